@@ -1,0 +1,18 @@
+# What every target of this project is compiled with. Nothing is set for a project that includes this
+# one: the settings are those of a target that only our own targets link to.
+add_library(orvadr_compile_options INTERFACE)
+target_compile_features(orvadr_compile_options INTERFACE cxx_std_17)
+target_compile_options(orvadr_compile_options INTERFACE
+    -Wall -Wextra -Wpedantic -Wshadow -Wconversion -Wold-style-cast -Woverloaded-virtual
+    -Wnull-dereference -Wnon-virtual-dtor
+    $<$<BOOL:${ORVADR_WARNINGS_AS_ERRORS}>:-Werror>)
+
+if(ORVADR_SANITIZE)
+    set(sanitizers -fsanitize=address,undefined -fno-sanitize-recover=all -fno-omit-frame-pointer)
+    target_compile_options(orvadr_compile_options INTERFACE ${sanitizers})
+    target_link_options(orvadr_compile_options INTERFACE ${sanitizers})
+endif()
+if(ORVADR_COVERAGE)
+    target_compile_options(orvadr_compile_options INTERFACE --coverage -fprofile-update=atomic)
+    target_link_options(orvadr_compile_options INTERFACE --coverage)
+endif()

@@ -1,0 +1,35 @@
+#include <orvarandom/orvarandom.h>
+
+#include <sys/random.h>
+
+#include <cerrno>
+#include <cstdint>
+
+namespace ORVA::RANDOM {
+
+namespace {
+
+// 64 bits from the kernel. Requests this small are never cut short; before the kernel has gathered
+// its first randomness they wait, and a signal may break the wait.
+std::uint64_t KernelBits()
+{
+    std::uint64_t bits = 0;
+    while (::getrandom(&bits, sizeof bits, 0) < 0 && errno == EINTR) {
+    }
+    return bits;
+}
+
+}  // namespace
+
+unsigned int ORVARandom::urandom(unsigned int min, unsigned int max)
+{
+    if (max <= min) return min;
+    const std::uint64_t range = std::uint64_t{max} - min + 1;
+    // The numbers past the last whole multiple of the range would favour the small results.
+    const std::uint64_t limit = UINT64_MAX - UINT64_MAX % range;
+    std::uint64_t bits = KernelBits();
+    while (bits >= limit) bits = KernelBits();
+    return static_cast<unsigned int>(min + bits % range);
+}
+
+}  // namespace ORVA::RANDOM

@@ -1,0 +1,92 @@
+#include "child_process.h"
+
+#include <fcntl.h>
+#include <poll.h>
+#include <signal.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <array>
+#include <cerrno>
+#include <chrono>
+#include <cstdlib>
+
+namespace {
+
+// Far longer than anything a test waits for: it ends runs that hang, it paces none.
+constexpr int DeadlineMSec = 60'000;
+
+}  // namespace
+
+void ChildProcess::Link::Tell() const
+{
+    const char byte = 0;
+    while (::write(out, &byte, 1) < 0 && errno == EINTR) {
+    }
+}
+
+bool ChildProcess::Link::Await() const
+{
+    pollfd waiting{in, POLLIN, 0};
+    if (::poll(&waiting, 1, DeadlineMSec) <= 0) return false;
+    char byte = 0;
+    return ::read(in, &byte, 1) == 1;
+}
+
+void ChildProcess::Link::Close()
+{
+    if (in >= 0) ::close(in);
+    if (out >= 0) ::close(out);
+    in = out = -1;
+}
+
+ChildProcess::ChildProcess(const std::function<void(Link&)>& body)
+{
+    std::array<int, 2> toChild{};
+    std::array<int, 2> fromChild{};
+    if (::pipe2(toChild.data(), O_CLOEXEC) < 0 || ::pipe2(fromChild.data(), O_CLOEXEC) < 0) {
+        std::abort();
+    }
+    pid = ::fork();
+    if (pid < 0) std::abort();
+    if (pid == 0) {
+        ::close(toChild[1]);
+        ::close(fromChild[0]);
+        (void)::signal(SIGPIPE, SIG_IGN);
+        ::alarm(DeadlineMSec / 1000);
+        Link ours(toChild[0], fromChild[1]);
+        try {
+            body(ours);
+        } catch (...) {
+            ::_exit(1);
+        }
+        ::_exit(0);
+    }
+    ::close(toChild[0]);
+    ::close(fromChild[1]);
+    link = Link(fromChild[0], toChild[1]);
+}
+
+ChildProcess::~ChildProcess()
+{
+    if (pid > 0) {
+        Kill(SIGKILL);
+        Join();
+    }
+    link.Close();
+}
+
+void ChildProcess::Kill(int signal) const
+{
+    ::kill(pid, signal);
+}
+
+int ChildProcess::Join()
+{
+    int status = 0;
+    while (::waitpid(pid, &status, 0) < 0) {
+        if (errno != EINTR) std::abort();
+    }
+    pid = -1;
+    return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+}
