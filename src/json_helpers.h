@@ -1,0 +1,34 @@
+// What Json::Value lacks or throws at. jsoncpp throws when a value is used as a type that it is
+// not; here, and nowhere else, those exceptions end: a value of the wrong kind counts as absent.
+#ifndef ORVADRCORE_SRC_JSON_HELPERS_H
+#define ORVADRCORE_SRC_JSON_HELPERS_H
+
+#include <string>
+
+#include <json/value.h>
+
+namespace OrvaDRCore {
+
+// Parses `text`, which must be one whole JSON document of any type, into `value`. A text that does
+// not parse, that goes on after its document or that nests deeper than the reader's limit (1000)
+// gives false and leaves `value` as it was.
+bool fromString(Json::Value& value, const std::string& text);
+
+// The document on one line, without blanks or a final newline. Bytes above 0x7f stand as they are,
+// so that every byte string survives the way through toString and fromString.
+std::string toString(const Json::Value& value);
+
+// The member `key` of an object; null when it is absent, when `object` is no object and when `key`
+// is null. The pointer is good until `object` changes.
+const Json::Value* FindMember(const Json::Value& object, const char* key);
+
+// The library's own conversions, with false and the empty text where it has none.
+bool AsBool(const Json::Value& value);
+std::string AsString(const Json::Value& value);
+
+// Empties an array or an object, which keeps its type; any other value becomes null.
+void Clear(Json::Value& value);
+
+}  // namespace OrvaDRCore
+
+#endif
