@@ -1,0 +1,82 @@
+/// \file
+/// Small helpers that stand alone: a UUID, a random pause, vectors as JSON or as one text, a path
+/// test.
+///
+/// \code
+///     Container::ToString<std::string>({"id", "name"}, ",");   // "id,name"
+///     Validator::IsVolPath("/volume1/replica");                // true
+/// \endcode
+///
+/// Nothing here keeps state; every function may be called from any thread. Log lines name the file
+/// `utils.cpp`.
+#ifndef ORVADRCORE_UTILS_H
+#define ORVADRCORE_UTILS_H
+
+#include <string>
+#include <vector>
+
+#include <json/value.h>
+
+#include <orvadrcore/export.h>
+
+namespace OrvaDRCore {
+
+/// A new UUID: the first line that `/usr/bin/uuidgen` prints, without blanks around it.
+/// \return the text; empty when the program printed nothing, without a log line, or when it could
+///         not be started, with ERR "Failed to exec the command [%s]."
+/// \note Starts a process; the process inherits no descriptor but 0, 1 and 2.
+ORVADRCORE_API std::string GenerateUUID();
+
+/// Sleeps for a random time between two bounds, both included.
+/// \param min  shortest sleep in milliseconds, above 0
+/// \param max  longest sleep in milliseconds, above `min`: equal bounds are refused on purpose
+/// \return true after the sleep; false at once, with ERR "Invalid period [%u - %u] to sleep", when
+///         the bounds are not as said
+/// \note A signal handler that runs in the meantime may cut the sleep short.
+ORVADRCORE_API bool RandomSleepInMSec(unsigned int min, unsigned int max);
+
+/// Vectors turned into something else, for elements of type `std::string`, `int`, `bool` and
+/// `double`. Neither operation fails or logs.
+class ORVADRCORE_API Container {
+  public:
+    Container() = delete;
+
+    /// The elements, in order, as a JSON array of text, integers, booleans or numbers.
+    /// \return the array; an empty array, not null, for an empty vector
+    template <class T>
+    static Json::Value ToJsonArray(const std::vector<T>& values);
+
+    /// The elements one after the other, with `separator` between them.
+    /// \warning Numbers are appended as characters, not in decimals: an `int` as the character of
+    ///          its low 8 bits (65 and 66 joined with "," give "A,B"), a `bool` as the character 1
+    ///          or 0, a `double` as the character of the low 8 bits of its value without the
+    ///          fraction (0 when negative). Format numbers as text first when you want decimals.
+    /// \note No separator follows as long as the result is empty, so empty texts at the beginning
+    ///       vanish: "" and "b" give "b". Later ones keep their separator.
+    template <class T>
+    static std::string ToString(const std::vector<T>& values, const std::string& separator);
+};
+
+extern template Json::Value Container::ToJsonArray(const std::vector<std::string>&);
+extern template Json::Value Container::ToJsonArray(const std::vector<int>&);
+extern template Json::Value Container::ToJsonArray(const std::vector<bool>&);
+extern template Json::Value Container::ToJsonArray(const std::vector<double>&);
+extern template std::string Container::ToString(const std::vector<std::string>&,
+                                                const std::string&);
+extern template std::string Container::ToString(const std::vector<int>&, const std::string&);
+extern template std::string Container::ToString(const std::vector<bool>&, const std::string&);
+extern template std::string Container::ToString(const std::vector<double>&, const std::string&);
+
+/// Tests of texts.
+class ORVADRCORE_API Validator {
+  public:
+    Validator() = delete;
+
+    /// Whether a path begins with "/volume". What follows is not looked at: "/volume", "/volume1/x"
+    /// and "/volumeUSB" all pass, an empty path does not.
+    static bool IsVolPath(const std::string& path);
+};
+
+}  // namespace OrvaDRCore
+
+#endif

@@ -1,0 +1,106 @@
+#include <orvadrcore/utils.h>
+
+#include <orvacore/orvacore.h>
+#include <orvarandom/orvarandom.h>
+#include <unistd.h>
+
+#include <cmath>
+#include <cstdio>
+#include <cstdlib>
+#include <string_view>
+
+#include "log.h"
+
+namespace OrvaDRCore {
+
+namespace {
+
+constexpr const char* UuidProgram = "/usr/bin/uuidgen";
+constexpr std::string_view VolumePrefix = "/volume";
+
+void Append(std::string& text, const std::string& element)
+{
+    text += element;
+}
+
+void Append(std::string& text, int element)
+{
+    text += static_cast<char>(static_cast<unsigned char>(element));
+}
+
+void Append(std::string& text, bool element)
+{
+    text += element ? '\1' : '\0';
+}
+
+void Append(std::string& text, double element)
+{
+    // fmod keeps the low 8 bits of numbers that no integer type holds; infinity and NaN have none.
+    const double low = element > 0 ? std::fmod(std::trunc(element), 256.0) : 0.0;
+    text += std::isfinite(low) ? static_cast<char>(static_cast<unsigned char>(low)) : '\0';
+}
+
+}  // namespace
+
+std::string GenerateUUID()
+{
+    std::string uuid;
+    FILE* output = CoreLibPopen(UuidProgram, "r", nullptr);
+    if (output == nullptr) {
+        DR_LOG(Err, "Failed to exec the command [%s].", UuidProgram);
+        return uuid;
+    }
+    char* line = nullptr;
+    std::size_t size = 0;
+    if (::getline(&line, &size, output) >= 0) uuid = CoreLibStrTrim(line, nullptr, nullptr);
+    CoreLibPclose(output);
+    std::free(line);
+    return uuid;
+}
+
+bool RandomSleepInMSec(unsigned int min, unsigned int max)
+{
+    if (min == 0 || max == 0 || min >= max) {
+        DR_LOG(Err, "Invalid period [%u - %u] to sleep", min, max);
+        return false;
+    }
+    ORVA::RANDOM::ORVARandom random;
+    ::usleep(random.urandom(min, max) * 1000U);
+    return true;
+}
+
+template <class T>
+Json::Value Container::ToJsonArray(const std::vector<T>& values)
+{
+    Json::Value array(Json::arrayValue);
+    for (const auto& value : values) array.append(Json::Value(value));
+    return array;
+}
+
+template <class T>
+std::string Container::ToString(const std::vector<T>& values, const std::string& separator)
+{
+    std::string text;
+    for (const auto& value : values) {
+        // The text is asked, not the position: empty elements at the beginning vanish, on purpose.
+        if (!text.empty()) text += separator;
+        Append(text, value);
+    }
+    return text;
+}
+
+template Json::Value Container::ToJsonArray(const std::vector<std::string>&);
+template Json::Value Container::ToJsonArray(const std::vector<int>&);
+template Json::Value Container::ToJsonArray(const std::vector<bool>&);
+template Json::Value Container::ToJsonArray(const std::vector<double>&);
+template std::string Container::ToString(const std::vector<std::string>&, const std::string&);
+template std::string Container::ToString(const std::vector<int>&, const std::string&);
+template std::string Container::ToString(const std::vector<bool>&, const std::string&);
+template std::string Container::ToString(const std::vector<double>&, const std::string&);
+
+bool Validator::IsVolPath(const std::string& path)
+{
+    return path.compare(0, VolumePrefix.size(), VolumePrefix) == 0;
+}
+
+}  // namespace OrvaDRCore
