@@ -1,0 +1,181 @@
+/// \file
+/// Values and records: what goes into SQL statements and comes out of them.
+///
+/// \code
+///     SqliteValueList node;
+///     node.AddValue("id", 3);
+///     node.AddValue("name", SqliteValue::EscapeText("O'Brien's NAS"));
+///     node.ToStr();                                   // "id:3, name:'O''Brien''s NAS'"
+///     std::string name;
+///     if (node.GetValue("name", name)) { ... }
+/// \endcode
+///
+/// Values and records are plain: they own all that they hold, and each is used by one thread at a
+/// time. Nothing here throws; what is refused is logged (file `sqlite_value.cpp`) and answered by
+/// false or by an invalid value.
+#ifndef ORVADRCORE_SQLITE_VALUE_H
+#define ORVADRCORE_SQLITE_VALUE_H
+
+#include <cstddef>
+#include <map>
+#include <string>
+#include <vector>
+
+#include <json/value.h>
+
+#include <orvadrcore/export.h>
+
+namespace OrvaDRCore {
+
+/// One column's value: an `int`, an `unsigned int`, a `bool`, a text, or nothing.
+class ORVADRCORE_API SqliteValue {
+  public:
+    /// No value: IsValid() is false and ToFormatedValue() empty.
+    SqliteValue() = default;
+
+    SqliteValue(int number);               ///< A signed integer.
+    SqliteValue(unsigned int number);      ///< An unsigned integer.
+    SqliteValue(bool truth);               ///< A boolean, written as 1 or 0.
+    SqliteValue(const std::string& text);  ///< A text; see the warning at ToFormatedValue().
+    SqliteValue(const char* text);         ///< A text; no value when `text` is null.
+    SqliteValue(std::nullptr_t) = delete;
+
+    SqliteValue(const SqliteValue&) = default;
+    SqliteValue(SqliteValue&&) noexcept = default;
+    ~SqliteValue() = default;
+
+    /// Takes over the other's payload and nothing else.
+    /// \warning Whether a value is valid is decided when it is built and does not travel with an
+    ///          assignment: `SqliteValue v; v = SqliteValue(1);` leaves `v` invalid, and a valid
+    ///          value that is assigned an empty one is not valid either. Build values, or put them
+    ///          into a SqliteValueList; do not fill empty ones.
+    SqliteValue& operator=(const SqliteValue& other);
+
+    /// Whether the value was built from a number, boolean or text and still holds one.
+    bool IsValid() const;
+
+    /// Reads the value as `T`: `std::string`, `unsigned int`, `int` or `bool`.
+    ///
+    /// A text is read from a text only and a number from a number that fits `T`; a boolean also
+    /// from the integers 0 and 1. Nothing is converted: the text "12" is no number, true is no 1.
+    /// \param[out] out  the result; untouched on failure
+    /// \return false when the value is of another kind, with WARN "[%s] is not string",
+    ///         "[%s] is not int" (both integer types) or "[%s] is not bool", filled with the value
+    ///         as JSON; the line's function is "GetValue<int>" and the like
+    template <class T>
+    bool GetValue(T& out) const = delete;
+
+    /// The value as an SQL literal: a text between single quotes, a number in decimals, a boolean
+    /// as 1 or 0; empty when there is no value.
+    /// \warning A text is quoted but not escaped: a single quote inside it ends the literal, and
+    ///          what follows is read as SQL. Pass texts that you do not control through
+    ///          EscapeText() when you build the value.
+    std::string ToFormatedValue() const;
+
+    /// The text with every single quote doubled: a value built from the result is written as the
+    /// literal of the original text.
+    /// \code
+    ///     SqliteValue(SqliteValue::EscapeText("it's")).ToFormatedValue();   // "'it''s'"
+    /// \endcode
+    /// \note SQLite ends a statement at the first zero byte, so no literal can hold one.
+    static std::string EscapeText(const std::string& text);
+
+  private:
+    bool valid = false;
+    Json::Value value;
+};
+
+template <>
+ORVADRCORE_API bool SqliteValue::GetValue<std::string>(std::string& out) const;
+template <>
+ORVADRCORE_API bool SqliteValue::GetValue<unsigned int>(unsigned int& out) const;
+template <>
+ORVADRCORE_API bool SqliteValue::GetValue<int>(int& out) const;
+template <>
+ORVADRCORE_API bool SqliteValue::GetValue<bool>(bool& out) const;
+
+/// One record: values by field name, in the byte order of the names, whatever the order of adding.
+/// No name is empty and every value is valid.
+class ORVADRCORE_API SqliteValueList {
+  public:
+    SqliteValueList() = default;
+    SqliteValueList(const SqliteValueList&) = default;
+    SqliteValueList(SqliteValueList&&) noexcept = default;
+    virtual ~SqliteValueList();
+
+    /// Replaces all fields by the other's.
+    SqliteValueList& operator=(const SqliteValueList& other);
+    SqliteValueList& operator=(SqliteValueList&& other) noexcept;
+
+    /// Adds a field, or replaces the value of a field that is there already.
+    /// \return false when `field` is empty or `value` not valid, with ERR
+    ///         "Bad Field[%s] or value [%s]"; the record is unchanged then
+    bool AddValue(const std::string& field, const SqliteValue& value);
+
+    /// Adds every field of the other record; where both have a field, the other's value wins.
+    SqliteValueList& operator+=(const SqliteValueList& other);
+
+    /// Whether a field is there. An empty name is not, with ERR "Invalid field [%s]".
+    bool HasField(const std::string& field) const;
+
+    /// The value of a field.
+    /// \return a reference that is good until the record changes; to a value that is not valid when
+    ///         there is none, with ERR "Invalid field [%s]" for an empty name and WARN
+    ///         "Failed to find field [%s]" for a missing field
+    const SqliteValue& GetValue(const std::string& field) const;
+
+    /// Reads a field as `T`: `std::string`, `bool`, `int` or `unsigned int`.
+    /// \param field     the field's name
+    /// \param[out] out  the result; untouched on failure
+    /// \return false for an empty name, with ERR "Invalid field [%s]"; for a missing field, with
+    ///         DEBUG "field [%s] is not existed"; for a value of another kind, with the line of
+    ///         SqliteValue::GetValue()
+    template <class T>
+    bool GetValue(const std::string& field, T& out) const;
+
+    /// All fields, for walking over a record whose columns are not known beforehand.
+    const std::map<std::string, SqliteValue>& GetValues() const { return values; }
+
+    /// The record for a reader: "id:3, name:'abc'".
+    std::string ToStr() const;
+
+  private:
+    // Behind the reference that is given out for what is not there; never changes.
+    SqliteValue invalidValue;
+    std::map<std::string, SqliteValue> values;
+};
+
+extern template bool SqliteValueList::GetValue(const std::string&, std::string&) const;
+extern template bool SqliteValueList::GetValue(const std::string&, bool&) const;
+extern template bool SqliteValueList::GetValue(const std::string&, int&) const;
+extern template bool SqliteValueList::GetValue(const std::string&, unsigned int&) const;
+
+/// Base of a program's own record types, which turn themselves into a SqliteValueList.
+///
+/// The order of the virtual operations is part of the binary interface.
+class ORVADRCORE_API SqliteRecord {
+  public:
+    /// The record with the named fields.
+    virtual SqliteValueList BuildRecord(const std::vector<std::string>& fields) const = 0;
+
+    /// Takes the object's content from a record. The library never calls it.
+    /// \return whether the record was taken; false by default
+    virtual bool LoadRecord(const SqliteValueList& record);
+
+    /// The names of all fields of this type.
+    virtual std::vector<std::string> GetRecordFields() const = 0;
+
+    virtual ~SqliteRecord();
+
+    /// BuildRecord() with all of GetRecordFields().
+    SqliteValueList ToSqliteRecord() const;
+
+  protected:
+    SqliteRecord() = default;
+    SqliteRecord(const SqliteRecord&) = default;
+    SqliteRecord& operator=(const SqliteRecord&) = default;
+};
+
+}  // namespace OrvaDRCore
+
+#endif

@@ -1,0 +1,194 @@
+#include <orvadrcore/sqlite_value.h>
+
+#include <utility>
+
+#include "json_helpers.h"
+#include "log.h"
+#include "pairs.h"
+
+namespace OrvaDRCore {
+
+SqliteValue::SqliteValue(int number) : valid(true), value(number) {}
+
+SqliteValue::SqliteValue(unsigned int number) : valid(true), value(number) {}
+
+SqliteValue::SqliteValue(bool truth) : valid(true), value(truth) {}
+
+SqliteValue::SqliteValue(const std::string& text) : valid(true), value(text) {}
+
+SqliteValue::SqliteValue(const char* text) : valid(text != nullptr)
+{
+    if (valid) value = text;
+}
+
+// `valid` stays as it was, on purpose: only construction makes a value valid.
+SqliteValue& SqliteValue::operator=(const SqliteValue& other)
+{
+    value = other.value;
+    return *this;
+}
+
+bool SqliteValue::IsValid() const
+{
+    return valid && (value.isString() || value.isBool() || value.isIntegral());
+}
+
+template <>
+bool SqliteValue::GetValue(std::string& out) const
+{
+    if (!value.isString()) {
+        DR_LOG_AS("GetValue<std::basic_string<char> >", Warn, "[%s] is not string",
+                  toString(value).c_str());
+        return false;
+    }
+    out = value.asString();
+    return true;
+}
+
+template <>
+bool SqliteValue::GetValue(unsigned int& out) const
+{
+    if (!value.isUInt()) {
+        DR_LOG_AS("GetValue<unsigned int>", Warn, "[%s] is not int", toString(value).c_str());
+        return false;
+    }
+    out = value.asUInt();
+    return true;
+}
+
+template <>
+bool SqliteValue::GetValue(int& out) const
+{
+    if (!value.isInt()) {
+        DR_LOG_AS("GetValue<int>", Warn, "[%s] is not int", toString(value).c_str());
+        return false;
+    }
+    out = value.asInt();
+    return true;
+}
+
+template <>
+bool SqliteValue::GetValue(bool& out) const
+{
+    const bool isBit = value.isInt() && (value.asInt() == 0 || value.asInt() == 1);
+    if (!value.isBool() && !isBit) {
+        DR_LOG_AS("GetValue<bool>", Warn, "[%s] is not bool", toString(value).c_str());
+        return false;
+    }
+    out = value.asBool();
+    return true;
+}
+
+std::string SqliteValue::ToFormatedValue() const
+{
+    if (value.isString()) return "'" + value.asString() + "'";
+    if (value.isBool()) return value.asBool() ? "1" : "0";
+    if (value.isInt()) return std::to_string(value.asInt());
+    if (value.isUInt()) return std::to_string(value.asUInt());
+    return {};
+}
+
+std::string SqliteValue::EscapeText(const std::string& text)
+{
+    std::string escaped;
+    escaped.reserve(text.size());
+    for (const char character : text) {
+        if (character == '\'') escaped += '\'';
+        escaped += character;
+    }
+    return escaped;
+}
+
+SqliteValueList::~SqliteValueList() = default;
+
+SqliteValueList& SqliteValueList::operator=(const SqliteValueList& other)
+{
+    // Through a copy made by construction: assigning value by value would lose `valid`.
+    return *this = SqliteValueList(other);
+}
+
+SqliteValueList& SqliteValueList::operator=(SqliteValueList&& other) noexcept
+{
+    values.swap(other.values);
+    return *this;
+}
+
+bool SqliteValueList::AddValue(const std::string& field, const SqliteValue& value)
+{
+    if (field.empty() || !value.IsValid()) {
+        DR_LOG(Err, "Bad Field[%s] or value [%s]", field.c_str(), value.ToFormatedValue().c_str());
+        return false;
+    }
+    const auto [entry, added] = values.try_emplace(field, value);
+    if (!added) entry->second = value;
+    return true;
+}
+
+SqliteValueList& SqliteValueList::operator+=(const SqliteValueList& other)
+{
+    for (const auto& [field, value] : other.values) AddValue(field, value);
+    return *this;
+}
+
+bool SqliteValueList::HasField(const std::string& field) const
+{
+    if (field.empty()) {
+        DR_LOG(Err, "Invalid field [%s]", field.c_str());
+        return false;
+    }
+    return values.count(field) > 0;
+}
+
+const SqliteValue& SqliteValueList::GetValue(const std::string& field) const
+{
+    if (field.empty()) {
+        DR_LOG(Err, "Invalid field [%s]", field.c_str());
+        return invalidValue;
+    }
+    const auto entry = values.find(field);
+    if (entry == values.end()) {
+        DR_LOG(Warn, "Failed to find field [%s]", field.c_str());
+        return invalidValue;
+    }
+    return entry->second;
+}
+
+template <class T>
+bool SqliteValueList::GetValue(const std::string& field, T& out) const
+{
+    if (field.empty()) {
+        DR_LOG(Err, "Invalid field [%s]", field.c_str());
+        return false;
+    }
+    const auto entry = values.find(field);
+    if (entry == values.end()) {
+        // A lower level than in the other GetValue, on purpose: asking this way is a test, too.
+        DR_LOG(Debug, "field [%s] is not existed", field.c_str());
+        return false;
+    }
+    return entry->second.GetValue(out);
+}
+
+template bool SqliteValueList::GetValue(const std::string&, std::string&) const;
+template bool SqliteValueList::GetValue(const std::string&, bool&) const;
+template bool SqliteValueList::GetValue(const std::string&, int&) const;
+template bool SqliteValueList::GetValue(const std::string&, unsigned int&) const;
+
+std::string SqliteValueList::ToStr() const
+{
+    return JoinPairs(*this, ":", ", ");
+}
+
+SqliteRecord::~SqliteRecord() = default;
+
+bool SqliteRecord::LoadRecord(const SqliteValueList& /*record*/)
+{
+    return false;
+}
+
+SqliteValueList SqliteRecord::ToSqliteRecord() const
+{
+    return BuildRecord(GetRecordFields());
+}
+
+}  // namespace OrvaDRCore
