@@ -1,0 +1,377 @@
+#include <orvadrcore/sqlite_condition.h>
+
+#include <type_traits>
+
+#include "support/log_capture.h"
+
+// Conditions have no virtual destructor, on purpose, and neither has the one that is derived here.
+#pragma GCC diagnostic ignored "-Wnon-virtual-dtor"
+
+namespace {
+
+using OrvaDRCore::SqliteAnd;
+using OrvaDRCore::SqliteCondition;
+using OrvaDRCore::SqliteEqual;
+using OrvaDRCore::SqliteIn;
+using OrvaDRCore::SqliteInFamily;
+using OrvaDRCore::SqliteNotEqual;
+using OrvaDRCore::SqliteNotIn;
+using OrvaDRCore::SqliteOr;
+using OrvaDRCore::SqliteValue;
+
+using Values = std::vector<SqliteValue>;
+
+// Polymorphic values without a virtual destructor, on purpose.
+template <class... Conditions>
+constexpr bool ArePlain = (... && (std::is_polymorphic_v<Conditions> &&
+                                   !std::has_virtual_destructor_v<Conditions> &&
+                                   std::is_copy_constructible_v<Conditions> &&
+                                   std::is_copy_assignable_v<Conditions>));
+static_assert(ArePlain<SqliteCondition, SqliteEqual, SqliteNotEqual, SqliteAnd, SqliteOr,
+                       SqliteInFamily, SqliteIn, SqliteNotIn>);
+
+static_assert(std::is_base_of_v<SqliteInFamily, SqliteIn>);
+static_assert(std::is_base_of_v<SqliteInFamily, SqliteNotIn>);
+
+constexpr const char* NullText = nullptr;
+
+// Its validity is not copied by an assignment: it holds the number and is not valid.
+SqliteValue AssignedOnly(int number)
+{
+    SqliteValue value;
+    value = SqliteValue(number);
+    return value;
+}
+
+class SqliteConditionTest : public LoggedTest {
+  protected:
+    SqliteConditionTest() : LoggedTest("sqlite_condition.cpp") {}
+
+    // Validity is asked through the base, as the commands do.
+    static void ExpectCondition(const SqliteCondition& condition, bool valid,
+                                const std::string& text)
+    {
+        EXPECT_EQ(condition.IsValid(), valid) << text;
+        EXPECT_EQ(condition.GetCondition(), text);
+    }
+
+    void ExpectRefusal(const std::string& message) { ExpectLines({Err("SetValue", message)}); }
+};
+
+TEST_F(SqliteConditionTest, AnEmptyConditionIsNotValid)
+{
+    ExpectCondition(SqliteCondition(), false, "");
+    ExpectCondition(SqliteCondition(""), false, "");
+    ExpectCondition(SqliteEqual(), false, "");
+    ExpectCondition(SqliteNotEqual(), false, "");
+    ExpectCondition(SqliteAnd(), false, "");
+    ExpectCondition(SqliteOr(), false, "");
+}
+
+TEST_F(SqliteConditionTest, AReadyTextIsTakenAsItIs)
+{
+    ExpectCondition(SqliteCondition("x > 5"), true, "x > 5");
+    ExpectCondition(SqliteCondition(" "), true, " ");
+    ExpectCondition(SqliteCondition("no ' SQL ;%s"), true, "no ' SQL ;%s");
+}
+
+TEST_F(SqliteConditionTest, AComparisonHasNoBlanks)
+{
+    ExpectCondition(SqliteEqual("id", 3), true, "id=3");
+    ExpectCondition(SqliteEqual("id", -3), true, "id=-3");
+    ExpectCondition(SqliteEqual("id", 4000000000U), true, "id=4000000000");
+    ExpectCondition(SqliteEqual("id", "abc"), true, "id='abc'");
+    ExpectCondition(SqliteEqual("id", std::string("abc")), true, "id='abc'");
+    ExpectCondition(SqliteEqual("id", ""), true, "id=''");
+    ExpectCondition(SqliteEqual("id", true), true, "id=1");
+    ExpectCondition(SqliteEqual("owner", "it's"), true, "owner='it's'");  // on purpose
+    ExpectCondition(SqliteEqual("lower(a b)", 1), true, "lower(a b)=1");
+    ExpectCondition(SqliteNotEqual("id", 3), true, "id!=3");
+    ExpectCondition(SqliteNotEqual("state", 0), true, "state!=0");
+    ExpectCondition(SqliteNotEqual("state", false), true, "state!=0");
+    ExpectCondition(SqliteNotEqual("name", "abc"), true, "name!='abc'");
+}
+
+TEST_F(SqliteConditionTest, AJunctionPutsItsOperandsInParentheses)
+{
+    const SqliteEqual left("id", 3);
+    const SqliteNotEqual right("state", 0);
+    ExpectCondition(SqliteAnd(left.GetCondition(), right.GetCondition()), true,
+                    "(id=3) AND (state!=0)");
+    ExpectCondition(SqliteOr(left.GetCondition(), right.GetCondition()), true,
+                    "(id=3) OR (state!=0)");
+    ExpectCondition(SqliteAnd("a=1", SqliteOr("b=2", "c=3").GetCondition()), true,
+                    "(a=1) AND ((b=2) OR (c=3))");
+}
+
+// What stands for the types in the cases' names.
+struct TypeNames {
+    template <class T>
+    static std::string GetName(int /*index*/)
+    {
+        if (std::is_same_v<T, SqliteEqual>) return "Equal";
+        if (std::is_same_v<T, SqliteNotEqual>) return "NotEqual";
+        if (std::is_same_v<T, SqliteAnd>) return "And";
+        return "Or";
+    }
+};
+
+// The cases that SqliteEqual and SqliteNotEqual share; SqliteAnd and SqliteOr below.
+template <class Condition>
+class SqliteComparisonTest : public SqliteConditionTest {
+};
+using Comparisons = ::testing::Types<SqliteEqual, SqliteNotEqual>;
+TYPED_TEST_SUITE(SqliteComparisonTest, Comparisons, TypeNames);
+
+TYPED_TEST(SqliteComparisonTest, SettingReplacesTheText)
+{
+    TypeParam condition("a", 1);
+    EXPECT_TRUE(condition.SetValue("b", "x"));
+    this->ExpectCondition(condition, true, TypeParam("b", "x").GetCondition());
+}
+
+TYPED_TEST(SqliteComparisonTest, BadOperandsAreRefused)
+{
+    struct Row {
+        const char* lvalue;
+        SqliteValue value;
+        const char* message;
+    };
+    const std::vector<Row> rows{
+        {"", 1, "Bad lvalue[] or rvalue[1]"},
+        {"", "%s%n", "Bad lvalue[] or rvalue['%s%n']"},
+        {"", {}, "Bad lvalue[] or rvalue[]"},
+        {"id", {}, "Bad lvalue[id] or rvalue[]"},
+        {"id", NullText, "Bad lvalue[id] or rvalue[]"},
+        {"id", AssignedOnly(7), "Bad lvalue[id] or rvalue[7]"},
+    };
+    for (const Row& row : rows) {
+        const TypeParam built(row.lvalue, row.value);
+        this->ExpectRefusal(row.message);
+        this->ExpectCondition(built, false, "");
+
+        TypeParam set("a", 1);
+        EXPECT_FALSE(set.SetValue(row.lvalue, row.value)) << row.message;
+        this->ExpectRefusal(row.message);
+        this->ExpectCondition(set, true, TypeParam("a", 1).GetCondition());
+    }
+}
+
+template <class Condition>
+class SqliteJunctionTest : public SqliteConditionTest {
+};
+using Junctions = ::testing::Types<SqliteAnd, SqliteOr>;
+TYPED_TEST_SUITE(SqliteJunctionTest, Junctions, TypeNames);
+
+// Appended, not replaced, on purpose.
+TYPED_TEST(SqliteJunctionTest, SettingAgainAppendsToTheText)
+{
+    TypeParam condition("a", "b");
+    EXPECT_TRUE(condition.SetValue("c", "d"));
+    this->ExpectCondition(condition, true,
+                          TypeParam("a", "b").GetCondition() + TypeParam("c", "d").GetCondition());
+}
+
+TYPED_TEST(SqliteJunctionTest, ItsOwnTextCanBeAnOperand)
+{
+    TypeParam condition("a", "b");
+    const std::string text = condition.GetCondition();
+    EXPECT_TRUE(condition.SetValue(condition.GetCondition(), condition.GetCondition()));
+    this->ExpectCondition(condition, true, text + TypeParam(text, text).GetCondition());
+}
+
+TYPED_TEST(SqliteJunctionTest, AnEmptyOperandIsRefused)
+{
+    struct Row {
+        const char* left;
+        const char* right;
+        const char* message;
+    };
+    const std::vector<Row> rows{
+        {"", "b", "Bad lvalue[] or rvalue[b]"},
+        {"a", "", "Bad lvalue[a] or rvalue[]"},
+        {"", "", "Bad lvalue[] or rvalue[]"},
+        {"%s%n", "", "Bad lvalue[%s%n] or rvalue[]"},
+    };
+    for (const Row& row : rows) {
+        const TypeParam built(row.left, row.right);
+        this->ExpectRefusal(row.message);
+        this->ExpectCondition(built, false, "");
+
+        TypeParam set("c", "d");
+        EXPECT_FALSE(set.SetValue(row.left, row.right)) << row.message;
+        this->ExpectRefusal(row.message);
+        this->ExpectCondition(set, true, TypeParam("c", "d").GetCondition());
+    }
+}
+
+TEST_F(SqliteConditionTest, AListOfValuesStandsInParentheses)
+{
+    ExpectCondition(SqliteIn("id", Values{1, 2, 3}), true, "id IN ( 1,2,3 )");
+    ExpectCondition(SqliteIn("id", Values{7}), true, "id IN ( 7 )");
+    ExpectCondition(SqliteIn("id", Values{1, 4000000000U, "x", true}), true,
+                    "id IN ( 1,4000000000,'x',1 )");
+    ExpectCondition(SqliteNotIn("name", Values{"a", "b"}), true, "name NOT IN ( 'a','b' )");
+    ExpectCondition(SqliteInFamily("IN", "id", Values{1}), true, "id IN ( 1 )");
+    ExpectCondition(SqliteInFamily("NOT IN", "id", Values{1}), true, "id NOT IN ( 1 )");
+}
+
+TEST_F(SqliteConditionTest, AnEmptyListIsAccepted)
+{
+    ExpectCondition(SqliteIn("id", Values{}), true, "id IN (  )");
+    ExpectCondition(SqliteNotIn("id", Values{}), true, "id NOT IN (  )");
+}
+
+TEST_F(SqliteConditionTest, AReadyListStandsInParentheses)
+{
+    ExpectCondition(SqliteIn("id", "SELECT id FROM jobs"), true, "id IN ( SELECT id FROM jobs )");
+    ExpectCondition(SqliteNotIn("id", "1,2"), true, "id NOT IN ( 1,2 )");
+    ExpectCondition(SqliteInFamily("IN", "id", "it's"), true, "id IN ( it's )");
+}
+
+// The keyword is asked, not the text, on purpose.
+TEST_F(SqliteConditionTest, AListConditionIsValidBeforeItHasAText)
+{
+    ExpectCondition(SqliteIn(), true, "");
+    ExpectCondition(SqliteNotIn(), true, "");
+    ExpectCondition(SqliteInFamily("IN"), true, "");
+    ExpectCondition(SqliteInFamily("NOT IN"), true, "");
+}
+
+TEST_F(SqliteConditionTest, SettingAListReplacesTheText)
+{
+    SqliteNotIn condition("a", Values{1});
+    EXPECT_TRUE(condition.SetValue("b", Values{2, 3}));
+    ExpectCondition(condition, true, "b NOT IN ( 2,3 )");
+    EXPECT_TRUE(condition.SetValue("c", "SELECT 4"));
+    ExpectCondition(condition, true, "c NOT IN ( SELECT 4 )");
+    EXPECT_TRUE(condition.SetValue("d", Values{}));
+    ExpectCondition(condition, true, "d NOT IN (  )");
+}
+
+TEST_F(SqliteConditionTest, AnotherKeywordRefusesEveryValue)
+{
+    for (const char* keyword :
+         {"", "in", "In", "not in", " IN", "IN ", "NOT  IN", "NOTIN", "LIKE", "%s%n"}) {
+        const std::string message = "Bad keyword [" + std::string(keyword) + "]";
+        SqliteInFamily condition(keyword);
+        ExpectLines({});
+        EXPECT_FALSE(condition.SetValue("id", Values{1}));
+        ExpectRefusal(message);
+        EXPECT_FALSE(condition.SetValue("id", "1"));
+        ExpectRefusal(message);
+        // The keyword comes first, and one failure is one line.
+        EXPECT_FALSE(condition.SetValue("", Values{SqliteValue()}));
+        ExpectRefusal(message);
+        EXPECT_FALSE(condition.SetValue("", ""));
+        ExpectRefusal(message);
+        ExpectCondition(condition, false, "");
+
+        ExpectCondition(SqliteInFamily(keyword, "id", Values{1}), false, "");
+        ExpectRefusal(message);
+        ExpectCondition(SqliteInFamily(keyword, "id", "1"), false, "");
+        ExpectRefusal(message);
+    }
+}
+
+TEST_F(SqliteConditionTest, AListWithoutAColumnIsRefused)
+{
+    SqliteIn condition("id", Values{1});
+    EXPECT_FALSE(condition.SetValue("", Values{2}));
+    ExpectRefusal("Bad lvalue[]");
+    EXPECT_FALSE(condition.SetValue("", Values{SqliteValue()}));
+    ExpectRefusal("Bad lvalue[]");
+    ExpectCondition(condition, true, "id IN ( 1 )");
+
+    ExpectCondition(SqliteNotIn("", Values{2}), true, "");
+    ExpectRefusal("Bad lvalue[]");
+}
+
+// Empty and yet valid, on purpose.
+TEST_F(SqliteConditionTest, AListWithABadValueEmptiesTheText)
+{
+    struct Row {
+        Values values;
+        const char* message;
+    };
+    const std::vector<Row> rows{
+        {{1, SqliteValue(), 3}, "Invalid rvalue []"},
+        {{SqliteValue()}, "Invalid rvalue []"},
+        {{1, 2, SqliteValue(NullText)}, "Invalid rvalue []"},
+        {{1, AssignedOnly(7), SqliteValue()}, "Invalid rvalue [7]"},
+    };
+    for (const Row& row : rows) {
+        ExpectCondition(SqliteIn("id", row.values), true, "");
+        ExpectRefusal(row.message);
+
+        SqliteNotIn condition("id", Values{1});
+        EXPECT_FALSE(condition.SetValue("id", row.values));
+        ExpectRefusal(row.message);
+        ExpectCondition(condition, true, "");
+    }
+}
+
+TEST_F(SqliteConditionTest, AReadyListWithAnEmptyOperandIsRefused)
+{
+    struct Row {
+        const char* lvalue;
+        const char* value;
+        const char* message;
+    };
+    const std::vector<Row> rows{
+        {"", "1", "Bad lvalue[] or value[1]"},
+        {"id", "", "Bad lvalue[id] or value[]"},
+        {"", "", "Bad lvalue[] or value[]"},
+    };
+    for (const Row& row : rows) {
+        ExpectCondition(SqliteIn(row.lvalue, row.value), true, "");
+        ExpectRefusal(row.message);
+
+        SqliteNotIn condition("a", "2");
+        EXPECT_FALSE(condition.SetValue(row.lvalue, row.value));
+        ExpectRefusal(row.message);
+        ExpectCondition(condition, true, "a NOT IN ( 2 )");
+    }
+}
+
+TEST_F(SqliteConditionTest, ACopyGoesItsOwnWay)
+{
+    const SqliteEqual original("a", 1);
+    SqliteEqual copy(original);
+    EXPECT_TRUE(copy.SetValue("b", 2));
+    ExpectCondition(copy, true, "b=2");
+    ExpectCondition(original, true, "a=1");
+
+    SqliteIn list;
+    list = SqliteIn("a", Values{1});
+    EXPECT_TRUE(list.SetValue("b", "2"));
+    ExpectCondition(list, true, "b IN ( 2 )");
+}
+
+// A caller's own kind of list, which has its own idea of validity.
+class AnyKeyword final : public SqliteInFamily {
+  public:
+    AnyKeyword(const std::string& word, bool answer) : SqliteInFamily(word), valid(answer) {}
+    bool IsValid() const override { return valid; }
+
+  private:
+    bool valid;
+};
+
+TEST_F(SqliteConditionTest, ASubclassIsAskedWhetherItIsValid)
+{
+    AnyKeyword accepting("GLOB", true);
+    EXPECT_TRUE(accepting.SetValue("id", Values{1}));
+    ExpectCondition(accepting, true, "id GLOB ( 1 )");
+    EXPECT_TRUE(accepting.SetValue("id", "2"));
+    ExpectCondition(accepting, true, "id GLOB ( 2 )");
+
+    AnyKeyword refusing("IN", false);
+    EXPECT_FALSE(refusing.SetValue("id", Values{1}));
+    ExpectRefusal("Bad keyword [IN]");
+    EXPECT_FALSE(refusing.SetValue("id", "2"));
+    ExpectRefusal("Bad keyword [IN]");
+    ExpectCondition(refusing, false, "");
+}
+
+}  // namespace
