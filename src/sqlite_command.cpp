@@ -1,0 +1,244 @@
+#include <orvadrcore/sqlite_command.h>
+
+#include <orvadrcore/utils.h>
+
+#include "log.h"
+#include "pairs.h"
+
+namespace OrvaDRCore {
+
+namespace {
+
+bool AddFieldValue(SqliteValueList& record, const std::string& field, const SqliteValue& value)
+{
+    if (field.empty() || !value.IsValid()) {
+        DR_LOG(Err, "Bad Field [%s] /value[%s]", field.c_str(), value.ToFormatedValue().c_str());
+        return false;
+    }
+    return record.AddValue(field, value);
+}
+
+// The text of a condition object, for the caller's setter of texts; null when it is not valid.
+const std::string* TextOf(const SqliteCondition& condition)
+{
+    if (!condition.IsValid()) {
+        DR_LOG_AS("SetCondition", Err, "Invalid condition");
+        return nullptr;
+    }
+    return &condition.GetCondition();
+}
+
+std::string PairsForLog(const SqliteValueList& record)
+{
+    return "values:[" + JoinPairs(record, "=", ",") + "]";
+}
+
+}  // namespace
+
+SqliteTableHandler::SqliteTableHandler(const std::string& tableName, const std::string& tableSchema)
+    : name(tableName), schema(tableSchema)
+{
+}
+
+SqliteTableHandler::~SqliteTableHandler() = default;
+
+SqliteCommand::~SqliteCommand() = default;
+
+bool SqliteCommand::SetTable(const SqliteTableHandler& handler)
+{
+    if (handler.GetName().empty()) {
+        DR_LOG(Err, "Invalid table [%s]", handler.GetName().c_str());
+        return false;
+    }
+    table = handler;
+    return true;
+}
+
+std::string SqliteCommand::ToStr() const
+{
+    std::stringstream out;
+    out << table.GetName() << "]";  // has no opening bracket, on purpose
+    DumpParam(out);
+    return out.str();
+}
+
+InsertCommand::~InsertCommand() = default;
+
+void InsertCommand::SetFieldValues(const SqliteValueList& values)
+{
+    fieldValues = values;
+}
+
+void InsertCommand::SetReplacable(bool allowed)
+{
+    replacable = allowed;
+}
+
+template <class T>
+bool InsertCommand::AddFieldValue(const std::string& field, const T& value)
+{
+    return OrvaDRCore::AddFieldValue(fieldValues, field, SqliteValue(value));
+}
+
+bool InsertCommand::AddFieldValue(const std::string& field, const char* text)
+{
+    return OrvaDRCore::AddFieldValue(fieldValues, field, SqliteValue(text));
+}
+
+bool InsertCommand::IsValid() const
+{
+    return !fieldValues.GetValues().empty() && !GetTable().GetName().empty();
+}
+
+std::string InsertCommand::ToFormatedInsertValues() const
+{
+    std::vector<std::string> names;
+    std::vector<std::string> literals;
+    for (const auto& [field, value] : fieldValues.GetValues()) {
+        names.push_back(field);
+        literals.push_back(value.ToFormatedValue());
+    }
+    return "(" + Container::ToString(names, ",") + ") VALUES (" +
+           Container::ToString(literals, ",") + ")";
+}
+
+std::string InsertCommand::GetCommand() const
+{
+    if (!IsValid()) {
+        DR_LOG(Err, "Bad insert parameter");
+        return {};
+    }
+    const char* verb = replacable ? "INSERT OR REPLACE INTO " : "INSERT INTO ";
+    return verb + GetTable().GetName() + " " + ToFormatedInsertValues() + ";";
+}
+
+void InsertCommand::DumpParam(std::stringstream& out) const
+{
+    out << PairsForLog(fieldValues);
+}
+
+UpdateCommand::~UpdateCommand() = default;
+
+void UpdateCommand::SetFieldValues(const SqliteValueList& values)
+{
+    fieldValues = values;
+}
+
+template <class T>
+bool UpdateCommand::AddFieldValue(const std::string& field, const T& value)
+{
+    return OrvaDRCore::AddFieldValue(fieldValues, field, SqliteValue(value));
+}
+
+bool UpdateCommand::AddFieldValue(const std::string& field, const char* text)
+{
+    return OrvaDRCore::AddFieldValue(fieldValues, field, SqliteValue(text));
+}
+
+// An empty text is refused without a line, on purpose; SelectCommand has one.
+bool UpdateCommand::SetCondition(const std::string& text)
+{
+    if (text.empty()) return false;
+    condition = text;
+    return true;
+}
+
+bool UpdateCommand::SetCondition(const SqliteCondition& object)
+{
+    const std::string* text = TextOf(object);
+    return text != nullptr && SetCondition(*text);
+}
+
+bool UpdateCommand::IsValid() const
+{
+    return !condition.empty() && !fieldValues.GetValues().empty() && !GetTable().GetName().empty();
+}
+
+// No ";" at the end of updates and selects, unlike inserts, on purpose.
+std::string UpdateCommand::GetCommand() const
+{
+    if (!IsValid()) {
+        DR_LOG(Err, "Bad update command");
+        return {};
+    }
+    std::string text =
+        "UPDATE " + GetTable().GetName() + " SET " + JoinPairs(fieldValues, "=", ",");
+    if (!condition.empty()) text += " WHERE " + condition;
+    return text;
+}
+
+void UpdateCommand::DumpParam(std::stringstream& out) const
+{
+    out << "condition:[" << condition << "]/" << PairsForLog(fieldValues);
+}
+
+SelectCommand::~SelectCommand() = default;
+
+void SelectCommand::SelectAll()
+{
+    fields.clear();
+    selectAll = true;
+}
+
+bool SelectCommand::AddField(const std::string& field)
+{
+    if (field.empty()) return false;
+    fields.push_back(field);
+    selectAll = false;
+    return true;
+}
+
+bool SelectCommand::SetCondition(const std::string& text)
+{
+    if (text.empty()) {
+        DR_LOG(Err, "Empty condition");
+        return false;
+    }
+    condition = text;
+    return true;
+}
+
+bool SelectCommand::SetCondition(const SqliteCondition& object)
+{
+    const std::string* text = TextOf(object);
+    return text != nullptr && SetCondition(*text);
+}
+
+bool SelectCommand::IsValid() const
+{
+    return !GetTable().GetName().empty() && (selectAll || !fields.empty());
+}
+
+std::string SelectCommand::GetCommand() const
+{
+    if (!IsValid()) {
+        DR_LOG(Err, "Bad select command");
+        return {};
+    }
+    std::string text = "SELECT ";
+    if (!fields.empty()) {
+        text += Container::ToString(fields, ",") + " ";
+    } else if (selectAll) {
+        text += " * ";  // the second blank before the star, on purpose
+    }
+    text += "FROM " + GetTable().GetName();
+    if (!condition.empty()) text += " WHERE " + condition;
+    return text;
+}
+
+void SelectCommand::DumpParam(std::stringstream& out) const
+{
+    out << "condition:[" << condition << "]/fields:["
+        << (selectAll ? "all" : Container::ToString(fields, ", ")) << "]";
+}
+
+template bool InsertCommand::AddFieldValue(const std::string&, const std::string&);
+template bool InsertCommand::AddFieldValue(const std::string&, const bool&);
+template bool InsertCommand::AddFieldValue(const std::string&, const int&);
+template bool InsertCommand::AddFieldValue(const std::string&, const unsigned int&);
+template bool UpdateCommand::AddFieldValue(const std::string&, const std::string&);
+template bool UpdateCommand::AddFieldValue(const std::string&, const bool&);
+template bool UpdateCommand::AddFieldValue(const std::string&, const int&);
+template bool UpdateCommand::AddFieldValue(const std::string&, const unsigned int&);
+
+}  // namespace OrvaDRCore
