@@ -1,0 +1,436 @@
+#include <orvadrcore/sqlite_db.h>
+
+#include <sqlite3.h>
+
+#include <memory>
+#include <utility>
+
+#include <orvadrcore/errors.h>
+#include <orvadrcore/utils.h>
+
+#include "json_helpers.h"
+#include "log.h"
+#include "retry.h"
+
+namespace OrvaDRCore {
+
+namespace {
+
+// How long a single try waits for another process's lock.
+constexpr int BusyTimeoutMSec = 1000;
+
+// The pause between tries: random, so that competing writers come apart.
+constexpr unsigned int MinPauseMSec = 500;
+constexpr unsigned int MaxPauseMSec = 1000;
+
+struct Finalize {
+    void operator()(sqlite3_stmt* statement) const { sqlite3_finalize(statement); }
+};
+using Statement = std::unique_ptr<sqlite3_stmt, Finalize>;
+
+// Fills `statement`, with null for a text that holds no statement. Answers SQLite's code.
+int PrepareStatement(sqlite3* handle, const std::string& command, Statement& statement)
+{
+    sqlite3_stmt* made = nullptr;
+    const int code = sqlite3_prepare_v2(handle, command.c_str(), -1, &made, nullptr);
+    statement.reset(made);
+    return code;
+}
+
+// The current row of a statement.
+SqliteValueList ParseRecord(sqlite3_stmt* statement)
+{
+    SqliteValueList record;
+    if (statement == nullptr) {
+        DR_LOG(Err, "Null Pointer");
+        return record;
+    }
+    const int columns = sqlite3_column_count(statement);
+    for (int column = 0; column < columns; ++column) {
+        const char* given = sqlite3_column_name(statement, column);  // null when memory is short
+        const char* name = given != nullptr ? given : "";
+        const int type = sqlite3_column_type(statement, column);
+        if (type == SQLITE_INTEGER) {
+            record.AddValue(name, SqliteValue(sqlite3_column_int(statement, column)));
+            continue;
+        }
+        // The pointer is null for a NULL column, and for a text when memory is short.
+        const unsigned char* text =
+            type == SQLITE_TEXT ? sqlite3_column_text(statement, column) : nullptr;
+        if (text != nullptr) {
+            record.AddValue(name, SqliteValue(reinterpret_cast<const char*>(text)));
+        } else if (type == SQLITE_NULL || type == SQLITE_TEXT) {
+            DR_LOG(Warn, "field [%s] has null value", name);
+        } else {
+            DR_LOG(Warn, "Not supported type [%d] with field [%s]", type, name);
+        }
+    }
+    return record;
+}
+
+}  // namespace
+
+// How a statement with retries went.
+struct SqliteDB::Tries {
+    bool succeeded;
+    unsigned long long failures;
+    std::string errors;  // the failed tries, as text for the log; empty when there are none
+};
+
+// What the record operations differ in.
+struct SqliteDB::Operation {
+    const char* function;  // the name that log lines carry
+    const char* kind;      // the word for an invalid command
+    int invalidCode;       // the error code for an invalid command
+};
+
+SqliteDB::SqliteDB(const std::string& file, unsigned int limit) : path(file), retryLimit(limit) {}
+
+SqliteDB::SqliteDB(SqliteDB&& other) noexcept
+    : errCode(other.errCode),
+      errRecord(std::move(other.errRecord)),
+      handle(std::exchange(other.handle, nullptr)),
+      // A copy: for an empty path SQLite would open a temporary file.
+      path(other.path),  // NOLINT(performance-move-constructor-init)
+      retryLimit(other.retryLimit)
+{
+}
+
+SqliteDB& SqliteDB::operator=(SqliteDB&& other) noexcept
+{
+    if (this != &other) {
+        Close();
+        errCode = other.errCode;
+        errRecord = std::move(other.errRecord);
+        handle = std::exchange(other.handle, nullptr);
+        path = other.path;
+        retryLimit = other.retryLimit;
+    }
+    return *this;
+}
+
+SqliteDB::~SqliteDB()
+{
+    Close();
+}
+
+bool SqliteDB::InsertRecord(const InsertCommand& command)
+{
+    // An invalid insert stays at 404 where the other operations answer 401, on purpose.
+    return ExecCommand({__func__, "insert", ERR::ERR_DATABASE_OPERATION}, command);
+}
+
+bool SqliteDB::UpdateRecord(const UpdateCommand& command)
+{
+    return ExecCommand({__func__, "update", ERR::BAD_PARAMETER}, command);
+}
+
+bool SqliteDB::SelectRecords(const SelectCommand& command, std::vector<SqliteValueList>& records)
+{
+    return SelectCommandInto({__func__, "select", ERR::BAD_PARAMETER}, command, records);
+}
+
+bool SqliteDB::SelectRecord(const SelectCommand& command, SqliteValueList& record)
+{
+    return SelectCommandInto({__func__, "select", ERR::BAD_PARAMETER}, command, record);
+}
+
+bool SqliteDB::DeleteRecord(const std::string& condition, const SqliteTableHandler& table)
+{
+    if (condition.empty()) {
+        SetErr(ERR::BAD_PARAMETER);
+        DR_LOG(Err, "invalid delete command: condition[%s]", condition.c_str());
+        return false;
+    }
+    return DoDelete(table, condition);
+}
+
+bool SqliteDB::DeleteAllRecords(const SqliteTableHandler& table)
+{
+    return DoDelete(table, "");
+}
+
+bool SqliteDB::DoDelete(const SqliteTableHandler& table, const std::string& condition)
+{
+    if (table.GetName().empty()) {
+        SetErr(ERR::BAD_PARAMETER);
+        DR_LOG(Err, "invalid table:[%s]", table.GetName().c_str());
+        return false;
+    }
+    SetErr(ERR::ERR_DATABASE_OPERATION);
+    if (!OpenFor(__func__)) return false;
+    if (!CreateTable(table)) {
+        DR_LOG(Err, "Failed to create table [%s]", table.GetName().c_str());
+        return false;
+    }
+    const std::string statement = GenerateDeleteCommand(table.GetName(), condition);
+    if (!Exec(statement)) {
+        DR_LOG(Err, "Failed to exec [%s] in db[%s]", statement.c_str(), path.c_str());
+        return false;
+    }
+    return true;
+}
+
+bool SqliteDB::IsTableExisted(const std::string& table)
+{
+    std::vector<SqliteValueList> records;
+    SelectByCommand("SELECT 1 FROM sqlite_master WHERE type='table' AND name='" + table + "';",
+                    records);
+    // The rows alone decide: a failed query counts as a missing table.
+    return !records.empty();
+}
+
+bool SqliteDB::CreateTable(const SqliteTableHandler& table)
+{
+    // The schema comes first, on purpose: without one nothing is asked for, not even a name.
+    if (table.GetSchema().empty()) return true;
+    if (table.GetName().empty()) {
+        DR_LOG(Err, "Invalid table [%s]", table.GetName().c_str());
+        return false;
+    }
+    if (IsTableExisted(table.GetName())) return true;
+
+    const std::string statement =
+        "CREATE TABLE IF NOT EXISTS " + table.GetName() + " (" + table.GetSchema() + ")";
+    if (!Exec(statement)) {
+        DR_LOG(Err, "Failed to create table [%s] with cmd[%s]", table.GetName().c_str(),
+               statement.c_str());
+        return false;
+    }
+    return true;
+}
+
+std::string SqliteDB::GenerateDeleteCommand(const std::string& table,
+                                            const std::string& condition) const
+{
+    if (table.empty()) {
+        DR_LOG(Err, "empty table");
+        return {};
+    }
+    std::string text = "DELETE FROM " + table;
+    if (!condition.empty()) text += " WHERE " + condition;
+    return text + ";";
+}
+
+bool SqliteDB::Exec(const std::string& command)
+{
+    if (handle == nullptr) {
+        SetErr(ERR::ERR_NULL_POINTER);
+        DR_LOG(Err, "DB[%s] is not opened", path.c_str());
+        return false;
+    }
+    if (command.empty()) {
+        SetErr(ERR::BAD_PARAMETER);
+        DR_LOG(Err, "empty command to exec db[%s]", path.c_str());
+        return false;
+    }
+    const Tries tries = TryRepeatedly([&] { return DoExecSqliteCommand(command); });
+    if (!tries.succeeded) {
+        DR_LOG(Warn, "Reach retry limit [%llu], failed to exec command [%s] with err[%s]",
+               tries.failures, command.c_str(), tries.errors.c_str());
+    } else if (tries.failures > 0) {
+        DR_LOG(Info, "After retry [%llu] times, success to exec command [%s], previous errors[%s]",
+               tries.failures, command.c_str(), tries.errors.c_str());
+    }
+    return tries.succeeded;
+}
+
+bool SqliteDB::SelectByCommand(const std::string& command, SqliteValueList& record)
+{
+    if (command.empty()) {
+        SetErr(ERR::BAD_PARAMETER);
+        DR_LOG(Err, "Empty command to select record");
+        return false;
+    }
+    const Tries tries = TryRepeatedly([&] { return DoSelectSqliteRecord(command, record); });
+    if (!tries.succeeded) {
+        DR_LOG(Warn, "Reach retry limit [%llu], failed to select command with errors[%s] ",
+               tries.failures, tries.errors.c_str());
+    } else if (tries.failures > 0) {
+        DR_LOG(Info, "After retry [%llu] times, success to exec command [%s], previous errs[%s]",
+               tries.failures, command.c_str(), tries.errors.c_str());
+    }
+    return tries.succeeded;
+}
+
+bool SqliteDB::SelectByCommand(const std::string& command, std::vector<SqliteValueList>& records)
+{
+    if (command.empty()) {
+        SetErr(ERR::BAD_PARAMETER);
+        DR_LOG(Err, "Empty command to select records");
+        return false;
+    }
+    const Tries tries = TryRepeatedly([&] { return DoSelectSqliteRecords(command, records); });
+    if (!tries.succeeded) {
+        DR_LOG(Warn, "Reach retry limit [%llu], failed to exec command [%s] with errors [%s]",
+               tries.failures, command.c_str(), tries.errors.c_str());
+    } else if (tries.failures > 0) {
+        DR_LOG(Info, "After retry [%llu] times, success to select command, previous errs [%s]",
+               tries.failures, tries.errors.c_str());
+    }
+    return tries.succeeded;
+}
+
+bool SqliteDB::Open()
+{
+    if (handle != nullptr) return true;
+    if (sqlite3_open(path.c_str(), &handle) != SQLITE_OK) {
+        Close();  // SQLite may hand out a handle also when it fails
+        DR_LOG(Warn, "Failed to open db[%s]", path.c_str());
+        return false;
+    }
+    if (sqlite3_busy_timeout(handle, BusyTimeoutMSec) != SQLITE_OK) {
+        // The connection stays open, on purpose: the next call answers true.
+        DR_LOG(Warn, "Failed to set busy timeout with error");
+        return false;
+    }
+    return true;
+}
+
+void SqliteDB::Close()
+{
+    if (handle == nullptr) return;
+    sqlite3_close(handle);
+    handle = nullptr;
+}
+
+void SqliteDB::SetDBErr(const std::string& command, int sqliteCode, const char* message) const
+{
+    Json::Value record(Json::objectValue);
+    if (!command.empty()) record["command"] = command;
+    if (sqliteCode != SQLITE_OK) record["sqlite_errcode"] = sqliteCode;
+    record["sqlite_errmsg"] = message != nullptr ? message : sqlite3_errmsg(handle);
+    errCode = ERR::ERR_DATABASE_OPERATION;
+    errRecord.swap(record);
+}
+
+bool SqliteDB::DoExecSqliteCommand(const std::string& command)
+{
+    char* message = nullptr;  // SQLite leaves it alone when the handle is null
+    const int code = sqlite3_exec(handle, command.c_str(), nullptr, nullptr, &message);
+    if (code != SQLITE_OK) SetDBErr(command, code, message);
+    sqlite3_free(message);
+    return code == SQLITE_OK;
+}
+
+bool SqliteDB::DoSelectSqliteRecord(const std::string& command, SqliteValueList& record)
+{
+    return DoSelect(command, [&record](SqliteValueList&& row) {
+        record = std::move(row);
+        return false;
+    });
+}
+
+bool SqliteDB::DoSelectSqliteRecords(const std::string& command,
+                                     std::vector<SqliteValueList>& records)
+{
+    return DoSelect(command, [&records](SqliteValueList&& row) {
+        records.push_back(std::move(row));
+        return true;
+    });
+}
+
+void SqliteDB::SetErr(int code) const
+{
+    errCode = code;
+    errRecord = Json::Value();
+}
+
+// The retry discipline of Exec and both selects: only their single tries and their words differ.
+template <class Attempt>
+SqliteDB::Tries SqliteDB::TryRepeatedly(Attempt attempt)
+{
+    Json::Value errors;
+    const auto attemptAndNote = [&] {
+        SetErr(0);
+        if (attempt()) return true;
+        Json::Value entry(Json::objectValue);
+        entry["err_code"] = errCode;
+        entry["err_code_str"] = ERR::ToString(errCode);
+        if (!errRecord.isNull()) entry["err_msg"] = errRecord;
+        errors.append(std::move(entry));
+        return false;
+    };
+    const auto pause = [] { RandomSleepInMSec(MinPauseMSec, MaxPauseMSec); };
+    const RetryOutcome outcome = Retry(retryLimit, attemptAndNote, pause);
+
+    Tries tries{outcome.succeeded, outcome.failures, {}};
+    if (outcome.failures > 0) tries.errors = toString(errors);
+    if (!outcome.succeeded) {
+        errCode = ERR::ERR_DATABASE_OPERATION;
+        errRecord.swap(errors);
+    }
+    return tries;
+}
+
+// One try of a select: gives each row to `takeRow`, which answers whether it wants another.
+template <class TakeRow>
+bool SqliteDB::DoSelect(const std::string& command, TakeRow takeRow)
+{
+    SetErr(ERR::ERR_DATABASE_OPERATION);
+    Statement statement;
+    int code = PrepareStatement(handle, command, statement);
+    if (code == SQLITE_OK) {
+        do {
+            code = sqlite3_step(statement.get());
+        } while (code == SQLITE_ROW && takeRow(ParseRecord(statement.get())));
+    }
+    if (code != SQLITE_ROW && code != SQLITE_DONE) {
+        SetDBErr(command, code, nullptr);
+        return false;
+    }
+    SetErr(0);
+    return true;
+}
+
+bool SqliteDB::OpenFor(const char* function)
+{
+    if (Open()) return true;
+    DR_LOG_AS(function, Err, "Failed to open db [%s]", path.c_str());
+    return false;
+}
+
+// What comes before the statement in every record operation.
+bool SqliteDB::Prepare(const Operation& operation, const SqliteCommand& command)
+{
+    SetErr(ERR::ERR_DATABASE_OPERATION);
+    if (!command.IsValid()) {
+        errCode = operation.invalidCode;
+        DR_LOG_AS(operation.function, Err, "invalid %s command [%s]", operation.kind,
+                  command.ToStr().c_str());
+        return false;
+    }
+    if (!OpenFor(operation.function)) return false;
+    if (!CreateTable(command.GetTable())) {
+        DR_LOG_AS(operation.function, Err, "Failed to create table");
+        return false;
+    }
+    return true;
+}
+
+bool SqliteDB::ExecCommand(const Operation& operation, const SqliteCommand& command)
+{
+    if (!Prepare(operation, command)) return false;
+    if (!Exec(command.GetCommand())) {
+        DR_LOG_AS(operation.function, Err, "Failed to exec [%s] in db[%s]",
+                  command.GetCommand().c_str(), path.c_str());
+        return false;
+    }
+    return true;
+}
+
+// `Output` is a record or a vector of records.
+template <class Output>
+bool SqliteDB::SelectCommandInto(const Operation& operation, const SelectCommand& command,
+                                 Output& output)
+{
+    if (!Prepare(operation, command)) return false;
+    const std::string statement = command.GetCommand();
+    if (!SelectByCommand(statement, output)) {
+        DR_LOG_AS(operation.function, Err, "Failed to select by command [%s]", statement.c_str());
+        return false;
+    }
+    return true;
+}
+
+}  // namespace OrvaDRCore
