@@ -1,0 +1,120 @@
+/// \file
+/// One call of a web API: which API, method and version, and the parameters.
+///
+/// \code
+///     Request request("DR.Node", 1, "get", Json::Value());
+///     request.addParam("name", "backup");
+///     request.toStr();    // "DR.Node/get/1"
+///     request.toJson();   // {"api":"DR.Node","method":"get","name":"backup","version":1}
+/// \endcode
+///
+/// A request only holds and checks its parts; it sends nothing. In JSON the three reserved keys
+/// "api", "method" and "version" stand beside the parameters. Requests are plain values, each used
+/// by one thread at a time. Nothing is logged and nothing throws, whatever the JSON looks like.
+#ifndef ORVADRCORE_REQUEST_H
+#define ORVADRCORE_REQUEST_H
+
+#include <string>
+
+#include <json/value.h>
+
+#include <orvadrcore/export.h>
+
+namespace OrvaDRCore {
+
+/// A file to send along with a request; only stored here.
+struct ORVADRCORE_API UploadFileDescription {
+    std::string name;  ///< The name that the other side sees.
+    std::string path;  ///< Where the file lies on this side.
+};
+
+/// One call of a web API.
+class ORVADRCORE_API Request {
+  public:
+    /// Not valid yet: no API, no method, version -1, time-out 300, no parameters.
+    Request() = default;
+
+    /// \param apiName     the API
+    /// \param apiVersion  its version, valid above 0; note the place between the two names
+    /// \param methodName  the method
+    /// \param parameters  the parameters, copied as they are: reserved keys are not taken out
+    Request(const std::string& apiName, int apiVersion, const std::string& methodName,
+            const Json::Value& parameters);
+
+    /// A default request, then setRequest().
+    Request(const Json::Value& request);
+
+    Request(const Request&) = default;
+    Request& operator=(const Request&) = default;
+    virtual ~Request();
+
+    /// Takes a request in its JSON form: "api" and "method" where they are texts and "version"
+    /// where it is an integer become the fields of those names; everything else becomes the
+    /// parameters, a reserved key of the wrong type included. A field whose key is missing keeps
+    /// its value; time-out, upload file and encryption are never taken from JSON. \param request
+    /// the JSON form; a value that is no object is kept as parameters as it is
+    void setRequest(const Json::Value& request);
+
+    /// Back to the defaults.
+    /// \note isEncryptRequired() keeps its answer, on purpose. Parameters keep their JSON type:
+    ///       an object becomes an empty one.
+    void clear();
+
+    void setVersion(int apiVersion);                        ///< Stores the version, unchecked.
+    void setMethod(const std::string& methodName);          ///< Stores the method.
+    void setAPI(const std::string& apiName);                ///< Stores the API.
+    void setTimeout(int limit);                             ///< Stores the transport's time-out.
+    void setUploadFile(const UploadFileDescription& file);  ///< Stores the file to send along.
+    bool setEncryptRequired(bool required);                 ///< Stores the flag. \return true
+
+    const std::string& getAPI() const { return api; }        ///< The API; empty by default.
+    const std::string& getMethod() const { return method; }  ///< The method; empty by default.
+    int getVersion() const { return version; }               ///< The version; -1 by default.
+    const Json::Value& getParams() const { return params; }  ///< The parameters; null by default.
+    int getTimeout() const { return timeout; }  ///< For the transport, in its unit; 300 by default.
+    const UploadFileDescription& getUploadFile() const
+    {
+        return uploadFile;
+    }                                                           ///< Empty by default.
+    bool isEncryptRequired() const { return encryptRequired; }  ///< False by default.
+
+    /// Whether a key is free for parameters: every key is but "api", "method" and "version".
+    static bool isValidKey(const std::string& key);
+
+    /// Sets one parameter.
+    /// \return false, nothing changed, for a reserved key and when the parameters are neither null
+    ///         nor an object
+    bool addParam(const std::string& key, const Json::Value& value);
+
+    /// Sets a parameter for each member of `object`; reserved keys are passed over.
+    /// \param object  an object; of an array the elements are taken under their index, any other
+    ///                value has no members
+    /// \return false, nothing changed, when the parameters are neither null nor an object; passing
+    ///         over a reserved key is no failure
+    bool addParam(const Json::Value& object);
+
+    /// Whether API and method are given and the version is above 0.
+    bool isValid() const;
+
+    /// The JSON form: the parameters and the three reserved keys, in one object. Parameters that
+    /// are neither null nor an object are left out.
+    Json::Value toJson() const;
+
+    /// "API/method/version", without parameters.
+    std::string toStr() const;
+
+  private:
+    bool takesParams() const;
+
+    int version = -1;
+    int timeout = 300;
+    std::string api;
+    std::string method;
+    Json::Value params;
+    bool encryptRequired = false;
+    UploadFileDescription uploadFile;
+};
+
+}  // namespace OrvaDRCore
+
+#endif

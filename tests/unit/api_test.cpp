@@ -1,0 +1,365 @@
+// What callers may do with the public classes, most of it checked by the compiler alone.
+#include <gtest/gtest.h>
+#include <json/value.h>
+#include <orvadrcore/errors.h>
+#include <orvadrcore/request.h>
+#include <orvadrcore/response.h>
+#include <orvadrcore/sqlite_command.h>
+#include <orvadrcore/sqlite_condition.h>
+#include <orvadrcore/sqlite_db.h>
+#include <orvadrcore/sqlite_value.h>
+#include <orvadrcore/utils.h>
+
+#include <cstddef>
+#include <memory>
+#include <sstream>
+#include <string>
+#include <type_traits>
+#include <vector>
+
+namespace {
+
+using namespace OrvaDRCore;  // NOLINT(google-build-using-namespace): all of it is looked at
+using std::string;
+
+// The overload of an operation that has exactly the given type; without one it does not compile.
+template <class Signature>
+constexpr bool Has(Signature operation)
+{
+    return operation != nullptr;
+}
+
+template <class T>
+constexpr bool IsPlainValue = std::is_default_constructible_v<T>&& std::is_copy_constructible_v<T>&&
+    std::is_copy_assignable_v<T>&& std::is_move_constructible_v<T>&& std::is_move_assignable_v<T>;
+
+// ----------------------------------------------------------------------------------------- errors
+
+static_assert(std::is_same_v<std::underlying_type_t<ERR::Code>, int>);
+static_assert(std::is_convertible_v<ERR::Code, int>);
+static_assert(!std::is_constructible_v<ERR>);
+static_assert(ERR::ERR_DATABASE_OPERATION == 404 && ERR::ERR_DR_MAX == 673);
+static_assert(Has<string (*)(int)>(&ERR::ToString));
+
+// ----------------------------------------------------------------------------------------- values
+
+static_assert(!std::is_polymorphic_v<SqliteValue>);
+static_assert(IsPlainValue<SqliteValue>);
+static_assert(std::is_nothrow_move_constructible_v<SqliteValue>);
+// The only assignment: one that moved would take the flag along with the payload.
+static_assert(std::is_same_v<decltype(&SqliteValue::operator=),
+                             SqliteValue& (SqliteValue::*)(const SqliteValue&)>);
+static_assert(std::is_convertible_v<int, SqliteValue>);
+static_assert(std::is_convertible_v<unsigned int, SqliteValue>);
+static_assert(std::is_convertible_v<bool, SqliteValue>);
+static_assert(std::is_convertible_v<string, SqliteValue>);
+static_assert(std::is_convertible_v<const char*, SqliteValue>);
+static_assert(!std::is_constructible_v<SqliteValue, std::nullptr_t>);
+// Numbers that would lose bits without a word.
+static_assert(!std::is_constructible_v<SqliteValue, long>);
+static_assert(!std::is_constructible_v<SqliteValue, unsigned long>);
+static_assert(!std::is_constructible_v<SqliteValue, double>);
+
+static_assert(Has<bool (SqliteValue::*)() const>(&SqliteValue::IsValid));
+static_assert(Has<string (SqliteValue::*)() const>(&SqliteValue::ToFormatedValue));
+static_assert(Has<bool (SqliteValue::*)(string&) const>(&SqliteValue::GetValue<string>));
+static_assert(Has<bool (SqliteValue::*)(bool&) const>(&SqliteValue::GetValue<bool>));
+static_assert(Has<bool (SqliteValue::*)(int&) const>(&SqliteValue::GetValue<int>));
+static_assert(
+    Has<bool (SqliteValue::*)(unsigned int&) const>(&SqliteValue::GetValue<unsigned int>));
+
+static_assert(IsPlainValue<SqliteValueList>);
+static_assert(std::has_virtual_destructor_v<SqliteValueList>);
+static_assert(std::is_nothrow_move_constructible_v<SqliteValueList>);
+static_assert(
+    Has<bool (SqliteValueList::*)(const string&, const SqliteValue&)>(&SqliteValueList::AddValue));
+static_assert(Has<bool (SqliteValueList::*)(const string&) const>(&SqliteValueList::HasField));
+static_assert(
+    Has<const SqliteValue& (SqliteValueList::*)(const string&) const>(&SqliteValueList::GetValue));
+static_assert(
+    Has<bool (SqliteValueList::*)(const string&, string&) const>(&SqliteValueList::GetValue));
+static_assert(
+    Has<bool (SqliteValueList::*)(const string&, bool&) const>(&SqliteValueList::GetValue));
+static_assert(
+    Has<bool (SqliteValueList::*)(const string&, int&) const>(&SqliteValueList::GetValue));
+static_assert(
+    Has<bool (SqliteValueList::*)(const string&, unsigned int&) const>(&SqliteValueList::GetValue));
+static_assert(Has<SqliteValueList& (SqliteValueList::*)(const SqliteValueList&)>(
+    &SqliteValueList::operator+=));
+static_assert(Has<string (SqliteValueList::*)() const>(&SqliteValueList::ToStr));
+
+static_assert(std::is_abstract_v<SqliteRecord>);
+static_assert(std::has_virtual_destructor_v<SqliteRecord>);
+static_assert(Has<SqliteValueList (SqliteRecord::*)(const std::vector<string>&) const>(
+    &SqliteRecord::BuildRecord));
+static_assert(Has<bool (SqliteRecord::*)(const SqliteValueList&)>(&SqliteRecord::LoadRecord));
+static_assert(Has<std::vector<string> (SqliteRecord::*)() const>(&SqliteRecord::GetRecordFields));
+static_assert(Has<SqliteValueList (SqliteRecord::*)() const>(&SqliteRecord::ToSqliteRecord));
+
+// --------------------------------------------------------------------------------------- commands
+
+static_assert(IsPlainValue<SqliteTableHandler>);
+static_assert(std::has_virtual_destructor_v<SqliteTableHandler>);
+static_assert(std::is_constructible_v<SqliteTableHandler, string, string>);
+static_assert(Has<const string& (SqliteTableHandler::*)() const>(&SqliteTableHandler::GetName));
+static_assert(Has<const string& (SqliteTableHandler::*)() const>(&SqliteTableHandler::GetSchema));
+
+static_assert(std::is_abstract_v<SqliteCommand>);
+static_assert(std::has_virtual_destructor_v<SqliteCommand>);
+static_assert(Has<string (SqliteCommand::*)() const>(&SqliteCommand::GetCommand));
+static_assert(Has<bool (SqliteCommand::*)() const>(&SqliteCommand::IsValid));
+static_assert(Has<void (SqliteCommand::*)(std::stringstream&) const>(&SqliteCommand::DumpParam));
+static_assert(Has<bool (SqliteCommand::*)(const SqliteTableHandler&)>(&SqliteCommand::SetTable));
+static_assert(Has<const SqliteTableHandler& (SqliteCommand::*)() const>(&SqliteCommand::GetTable));
+static_assert(Has<string (SqliteCommand::*)() const>(&SqliteCommand::ToStr));
+
+// What every builder has, and what those have that hold values or a condition.
+template <class T>
+constexpr bool IsBuilder =
+    std::is_base_of_v<SqliteCommand, T>&& IsPlainValue<T>&& std::has_virtual_destructor_v<T> &&
+    !std::is_abstract_v<T>;
+template <class T>
+constexpr bool TakesValues =
+    Has<void (T::*)(const SqliteValueList&)>(&T::SetFieldValues) &&
+    Has<bool (T::*)(const string&, const string&)>(&T::template AddFieldValue<string>) &&
+    Has<bool (T::*)(const string&, const bool&)>(&T::template AddFieldValue<bool>) &&
+    Has<bool (T::*)(const string&, const int&)>(&T::template AddFieldValue<int>) &&
+    Has<bool (T::*)(const string&, const unsigned int&)>(
+        &T::template AddFieldValue<unsigned int>) &&
+    Has<bool (T::*)(const string&, const char*)>(&T::AddFieldValue);
+template <class T>
+constexpr bool TakesACondition = Has<bool (T::*)(const string&)>(&T::SetCondition) &&
+                                 Has<bool (T::*)(const SqliteCondition&)>(&T::SetCondition);
+
+static_assert(IsBuilder<InsertCommand> && TakesValues<InsertCommand>);
+static_assert(IsBuilder<UpdateCommand> && TakesValues<UpdateCommand>);
+static_assert(IsBuilder<SelectCommand>);
+static_assert(TakesACondition<UpdateCommand> && TakesACondition<SelectCommand>);
+static_assert(Has<void (InsertCommand::*)(bool)>(&InsertCommand::SetReplacable));
+static_assert(Has<string (InsertCommand::*)() const>(&InsertCommand::ToFormatedInsertValues));
+static_assert(Has<void (SelectCommand::*)()>(&SelectCommand::SelectAll));
+static_assert(Has<bool (SelectCommand::*)(const string&)>(&SelectCommand::AddField));
+
+// ------------------------------------------------------------------------------------- conditions
+
+// Copied and passed by reference, never deleted through a base: no virtual destructor, on purpose.
+template <class T>
+constexpr bool IsCondition = std::is_base_of_v<SqliteCondition, T>&& std::is_polymorphic_v<T> &&
+                             !std::has_virtual_destructor_v<T> && std::is_copy_constructible_v<T> &&
+                             std::is_copy_assignable_v<T>;
+template <class T, class Operand>
+constexpr bool TakesTwo = IsCondition<T>&& std::is_default_constructible_v<T>&&
+    std::is_constructible_v<T, string, Operand>&& Has<bool (T::*)(const string&, const Operand&)>(
+        &T::SetValue);
+
+static_assert(IsCondition<SqliteCondition> && IsPlainValue<SqliteCondition>);
+static_assert(std::is_constructible_v<SqliteCondition, string>);
+static_assert(Has<bool (SqliteCondition::*)() const>(&SqliteCondition::IsValid));
+static_assert(Has<const string& (SqliteCondition::*)() const>(&SqliteCondition::GetCondition));
+static_assert(TakesTwo<SqliteEqual, SqliteValue> && TakesTwo<SqliteNotEqual, SqliteValue>);
+static_assert(TakesTwo<SqliteAnd, string> && TakesTwo<SqliteOr, string>);
+static_assert(TakesTwo<SqliteIn, string> && TakesTwo<SqliteIn, std::vector<SqliteValue>>);
+static_assert(TakesTwo<SqliteNotIn, string> && TakesTwo<SqliteNotIn, std::vector<SqliteValue>>);
+static_assert(std::is_base_of_v<SqliteInFamily, SqliteIn> &&
+              std::is_base_of_v<SqliteInFamily, SqliteNotIn>);
+static_assert(IsCondition<SqliteInFamily> && !std::is_default_constructible_v<SqliteInFamily>);
+static_assert(std::is_constructible_v<SqliteInFamily, string>);
+static_assert(std::is_constructible_v<SqliteInFamily, string, string, string>);
+static_assert(std::is_constructible_v<SqliteInFamily, string, string, std::vector<SqliteValue>>);
+
+// ------------------------------------------------------------------------------------- connection
+
+static_assert(!std::is_polymorphic_v<SqliteDB>);
+static_assert(!std::is_default_constructible_v<SqliteDB>);
+static_assert(std::is_constructible_v<SqliteDB, string, unsigned int>);
+static_assert(!std::is_copy_constructible_v<SqliteDB> && !std::is_copy_assignable_v<SqliteDB>);
+static_assert(std::is_nothrow_move_constructible_v<SqliteDB>);
+static_assert(std::is_nothrow_move_assignable_v<SqliteDB>);
+static_assert(Has<bool (SqliteDB::*)()>(&SqliteDB::Open));
+static_assert(Has<void (SqliteDB::*)()>(&SqliteDB::Close));
+static_assert(Has<int (SqliteDB::*)() const>(&SqliteDB::GetErrCode));
+static_assert(Has<const Json::Value& (SqliteDB::*)() const>(&SqliteDB::GetErr));
+static_assert(Has<void (SqliteDB::*)(const string&, int, const char*) const>(&SqliteDB::SetDBErr));
+static_assert(Has<bool (SqliteDB::*)(const string&)>(&SqliteDB::Exec));
+static_assert(Has<bool (SqliteDB::*)(const string&)>(&SqliteDB::DoExecSqliteCommand));
+static_assert(Has<bool (SqliteDB::*)(const string&, SqliteValueList&)>(&SqliteDB::SelectByCommand));
+static_assert(Has<bool (SqliteDB::*)(const string&, std::vector<SqliteValueList>&)>(
+    &SqliteDB::SelectByCommand));
+static_assert(
+    Has<bool (SqliteDB::*)(const string&, SqliteValueList&)>(&SqliteDB::DoSelectSqliteRecord));
+static_assert(Has<bool (SqliteDB::*)(const string&, std::vector<SqliteValueList>&)>(
+    &SqliteDB::DoSelectSqliteRecords));
+static_assert(Has<bool (SqliteDB::*)(const string&)>(&SqliteDB::IsTableExisted));
+static_assert(Has<bool (SqliteDB::*)(const SqliteTableHandler&)>(&SqliteDB::CreateTable));
+static_assert(Has<bool (SqliteDB::*)(const InsertCommand&)>(&SqliteDB::InsertRecord));
+static_assert(Has<bool (SqliteDB::*)(const UpdateCommand&)>(&SqliteDB::UpdateRecord));
+static_assert(
+    Has<bool (SqliteDB::*)(const SelectCommand&, SqliteValueList&)>(&SqliteDB::SelectRecord));
+static_assert(Has<bool (SqliteDB::*)(const SelectCommand&, std::vector<SqliteValueList>&)>(
+    &SqliteDB::SelectRecords));
+static_assert(
+    Has<bool (SqliteDB::*)(const SqliteTableHandler&, const string&)>(&SqliteDB::DoDelete));
+static_assert(Has<bool (SqliteDB::*)(const SqliteTableHandler&)>(&SqliteDB::DeleteAllRecords));
+static_assert(
+    Has<bool (SqliteDB::*)(const string&, const SqliteTableHandler&)>(&SqliteDB::DeleteRecord));
+
+// ------------------------------------------------------------------------------ request and reply
+
+static_assert(std::is_aggregate_v<UploadFileDescription> && IsPlainValue<UploadFileDescription>);
+static_assert(std::is_same_v<decltype(UploadFileDescription::name), string>);
+static_assert(std::is_same_v<decltype(UploadFileDescription::path), string>);
+
+static_assert(IsPlainValue<Request>);
+static_assert(std::has_virtual_destructor_v<Request>);
+static_assert(std::is_constructible_v<Request, string, int, string, Json::Value>);
+static_assert(std::is_constructible_v<Request, Json::Value>);
+static_assert(Has<const string& (Request::*)() const>(&Request::getAPI));
+static_assert(Has<const string& (Request::*)() const>(&Request::getMethod));
+static_assert(Has<int (Request::*)() const>(&Request::getVersion));
+static_assert(Has<const Json::Value& (Request::*)() const>(&Request::getParams));
+static_assert(Has<int (Request::*)() const>(&Request::getTimeout));
+static_assert(Has<const UploadFileDescription& (Request::*)() const>(&Request::getUploadFile));
+static_assert(Has<bool (Request::*)() const>(&Request::isEncryptRequired));
+static_assert(Has<void (Request::*)(const Json::Value&)>(&Request::setRequest));
+static_assert(Has<void (Request::*)()>(&Request::clear));
+static_assert(Has<void (Request::*)(int)>(&Request::setVersion));
+static_assert(Has<void (Request::*)(const string&)>(&Request::setMethod));
+static_assert(Has<void (Request::*)(const string&)>(&Request::setAPI));
+static_assert(Has<void (Request::*)(int)>(&Request::setTimeout));
+static_assert(Has<void (Request::*)(const UploadFileDescription&)>(&Request::setUploadFile));
+static_assert(Has<bool (Request::*)(bool)>(&Request::setEncryptRequired));
+static_assert(Has<bool (*)(const string&)>(&Request::isValidKey));
+static_assert(Has<bool (Request::*)(const string&, const Json::Value&)>(&Request::addParam));
+static_assert(Has<bool (Request::*)(const Json::Value&)>(&Request::addParam));
+static_assert(Has<bool (Request::*)() const>(&Request::isValid));
+static_assert(Has<Json::Value (Request::*)() const>(&Request::toJson));
+static_assert(Has<string (Request::*)() const>(&Request::toStr));
+
+static_assert(IsPlainValue<Response>);
+static_assert(std::has_virtual_destructor_v<Response>);
+static_assert(std::is_constructible_v<Response, string>);
+static_assert(std::is_constructible_v<Response, const char*>);
+static_assert(std::is_constructible_v<Response, Json::Value>);
+static_assert(Has<bool (Response::*)(const string&)>(&Response::setResp));
+static_assert(Has<bool (Response::*)(const char*)>(&Response::setResp));
+static_assert(Has<void (Response::*)(const Json::Value&)>(&Response::setResp));
+static_assert(Has<void (Response::*)()>(&Response::clear));
+static_assert(Has<const Json::Value& (Response::*)() const>(&Response::getResp));
+static_assert(Has<bool (Response::*)() const>(&Response::isValid));
+static_assert(Has<bool (Response::*)() const>(&Response::isSuccess));
+static_assert(Has<int (Response::*)() const>(&Response::getErrCode));
+static_assert(Has<Json::Value (Response::*)() const>(&Response::getErrMsg));
+static_assert(Has<Json::Value (Response::*)() const>(&Response::getErr));
+static_assert(Has<bool (Response::*)() const>(&Response::hasData));
+static_assert(Has<const Json::Value& (Response::*)() const>(&Response::getData));
+static_assert(Has<bool (Response::*)(const char*) const>(&Response::hasDataField));
+static_assert(Has<const Json::Value& (Response::*)(const char*) const>(&Response::getDataField));
+static_assert(Has<string (Response::*)(const char*) const>(&Response::getDataFieldtoStr));
+static_assert(Has<bool (Response::*)() const>(&Response::isPollFinish));
+static_assert(Has<bool (Response::*)() const>(&Response::isPollSuccess));
+static_assert(Has<string (Response::*)() const>(&Response::getTaskId));
+static_assert(Has<bool (Response::*)(const char*) const>(&Response::hasField));
+static_assert(Has<const Json::Value& (Response::*)(const char*) const>(&Response::getField));
+static_assert(Has<bool (Response::*)() const>(&Response::hasAdditional));
+static_assert(Has<const Json::Value& (Response::*)() const>(&Response::getAdditional));
+
+// -------------------------------------------------------------------------------------- utilities
+
+static_assert(Has<string (*)()>(&GenerateUUID));
+static_assert(Has<bool (*)(unsigned int, unsigned int)>(&RandomSleepInMSec));
+static_assert(Has<bool (*)(const string&)>(&Validator::IsVolPath));
+template <class T>
+constexpr bool IsJoined =
+    Has<Json::Value (*)(const std::vector<T>&)>(&Container::ToJsonArray<T>) &&
+    Has<string (*)(const std::vector<T>&, const string&)>(&Container::ToString<T>);
+static_assert(IsJoined<string> && IsJoined<int> && IsJoined<bool> && IsJoined<double>);
+
+// ------------------------------------------------------------- which overload a literal comes to
+
+TEST(ApiTest, AStringLiteralIsATextAndNeverABoolean)
+{
+    EXPECT_EQ(SqliteValue("abc").ToFormatedValue(), "'abc'");
+    EXPECT_EQ(SqliteEqual("name", "abc").GetCondition(), "name='abc'");
+    EXPECT_EQ(SqliteIn("id", "SELECT 1").GetCondition(), "id IN ( SELECT 1 )");
+
+    SqliteValueList list;
+    EXPECT_TRUE(list.AddValue("name", "abc"));
+    EXPECT_EQ(list.ToStr(), "name:'abc'");
+
+    InsertCommand insert;
+    EXPECT_TRUE(insert.AddFieldValue("name", "abc"));
+    EXPECT_EQ(insert.ToFormatedInsertValues(), "(name) VALUES ('abc')");
+
+    UpdateCommand update;
+    EXPECT_TRUE(update.AddFieldValue("name", "abc"));
+    EXPECT_TRUE(update.SetCondition("id=3"));
+    EXPECT_EQ(update.ToStr(), "]condition:[id=3]/values:[name='abc']");
+
+    EXPECT_TRUE(Response("{}").getResp().isObject());
+    Response response;
+    EXPECT_TRUE(response.setResp("{}"));
+    EXPECT_TRUE(response.getResp().isObject());
+
+    Request request;
+    EXPECT_TRUE(request.addParam("name", "abc"));
+    EXPECT_EQ(request.getParams()["name"].asString(), "abc");
+}
+
+TEST(ApiTest, NumbersAndBooleansKeepTheirKind)
+{
+    InsertCommand insert;
+    EXPECT_TRUE(insert.AddFieldValue("a", -1));
+    EXPECT_TRUE(insert.AddFieldValue("b", 4294967295U));
+    EXPECT_TRUE(insert.AddFieldValue("c", true));
+    EXPECT_TRUE(insert.AddFieldValue("d", string("x")));
+    EXPECT_EQ(insert.ToFormatedInsertValues(), "(a,b,c,d) VALUES (-1,4294967295,1,'x')");
+    EXPECT_EQ(SqliteIn("id", std::vector<SqliteValue>{1, true, "x"}).GetCondition(),
+              "id IN ( 1,1,'x' )");
+}
+
+TEST(ApiTest, AnErrorCodeIsAnInt)
+{
+    const int code = ERR::BAD_PARAMETER;
+    EXPECT_EQ(code, 401);
+    EXPECT_EQ(ERR::ToString(ERR::BAD_PARAMETER), "BAD_PARAMETER");
+}
+
+TEST(ApiTest, AssigningDoesNotMakeAValueValid)
+{
+    SqliteValue value;
+    value = SqliteValue(1);  // on purpose: neither a copy nor a move takes the flag along
+    EXPECT_FALSE(value.IsValid());
+    const SqliteValue one(1);
+    value = one;
+    EXPECT_FALSE(value.IsValid());
+}
+
+// --------------------------------------------------------------------------------- derived classes
+
+// Counts its ends: with a virtual destructor the base's owner reaches it.
+template <class Base>
+class Derived : public Base {
+  public:
+    explicit Derived(int& count) : ends(count) {}
+    Derived(const Derived&) = delete;
+    Derived& operator=(const Derived&) = delete;
+    ~Derived() override { ++ends; }
+
+  private:
+    int& ends;
+};
+
+TEST(ApiTest, ClassesThatCallersDeriveFromAreDeletedThroughTheirBase)
+{
+    int ends = 0;
+    std::unique_ptr<Request>(new Derived<Request>(ends)).reset();
+    std::unique_ptr<Response>(new Derived<Response>(ends)).reset();
+    std::unique_ptr<SqliteValueList>(new Derived<SqliteValueList>(ends)).reset();
+    std::unique_ptr<SqliteTableHandler>(new Derived<SqliteTableHandler>(ends)).reset();
+    std::unique_ptr<SqliteCommand>(new Derived<InsertCommand>(ends)).reset();
+    std::unique_ptr<SqliteCommand>(new Derived<UpdateCommand>(ends)).reset();
+    std::unique_ptr<SqliteCommand>(new Derived<SelectCommand>(ends)).reset();
+    EXPECT_EQ(ends, 7);
+}
+
+}  // namespace
