@@ -1,0 +1,185 @@
+#include "program.h"
+
+#include <fcntl.h>
+#include <poll.h>
+#include <spawn.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <array>
+#include <cerrno>
+#include <csignal>
+#include <cstdlib>
+
+namespace {
+
+// Far longer than anything a test waits for: it ends runs that hang, it paces none.
+constexpr std::chrono::seconds Deadline{100};
+
+struct Pipe {
+    int readEnd;
+    int writeEnd;
+};
+
+Pipe MakePipe()
+{
+    std::array<int, 2> ends{};
+    if (::pipe2(ends.data(), O_CLOEXEC) < 0) std::abort();
+    return {ends[0], ends[1]};
+}
+
+void Close(int& descriptor)
+{
+    if (descriptor >= 0) ::close(descriptor);
+    descriptor = -1;
+}
+
+// Appends what has come through a pipe and closes it at its end.
+void Receive(int& descriptor, std::string& text)
+{
+    std::array<char, 65536> buffer{};
+    const ssize_t count = ::read(descriptor, buffer.data(), buffer.size());
+    if (count > 0) {
+        text.append(buffer.data(), static_cast<std::size_t>(count));
+    } else if (count == 0 || errno != EINTR) {
+        Close(descriptor);
+    }
+}
+
+}  // namespace
+
+Program::Program(const std::vector<std::string>& arguments)
+    : deadline(std::chrono::steady_clock::now() + Deadline)
+{
+    // A program that ends early is no reason to end with it.
+    static_cast<void>(std::signal(SIGPIPE, SIG_IGN));
+
+    const Pipe toIn = MakePipe();
+    const Pipe fromOut = MakePipe();
+    const Pipe fromErr = MakePipe();
+    posix_spawn_file_actions_t actions;
+    ::posix_spawn_file_actions_init(&actions);
+    ::posix_spawn_file_actions_adddup2(&actions, toIn.readEnd, STDIN_FILENO);
+    ::posix_spawn_file_actions_adddup2(&actions, fromOut.writeEnd, STDOUT_FILENO);
+    ::posix_spawn_file_actions_adddup2(&actions, fromErr.writeEnd, STDERR_FILENO);
+
+    // The program gets the signal as a shell would leave it.
+    posix_spawnattr_t attributes;
+    sigset_t defaults;
+    ::sigemptyset(&defaults);
+    ::sigaddset(&defaults, SIGPIPE);
+    ::posix_spawnattr_init(&attributes);
+    ::posix_spawnattr_setsigdefault(&attributes, &defaults);
+    ::posix_spawnattr_setflags(&attributes, POSIX_SPAWN_SETSIGDEF);
+
+    std::vector<char*> words;
+    words.reserve(arguments.size() + 1);
+    for (const std::string& argument : arguments) {
+        words.push_back(const_cast<char*>(argument.c_str()));
+    }
+    words.push_back(nullptr);
+    if (::posix_spawn(&pid, words[0], &actions, &attributes, words.data(), environ) != 0) {
+        std::abort();
+    }
+    ::posix_spawnattr_destroy(&attributes);
+    ::posix_spawn_file_actions_destroy(&actions);
+
+    ::close(toIn.readEnd);
+    ::close(fromOut.writeEnd);
+    ::close(fromErr.writeEnd);
+    in = toIn.writeEnd;
+    out = fromOut.readEnd;
+    err = fromErr.readEnd;
+    ::fcntl(in, F_SETFL, O_NONBLOCK);  // so that a full pipe never keeps us from reading
+}
+
+Program::~Program()
+{
+    Close(in);
+    Close(out);
+    Close(err);
+    if (pid < 0) return;
+    ::kill(pid, SIGKILL);
+    Join();
+}
+
+void Program::Send(const std::string& text)
+{
+    unsent += text;
+    WriteUnsent();
+}
+
+std::string Program::ReadLine()
+{
+    std::size_t end = unread.find('\n');
+    while (end == std::string::npos) {
+        if (out < 0 || !Pump()) return {};
+        end = unread.find('\n');
+    }
+    std::string line = unread.substr(0, end);
+    unread.erase(0, end + 1);
+    return line;
+}
+
+void Program::CloseOutput()
+{
+    Close(out);
+}
+
+ProgramResult Program::Finish()
+{
+    isInputComplete = true;
+    while (in >= 0 || out >= 0 || err >= 0) {
+        if (Pump()) continue;
+        ::kill(pid, SIGKILL);
+        break;
+    }
+    return {Join(), unread, errors};
+}
+
+// Writes what the pipe takes; a program that reads no more gets nothing.
+void Program::WriteUnsent()
+{
+    const ssize_t count = ::write(in, unsent.data(), unsent.size());
+    if (count > 0) unsent.erase(0, static_cast<std::size_t>(count));
+    if (count < 0 && errno == EPIPE) {
+        unsent.clear();
+        Close(in);
+    }
+}
+
+// Waits for one event on the pipes and answers it. False when the deadline has passed.
+bool Program::Pump()
+{
+    if (isInputComplete && unsent.empty()) Close(in);
+    // A closed pipe is -1, which poll passes over; so is an input that has nothing to take.
+    std::array<pollfd, 3> pipes{pollfd{unsent.empty() ? -1 : in, POLLOUT, 0},
+                                pollfd{out, POLLIN, 0}, pollfd{err, POLLIN, 0}};
+    const auto left = std::chrono::duration_cast<std::chrono::milliseconds>(
+        deadline - std::chrono::steady_clock::now());
+    if (left.count() <= 0) return false;
+    if (in < 0 && out < 0 && err < 0) return true;
+    if (::poll(pipes.data(), pipes.size(), static_cast<int>(left.count())) <= 0) return true;
+
+    if (pipes[0].revents != 0) WriteUnsent();
+    if (pipes[1].revents != 0) Receive(out, unread);
+    if (pipes[2].revents != 0) Receive(err, errors);
+    return true;
+}
+
+int Program::Join()
+{
+    int status = 0;
+    while (::waitpid(pid, &status, 0) < 0) {
+        if (errno != EINTR) std::abort();
+    }
+    pid = -1;
+    return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+}
+
+ProgramResult RunProgram(const std::vector<std::string>& arguments, const std::string& input)
+{
+    Program program(arguments);
+    program.Send(input);
+    return program.Finish();
+}
