@@ -3,7 +3,6 @@
 #include <climits>
 #include <iterator>
 #include <set>
-#include <type_traits>
 
 #include "support/log_capture.h"
 
@@ -57,10 +56,6 @@ constexpr NamedCode Codes[] = {
     {ERR::ERR_NODE_UNKNOWN, 599, "ERR_NODE_UNKNOWN"},
     {ERR::ERR_DR_MAX, 673, "ERR_DR_MAX"},
 };
-
-// Callers keep codes in plain ints.
-static_assert(std::is_convertible_v<ERR::Code, int>);
-static_assert(std::is_same_v<std::underlying_type_t<ERR::Code>, int>);
 
 // Naming a code logs nothing: the fixture would say so.
 class ErrorsTest : public LoggedTest {

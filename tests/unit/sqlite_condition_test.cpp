@@ -349,6 +349,7 @@ TEST_F(SqliteConditionTest, ACopyGoesItsOwnWay)
 }
 
 // A caller's own kind of list, which has its own idea of validity.
+// NOLINTNEXTLINE(cppcoreguidelines-virtual-class-destructor)
 class AnyKeyword final : public SqliteInFamily {
   public:
     AnyKeyword(const std::string& word, bool answer) : SqliteInFamily(word), valid(answer) {}

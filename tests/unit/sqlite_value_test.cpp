@@ -3,7 +3,6 @@
 #include <gmock/gmock.h>
 
 #include <climits>
-#include <cstddef>
 #include <optional>
 #include <type_traits>
 #include <utility>
@@ -19,15 +18,7 @@ using ::testing::ElementsAre;
 
 constexpr const char* NullText = nullptr;
 
-// A value has no virtual operation, and a bare null pointer is no text.
-static_assert(!std::is_polymorphic_v<SqliteValue>);
-static_assert(!std::is_constructible_v<SqliteValue, std::nullptr_t>);
-static_assert(std::is_nothrow_move_constructible_v<SqliteValue>);
-static_assert(std::has_virtual_destructor_v<SqliteValueList>);
-static_assert(std::is_nothrow_move_constructible_v<SqliteValueList>);
-static_assert(std::is_nothrow_move_assignable_v<SqliteValueList>);
-static_assert(std::has_virtual_destructor_v<SqliteRecord>);
-
+// A value is read as one of four types, and as no other by way of a conversion.
 template <class T, class = void>
 constexpr bool CanBeReadAs = false;
 template <class T>
