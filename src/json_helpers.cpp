@@ -6,6 +6,8 @@
 #include <json/reader.h>
 #include <json/writer.h>
 
+#include "file_io.h"
+
 namespace OrvaDRCore {
 
 bool fromString(Json::Value& value, const std::string& text)
@@ -39,6 +41,18 @@ std::string toString(const Json::Value& value)
     builder["emitUTF8"] = true;
     builder["indentation"] = "";
     return Json::writeString(builder, value);
+}
+
+bool fromFile(Json::Value& value, const std::string& path)
+{
+    const FileDescriptor file(path, O_RDONLY);
+    std::string text;
+    return file.IsOpen() && ReadAll(file.Get(), text) && fromString(value, text);
+}
+
+bool toFile(const Json::Value& value, const std::string& path)
+{
+    return ReplaceFile(path, toString(value));
 }
 
 const Json::Value* FindMember(const Json::Value& object, const char* key)

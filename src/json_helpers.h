@@ -18,6 +18,13 @@ bool fromString(Json::Value& value, const std::string& text);
 // so that every byte string survives the way through toString and fromString.
 std::string toString(const Json::Value& value);
 
+// Parses a whole file. False when it cannot be read or does not parse; `value` is as it was then.
+bool fromFile(Json::Value& value, const std::string& path);
+
+// Replaces a file by the document, whole: see ReplaceFile. False with errno set; the old file is as
+// it was then.
+bool toFile(const Json::Value& value, const std::string& path);
+
 // The member `key` of an object; null when it is absent, when `object` is no object and when `key`
 // is null. The pointer is good until `object` changes.
 const Json::Value* FindMember(const Json::Value& object, const char* key);

@@ -1,0 +1,147 @@
+#include "file_io.h"
+
+#include <sys/file.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdio>
+#include <utility>
+
+namespace OrvaDRCore {
+
+namespace {
+
+constexpr std::size_t ReadSize = 65536;
+
+constexpr mode_t PermissionBits = 07777;
+constexpr mode_t NewFileMode = 0666;  // the kernel takes the umask off
+constexpr mode_t OwnerOnly = 0600;    // until the bits that the file is to have are set
+
+constexpr const char* TemporarySuffix = ".orvadr-tmp";
+constexpr int MaxWriters = 64;  // of one file, at once
+
+bool TryLock(const FileDescriptor& file)
+{
+    return ::flock(file.Get(), LOCK_EX | LOCK_NB) == 0;
+}
+
+// Whether `path` still is the name of the open file.
+bool IsNamed(const FileDescriptor& file, const std::string& path)
+{
+    struct stat open {};
+    struct stat named {};
+    return ::fstat(file.Get(), &open) == 0 && ::lstat(path.c_str(), &named) == 0 &&
+           open.st_dev == named.st_dev && open.st_ino == named.st_ino;
+}
+
+// Removes the temporary file of a writer that is no more, on which nobody holds a lock.
+bool RemoveLeftOver(const std::string& path)
+{
+    const FileDescriptor file(path, O_RDONLY | O_NOFOLLOW | O_NONBLOCK);
+    return file.IsOpen() && TryLock(file) && IsNamed(file, path) && ::unlink(path.c_str()) == 0;
+}
+
+// Makes and locks the temporary file of that name, if there is none yet. Never goes through a
+// symbolic link. None, with errno set, on failure: EEXIST when another writer has the name.
+FileDescriptor MakeLocked(const std::string& path, mode_t mode)
+{
+    FileDescriptor file(path, O_WRONLY | O_CREAT | O_EXCL, mode);
+    if (!file.IsOpen()) return file;
+    // A file that is not locked yet looks like a left-over: another writer may be removing it.
+    if (TryLock(file) && IsNamed(file, path)) return file;
+
+    const int error = errno;
+    const bool taken = error == EWOULDBLOCK || !IsNamed(file, path);
+    if (!taken) ::unlink(path.c_str());  // a file system without locks
+    errno = taken ? EEXIST : error;
+    return {};
+}
+
+// Makes and locks a temporary file of the caller's own beside the file `path`, which becomes its
+// name, and removes left-overs under the next names.
+FileDescriptor MakeTemporary(std::string& path, mode_t mode)
+{
+    const std::string stem = path + TemporarySuffix;
+    int writer = 0;
+    while (true) {
+        path = stem + std::to_string(writer);
+        FileDescriptor file = MakeLocked(path, mode);
+        if (file.IsOpen()) {
+            while (RemoveLeftOver(stem + std::to_string(++writer))) {
+            }
+            return file;
+        }
+        if (errno != EEXIST) return file;
+        if (!RemoveLeftOver(path) && ++writer == MaxWriters) {
+            errno = EAGAIN;
+            return file;
+        }
+    }
+}
+
+// Gives the temporary file its content, its permission bits and its name.
+bool Complete(const FileDescriptor& file, std::string_view text, std::optional<mode_t> mode,
+              const std::string& temporary, const std::string& path)
+{
+    return WriteAll(file.Get(), text) && (!mode || ::fchmod(file.Get(), *mode) == 0) &&
+           ::fsync(file.Get()) == 0 && std::rename(temporary.c_str(), path.c_str()) == 0;
+}
+
+}  // namespace
+
+FileDescriptor::FileDescriptor(const std::string& path, int flags, mode_t mode)
+    : fd(::open(path.c_str(), flags | O_CLOEXEC, mode))
+{
+}
+
+FileDescriptor::FileDescriptor(FileDescriptor&& other) noexcept : fd(std::exchange(other.fd, -1)) {}
+
+FileDescriptor::~FileDescriptor()
+{
+    const int error = errno;
+    if (fd >= 0) ::close(fd);
+    errno = error;
+}
+
+bool ReadAll(int fd, std::string& text)
+{
+    std::size_t size = text.size();
+    ssize_t count = 0;
+    do {
+        if (count > 0) size += static_cast<std::size_t>(count);
+        if (text.size() < size + ReadSize) text.resize(size + ReadSize + size / 2);
+        count = ::read(fd, &text[size], text.size() - size);
+    } while (count > 0 || (count < 0 && errno == EINTR));
+    text.resize(size);
+    return count == 0;
+}
+
+bool WriteAll(int fd, std::string_view text)
+{
+    while (!text.empty()) {
+        const ssize_t count = ::write(fd, text.data(), text.size());
+        if (count < 0 && errno == EINTR) continue;
+        if (count <= 0) return false;
+        text.remove_prefix(static_cast<std::size_t>(count));
+    }
+    return true;
+}
+
+bool ReplaceFile(const std::string& path, std::string_view text, std::optional<mode_t> mode)
+{
+    struct stat old {};
+    if (!mode && ::stat(path.c_str(), &old) == 0) mode = old.st_mode & PermissionBits;
+
+    std::string temporary = path;
+    const FileDescriptor file = MakeTemporary(temporary, mode ? OwnerOnly : NewFileMode);
+    if (!file.IsOpen()) return false;
+    if (Complete(file, text, mode, temporary, path)) return true;
+
+    const int error = errno;
+    ::unlink(temporary.c_str());
+    errno = error;
+    return false;
+}
+
+}  // namespace OrvaDRCore

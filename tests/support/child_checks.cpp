@@ -1,0 +1,49 @@
+#include "child_checks.h"
+
+#include <grp.h>
+#include <gtest/gtest.h>
+#include <unistd.h>
+
+#include <cstdio>
+#include <stdexcept>
+
+#include "child_process.h"
+
+namespace {
+
+constexpr uid_t OrdinaryUser = 65534;
+constexpr gid_t OrdinaryGroup = 65534;
+
+void DropRights()
+{
+    if (::setgroups(0, nullptr) < 0 ||
+        ::setresgid(OrdinaryGroup, OrdinaryGroup, OrdinaryGroup) < 0 ||
+        ::setresuid(OrdinaryUser, OrdinaryUser, OrdinaryUser) < 0) {
+        throw std::runtime_error("root's rights cannot be dropped");
+    }
+}
+
+}  // namespace
+
+void CheckInChild(const std::function<void()>& checks)
+{
+    (void)std::fflush(stdout);
+    ChildProcess child([&](ChildProcess::Link& /*link*/) {
+        checks();
+        (void)std::fflush(stdout);  // what failed, which would go with the process
+        if (::testing::Test::HasFailure()) throw std::runtime_error("a check failed");
+    });
+    EXPECT_EQ(child.Join(), 0);
+}
+
+void CheckAsOrdinaryUser(const TempDir& dir, const std::function<void()>& checks)
+{
+    const bool isRoot = ::geteuid() == 0;
+    if (isRoot) {
+        ASSERT_EQ(::chown(dir.Path().c_str(), OrdinaryUser, OrdinaryGroup), 0);
+    }
+    CheckInChild([&] {
+        if (isRoot) DropRights();
+        checks();
+    });
+}
