@@ -1,8 +1,6 @@
 #include <orvadrcore/utils.h>
 
-#include <dlfcn.h>
 #include <gmock/gmock.h>
-#include <spawn.h>
 #include <sys/wait.h>
 
 #include <cerrno>
@@ -16,6 +14,8 @@
 #include "json_helpers.h"
 #include "support/log_capture.h"
 #include "support/pauses.h"
+#include "support/program_notes.h"
+#include "support/syscall_faults.h"
 
 namespace {
 
@@ -24,66 +24,34 @@ namespace {
 class ProgramStandIn {
   public:
     // No program: starting one fails with `error`.
-    explicit ProgramStandIn(int error) : ProgramStandIn(error, {}) {}
+    explicit ProgramStandIn(int error)
+    {
+        faults.execve = [this, error](const char* /*path*/, char* const* arguments,
+                                      char* const* /*environment*/) {
+            notes.Note(arguments);
+            errno = error;
+            return -1;
+        };
+    }
     explicit ProgramStandIn(std::vector<std::string> command)
-        : ProgramStandIn(0, std::move(command))
     {
+        faults.execve = [this, command](const char* /*path*/, char* const* arguments,
+                                        char* const* environment) mutable {
+            notes.Note(arguments);
+            std::vector<char*> texts;
+            for (std::string& text : command) texts.push_back(text.data());
+            texts.push_back(nullptr);
+            return RealExecve(texts[0], texts.data(), environment);
+        };
     }
-    ProgramStandIn(const ProgramStandIn&) = delete;
-    ProgramStandIn& operator=(const ProgramStandIn&) = delete;
-    ~ProgramStandIn() { current = nullptr; }
 
-    // The path that was asked for, followed by its arguments.
-    const std::vector<std::string>& Asked() const { return asked; }
-
-    static ProgramStandIn* Current() { return current; }
-
-    // As posix_spawn, which has the other parameters.
-    template <class Spawn>
-    int Start(const char* path, char* const arguments[], Spawn spawn)
-    {
-        asked = {path};
-        for (; *arguments != nullptr; ++arguments) asked.emplace_back(*arguments);
-        if (failure != 0) return failure;
-        std::vector<char*> texts;
-        for (std::string& text : standIn) texts.push_back(text.data());
-        texts.push_back(nullptr);
-        return spawn(texts[0], texts.data());
-    }
+    // The program that was asked for, followed by its arguments.
+    std::vector<std::string> Asked() const { return notes.Taken().back(); }
 
   private:
-    ProgramStandIn(int error, std::vector<std::string> command)
-        : failure(error), standIn(std::move(command))
-    {
-        if (current != nullptr) std::abort();
-        current = this;
-    }
-
-    static inline ProgramStandIn* current = nullptr;
-
-    int failure;
-    std::vector<std::string> standIn;
-    std::vector<std::string> asked;
+    SyscallFaults faults;
+    ProgramNotes notes;
 };
-
-}  // namespace
-
-// What the library's programs are started with.
-extern "C" int posix_spawn(pid_t* pid, const char* path, const posix_spawn_file_actions_t* actions,
-                           const posix_spawnattr_t* attributes, char* const arguments[],
-                           char* const environment[])
-{
-    void* symbol = ::dlsym(RTLD_NEXT, "posix_spawn");
-    if (symbol == nullptr) std::abort();
-    const auto spawn = [&](const char* program, char* const* programArguments) {
-        return reinterpret_cast<decltype(posix_spawn)*>(symbol)(pid, program, actions, attributes,
-                                                                programArguments, environment);
-    };
-    ProgramStandIn* standIn = ProgramStandIn::Current();
-    return standIn != nullptr ? standIn->Start(path, arguments, spawn) : spawn(path, arguments);
-}
-
-namespace {
 
 using OrvaDRCore::Container;
 using OrvaDRCore::GenerateUUID;
@@ -125,7 +93,7 @@ TEST_F(UtilsTest, TheUuidComesFromUuidgenWithoutArguments)
 {
     const ProgramStandIn program({"/bin/true"});
     GenerateUUID();
-    EXPECT_THAT(program.Asked(), ElementsAre("/usr/bin/uuidgen", "/usr/bin/uuidgen"));
+    EXPECT_THAT(program.Asked(), ElementsAre("/usr/bin/uuidgen"));
 }
 
 TEST_F(UtilsTest, AUuidProgramThatCannotBeStartedIsLogged)

@@ -1,24 +1,42 @@
 /// \file
 /// Stand-in for the appliance's core library on Linux systems that lack it: the calls that the DR
-/// library needs. Every call may be made from any thread, none throws, none logs.
+/// library needs. Every call may be made from any thread unless it says otherwise; none throws,
+/// none logs.
+///
+/// Programs are started without a shell and inherit descriptors 0, 1 and 2, and no others. They are
+/// no children of the caller, who gets no SIGCHLD for them: a handler that reaps all children does
+/// not take their results away, and neither does a caller that ignores the signal. Handled signals
+/// and SIGCHLD have their default action in the program; ignored ones stay ignored.
 #ifndef ORVACORE_ORVACORE_H
 #define ORVACORE_ORVACORE_H
 
+#include <sys/types.h>
+
 #include <cstdio>
 
-/// Starts a program without a shell and gives a stream to read its standard output from.
+// ------------------------------------------------------------------------------------ programs
+
+/// Runs a program and waits for its end.
+/// \param path  the program's file; it is also its first argument
+/// \param argument1,argument2,argument3,argument4  further arguments; the first null one ends them
+/// \return 0 when the program ended with code 0, its code when it ended with another, -1 when it
+///         could not be started (errno set) or was ended by a signal
+int CoreLibExec(const char* path, const char* argument1, const char* argument2,
+                const char* argument3, const char* argument4);
+
+/// Starts a program and gives a stream to read its standard output from.
 /// \param path  the program's file; it is also its first argument
 /// \param mode  "r", the only way there is
-/// \param ...   further arguments (`const char*`), ended by a null pointer
+/// \param ...   further arguments (`const char*`), ended by a null pointer, 15 at most
 /// \return the stream, to be closed with CoreLibPclose(); null with errno set when the program
 ///         cannot be started or the mode is another
-/// \note The program inherits descriptors 0, 1 (the stream) and 2, and no others.
 FILE* CoreLibPopen(const char* path, const char* mode, ...);
 
 /// Closes a stream of CoreLibPopen() and waits for its program.
-/// \return 0 when the program ended with code 0 (or its end cannot be known because the caller
-///         ignores SIGCHLD), otherwise -1
+/// \return 0 when the program ended with code 0, otherwise -1
 int CoreLibPclose(FILE* stream);
+
+// ----------------------------------------------------------------------------- texts and files
 
 /// Cuts characters off both ends of a text, in place.
 /// \param text      the text; null is given back as it is
@@ -26,5 +44,41 @@ int CoreLibPclose(FILE* stream);
 /// \param trailing  the characters to cut at the end; null means white space
 /// \return `text`
 char* CoreLibStrTrim(char* text, const char* leading, const char* trailing);
+
+/// Whether a path names anything, symbolic links followed.
+bool CoreLibFileExist(const char* path);
+
+/// \return 1 when a path names a directory, symbolic links followed, otherwise 0
+int CoreLibFileCheckDir(const char* path);
+
+// ----------------------------------------------------------------------------------- processes
+
+/// The flag of CoreLibProcForkEx() for a child that nobody waits for.
+constexpr int CORELIB_FORK_DETACHED = 0x40;
+
+/// Forks.
+///
+/// A detached child is no child of the caller: it needs no wait and never becomes the caller's
+/// zombie, unless the caller is the one who adopts orphans, as process 1 is. It keeps working
+/// directory, umask and signal handling. Those of its standard input, output and error that are
+/// pipes or sockets become /dev/null, so that whoever reads the caller's output meets its end when
+/// the caller ends.
+/// \param flags  CORELIB_FORK_DETACHED, or 0 for a plain fork
+/// \return the child's process id in the caller, 0 in the child, -1 with errno set on failure
+pid_t CoreLibProcForkEx(int flags);
+
+/// \return 1 when a process lives, whoever its user is, otherwise 0; neither a zombie nor a single
+///         thread of a process is a process that lives
+int CoreLibProcAlive(pid_t pid);
+
+/// Writes the caller's process id into a file: the id in decimals on the first line, the process's
+/// start time in clock ticks since boot on the second, by which a later process with the same id is
+/// told apart. The file is replaced whole and may be read by everyone.
+/// \return 0, or -1 with errno set
+int CoreLibProcPidFileCreate(const char* path);
+
+/// \return the process id in a file, also in one that holds nothing but the id; 0 when there is no
+///         file, no id in it, or when the id now belongs to a process that was started later
+pid_t CoreLibReadPidFile(const char* path);
 
 #endif

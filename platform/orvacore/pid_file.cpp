@@ -1,0 +1,70 @@
+#include <orvacore/orvacore.h>
+
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <charconv>
+#include <string>
+
+#include "file_io.h"
+#include "process_status.h"
+
+namespace {
+
+constexpr mode_t ReadableByAll = 0644;
+constexpr std::size_t ReadSize = 64;  // two numbers are shorter
+
+// The beginning of a file, empty when it cannot be read. A named pipe is not waited for.
+std::string ReadBeginning(const char* path)
+{
+    const OrvaDRCore::FileDescriptor file(path, O_RDONLY | O_NONBLOCK);
+    std::array<char, ReadSize> text{};
+    ssize_t count = 0;
+    do {
+        count = ::read(file.Get(), text.data(), text.size());
+    } while (count < 0 && errno == EINTR);
+    return {text.data(), static_cast<std::size_t>(std::max<ssize_t>(count, 0))};
+}
+
+// The number that a line consists of, and nothing else; 0 for any other line.
+template <class Number>
+Number ParseLine(const std::string& line)
+{
+    Number number = 0;
+    const char* end = line.data() + line.size();
+    const auto [stop, error] = std::from_chars(line.data(), end, number);
+    return error == std::errc() && stop == end ? number : 0;
+}
+
+// The line at `at`, which is moved behind it.
+std::string TakeLine(const std::string& text, std::size_t& at)
+{
+    const std::size_t end = std::min(text.find('\n', at), text.size());
+    std::string line = text.substr(at, end - at);
+    at = std::min(end + 1, text.size());
+    return line;
+}
+
+}  // namespace
+
+int CoreLibProcPidFileCreate(const char* path)
+{
+    const pid_t pid = ::getpid();
+    std::string text = std::to_string(pid) + "\n";
+    if (const auto status = ReadProcessStatus(pid)) text += std::to_string(status->start) + "\n";
+    return OrvaDRCore::ReplaceFile(path, text, ReadableByAll) ? 0 : -1;
+}
+
+pid_t CoreLibReadPidFile(const char* path)
+{
+    const std::string text = ReadBeginning(path);
+    std::size_t at = 0;
+    const auto pid = ParseLine<pid_t>(TakeLine(text, at));
+    const auto start = ParseLine<unsigned long long>(TakeLine(text, at));
+    if (pid <= 0) return 0;
+    const auto status = ReadProcessStatus(pid);
+    const bool reused = start != 0 && status && status->start != start;
+    return reused ? 0 : pid;
+}

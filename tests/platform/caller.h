@@ -1,0 +1,242 @@
+// What the tests of the platform stand-ins share: callers in processes of their own, whose signals,
+// descriptors and user can be changed freely, and looks at what a process has.
+#ifndef ORVADRCORE_TESTS_PLATFORM_CALLER_H
+#define ORVADRCORE_TESTS_PLATFORM_CALLER_H
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <poll.h>
+#include <signal.h>
+#include <sys/resource.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <array>
+#include <cerrno>
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <functional>
+#include <set>
+#include <sstream>
+#include <stdexcept>
+#include <string>
+#include <vector>
+
+#include "support/child_process.h"
+
+// Runs `body` in a process of its own, which ends after a minute at the latest. Expectations that
+// fail there fail the test.
+inline void InProcess(const std::function<void()>& body)
+{
+    ChildProcess process([&](ChildProcess::Link&) {
+        body();
+        if (::testing::Test::HasFailure()) throw std::runtime_error("an expectation failed");
+    });
+    EXPECT_EQ(process.Join(), 0);
+}
+
+// A pipe that programs inherit only as far as their caller hands it on.
+class Pipe {
+  public:
+    Pipe()
+    {
+        if (::pipe2(ends.data(), O_CLOEXEC) < 0) std::abort();
+    }
+    Pipe(const Pipe&) = delete;
+    Pipe& operator=(const Pipe&) = delete;
+    ~Pipe()
+    {
+        CloseReading();
+        CloseWriting();
+    }
+
+    int Reading() const { return ends[0]; }
+    int Writing() const { return ends[1]; }
+    void CloseReading() { Close(ends[0]); }
+    void CloseWriting() { Close(ends[1]); }
+
+    void Write(const std::string& text) const
+    {
+        EXPECT_EQ(::write(Writing(), text.data(), text.size()), static_cast<ssize_t>(text.size()));
+    }
+
+    // What is written until the last writer, this process apart, has closed its end.
+    std::string ReadToEnd()
+    {
+        CloseWriting();
+        std::string text;
+        while (ReadOne(text)) {
+        }
+        return text;
+    }
+
+    // What is written before the next line end.
+    std::string ReadLine() const
+    {
+        std::string line;
+        while (ReadOne(line) && line.back() != '\n') {
+        }
+        if (!line.empty()) line.pop_back();
+        return line;
+    }
+
+  private:
+    static constexpr int DeadlineMSec = 60'000;
+
+    static void Close(int& fd)
+    {
+        if (fd >= 0) ::close(fd);
+        fd = -1;
+    }
+
+    bool ReadOne(std::string& text) const
+    {
+        pollfd waiting{Reading(), POLLIN, 0};
+        if (::poll(&waiting, 1, DeadlineMSec) <= 0) {
+            ADD_FAILURE() << "nobody wrote or closed the pipe";
+            return false;
+        }
+        char next = 0;
+        if (::read(Reading(), &next, 1) != 1) return false;
+        text += next;
+        return true;
+    }
+
+    std::array<int, 2> ends{-1, -1};
+};
+
+inline std::string Content(const std::string& path)
+{
+    std::ostringstream text;
+    text << std::ifstream(path, std::ios::binary).rdbuf();
+    return text.str();
+}
+
+inline void SetContent(const std::string& path, const std::string& text)
+{
+    std::ofstream(path, std::ios::binary) << text;
+}
+
+// The number at the beginning of a text; 0 when there is none.
+inline long Number(const std::string& text)
+{
+    return std::strtol(text.c_str(), nullptr, 10);
+}
+
+// A process that no test waits for, killed at the end of the test.
+struct Bystander {
+    pid_t pid;
+
+    explicit Bystander(const std::string& text) : pid(static_cast<pid_t>(Number(text))) {}
+    Bystander(const Bystander&) = delete;
+    Bystander& operator=(const Bystander&) = delete;
+    ~Bystander()
+    {
+        if (pid > 0) ::kill(pid, SIGKILL);
+    }
+};
+
+// The open descriptors of this process.
+inline std::set<int> Descriptors()
+{
+    std::set<int> open;
+    std::vector<int> listed;  // with that of the list
+    for (const auto& entry : std::filesystem::directory_iterator("/proc/self/fd")) {
+        listed.push_back(static_cast<int>(Number(entry.path().filename())));
+    }
+    for (const int fd : listed) {
+        if (::fcntl(fd, F_GETFD) >= 0) open.insert(fd);
+    }
+    return open;
+}
+
+// Leaves room for `count` descriptors more than those that are open.
+inline void LeaveDescriptors(int count)
+{
+    std::vector<int> free(static_cast<std::size_t>(count) + 1);
+    for (int& fd : free) fd = ::fcntl(STDERR_FILENO, F_DUPFD, 0);
+    for (const int fd : free) ::close(fd);
+    rlimit limits{};
+    ::getrlimit(RLIMIT_NOFILE, &limits);
+    limits.rlim_cur = static_cast<rlim_t>(free.back());
+    EXPECT_EQ(::setrlimit(RLIMIT_NOFILE, &limits), 0);
+}
+
+// Whether this process has a child that runs or that nobody has waited for.
+inline bool HasChildren()
+{
+    return ::waitpid(-1, nullptr, WNOHANG | __WALL) >= 0 || errno != ECHILD;
+}
+
+// The blocked signals, and what each signal does, as a text to be compared.
+inline std::string SignalSettings()
+{
+    std::ostringstream text;
+    const auto print = [&](const sigset_t& signals) {
+        for (int signal = 1; signal <= SIGRTMAX; ++signal) text << ::sigismember(&signals, signal);
+        text << '\n';
+    };
+    sigset_t blocked;
+    ::pthread_sigmask(SIG_SETMASK, nullptr, &blocked);
+    print(blocked);
+    for (int signal = 1; signal <= SIGRTMAX; ++signal) {
+        struct sigaction action {};
+        if (::sigaction(signal, nullptr, &action) < 0) continue;
+        text << signal << ' ' << reinterpret_cast<void*>(action.sa_handler) << ' '
+             << action.sa_flags << ' ';
+        print(action.sa_mask);
+    }
+    return text.str();
+}
+
+inline void SetSignal(int signal, void (*handler)(int), int flags = 0)
+{
+    struct sigaction action {};
+    action.sa_handler = handler;
+    action.sa_flags = flags;
+    EXPECT_EQ(::sigaction(signal, &action, nullptr), 0);
+}
+
+inline void BlockSignal(int signal)
+{
+    sigset_t signals;
+    ::sigemptyset(&signals);
+    ::sigaddset(&signals, signal);
+    EXPECT_EQ(::pthread_sigmask(SIG_BLOCK, &signals, nullptr), 0);
+}
+
+// A handler that waits for every child there is, as event loops have it.
+inline void ReapAll(int)
+{
+    const int error = errno;
+    while (::waitpid(-1, nullptr, WNOHANG) > 0) {
+    }
+    errno = error;
+}
+
+// What callers do with the signal of their children.
+struct ChildSignal {
+    const char* name;
+    void (*handler)(int);
+    int flags;
+};
+const std::array<ChildSignal, 5> ChildSignals{{
+    {"default", SIG_DFL, 0},
+    {"ignored", SIG_IGN, 0},
+    {"no zombies", SIG_DFL, SA_NOCLDWAIT},
+    {"reaping handler", ReapAll, SA_RESTART},
+    {"reaping handler, no zombies", ReapAll, SA_NOCLDWAIT},
+}};
+
+// Gives up root's rights, for good; an ordinary user has none.
+inline void BecomeOrdinary()
+{
+    constexpr uid_t Nobody = 65534;
+    if (::geteuid() != 0) return;
+    EXPECT_EQ(::setgid(Nobody), 0);
+    EXPECT_EQ(::setuid(Nobody), 0);
+}
+
+#endif

@@ -1,0 +1,352 @@
+// Pid files: CoreLibProcPidFileCreate() and CoreLibReadPidFile().
+#include <orvacore/orvacore.h>
+
+#include <sys/prctl.h>
+
+#include <climits>
+#include <filesystem>
+#include <thread>
+
+#include "caller.h"
+#include "support/temp_dir.h"
+
+namespace {
+
+// When this process was started, in clock ticks since boot: field 22 of what the kernel says. The
+// name before the 3rd field may hold anything.
+unsigned long long OwnStart()
+{
+    const std::string status = Content("/proc/self/stat");
+    std::istringstream fields(status.substr(status.rfind(')') + 1));
+    std::string field;
+    for (int number = 3; number < 22; ++number) fields >> field;
+    unsigned long long start = 0;
+    fields >> start;
+    return start;
+}
+
+std::string OwnText()
+{
+    return std::to_string(::getpid()) + "\n" + std::to_string(OwnStart()) + "\n";
+}
+
+class PidFileTest : public ::testing::Test {
+  protected:
+    // In the process that calls.
+    int Create() const { return CoreLibProcPidFileCreate(path.c_str()); }
+    pid_t Read() const { return CoreLibReadPidFile(path.c_str()); }
+
+    void ExpectNotCreated(int error) const
+    {
+        errno = 0;
+        EXPECT_EQ(Create(), -1);
+        EXPECT_EQ(errno, error);
+    }
+
+    struct stat Status() const
+    {
+        struct stat status {};
+        EXPECT_EQ(::lstat(path.c_str(), &status), 0);
+        return status;
+    }
+
+    std::set<std::string> Names() const
+    {
+        std::set<std::string> names;
+        for (const auto& entry : std::filesystem::directory_iterator(dir.Path())) {
+            names.insert(entry.path().filename().string());
+        }
+        return names;
+    }
+
+    TempDir dir;
+    std::string path = dir.File("x.pid");
+};
+
+TEST_F(PidFileTest, HoldsIdAndStart)
+{
+    EXPECT_EQ(Create(), 0);
+    EXPECT_EQ(Content(path), OwnText());
+    EXPECT_EQ(Read(), ::getpid());
+    EXPECT_EQ(Names(), std::set<std::string>{"x.pid"});
+}
+
+TEST_F(PidFileTest, NamesTheProcessThatCallsWhateverItsName)
+{
+    for (const char* name : {"name", ") Z (", ") S 1 2 3", ")", "", "a b\n1 2", "((((("}) {
+        SCOPED_TRACE(name);
+        ChildProcess process([&](ChildProcess::Link& link) {
+            ::prctl(PR_SET_NAME, name);
+            if (Create() != 0 || Content(path) != OwnText()) return;
+            link.Tell();
+            link.Await();
+        });
+        EXPECT_TRUE(process.Await());
+        EXPECT_EQ(Read(), process.Pid());
+        EXPECT_EQ(CoreLibProcAlive(Read()), 1);
+        process.Tell();
+        EXPECT_EQ(process.Join(), 0);
+    }
+}
+
+TEST_F(PidFileTest, NamesTheDetachedChildThatCalls)
+{
+    InProcess([this] {
+        Pipe done;
+        const pid_t child = CoreLibProcForkEx(CORELIB_FORK_DETACHED);
+        if (child == 0) {
+            Create();
+            done.Write(Content(path) == OwnText() ? "right" : "wrong");
+            ::_exit(0);
+        }
+        EXPECT_EQ(done.ReadToEnd(), "right");
+        EXPECT_EQ(Content(path).find(std::to_string(child) + "\n"), 0U);
+    });
+}
+
+TEST_F(PidFileTest, MayBeReadByEveryoneWhateverTheUmask)
+{
+    for (const mode_t mask : {0000U, 0022U, 0077U, 0777U}) {
+        InProcess([&] {
+            ::umask(mask);
+            EXPECT_EQ(Create(), 0);
+        });
+        EXPECT_EQ(Status().st_mode, S_IFREG | 0644U);
+    }
+}
+
+TEST_F(PidFileTest, AnotherUserReadsIt)
+{
+    EXPECT_EQ(Create(), 0);
+    EXPECT_EQ(::chmod(dir.Path().c_str(), 0711), 0);
+    const pid_t writer = ::getpid();
+    InProcess([&] {
+        BecomeOrdinary();
+        EXPECT_EQ(Read(), writer);
+        EXPECT_EQ(CoreLibProcAlive(writer), 1);
+    });
+}
+
+TEST_F(PidFileTest, IsReplacedWhole)
+{
+    SetContent(path, "1\n2\n");
+    const std::string other = dir.File("other name");
+    EXPECT_EQ(::link(path.c_str(), other.c_str()), 0);
+    EXPECT_EQ(::chmod(path.c_str(), 0400), 0);
+    EXPECT_EQ(Create(), 0);
+    EXPECT_EQ(Content(path), OwnText());
+    EXPECT_EQ(Status().st_mode, S_IFREG | 0644U);
+    EXPECT_EQ(Content(other), "1\n2\n");  // the old file, which is not written to
+    EXPECT_EQ(Names(), (std::set<std::string>{"other name", "x.pid"}));
+}
+
+TEST_F(PidFileTest, WhatADeadProcessLeftIsReplaced)
+{
+    InProcess([&] { EXPECT_EQ(Create(), 0); });
+    EXPECT_EQ(CoreLibProcAlive(Read()), 0);
+    EXPECT_EQ(Create(), 0);
+    EXPECT_EQ(Read(), ::getpid());
+}
+
+TEST_F(PidFileTest, NothingIsWrittenThroughASymbolicLink)
+{
+    const std::string precious = dir.File("precious");
+    SetContent(precious, "precious");
+    for (const char* link : {"x.pid", "x.pid.orvadr-tmp0", "x.pid.orvadr-tmp1"}) {
+        std::filesystem::create_symlink(precious, dir.File(link));
+    }
+    EXPECT_EQ(Create(), 0);
+    EXPECT_TRUE(S_ISREG(Status().st_mode));
+    EXPECT_EQ(Content(path), OwnText());
+    EXPECT_EQ(Content(precious), "precious");
+}
+
+TEST_F(PidFileTest, NothingIsMadeThroughADanglingLink)
+{
+    std::filesystem::create_symlink(dir.File("target"), path);
+    EXPECT_EQ(Create(), 0);
+    EXPECT_EQ(Content(path), OwnText());
+    EXPECT_EQ(Names(), std::set<std::string>{"x.pid"});
+}
+
+TEST_F(PidFileTest, IsNotCreatedWhereThatCannotBe)
+{
+    SetContent(dir.File("file"), "");
+    path = dir.File("missing/x.pid");
+    ExpectNotCreated(ENOENT);
+    path = dir.File("file/x.pid");
+    ExpectNotCreated(ENOTDIR);
+    path = dir.File(std::string(300, 'x'));
+    ExpectNotCreated(ENAMETOOLONG);
+    path = dir.Path();
+    ExpectNotCreated(EISDIR);
+    EXPECT_EQ(Names(), std::set<std::string>{"file"});
+    EXPECT_FALSE(std::filesystem::exists(dir.Path() + ".orvadr-tmp0"));
+}
+
+TEST_F(PidFileTest, AnUnwritableDirectoryIsAnErrorAndTheOldFileStays)
+{
+    SetContent(path, "1\n");
+    EXPECT_EQ(::chmod(dir.Path().c_str(), 0555), 0);
+    InProcess([&] {
+        BecomeOrdinary();
+        ExpectNotCreated(EACCES);
+    });
+    EXPECT_EQ(::chmod(dir.Path().c_str(), 0700), 0);
+    EXPECT_EQ(Content(path), "1\n");
+    EXPECT_EQ(Names(), std::set<std::string>{"x.pid"});
+}
+
+TEST_F(PidFileTest, AFailureToWriteIsAnErrorAndTheOldFileStays)
+{
+    SetContent(path, "1\n");
+    InProcess([&] {
+        SetSignal(SIGXFSZ, SIG_IGN);
+        const rlimit none{0, RLIM_INFINITY};
+        EXPECT_EQ(::setrlimit(RLIMIT_FSIZE, &none), 0);
+        ExpectNotCreated(EFBIG);
+    });
+    EXPECT_EQ(Content(path), "1\n");
+    EXPECT_EQ(Names(), std::set<std::string>{"x.pid"});
+}
+
+TEST_F(PidFileTest, OfManyWritersOneWins)
+{
+    std::array<std::thread, 4> threads;
+    for (std::thread& thread : threads) {
+        thread = std::thread([this] {
+            for (int run = 0; run < 10; ++run) {
+                EXPECT_EQ(Create(), 0);
+                EXPECT_EQ(Read(), ::getpid());
+            }
+        });
+    }
+    for (std::thread& thread : threads) thread.join();
+    EXPECT_EQ(Content(path), OwnText());
+    EXPECT_EQ(Names(), std::set<std::string>{"x.pid"});
+}
+
+TEST_F(PidFileTest, AMissingFileHoldsNoId)
+{
+    EXPECT_EQ(Read(), 0);
+    path = dir.File("missing/x.pid");
+    EXPECT_EQ(Read(), 0);
+    path = "";
+    EXPECT_EQ(Read(), 0);
+}
+
+TEST_F(PidFileTest, OnlyALineThatIsAnIdIsRead)
+{
+    const std::string own = std::to_string(::getpid());
+    const std::string start = std::to_string(OwnStart());
+    struct Row {
+        std::string text;
+        pid_t pid;
+    };
+    const std::vector<Row> rows{
+        {"", 0},
+        {"\n", 0},
+        {"garbage", 0},
+        {"garbage\n" + own + "\n", 0},
+        {"\n" + own + "\n", 0},
+        {"0", 0},
+        {"-5", 0},
+        {"-" + own, 0},
+        {"+" + own, 0},
+        {"4294967297", 0},  // 1 for whoever reads 32 bits
+        {"2147483648", 0},
+        {"-2147483649", 0},
+        {"99999999999999999999", 0},
+        {own + "abc", 0},
+        {" " + own, 0},
+        {own + " ", 0},
+        {own + " " + start, 0},
+        {own + "\r\n", 0},
+        {own + std::string(1, '\0'), 0},
+        {own + ".0", 0},
+        {"0x1", 0},
+        {std::string(1'000'000, '9'), 0},
+        {std::string(1'000'000, '\n'), 0},
+        {own, ::getpid()},
+        {own + "\n", ::getpid()},
+        {own + "\n\n", ::getpid()},
+        {own + "\n" + start, ::getpid()},
+        {own + "\n" + start + "\n", ::getpid()},
+        {own + "\n" + start + "\nmore\n", ::getpid()},
+        {own + "\n" + std::to_string(OwnStart() + 1) + "\n", 0},  // the id is used again
+        {own + "\n" + std::to_string(OwnStart() - 1) + "\n", 0},
+        {own + "\n1", 0},
+        {own + "\n18446744073709551615\n", 0},
+        {own + "\n" + std::string(15, '0') + "1\n", 0},
+        {"2147483647", INT_MAX},  // nobody's
+        {"2147483647\n", INT_MAX},
+        {"2147483647\n1\n", INT_MAX},
+    };
+    for (const Row& row : rows) {
+        SetContent(path, row.text);
+        EXPECT_EQ(Read(), row.pid) << row.text.substr(0, 100);
+    }
+}
+
+TEST_F(PidFileTest, TheIdOfAZombieIsReadUntilItIsUsedAgain)
+{
+    ChildProcess process([this](ChildProcess::Link&) { Create(); });
+    const pid_t pid = process.Pid();
+    siginfo_t info{};
+    EXPECT_EQ(::waitid(P_PID, static_cast<id_t>(pid), &info, WEXITED | WNOWAIT), 0);
+    EXPECT_EQ(Read(), pid);
+    EXPECT_EQ(CoreLibProcAlive(pid), 0);
+    EXPECT_EQ(process.Join(), 0);
+    EXPECT_EQ(Read(), pid);
+    EXPECT_EQ(CoreLibProcAlive(pid), 0);
+}
+
+TEST_F(PidFileTest, WhatCannotBeReadHoldsNoId)
+{
+    SetContent(path, std::to_string(::getpid()));
+    EXPECT_EQ(::chmod(dir.Path().c_str(), 0711), 0);
+    EXPECT_EQ(::chmod(path.c_str(), 0000), 0);
+    InProcess([this] {
+        BecomeOrdinary();
+        EXPECT_EQ(Read(), 0);
+        path = dir.Path();
+        EXPECT_EQ(Read(), 0);
+    });
+}
+
+TEST_F(PidFileTest, APipeHoldsNoIdAndIsNotWaitedFor)
+{
+    EXPECT_EQ(::mkfifo(path.c_str(), 0600), 0);
+    InProcess([this] { EXPECT_EQ(Read(), 0); });
+}
+
+TEST_F(PidFileTest, NoMoreIsReadThanAPidFileHolds)
+{
+    constexpr long SizeKiB = 512L * 1024;
+    SetContent(path, std::to_string(::getpid()) + "\n");
+    EXPECT_EQ(::truncate(path.c_str(), SizeKiB * 1024), 0);
+    InProcess([this] {
+        const auto peakKiB = [] {
+            rusage usage{};
+            ::getrusage(RUSAGE_SELF, &usage);
+            return usage.ru_maxrss;
+        };
+        const long before = peakKiB();
+        EXPECT_EQ(Read(), ::getppid());
+        EXPECT_LT(peakKiB() - before, SizeKiB / 4);
+    });
+}
+
+TEST_F(PidFileTest, CreatingAndReadingLeavesNoDescriptor)
+{
+    const std::set<int> before = Descriptors();
+    EXPECT_EQ(Create(), 0);
+    EXPECT_EQ(Read(), ::getpid());
+    EXPECT_EQ(CoreLibProcAlive(::getpid()), 1);
+    path = dir.File("missing/x.pid");
+    ExpectNotCreated(ENOENT);
+    EXPECT_EQ(Read(), 0);
+    EXPECT_EQ(Descriptors(), before);
+}
+
+}  // namespace

@@ -1,0 +1,508 @@
+// Detached children, CoreLibProcForkEx(), and the question whether a process lives,
+// CoreLibProcAlive().
+#include <orvacore/orvacore.h>
+
+#include <dlfcn.h>
+#include <sched.h>
+#include <stdio.h>
+#include <sys/prctl.h>
+#include <sys/socket.h>
+#include <sys/syscall.h>
+
+#include <climits>
+#include <filesystem>
+#include <thread>
+
+#include "caller.h"
+#include "support/temp_dir.h"
+
+namespace {
+
+// Something that happens in place of a fork. Forks are counted down to it in this process and,
+// from its copy of the count on, in every child.
+struct ForkFault {
+    int forksUntil;
+    void (*action)();
+};
+ForkFault forkFault{0, nullptr};
+
+}  // namespace
+
+// Takes the C library's place in the test program.
+extern "C" pid_t fork() noexcept
+{
+    if (forkFault.forksUntil > 0 && --forkFault.forksUntil == 0) {
+        forkFault.action();
+        return -1;
+    }
+    static const auto real = reinterpret_cast<pid_t (*)()>(::dlsym(RTLD_NEXT, "fork"));
+    return real();
+}
+
+namespace {
+
+// Forks a detached child that runs `body` and ends. Gives its process id.
+pid_t Detach(const std::function<void()>& body)
+{
+    const pid_t pid = CoreLibProcForkEx(CORELIB_FORK_DETACHED);
+    if (pid == 0) {
+        ::alarm(60);
+        body();
+        ::_exit(0);
+    }
+    EXPECT_GT(pid, 0);
+    return pid;
+}
+
+void ExpectNotForked(int error)
+{
+    const std::set<int> before = Descriptors();
+    errno = 0;
+    const pid_t pid = CoreLibProcForkEx(CORELIB_FORK_DETACHED);
+    const int found = errno;
+    if (pid == 0) ::_exit(0);
+    EXPECT_EQ(pid, -1);
+    EXPECT_EQ(found, error);
+    EXPECT_EQ(Descriptors(), before);
+    EXPECT_FALSE(HasChildren());
+}
+
+TEST(ForkTest, TheFlagsValueIsFixed)
+{
+    EXPECT_EQ(CORELIB_FORK_DETACHED, 0x40);
+}
+
+TEST(ForkTest, WithoutFlagsTheChildIsTheCallers)
+{
+    InProcess([] {
+        const pid_t caller = ::getpid();
+        const pid_t child = CoreLibProcForkEx(0);
+        if (child == 0) ::_exit(::getppid() == caller ? 5 : 6);
+        int status = 0;
+        EXPECT_EQ(::waitpid(child, &status, 0), child);
+        EXPECT_EQ(WEXITSTATUS(status), 5);
+    });
+}
+
+TEST(ForkTest, WithoutFlagsAFailureIsTold)
+{
+    InProcess([] {
+        forkFault = {1, [] { errno = ENOMEM; }};
+        EXPECT_EQ(CoreLibProcForkEx(0), -1);
+        EXPECT_EQ(errno, ENOMEM);
+    });
+}
+
+TEST(DetachedForkTest, TheCallerGetsTheIdOfTheProcessThatRunsTheChildsCode)
+{
+    InProcess([] {
+        Pipe report;
+        const pid_t child = Detach([&] { report.Write(std::to_string(::getpid())); });
+        EXPECT_EQ(report.ReadToEnd(), std::to_string(child));
+        EXPECT_NE(child, ::getpid());
+    });
+}
+
+TEST(DetachedForkTest, TheChildIsNoChildOfTheCaller)
+{
+    InProcess([] {
+        Pipe forked;
+        Pipe report;
+        const pid_t child = Detach([&] {
+            forked.ReadToEnd();
+            report.Write(std::to_string(::getppid()));
+        });
+        EXPECT_EQ(::waitpid(child, nullptr, WNOHANG), -1);
+        EXPECT_EQ(errno, ECHILD);
+        EXPECT_FALSE(HasChildren());
+        forked.CloseWriting();
+        EXPECT_NE(report.ReadToEnd(), std::to_string(::getpid()));
+    });
+}
+
+TEST(DetachedForkTest, TheCallersOtherChildrenAreLeftToIt)
+{
+    InProcess([] {
+        const pid_t other = ::fork();
+        if (other == 0) ::_exit(5);
+        siginfo_t info{};
+        EXPECT_EQ(::waitid(P_PID, static_cast<id_t>(other), &info, WEXITED | WNOWAIT), 0);
+        Detach([] {});
+        int status = 0;
+        EXPECT_EQ(::waitpid(other, &status, 0), other);
+        EXPECT_EQ(WEXITSTATUS(status), 5);
+        EXPECT_FALSE(HasChildren());
+    });
+}
+
+TEST(DetachedForkTest, WorksWhateverTheCallerDoesWithItsChildrensSignal)
+{
+    for (const ChildSignal& row : ChildSignals) {
+        SCOPED_TRACE(row.name);
+        InProcess([&] {
+            SetSignal(SIGCHLD, row.handler, row.flags);
+            for (int i = 0; i < 20; ++i) {
+                Pipe report;
+                const pid_t child = Detach([&] { report.Write(std::to_string(::getpid())); });
+                EXPECT_EQ(report.ReadToEnd(), std::to_string(child));
+                EXPECT_FALSE(HasChildren());
+            }
+        });
+    }
+}
+
+// What a detached child keeps of its caller.
+std::string Settings()
+{
+    const mode_t mask = ::umask(0);
+    ::umask(mask);
+    return std::filesystem::current_path().string() + '\n' + std::to_string(mask) + '\n' +
+           SignalSettings();
+}
+
+TEST(DetachedForkTest, DirectoryUmaskAndSignalsAreKept)
+{
+    const TempDir dir;
+    InProcess([&] {
+        EXPECT_EQ(::chdir(dir.Path().c_str()), 0);
+        ::umask(0137);
+        SetSignal(SIGUSR1, ReapAll, SA_RESTART | SA_NODEFER);
+        SetSignal(SIGCHLD, SIG_IGN);
+        BlockSignal(SIGUSR2);
+        Pipe report;
+        Detach([&] { report.Write(Settings()); });
+        EXPECT_EQ(report.ReadToEnd(), Settings());
+    });
+}
+
+// What a descriptor leads to, as far as it can be told apart from others.
+std::string Target(const struct stat& status)
+{
+    return std::to_string(status.st_dev) + ' ' + std::to_string(status.st_ino) + ' ' +
+           std::to_string(status.st_rdev);
+}
+
+std::string Target(int fd)
+{
+    struct stat status {};
+    return ::fstat(fd, &status) < 0 ? "closed" : Target(status);
+}
+
+std::string Target(const std::string& path)
+{
+    struct stat status {};
+    EXPECT_EQ(::stat(path.c_str(), &status), 0) << path;
+    return Target(status);
+}
+
+int OpenTerminal(const std::string&)
+{
+    const int terminal = ::posix_openpt(O_RDWR | O_NOCTTY);
+    std::array<char, 64> name{};
+    EXPECT_EQ(::unlockpt(terminal), 0);
+    EXPECT_EQ(::ptsname_r(terminal, name.data(), name.size()), 0);
+    return ::open(name.data(), O_RDWR | O_NOCTTY);
+}
+
+template <int End>
+int OpenPipe(const std::string&)
+{
+    std::array<int, 2> ends{};
+    EXPECT_EQ(::pipe(ends.data()), 0);
+    return ends[End];
+}
+
+template <int Family, int Type>
+int OpenSocket(const std::string&)
+{
+    return ::socket(Family, Type, 0);
+}
+
+int OpenFifo(const std::string& path)
+{
+    EXPECT_EQ(::mkfifo(path.c_str(), 0600), 0);
+    return ::open(path.c_str(), O_RDWR);
+}
+
+int OpenFile(const std::string& path)
+{
+    return ::open(path.c_str(), O_RDWR | O_CREAT, 0600);
+}
+
+TEST(DetachedForkTest, StandardStreamsThatLeadToSomebodyBecomeTheNullDevice)
+{
+    struct Row {
+        const char* name;
+        int (*open)(const std::string& path);
+        bool stays;
+    };
+    const std::array<Row, 8> rows{{
+        {"reading end of a pipe", OpenPipe<0>, false},
+        {"writing end of a pipe", OpenPipe<1>, false},
+        {"named pipe", OpenFifo, false},
+        {"local socket", OpenSocket<AF_UNIX, SOCK_DGRAM>, false},
+        {"network socket", OpenSocket<AF_INET, SOCK_STREAM>, false},
+        {"file", OpenFile, true},
+        {"directory", [](const std::string&) { return ::open("/", O_RDONLY); }, true},
+        {"terminal", OpenTerminal, true},
+    }};
+    for (const Row& row : rows) {
+        for (const int fd : {STDIN_FILENO, STDOUT_FILENO, STDERR_FILENO}) {
+            SCOPED_TRACE(std::string(row.name) + " on " + std::to_string(fd));
+            const TempDir dir;
+            InProcess([&] {
+                const int stream = row.open(dir.File("stream"));
+                const std::string before = Target(stream);
+                EXPECT_EQ(::dup2(stream, fd), fd);
+                Pipe report;
+                Detach([&] { report.Write(Target(fd)); });
+                EXPECT_EQ(report.ReadToEnd(), row.stays ? before : Target("/dev/null"));
+                EXPECT_EQ(Target(fd), before);
+            });
+        }
+    }
+}
+
+TEST(DetachedForkTest, TheNullDeviceCanBeReadWrittenAndHandedOn)
+{
+    InProcess([] {
+        const Pipe streams;
+        for (const int fd : {0, 1, 2}) EXPECT_EQ(::dup2(streams.Writing(), fd), fd);
+        Pipe report;
+        Detach([&] {
+            for (const int fd : {0, 1, 2}) {
+                char byte = 'x';
+                report.Write(std::to_string(::write(fd, &byte, 1)));
+                report.Write(std::to_string(::read(fd, &byte, 1)));
+                report.Write(std::to_string(::fcntl(fd, F_GETFD)) + " ");
+            }
+        });
+        EXPECT_EQ(report.ReadToEnd(), "100 100 100 ");
+    });
+}
+
+TEST(DetachedForkTest, StandardStreamsThatAreClosedStayClosed)
+{
+    for (const std::string open : {"", "0", "1", "2", "01", "02", "12"}) {
+        SCOPED_TRACE("open: " + open);
+        InProcess([&] {
+            Pipe report;
+            const Pipe stream;
+            for (const int fd : {0, 1, 2}) {
+                if (open.find(std::to_string(fd)) == std::string::npos) {
+                    ::close(fd);
+                } else {
+                    ::dup2(stream.Writing(), fd);
+                }
+            }
+            Detach([&] {
+                for (const int fd : {0, 1, 2}) {
+                    if (Target(fd) != "closed") report.Write(std::to_string(fd));
+                }
+            });
+            EXPECT_EQ(report.ReadToEnd(), open);
+        });
+    }
+}
+
+TEST(DetachedForkTest, OtherDescriptorsStayOpenAndNoneIsAdded)
+{
+    InProcess([] {
+        Pipe report;
+        const Pipe other;
+        const std::set<int> before = Descriptors();
+        Detach([&] { report.Write(Descriptors() == before ? "same" : "different"); });
+        EXPECT_EQ(Descriptors(), before);
+        EXPECT_EQ(report.ReadToEnd(), "same");
+    });
+}
+
+TEST(DetachedForkTest, AReaderOfTheCallersOutputMeetsItsEndWhenTheCallerEnds)
+{
+    Pipe output;
+    Pipe never;
+    InProcess([&] {
+        ::dup2(output.Writing(), STDOUT_FILENO);
+        output.CloseWriting();
+        output.CloseReading();
+        const pid_t child = Detach([&] { never.ReadToEnd(); });
+        EXPECT_GT(::dprintf(STDOUT_FILENO, "%d", child), 0);
+    });
+    const Bystander child(output.ReadToEnd());
+    EXPECT_EQ(CoreLibProcAlive(child.pid), 1);
+}
+
+TEST(DetachedForkTest, AFailureOfTheFirstForkIsTold)
+{
+    InProcess([] {
+        forkFault = {1, [] { errno = EAGAIN; }};
+        ExpectNotForked(EAGAIN);
+    });
+}
+
+TEST(DetachedForkTest, AFailureOfTheSecondForkIsTold)
+{
+    InProcess([] {
+        forkFault = {2, [] { errno = ENOMEM; }};
+        ExpectNotForked(ENOMEM);
+    });
+}
+
+TEST(DetachedForkTest, AProcessBetweenThatIsKilledIsAFailure)
+{
+    InProcess([] {
+        forkFault = {2, [] { ::kill(::getpid(), SIGKILL); }};
+        ExpectNotForked(ECHILD);
+    });
+}
+
+TEST(DetachedForkTest, WithoutDescriptorsNothingIsForked)
+{
+    for (int spare = 0; spare < 2; ++spare) {
+        InProcess([spare] {
+            const std::set<int> before = Descriptors();
+            rlimit limits{};
+            ::getrlimit(RLIMIT_NOFILE, &limits);
+            LeaveDescriptors(spare);
+            errno = 0;
+            EXPECT_EQ(CoreLibProcForkEx(CORELIB_FORK_DETACHED), -1);
+            EXPECT_EQ(errno, EMFILE);
+            ::setrlimit(RLIMIT_NOFILE, &limits);
+            EXPECT_EQ(Descriptors(), before);
+            EXPECT_FALSE(HasChildren());
+        });
+    }
+}
+
+TEST(DetachedForkTest, ManyForksLeaveNothingBehind)
+{
+    InProcess([] {
+        const std::set<int> before = Descriptors();
+        for (int i = 0; i < 300; ++i) Detach([] {});
+        EXPECT_EQ(Descriptors(), before);
+        EXPECT_FALSE(HasChildren());
+    });
+}
+
+TEST(DetachedForkTest, ThreadsForkAtOnce)
+{
+    constexpr int Threads = 4;
+    constexpr int Forks = 10;
+    InProcess([] {
+        Pipe report;
+        std::array<std::set<pid_t>, Threads> told;
+        std::vector<std::thread> threads;
+        threads.reserve(Threads);
+        for (std::set<pid_t>& children : told) {
+            threads.emplace_back([&] {
+                for (int i = 0; i < Forks; ++i) {
+                    children.insert(
+                        Detach([&] { ::dprintf(report.Writing(), "%d\n", ::getpid()); }));
+                }
+            });
+        }
+        for (std::thread& thread : threads) thread.join();
+        std::set<pid_t> all;
+        for (std::set<pid_t>& children : told) all.merge(children);
+        std::set<pid_t> seen;
+        std::istringstream lines(report.ReadToEnd());
+        for (pid_t pid = 0; lines >> pid;) seen.insert(pid);
+        EXPECT_EQ(seen.size(), static_cast<std::size_t>(Threads * Forks));
+        EXPECT_EQ(seen, all);
+        EXPECT_FALSE(HasChildren());
+    });
+}
+
+TEST(AliveTest, ThisProcessLives)
+{
+    EXPECT_EQ(CoreLibProcAlive(::getpid()), 1);
+}
+
+TEST(AliveTest, NumbersThatAreNoProcessDoNotLive)
+{
+    for (const pid_t pid : {0, -1, -2, INT_MIN, INT_MAX}) EXPECT_EQ(CoreLibProcAlive(pid), 0);
+    EXPECT_EQ(CoreLibProcAlive(-::getpgrp()), 0);  // a group of processes is none, either
+}
+
+TEST(AliveTest, AProcessOfAnotherUserLives)
+{
+    InProcess([] {
+        BecomeOrdinary();
+        EXPECT_EQ(CoreLibProcAlive(1), 1);
+    });
+}
+
+TEST(AliveTest, AStoppedProcessLives)
+{
+    ChildProcess process([](ChildProcess::Link& link) { link.Await(); });
+    process.Kill(SIGSTOP);
+    siginfo_t info{};
+    const auto id = static_cast<id_t>(process.Pid());
+    EXPECT_EQ(::waitid(P_PID, id, &info, WSTOPPED), 0);
+    EXPECT_EQ(CoreLibProcAlive(process.Pid()), 1);
+    process.Kill(SIGCONT);
+    process.Tell();
+    EXPECT_EQ(process.Join(), 0);
+}
+
+TEST(AliveTest, NeitherAZombieNorAnEndedProcessLivesWhateverItsName)
+{
+    for (const char* name : {"name", ") Z (", ") S (", ")", "", "a b\n1 2", "0123456789abcdef"}) {
+        SCOPED_TRACE(name);
+        ChildProcess process([name](ChildProcess::Link& link) {
+            ::prctl(PR_SET_NAME, name);
+            link.Tell();
+            link.Await();
+        });
+        EXPECT_TRUE(process.Await());
+        const pid_t pid = process.Pid();
+        EXPECT_EQ(CoreLibProcAlive(pid), 1);
+
+        process.Tell();
+        siginfo_t info{};
+        EXPECT_EQ(::waitid(P_PID, static_cast<id_t>(pid), &info, WEXITED | WNOWAIT), 0);
+        EXPECT_EQ(::kill(pid, 0), 0);
+        EXPECT_EQ(CoreLibProcAlive(pid), 0);
+
+        EXPECT_EQ(process.Join(), 0);
+        EXPECT_EQ(CoreLibProcAlive(pid), 0);
+    }
+}
+
+TEST(AliveTest, TheIdOfAThreadIsNoProcess)
+{
+    pid_t thread = 0;
+    int alive = -1;
+    std::thread([&] {
+        thread = static_cast<pid_t>(::syscall(SYS_gettid));
+        alive = CoreLibProcAlive(thread);
+    }).join();
+    EXPECT_NE(thread, ::getpid());
+    EXPECT_EQ(alive, 0);
+}
+
+// The letter in /proc/PID/stat that says what the process's first thread does.
+char State(pid_t pid)
+{
+    const std::string status = Content("/proc/" + std::to_string(pid) + "/stat");
+    return status[status.rfind(')') + 2];
+}
+
+TEST(AliveTest, AProcessLivesAsLongAsOneOfItsThreads)
+{
+    ChildProcess process([](ChildProcess::Link& link) {
+        std::thread([&link] {
+            while (State(::getpid()) != 'Z') ::sched_yield();
+            link.Tell();
+            link.Await();
+            ::_exit(0);
+        }).detach();
+        ::syscall(SYS_exit, 0);  // of the first thread alone
+    });
+    EXPECT_TRUE(process.Await());
+    EXPECT_EQ(CoreLibProcAlive(process.Pid()), 1);
+    process.Tell();
+    EXPECT_EQ(process.Join(), 0);
+}
+
+}  // namespace
