@@ -1,0 +1,194 @@
+#include <orvadrcore/file.h>
+
+#include <orvacore/orvacore.h>
+#include <sys/stat.h>
+
+#include <algorithm>
+#include <array>
+#include <cstdio>
+#include <sstream>
+
+#include "file_io.h"
+#include "json_helpers.h"
+#include "log.h"
+
+namespace OrvaDRCore {
+
+namespace {
+
+constexpr int MaxDirMode = 0777;
+constexpr std::size_t ChunkSize = 1024;
+
+constexpr mode_t NewFileMode = 0666;  // less the umask
+
+}  // namespace
+
+bool File::Read(const std::string& path, Json::Value& value)
+{
+    const FileDescriptor file(path, O_RDONLY);
+    if (!CoreLibFileExist(path.c_str())) return true;
+    if (!file.IsOpen()) {
+        DR_LOG(Err, "File[%s] is not opened.", path.c_str());
+        return false;
+    }
+    std::string text;
+    ReadAll(file.Get(), text);  // what a failure has cut off does not parse
+    // The lines are joined with nothing between them.
+    text.erase(std::remove(text.begin(), text.end(), '\n'), text.end());
+    return fromString(value, text);
+}
+
+bool File::Read(int fd, Json::Value& value)
+{
+    FILE* stream = ::fdopen(fd, "r");
+    if (stream == nullptr) {
+        DR_LOG(Err, "Failed to open file descriptor [%d]", fd);
+        return false;
+    }
+    std::string text;
+    std::array<char, ChunkSize> chunk{};
+    while (std::fgets(chunk.data(), static_cast<int>(chunk.size()), stream) != nullptr) {
+        text += chunk.data();
+    }
+    (void)std::fclose(stream);
+    return fromString(value, text);
+}
+
+bool File::Write(const std::string& path, const Json::Value& value)
+{
+    if (path.empty()) {
+        DR_LOG(Err, "Empty path to write.");
+        return false;
+    }
+    const std::string text = toString(value);
+    const FileDescriptor file(path, O_WRONLY | O_CREAT | O_TRUNC, NewFileMode);
+    if (!file.IsOpen()) {
+        DR_LOG(Err, "File [%s] is not opened.", path.c_str());
+        return false;
+    }
+    if (!WriteAll(file.Get(), text + "\n")) {
+        DR_LOG(Err, "Failed to write [%s] to [%s].", text.c_str(), path.c_str());
+        return false;
+    }
+    return true;
+}
+
+bool File::Write(int fd, const Json::Value& value)
+{
+    FILE* stream = ::fdopen(fd, "w");
+    if (stream == nullptr) {
+        DR_LOG(Err, "Failed to open file descriptor [%d]", fd);
+        return false;
+    }
+    // Without a buffer it is fprintf itself that meets a full disk, not the close behind it.
+    (void)std::setvbuf(stream, nullptr, _IONBF, 0);
+    const std::string text = toString(value);
+    const bool written = std::fprintf(stream, "%s", text.c_str()) >= 0;
+    if (!written) DR_LOG(Err, "Failed to write [%s] to fd[%d]", text.c_str(), fd);
+    (void)std::fclose(stream);
+    return written;
+}
+
+bool File::CreateDir(const std::string& path, int mode)
+{
+    if (path.empty()) return false;
+    if (CoreLibFileCheckDir(path.c_str()) == 1) return true;
+
+    const auto bits = static_cast<unsigned int>(mode);
+    if (mode > MaxDirMode) {
+        DR_LOG(Err, "Directory mode error: %o", bits);
+        return false;
+    }
+    std::array<char, 4> octal{};
+    if (std::snprintf(octal.data(), octal.size(), "%o", bits) >= static_cast<int>(octal.size())) {
+        DR_LOG(Err, "snprintf error with mode [%o]", bits);
+        return false;
+    }
+    if (CoreLibExec("/bin/mkdir", "-p", path.c_str(), "-m", octal.data()) != 0) {
+        DR_LOG(Err, "Failed to create dir [%s] with mode [%o]", path.c_str(), bits);
+        return false;
+    }
+    return true;
+}
+
+bool File::RemoveDir(const std::string& path)
+{
+    return CoreLibFileCheckDir(path.c_str()) == 0 ||
+           CoreLibExec("/bin/rm", "-rf", path.c_str(), nullptr, nullptr) == 0;
+}
+
+std::string File::GetParentDir(const std::string& path)
+{
+    return path.substr(0, path.rfind('/'));
+}
+
+bool File::IsRegularFile(int fd)
+{
+    struct stat status {};
+    return fd >= 0 && ::fstat(fd, &status) == 0 && S_ISREG(status.st_mode);
+}
+
+template <class K, class V>
+int File::Read(const std::string& path, std::map<K, V>& out)
+{
+    const FileDescriptor file(path, O_RDONLY);
+    if (!CoreLibFileExist(path.c_str())) return 0;
+    if (!file.IsOpen()) {
+        DR_LOG(Warn, "File[%s] is not opened.", path.c_str());
+        return -1;
+    }
+    std::string text;
+    ReadAll(file.Get(), text);  // a failure counts as the end
+
+    out.clear();
+    std::istringstream lines(text);
+    for (std::string line; std::getline(lines, line);) {
+        K key{};
+        V value{};
+        if (!parseLineKeyValue(line, std::string("="), key, value)) {
+            DR_LOG(Notice, "Failed to parse line[%s] from file [%s]", line.c_str(), path.c_str());
+            continue;
+        }
+        out.emplace(key, value);  // the first of two lines with one key counts
+    }
+    return static_cast<int>(out.size());
+}
+
+template <class K, class V>
+bool File::parseLineKeyValue(const std::string& line, const std::string& separator, K& key,
+                             V& value)
+{
+    if (line.empty() || separator.empty()) {
+        DR_LOG(Warn, "Bad Parameter.");
+        return false;
+    }
+    const std::size_t at = line.find(separator);
+    if (at == std::string::npos) {
+        DR_LOG(Notice, "Cannot find separator[%s] in line[%s]", separator.c_str(), line.c_str());
+        return false;
+    }
+    return toType(line.substr(0, at), key, K{}) &&
+           toType(line.substr(at + separator.size()), value, V{});
+}
+
+template <class In, class Out>
+bool File::toType(const In& in, Out& out, const Out& fallback)
+{
+    std::stringstream stream;
+    stream << in;
+    if (stream.str().empty()) {
+        out = fallback;
+        return false;
+    }
+    stream >> out;  // its success is not looked at, on purpose
+    return true;
+}
+
+template int File::Read(const std::string&, std::map<std::string, std::string>&);
+template int File::Read(const std::string&, std::map<std::string, int>&);
+template int File::Read(const std::string&, std::map<std::string, double>&);
+template bool File::toType(const std::string&, std::string&, const std::string&);
+template bool File::toType(const std::string&, int&, const int&);
+template bool File::toType(const std::string&, double&, const double&);
+
+}  // namespace OrvaDRCore
