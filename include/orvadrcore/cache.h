@@ -1,0 +1,187 @@
+/// \file
+/// A JSON document on disk that many processes share and exactly one at a time refreshes.
+///
+/// The smallest cache says three things:
+/// \code
+///     class NodeStatus : public Cache {
+///       public:
+///         NodeStatus() : Cache("/var/cache/dr", "status", 30, false, 2) {}
+///         Json::Value GetInfo() const override { return "node status"; }
+///         bool GetUpdatedData(Json::Value& data) const override { return AskAllNodes(data); }
+///         bool IsValidData(const Json::Value& data) const override { return data.isObject(); }
+///     };
+///
+///     const Json::Value status = NodeStatus().Read();
+/// \endcode
+///
+/// **Fresh or stale.** Data is fresh when the file is not older than the time-out, IsValidData()
+/// accepts it and IsNeedUpdate() does not object. Its age is that of the file, in whole seconds;
+/// times written inside do not count.
+///
+/// **Who waits.** Read() gives fresh data at once. Of stale data it makes one process the updater,
+/// marked by a pid file. When IsUpdatedDataRequired() says so, the refresh runs in the calling
+/// process, and a process that meets another updater waits for it. By default that is so when the
+/// constructor was told, and whenever what is cached is not valid, as before the first refresh.
+/// Otherwise Read() starts a child that refreshes in the background, or finds one at work, and
+/// gives the old data at once.
+///
+/// **What runs in the child.** GetUpdatedData(), GetInfo(), IsValidData() and what they call may
+/// run in a forked child, which ends without exit handlers or destructors. They must not use what
+/// the caller had open: not its SqliteDB (SQLite connections do not survive a fork), not its
+/// sockets, not its locks. Open your own. What they compute reaches others through the cache file
+/// alone. An exception out of them ends the child; in a caller that waits it goes on to the caller,
+/// behind the removal of the pid file.
+///
+/// An object is used by one thread at a time and holds no file and no lock between calls. Nothing
+/// throws by itself. Log lines are at DEBUG unless said otherwise and name the file `cache.cpp`.
+///
+/// \warning The lock of a cache is a FileLock. Where it cannot be opened at all (no rights, no
+///          descriptors left, a name too long) every process seems to find another one updating: a
+///          caller that has to wait then waits without end. With the modes of lock files this means
+///          that caches are for processes running as root.
+/// \warning Whether data is stale is not asked again once a process has become the updater: a late
+///          caller may refresh once more what has just been refreshed. What holds is that no two
+///          refresh at the same time.
+#ifndef ORVADRCORE_CACHE_H
+#define ORVADRCORE_CACHE_H
+
+#include <ctime>
+#include <string>
+
+#include <json/value.h>
+
+#include <orvadrcore/export.h>
+
+namespace OrvaDRCore {
+
+/// A cache of one JSON value; subclasses say what it holds. The order of the virtual operations is
+/// part of the binary interface.
+class ORVADRCORE_API Cache {
+  public:
+    /// Nothing is read yet. The cache file is `dir` + "/" + `file` + ".cached"; beside it lies,
+    /// while a refresh runs, the same with ".pid". \param dir              its directory, made with
+    /// mode 0755 when missing \param file             its name, without ".cached" \param
+    /// timeoutSeconds   data whose file is older is stale \param updatedRequired  callers always
+    /// need fresh data: refresh in the caller, and wait \param retries          how often producing
+    /// and writing are tried again: this many times plus
+    ///                         one; not at all when negative
+    /// \note Logs WARN "Invalid dir[%s] and file[%s] to cache" when one of them is empty and ERR
+    ///       "Failed to create [%s]" when the directory cannot be made (function `GetCachedPath`).
+    ///       The cache file is then /tmp/default_dr_cache, which all such caches share.
+    Cache(const std::string& dir, const std::string& file, long timeoutSeconds,
+          bool updatedRequired, int retries);
+
+    virtual ~Cache();
+
+    // -------------------------------------------------------------- what a subclass has to say
+
+    /// A value that names this cache and its parameters: stored in the file, printed in log lines.
+    virtual Json::Value GetInfo() const = 0;
+
+    /// What GetCachedData() gives when nothing can be loaded; null by default.
+    virtual Json::Value GetDefaultValue() const;
+
+    /// Produces fresh data; may run in a forked child.
+    /// \param[out] data  the data; null before the call
+    /// \return false when there is none
+    virtual bool GetUpdatedData(Json::Value& data) const = 0;
+
+    /// Whether data may be cached, and given out without a refresh.
+    virtual bool IsValidData(const Json::Value& data) const = 0;
+
+    /// Whether data that is neither old nor invalid is to be refreshed all the same, for instance
+    /// because it says that it is incomplete; false by default.
+    virtual bool IsNeedUpdate(const Json::Value& data) const;
+
+    /// Whether callers have to wait for fresh data. By default so when the constructor was told,
+    /// and otherwise when the cached data is not valid.
+    virtual bool IsUpdatedDataRequired() const;
+
+    // ------------------------------------------------------------------------------------- reading
+
+    /// The data, refreshed when it is stale: see the head of this file.
+    /// \return fresh data; old data while another process refreshes, or when the refresh failed,
+    ///         with "Failed to update cache [%s], use old cache data."; the default value when
+    ///         there is none
+    /// \note Where callers wait, there is no limit to it: the wait ends when the file is fresh or
+    /// no
+    ///       updater lives any more.
+    Json::Value Read() const;
+
+    /// The data as it is, from memory while the file's modification time is that of the last load
+    /// or write, otherwise from the file. \return the data; the default value when the file cannot
+    /// be loaded, with
+    ///         "Failed to load cache [%s], use default cache data" behind the line of Load()
+    Json::Value GetCachedData() const;
+
+    /// Reads the file into memory. A document without "cached_data" counts as loaded and leaves the
+    /// data in memory as it was.
+    /// \return false with "no data is cached in [%s]" (no file) or "Failed to read data from cache
+    ///         [%s]" (no JSON document); the data in memory is as it was then
+    bool Load() const;
+
+    /// Whether the file is missing or older than the time-out.
+    bool IsTimeout() const;
+
+    /// The longest refresh so far in seconds, as the file says; 0 when it does not.
+    int GetMaxUpdateTime() const;
+
+    /// Deletes the cache file. Data in memory and the pid file stay.
+    /// \return 0, or -1 with errno set
+    int Remove();
+
+    // ---------------------------------------------------------------------------------- refreshing
+
+    /// Gets the data refreshed, whether it is stale or not: here, in a child, or by waiting for
+    /// another process, as IsUpdatedDataRequired() says.
+    /// \return true after a refresh here, when a child was started, when another process is at
+    /// work,
+    ///         and after waiting for one, whatever came of it. False when the refresh here failed,
+    ///         and with WARN "Failed to fork(). errno=[%d/%m]"
+    /// \note Lines: "start to block wait cache [%s] ", "finish to block wait cache [%s] ",
+    ///       "Failed to lock [%s]", "there is other process to update cache [%s]",
+    ///       "Failed to set cache [%s] updating", "---> Start to update cache [%s]",
+    ///       "<--- Finish to update cache [%s]",
+    ///       "Failed to unset updating cache [%s] since different pid[%d]"
+    bool Update() const;
+
+    /// Produces data, with retries after pauses of 500 to 1000 milliseconds, and writes it. Takes
+    /// no lock and marks nothing. \return false with "Failed to get updated cache [%s] and reach
+    /// the retry limit[%d]", or as
+    ///         UpdateWithData()
+    bool DoUpdate() const;
+
+    /// Writes data, with retries after pauses of 300 to 1000 milliseconds; the file is replaced
+    /// whole. Takes no lock and marks nothing.
+    /// \param data    the data
+    /// \param begin   when producing began, in seconds since the epoch; below 1 if not known
+    /// \param finish  when it ended, likewise
+    /// \return false with "[%s] is not valid to update for cache [%s]" or
+    ///         "Failed to write cache to file [%s] and reach retry limit[%d]"; the file is as it
+    ///         was
+    bool UpdateWithData(const Json::Value& data, long begin, long finish) const;
+
+    /// As above, times not known.
+    bool UpdateWithData(const Json::Value& data) const;
+
+  private:
+    std::string PidPath() const;
+    std::string LockName() const;
+    bool IsUpdating() const;
+    bool SetUpdating() const;
+    void UnsetUpdating() const;
+    void WaitForUpdater() const;
+    bool Refresh() const;
+    [[noreturn]] void RefreshInChild() const;
+
+    std::string cachedPath;
+    long timeout;
+    bool updatedDataRequired;
+    int retryLimit;
+    mutable Json::Value cachedData;
+    mutable std::time_t loadedModifyTime = -1;
+};
+
+}  // namespace OrvaDRCore
+
+#endif

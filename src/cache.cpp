@@ -1,0 +1,330 @@
+#include <orvadrcore/cache.h>
+
+#include <orvacore/orvacore.h>
+#include <sys/file.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <limits>
+
+#include <orvadrcore/file.h>
+#include <orvadrcore/file_lock.h>
+#include <orvadrcore/utils.h>
+
+#include "json_helpers.h"
+#include "log.h"
+#include "retry.h"
+
+namespace OrvaDRCore {
+
+namespace {
+
+constexpr const char* DefaultPath = "/tmp/default_dr_cache";
+constexpr int CacheDirMode = 0755;
+
+constexpr int ProbeLock = LOCK_SH | LOCK_NB;    // to read the pid file
+constexpr int MarkingLock = LOCK_EX | LOCK_NB;  // to check and write it
+constexpr unsigned int LockRetries = 5;         // a second apart
+
+constexpr int DetachedFork = 0x40;
+
+struct PauseMSec {
+    unsigned int min;
+    unsigned int max;
+    void operator()() const { RandomSleepInMSec(min, max); }
+};
+constexpr PauseMSec WaitPause{300, 1000};
+constexpr PauseMSec ProducePause{500, 1000};
+constexpr PauseMSec WritePause{300, 1000};
+
+std::string GetCachedPath(const std::string& dir, const std::string& file)
+{
+    if (dir.empty() || file.empty()) {
+        DR_LOG(Warn, "Invalid dir[%s] and file[%s] to cache", dir.c_str(), file.c_str());
+        return DefaultPath;
+    }
+    if (!File::CreateDir(dir, CacheDirMode)) {
+        DR_LOG(Err, "Failed to create [%s]", dir.c_str());
+        return DefaultPath;
+    }
+    return dir + "/" + file + ".cached";
+}
+
+// In whole seconds since the epoch; -1 for what is not there.
+std::time_t GetModifyTime(const std::string& path)
+{
+    struct stat64 status {};
+    return ::stat64(path.c_str(), &status) == 0 ? status.st_mtime : -1;
+}
+
+bool IsLiving(pid_t pid)
+{
+    return pid > 0 && CoreLibProcAlive(pid) == 1;
+}
+
+// The limit of both retry loops: one try more than it says, and a single one when it is negative.
+std::uint64_t RetriesOf(int limit)
+{
+    return limit < 0 ? 0 : static_cast<std::uint64_t>(limit) + 1;
+}
+
+int ToWholeSeconds(double seconds)
+{
+    constexpr double Largest = std::numeric_limits<int>::max();
+    return static_cast<int>(std::clamp(seconds, -Largest, Largest));
+}
+
+}  // namespace
+
+Cache::Cache(const std::string& dir, const std::string& file, long timeoutSeconds,
+             bool updatedRequired, int retries)
+    : cachedPath(GetCachedPath(dir, file)),
+      timeout(timeoutSeconds),
+      updatedDataRequired(updatedRequired),
+      retryLimit(retries)
+{
+}
+
+Cache::~Cache() = default;
+
+Json::Value Cache::GetDefaultValue() const
+{
+    return {};
+}
+
+bool Cache::IsNeedUpdate(const Json::Value& /*data*/) const
+{
+    return false;
+}
+
+bool Cache::IsUpdatedDataRequired() const
+{
+    return updatedDataRequired || !IsValidData(GetCachedData());
+}
+
+Json::Value Cache::Read() const
+{
+    Json::Value data = GetCachedData();
+    if (!IsTimeout() && IsValidData(data) && !IsNeedUpdate(data)) return data;
+    if (Update()) return GetCachedData();
+    DR_LOG(Debug, "Failed to update cache [%s], use old cache data.", toString(GetInfo()).c_str());
+    return data;
+}
+
+Json::Value Cache::GetCachedData() const
+{
+    const std::time_t modifyTime = GetModifyTime(cachedPath);
+    if (modifyTime != -1 && modifyTime == loadedModifyTime) return cachedData;
+    if (!Load()) {
+        cachedData = GetDefaultValue();
+        DR_LOG(Debug, "Failed to load cache [%s], use default cache data", cachedPath.c_str());
+    }
+    return cachedData;
+}
+
+bool Cache::Load() const
+{
+    if (!CoreLibFileExist(cachedPath.c_str())) {
+        DR_LOG(Debug, "no data is cached in [%s]", cachedPath.c_str());
+        return false;
+    }
+    // Taken before reading: a write in between is then seen as one by the next read.
+    const std::time_t modifyTime = GetModifyTime(cachedPath);
+    Json::Value document;
+    if (!fromFile(document, cachedPath)) {
+        DR_LOG(Debug, "Failed to read data from cache [%s]", cachedPath.c_str());
+        return false;
+    }
+    // Without "cached_data" the file counts as loaded and the old data stays, on purpose.
+    if (FindMember(document, "cached_data") != nullptr) cachedData.swap(document["cached_data"]);
+    loadedModifyTime = modifyTime;
+    return true;
+}
+
+bool Cache::IsTimeout() const
+{
+    const std::time_t modifyTime = GetModifyTime(cachedPath);
+    const std::time_t now = std::time(nullptr);
+    return now == -1 || std::difftime(now, modifyTime) > static_cast<double>(timeout);
+}
+
+int Cache::GetMaxUpdateTime() const
+{
+    Json::Value document;
+    if (!fromFile(document, cachedPath)) return 0;
+    const Json::Value* longest = FindMember(document, "max_updated_time");
+    // A real number counts as absent, on purpose, although to jsoncpp 3.0 is an int.
+    const bool known = longest != nullptr && longest->isInt() && longest->type() != Json::realValue;
+    return known ? longest->asInt() : 0;
+}
+
+int Cache::Remove()
+{
+    return ::unlink(cachedPath.c_str());
+}
+
+bool Cache::Update() const
+{
+    const bool block = IsUpdatedDataRequired();
+    if (IsUpdating()) {
+        if (block) WaitForUpdater();
+        return true;
+    }
+    if (block) return Refresh();
+
+    const pid_t child = CoreLibProcForkEx(DetachedFork);
+    if (child < 0) {
+        DR_LOG(Warn, "Failed to fork(). errno=[%d/%m]", errno);
+        return false;
+    }
+    if (child == 0) RefreshInChild();
+    return true;
+}
+
+bool Cache::DoUpdate() const
+{
+    const long begin = std::time(nullptr);
+    Json::Value data;
+    const auto produce = [&] {
+        data = Json::Value();
+        return GetUpdatedData(data);
+    };
+    if (!Retry(RetriesOf(retryLimit), produce, ProducePause).succeeded) {
+        DR_LOG(Debug, "Failed to get updated cache [%s] and reach the retry limit[%d]",
+               toString(GetInfo()).c_str(), retryLimit);
+        return false;
+    }
+    return UpdateWithData(data, begin, std::time(nullptr));
+}
+
+bool Cache::UpdateWithData(const Json::Value& data, long begin, long finish) const
+{
+    if (!IsValidData(data)) {
+        DR_LOG(Debug, "[%s] is not valid to update for cache [%s]", toString(data).c_str(),
+               toString(GetInfo()).c_str());
+        return false;
+    }
+    if (begin < 1 || finish < 1) begin = finish = 0;
+    const double took = std::difftime(finish, begin);
+    Json::Value document(Json::objectValue);
+    document["timeout"] = Json::Int64{timeout};
+    document["info"] = GetInfo();
+    document["cached_data"] = data;
+    document["begin_time_to_update"] = Json::Int64{begin};
+    document["finish_time_to_update"] = Json::Int64{finish};
+    document["updated_time"] = took;
+    document["max_updated_time"] = std::max(GetMaxUpdateTime(), ToWholeSeconds(took));
+
+    const auto write = [&] { return toFile(document, cachedPath); };
+    if (!Retry(RetriesOf(retryLimit), write, WritePause).succeeded) {
+        DR_LOG(Debug, "Failed to write cache to file [%s] and reach retry limit[%d]",
+               cachedPath.c_str(), retryLimit);
+        return false;
+    }
+    cachedData.swap(document["cached_data"]);
+    loadedModifyTime = GetModifyTime(cachedPath);
+    return true;
+}
+
+bool Cache::UpdateWithData(const Json::Value& data) const
+{
+    return UpdateWithData(data, 0, 0);
+}
+
+std::string Cache::PidPath() const
+{
+    return cachedPath + ".pid";
+}
+
+std::string Cache::LockName() const
+{
+    return cachedPath + ".lock";
+}
+
+// Whether a living process is marked as updater. The lock is free again when this returns.
+bool Cache::IsUpdating() const
+{
+    FileLock lock(LockName());
+    return !lock.lock(ProbeLock, LockRetries) || IsLiving(CoreLibReadPidFile(PidPath().c_str()));
+}
+
+// Marks this process as the updater. The refresh itself runs without a lock: the pid file is
+// enough.
+bool Cache::SetUpdating() const
+{
+    const std::string pidPath = PidPath();
+    FileLock lock(LockName());
+    if (!lock.lock(MarkingLock, LockRetries)) {
+        DR_LOG(Debug, "Failed to lock [%s]", FileLock::getLockFilePath(LockName()).c_str());
+        return false;
+    }
+    if (IsLiving(CoreLibReadPidFile(pidPath.c_str()))) {
+        DR_LOG(Debug, "there is other process to update cache [%s]", cachedPath.c_str());
+        return false;
+    }
+    if (CoreLibProcPidFileCreate(pidPath.c_str()) != 0) {
+        DR_LOG(Debug, "Failed to set cache [%s] updating", cachedPath.c_str());
+        return false;
+    }
+    DR_LOG(Debug, "---> Start to update cache [%s]", cachedPath.c_str());
+    return true;
+}
+
+// Removes the mark, unless it is by now that of another living process.
+void Cache::UnsetUpdating() const
+{
+    const std::string pidPath = PidPath();
+    FileLock lock(LockName());
+    if (!lock.lock(ProbeLock, LockRetries)) return;  // the pid file stays, on purpose
+    if (IsUpdating()) {
+        const pid_t pid = CoreLibReadPidFile(pidPath.c_str());
+        if (pid != ::getpid()) {
+            DR_LOG(Debug, "Failed to unset updating cache [%s] since different pid[%d]",
+                   pidPath.c_str(), pid);
+            return;
+        }
+    }
+    DR_LOG(Debug, "<--- Finish to update cache [%s]", cachedPath.c_str());
+    ::unlink(pidPath.c_str());
+}
+
+// No lock is held during the pauses: it would keep others from marking.
+void Cache::WaitForUpdater() const
+{
+    DR_LOG_AS("Update", Debug, "start to block wait cache [%s] ", cachedPath.c_str());
+    do {
+        WaitPause();
+    } while (IsUpdating() && IsTimeout());
+    DR_LOG_AS("Update", Debug, "finish to block wait cache [%s] ", cachedPath.c_str());
+}
+
+// The refresh of a caller that waits, and of the child.
+bool Cache::Refresh() const
+{
+    if (IsUpdating() || !SetUpdating()) return false;
+    bool updated = false;
+    try {
+        updated = DoUpdate();
+    } catch (...) {
+        // A subclass's. The mark of a living process would make all others wait.
+        UnsetUpdating();
+        throw;
+    }
+    UnsetUpdating();
+    return updated;
+}
+
+// Nothing of the caller's code runs behind this: no unwinding, no destructors, no exit handlers.
+void Cache::RefreshInChild() const
+{
+    try {
+        Refresh();
+    } catch (...) {
+        // A subclass's; there is nobody left to tell.
+    }
+    ::_exit(0);
+}
+
+}  // namespace OrvaDRCore
