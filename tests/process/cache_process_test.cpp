@@ -1,0 +1,675 @@
+// Caches that many processes read at once.
+#include <gmock/gmock.h>
+#include <malloc.h>
+#include <poll.h>
+#include <signal.h>
+#include <sys/file.h>
+#include <sys/prctl.h>
+#include <sys/resource.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <atomic>
+#include <chrono>
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <functional>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include <orvadrcore/file_lock.h>
+
+#include "support/await.h"
+#include "support/child_process.h"
+#include "support/crowd.h"
+#include "support/pauses.h"
+#include "support/process_test.h"
+#include "support/rights.h"
+#include "support/scale.h"
+#include "support/shared_memory.h"
+
+namespace {
+
+using OrvaDRCore::FileLock;
+using ::testing::AnyOf;
+using ::testing::Each;
+using ::testing::ElementsAre;
+
+constexpr int Old = 1;
+constexpr int New = 2;
+
+Producer TakesTwoSeconds(const Producer& produce)
+{
+    return [produce](Json::Value& data) {
+        std::this_thread::sleep_for(std::chrono::seconds(2));
+        return produce(data);
+    };
+}
+
+// Sleeps as long as the library does, but calls `action` before each of its pauses.
+class NotedPauses {
+  public:
+    explicit NotedPauses(const std::function<void()>& action)
+    {
+        pauses.OnPause([this, action](std::size_t /*count*/) {
+            action();
+            std::this_thread::sleep_for(std::chrono::microseconds(pauses.Taken().back()));
+        });
+    }
+
+  private:
+    Pauses pauses;
+};
+
+// ------------------------------------------------------------------------------ many at once
+
+// A number of processes, forked while this object lives, that are on their way to somewhere. One
+// arrives when it says so or ends; what it forks is on its way, too.
+class Travellers {
+  public:
+    Travellers()
+    {
+        if (::pipe2(ends.data(), O_CLOEXEC) < 0) std::abort();
+    }
+    Travellers(const Travellers&) = delete;
+    Travellers& operator=(const Travellers&) = delete;
+    ~Travellers()
+    {
+        Arrive();
+        ::close(ends[0]);
+    }
+
+    void Arrive()
+    {
+        if (ends[1] >= 0) ::close(ends[1]);
+        ends[1] = -1;
+    }
+
+    // Waits for all others. False when one does not arrive before a deadline.
+    bool AwaitOthers()
+    {
+        constexpr int DeadlineMSec = 60'000;
+        Arrive();
+        pollfd waiting{ends[0], POLLIN, 0};
+        return ::poll(&waiting, 1, DeadlineMSec) > 0;
+    }
+
+  private:
+    std::array<int, 2> ends{};  // of a pipe; whoever travels holds the writing end
+};
+
+class ManyReadersTest : public ProcessTest {
+  protected:
+    static constexpr int Readers = 32;
+
+    // What producing does besides; false when it fails.
+    using Action = std::function<bool(Travellers&)>;
+
+    // One round: all readers read at the same moment, each with a mode of its own. A reader has
+    // arrived when it has its answer or waits for it.
+    void ReadAtOnce(int number, const std::function<Mode(int)>& modeOf,
+                    const Action& whileProducing);
+
+    // Counts of the last round.
+    int RoundProductions() const { return Productions() - productionsBefore; }
+    std::vector<int> NumbersOfWaiters(bool waited) const;
+
+  private:
+    struct Reader {
+        std::atomic<int> number;  // of the document that it got
+        std::atomic<bool> waited;
+    };
+    struct Round {
+        std::array<Reader, Readers> readers;
+        std::atomic<int> producing;
+        std::atomic<int> overlaps;
+    };
+
+    void ReadInRound(Mode mode, Reader& reader, const Producer& produce, Travellers& travellers);
+
+    SharedMemory<Round> round;
+    int productionsBefore = 0;
+};
+
+void ManyReadersTest::ReadInRound(Mode mode, Reader& reader, const Producer& produce,
+                                  Travellers& travellers)
+{
+    const NotedPauses pauses([&] {
+        reader.waited = true;
+        travellers.Arrive();
+    });
+    reader.number = NumberOf(MakeCache(mode, produce).Read());
+}
+
+void ManyReadersTest::ReadAtOnce(int number, const std::function<Mode(int)>& modeOf,
+                                 const Action& whileProducing)
+{
+    productionsBefore = Productions();
+    Travellers travellers;
+    const auto produce = [&](Json::Value& data) {
+        if (round->producing++ != 0) ++round->overlaps;
+        const bool succeeded = whileProducing(travellers);
+        --round->producing;
+        return succeeded && Gives(number)(data);
+    };
+
+    for (Reader& reader : round->readers) {
+        reader.number = NoDocument;
+        reader.waited = false;
+    }
+    const Crowd crowd(Readers, [&](int i) {
+        ReadInRound(modeOf(i), round->readers.at(static_cast<std::size_t>(i)), produce, travellers);
+    });
+    travellers.Arrive();
+    ASSERT_TRUE(crowd.Start());
+    EXPECT_TRUE(crowd.Join());
+    AwaitDescendants();
+
+    EXPECT_EQ(round->overlaps, 0);
+    EXPECT_EQ(NumberInFile(), number);
+    EXPECT_THAT(Files(), ElementsAre("x.cached"));
+}
+
+std::vector<int> ManyReadersTest::NumbersOfWaiters(bool waited) const
+{
+    std::vector<int> numbers;
+    for (const Reader& reader : round->readers) {
+        if (reader.waited == waited) numbers.push_back(reader.number);
+    }
+    return numbers;
+}
+
+TEST_F(ManyReadersTest, InTheBackgroundOneProducesAndAllGetTheOldDocument)
+{
+    if (!HasLocks()) return;
+    const int rounds = Scaled(3, 50);
+    for (int i = 1; i <= rounds && !HasFailure(); ++i) {
+        WriteStale(i);
+        ReadAtOnce(
+            i + 1, [](int) { return Mode::Background; },
+            [](Travellers& travellers) { return travellers.AwaitOthers(); });
+        EXPECT_EQ(RoundProductions(), 1);
+        EXPECT_THAT(NumbersOfWaiters(false), Each(i));
+        EXPECT_THAT(NumbersOfWaiters(true), ElementsAre());
+    }
+    ReportCount("rounds", rounds);
+}
+
+TEST_F(ManyReadersTest, OneProducesAndAllWhoWaitGetTheNewDocument)
+{
+    if (!HasLocks()) return;
+    const int rounds = Scaled(3, 50);
+    for (int i = 1; i <= rounds && !HasFailure(); ++i) {
+        WriteStale(i);
+        ReadAtOnce(
+            i + 1, [](int) { return Mode::Blocking; },
+            [](Travellers& travellers) { return travellers.AwaitOthers(); });
+        EXPECT_EQ(RoundProductions(), 1);
+        EXPECT_THAT(NumbersOfWaiters(true), Each(i + 1));
+        // The one that produced, and those that found it in their way when they wanted to begin.
+        EXPECT_THAT(NumbersOfWaiters(false), Each(AnyOf(i, i + 1)));
+    }
+    ReportCount("rounds", rounds);
+}
+
+TEST_F(ManyReadersTest, LateComersMayProduceAgainButNeverTwoAtATime)
+{
+    if (!HasLocks()) return;
+    const int rounds = Scaled(1, 50);
+    int all = 0;
+    for (int i = 1; i <= rounds && !HasFailure(); ++i) {
+        WriteStale(i);
+        ReadAtOnce(
+            i + 1, [](int reader) { return reader % 2 == 0 ? Mode::Background : Mode::Blocking; },
+            [](Travellers& /*travellers*/) {
+                std::this_thread::sleep_for(std::chrono::milliseconds(20));
+                return true;
+            });
+        EXPECT_GE(RoundProductions(), 1);
+        all += RoundProductions();
+        EXPECT_THAT(NumbersOfWaiters(true), Each(i + 1));
+        EXPECT_THAT(NumbersOfWaiters(false), Each(AnyOf(i, i + 1)));
+    }
+    ReportCount("rounds", rounds);
+    ReportCount("productions", all);
+}
+
+// ------------------------------------------------------------------------------ readers and
+// updaters
+
+class CacheProcessTest : public ProcessTest {
+  protected:
+    // An updater at work, which goes on when it is told to.
+    ChildProcess StartUpdater()
+    {
+        return ChildProcess([this](ChildProcess::Link& link) {
+            const auto produce = [&link](Json::Value& data) {
+                link.Tell();
+                return link.Await() && Gives(New)(data);
+            };
+            MakeCache(Mode::Blocking, produce).Read();
+        });
+    }
+
+    // A process that does something with a cache and tells when it has begun to wait for another
+    // updater.
+    ChildProcess StartWaiter(const std::function<void(const TestCache&)>& action)
+    {
+        return ChildProcess([this, action](ChildProcess::Link& link) {
+            const NotedPauses pauses([&link] { link.Tell(); });
+            action(MakeCache(Mode::Blocking, Gives(New)));
+        });
+    }
+};
+
+TEST_F(CacheProcessTest, ABackgroundReaderHasItsAnswerAtOnce)
+{
+    if (!HasLocks()) return;
+    const std::vector<std::string> names{"a", "b", "c", "d", "e"};
+    std::vector<std::chrono::milliseconds> firstTook;
+    std::vector<std::chrono::milliseconds> secondTook;
+    for (const std::string& name : names) {
+        WriteStale(Old, name);
+        const int before = Productions();
+        const Reading first = ReadElsewhere(Mode::Background, TakesTwoSeconds(Gives(New)), name);
+        ASSERT_TRUE(AwaitUntil([&] { return Productions() == before + 1; }));
+        const Reading second = ReadElsewhere(Mode::Background, Gives(New), name);
+        EXPECT_EQ(first.number, Old);
+        EXPECT_TRUE(first.startedProcesses);
+        EXPECT_EQ(second.number, Old);
+        EXPECT_FALSE(second.startedProcesses);
+        firstTook.push_back(first.took);
+        secondTook.push_back(second.took);
+    }
+    AwaitDescendants();
+    for (const std::string& name : names) EXPECT_EQ(NumberInFile(name), New);
+    EXPECT_EQ(Productions(), static_cast<int>(names.size()));
+
+    // A busy machine may hold up one or the other of them.
+    for (auto* took : {&firstTook, &secondTook}) {
+        std::nth_element(took->begin(), took->begin() + 2, took->end());
+        EXPECT_LT(took->at(2).count(), 100);
+    }
+}
+
+TEST_F(CacheProcessTest, AWaitingReaderGetsWhatTheOtherUpdaterWrites)
+{
+    if (!HasLocks()) return;
+    WriteStale(Old);
+    ChildProcess updater = StartUpdater();
+    ASSERT_TRUE(updater.Await());
+    const SharedMemory<std::atomic<int>> number;
+    ChildProcess waiter =
+        StartWaiter([&](const TestCache& cache) { *number = NumberOf(cache.Read()); });
+    ASSERT_TRUE(waiter.Await());
+    ASSERT_TRUE(waiter.Await()) << "the wait ended although the updater has not written";
+    EXPECT_EQ(NumberInFile(), Old);
+
+    updater.Tell();
+    EXPECT_EQ(updater.Join(), 0);
+    EXPECT_EQ(waiter.Join(), 0);
+    EXPECT_EQ(*number, New);
+    EXPECT_EQ(Productions(), 1);
+}
+
+TEST_F(CacheProcessTest, AReaderWithoutADocumentWaitsForTheOtherUpdater)
+{
+    if (!HasLocks()) return;
+    ChildProcess updater = StartUpdater();
+    ASSERT_TRUE(updater.Await());
+    const SharedMemory<std::atomic<int>> number;
+    ChildProcess waiter([&](ChildProcess::Link& link) {
+        const NotedPauses pauses([&link] { link.Tell(); });
+        *number = NumberOf(MakeCache(Mode::Background, Gives(New)).Read());
+    });
+    ASSERT_TRUE(waiter.Await());
+
+    updater.Tell();
+    EXPECT_EQ(updater.Join(), 0);
+    EXPECT_EQ(waiter.Join(), 0);
+    EXPECT_EQ(*number, New);
+    EXPECT_EQ(Productions(), 1);
+}
+
+TEST_F(CacheProcessTest, AWaitingReaderGetsWhatIsThereWhenTheUpdaterIsKilled)
+{
+    if (!HasLocks()) return;
+    WriteStale(Old);
+    ChildProcess updater = StartUpdater();
+    ASSERT_TRUE(updater.Await());
+    const SharedMemory<std::atomic<int>> number;
+    const SharedMemory<std::atomic<bool>> updated;
+    ChildProcess reader =
+        StartWaiter([&](const TestCache& cache) { *number = NumberOf(cache.Read()); });
+    ChildProcess other = StartWaiter([&](const TestCache& cache) { *updated = cache.Update(); });
+    ASSERT_TRUE(reader.Await());
+    ASSERT_TRUE(other.Await());
+
+    updater.Kill(SIGKILL);
+    EXPECT_EQ(reader.Join(), 0);
+    EXPECT_EQ(other.Join(), 0);
+    EXPECT_EQ(*number, Old);
+    EXPECT_TRUE(*updated) << "on purpose, although nothing was written";
+    EXPECT_EQ(Productions(), 1) << "whoever has waited does not take over";
+}
+
+TEST_F(CacheProcessTest, ReadersNeverSeeAPartOfADocument)
+{
+    constexpr int Readers = 4;
+    if (!HasLocks()) return;
+    const int rewrites = Scaled(300, 2000);
+    const TestCache writer = MakeCache(Mode::Background, nullptr);
+    ASSERT_TRUE(writer.UpdateWithData(DocumentOf(Old)));
+
+    const SharedMemory<std::atomic<bool>> done;
+    const SharedMemory<std::atomic<int>> reads;
+    const SharedMemory<std::atomic<int>> partial;
+    const Crowd crowd(Readers, [&](int) {
+        while (!*done) {
+            // A new object reads the file whatever its time is.
+            const int number = NumberOf(MakeCache(Mode::Background, Gives(New)).Read());
+            if (number == NoDocument) ++*partial;
+            ++*reads;
+        }
+    });
+    ASSERT_TRUE(crowd.Start());
+    // Long documents and short ones, in no order.
+    for (int i = 0; i < rewrites; ++i) EXPECT_TRUE(writer.UpdateWithData(DocumentOf(i * 337)));
+    *done = true;
+    EXPECT_TRUE(crowd.Join());
+
+    EXPECT_GT(*reads, 0);
+    EXPECT_EQ(*partial, 0);
+    EXPECT_EQ(Productions(), 0) << "a reader has found nothing valid";
+    ReportCount("rewrites", rewrites);
+    ReportCount("reads", *reads);
+}
+
+TEST_F(CacheProcessTest, BackgroundRefreshesCostALongLivedProcessNothing)
+{
+    constexpr int WarmUp = 5;
+    constexpr std::size_t SmallChange = 4096;
+    struct State {
+        std::ptrdiff_t descriptors;
+        std::size_t heap;
+    };
+    const auto look = [] {
+        const std::filesystem::directory_iterator descriptors("/proc/self/fd");
+        return State{std::distance(begin(descriptors), end(descriptors)), ::mallinfo2().uordblks};
+    };
+    if (!HasLocks()) return;
+    const int refreshes = Scaled(20, 300);
+    WriteStale(Old);
+
+    const SharedMemory<std::array<State, 2>> states;
+    const SharedMemory<std::atomic<int>> children;
+    ChildProcess process([&](ChildProcess::Link& /*link*/) {
+        ::alarm(600);
+        const TestCache cache = MakeCache(Mode::Background, Gives(Old));
+        for (int i = 0; i < WarmUp + refreshes; ++i) {
+            if (i == WarmUp) states->at(0) = look();
+            MakeStale();
+            cache.Read();
+            if (!AwaitUntil([&] { return !cache.IsTimeout(); })) ::_exit(2);
+            if (!AwaitUntil([&] { return ::access(PidFile().c_str(), F_OK) != 0; })) ::_exit(3);
+            FileLock lock(LockName());
+            if (!AwaitUntil([&] { return lock.tryLock(LOCK_EX | LOCK_NB); })) ::_exit(5);
+            if (NumberOf(cache.Read()) != Old) ::_exit(4);
+            if (::waitpid(-1, nullptr, WNOHANG | __WALL) >= 0) ++*children;
+        }
+        states->at(1) = look();
+    });
+    EXPECT_EQ(process.Join(), 0);
+    EXPECT_EQ(Productions(), WarmUp + refreshes);
+    EXPECT_EQ(*children, 0);
+    EXPECT_EQ(states->at(1).descriptors, states->at(0).descriptors);
+    EXPECT_LT(states->at(1).heap, states->at(0).heap + SmallChange);
+    ReportCount("refreshes", refreshes);
+}
+
+// ------------------------------------------------------------------------------------ failures
+
+bool Limit(__rlimit_resource resource, rlim_t value)
+{
+    const rlimit limit{value, value};
+    return ::setrlimit(resource, &limit) == 0;
+}
+
+class FailingRefreshTest : public ProcessTest {
+  protected:
+    // Makes the cache one that also a process without root's rights can use.
+    void SetUpForEveryone()
+    {
+        ASSERT_EQ(::chmod(dir.Path().c_str(), 0755), 0);
+        ASSERT_TRUE(FileLock(LockName()).openLockedFile());
+        ASSERT_EQ(::chmod(FileLock::getLockFilePath(LockName()).c_str(), 0644), 0);
+    }
+
+    // Updates and reads the stale cache in a process that does `spoil` first. It must get the old
+    // document, and nothing must have changed after it. `updated` is what Update() has to say.
+    void ExpectTheOldDocument(Mode mode, bool updated, const std::function<bool()>& spoil,
+                              const Producer& produce = Gives(New));
+
+    // Puts the stale cache on a disk that has no room for a large document, or for nothing at all.
+    bool FillDisk(bool completely);
+};
+
+void FailingRefreshTest::ExpectTheOldDocument(Mode mode, bool updated,
+                                              const std::function<bool()>& spoil,
+                                              const Producer& produce)
+{
+    struct Outcome {
+        bool updated;
+        int read;
+        int inFile;
+        std::ptrdiff_t temporaries;
+    };
+    const SharedMemory<Outcome> outcome;
+    ChildProcess reader([&](ChildProcess::Link& /*link*/) {
+        ::prctl(PR_SET_CHILD_SUBREAPER, 1);
+        if (!spoil()) ::_exit(2);
+        const TestCache cache = MakeCache(mode, produce);
+        outcome->updated = cache.Update();
+        outcome->read = NumberOf(cache.Read());
+        AwaitDescendants();
+        const std::vector<std::string> files = Files();
+        outcome->inFile = NumberInFile();
+        outcome->temporaries = std::count_if(files.begin(), files.end(), [](const auto& name) {
+            return name.find("orvadr-tmp") != std::string::npos;
+        });
+    });
+    ASSERT_EQ(reader.Join(), 0);
+    EXPECT_EQ(outcome->updated, updated);
+    EXPECT_EQ(outcome->read, Old);
+    EXPECT_EQ(outcome->inFile, Old);
+    EXPECT_EQ(outcome->temporaries, 0);
+}
+
+bool FailingRefreshTest::FillDisk(bool completely)
+{
+    constexpr int Size = 32 * 1024;
+    if (!MountSmallDisk(dir.Path(), Size)) {
+        WriteStale(Old);
+        (void)::signal(SIGXFSZ, SIG_IGN);
+        return Limit(RLIMIT_FSIZE, completely ? 0 : Size);
+    }
+    WriteStale(Old);
+    if (!completely) return true;
+    std::ofstream filler(dir.File("filler"));
+    while (filler << std::string(Size, 'x') << std::flush) {
+    }
+    return true;
+}
+
+TEST_F(FailingRefreshTest, WithoutAForkTheReaderKeepsTheOldDocument)
+{
+    if (!HasLocks()) return;
+    SetUpForEveryone();
+    WriteStale(Old);
+    ExpectTheOldDocument(Mode::Background, false,
+                         [] { return LoseRights() && Limit(RLIMIT_NPROC, 0); });
+    EXPECT_EQ(Productions(), 0);
+}
+
+TEST_F(FailingRefreshTest, AnUnwritableDirectoryKeepsTheOldDocument)
+{
+    if (!HasLocks()) return;
+    SetUpForEveryone();
+    WriteStale(Old);
+    ASSERT_EQ(::chmod(dir.Path().c_str(), 0555), 0);
+    ExpectTheOldDocument(Mode::Blocking, false, LoseRights);
+    ExpectTheOldDocument(Mode::Background, true, LoseRights);
+    EXPECT_EQ(Productions(), 0);
+}
+
+TEST_F(FailingRefreshTest, APidFileThatCannotBeWrittenKeepsTheOldDocument)
+{
+    if (!HasLocks()) return;
+    WriteStale(Old);
+    ASSERT_TRUE(std::filesystem::create_directories(PidFile() + "/not empty"));
+    const auto nothing = [] { return true; };
+    ExpectTheOldDocument(Mode::Blocking, false, nothing);
+    ExpectTheOldDocument(Mode::Background, true, nothing);
+    EXPECT_EQ(Productions(), 0);
+}
+
+TEST_F(FailingRefreshTest, ADocumentThatDoesNotFitOnTheDiskKeepsTheOldOne)
+{
+    constexpr int Large = 999;
+    if (!HasLocks()) return;
+    const auto fill = [this] { return FillDisk(false); };
+    ExpectTheOldDocument(Mode::Blocking, false, fill, Gives(Large));
+    EXPECT_EQ(Productions(), 2);
+    ExpectTheOldDocument(Mode::Background, true, fill, Gives(Large));
+    EXPECT_GT(Productions(), 2);
+}
+
+TEST_F(FailingRefreshTest, AFullDiskKeepsTheOldDocument)
+{
+    if (!HasLocks()) return;
+    const auto fill = [this] { return FillDisk(true); };
+    ExpectTheOldDocument(Mode::Blocking, false, fill);
+    ExpectTheOldDocument(Mode::Background, true, fill);
+    EXPECT_EQ(Productions(), 0);
+}
+
+TEST_F(FailingRefreshTest, AFileThatHoldsNoDocumentIsReplacedByTheReader)
+{
+    if (!HasLocks()) return;
+    const std::vector<std::string> contents{"",
+                                            "\n",
+                                            "{",
+                                            std::string(100, '\0'),
+                                            std::string(100'000, '['),
+                                            "no JSON",
+                                            "42",
+                                            "{}",
+                                            R"({"cached_data":{"number":1,"text":"cut off)"};
+    for (const std::string& content : contents) {
+        SCOPED_TRACE(content.substr(0, 100));
+        std::ofstream(CacheFile()) << content;
+        const int before = Productions();
+        EXPECT_EQ(NumberOf(MakeCache(Mode::Background, Gives(New)).Read()), New);
+        EXPECT_EQ(Productions(), before + 1);
+        EXPECT_EQ(NumberInFile(), New);
+    }
+}
+
+TEST_F(FailingRefreshTest, ADirectoryInTheFilesPlaceGivesTheDefault)
+{
+    if (!HasLocks()) return;
+    ASSERT_TRUE(std::filesystem::create_directories(CacheFile()));
+    const TestCache cache = MakeCache(Mode::Background, Gives(New));
+    EXPECT_FALSE(cache.Update());
+    EXPECT_EQ(cache.Read(), cache.GetDefaultValue());
+    EXPECT_TRUE(std::filesystem::is_directory(CacheFile()));
+    EXPECT_THAT(Files(), ElementsAre("x.cached"));
+}
+
+// A lock that others hold is tried six times, a second apart.
+class HeldLockTest : public ProcessTest {
+  protected:
+    static constexpr std::chrono::seconds AllTries{5};
+
+    // A process that holds the cache's lock until it is told.
+    ChildProcess StartHolder(int operation)
+    {
+        return ChildProcess([this, operation](ChildProcess::Link& link) {
+            FileLock lock(LockName());
+            if (!lock.lock(operation, 0)) return;
+            link.Tell();
+            link.Await();
+        });
+    }
+};
+
+TEST_F(HeldLockTest, WhoCannotLookForAnUpdaterTakesItThatThereIsOne)
+{
+    if (!HasLocks()) return;
+    WriteStale(Old);
+    ChildProcess holder = StartHolder(LOCK_EX);
+    ASSERT_TRUE(holder.Await());
+    const Reading reading = ReadElsewhere(Mode::Background, Gives(New));
+    EXPECT_EQ(reading.number, Old);
+    EXPECT_FALSE(reading.startedProcesses);
+    EXPECT_GE(reading.took, AllTries);
+
+    holder.Tell();
+    EXPECT_EQ(holder.Join(), 0);
+    EXPECT_EQ(Productions(), 0);
+    EXPECT_EQ(ReadElsewhere(Mode::Blocking, Gives(New)).number, New);
+}
+
+TEST_F(HeldLockTest, WhoCannotMarkItselfAsUpdaterDoesNotProduce)
+{
+    if (!HasLocks()) return;
+    WriteStale(Old);
+    ChildProcess holder = StartHolder(LOCK_SH);
+    ASSERT_TRUE(holder.Await());
+    EXPECT_EQ(NumberOf(MakeCache(Mode::Background, Gives(New)).Read()), Old);
+    const Reading reading = ReadElsewhere(Mode::Blocking, Gives(New));
+    EXPECT_EQ(reading.number, Old);
+    EXPECT_GE(reading.took, AllTries);
+    EXPECT_EQ(Productions(), 0);
+    EXPECT_EQ(NumberInFile(), Old);
+}
+
+TEST_F(HeldLockTest, AnUpdaterThatCannotRemoveItsMarkCountsAsOneAsLongAsItLives)
+{
+    if (!HasLocks()) return;
+    WriteStale(Old);
+    ChildProcess updater([this](ChildProcess::Link& link) {
+        const auto produce = [&link](Json::Value& data) {
+            link.Tell();
+            return link.Await() && Gives(New)(data);
+        };
+        MakeCache(Mode::Blocking, produce).Read();
+        link.Tell();
+        link.Await();
+    });
+    ASSERT_TRUE(updater.Await());
+    ChildProcess holder = StartHolder(LOCK_EX);
+    ASSERT_TRUE(holder.Await());
+    updater.Tell();
+    ASSERT_TRUE(updater.Await());
+    EXPECT_EQ(NumberInFile(), New);
+    EXPECT_THAT(Files(), ElementsAre("x.cached", "x.cached.pid"));
+    holder.Tell();
+    EXPECT_EQ(holder.Join(), 0);
+
+    MakeStale();
+    const Reading reading = ReadElsewhere(Mode::Background, Gives(Old));
+    EXPECT_EQ(reading.number, New);
+    EXPECT_FALSE(reading.startedProcesses);
+    updater.Tell();
+    EXPECT_EQ(updater.Join(), 0);
+    EXPECT_EQ(ReadElsewhere(Mode::Blocking, Gives(Old)).number, Old);
+    EXPECT_THAT(Files(), ElementsAre("x.cached"));
+}
+
+}  // namespace

@@ -1,0 +1,53 @@
+// A number of processes that begin at the same moment.
+#ifndef ORVADRCORE_TESTS_CROWD_H
+#define ORVADRCORE_TESTS_CROWD_H
+
+#include <unistd.h>
+
+#include <algorithm>
+#include <functional>
+#include <memory>
+#include <vector>
+
+#include "child_process.h"
+
+class Crowd {
+    static constexpr unsigned int DeadlineSeconds = 600;  // for what is done very often
+
+  public:
+    // Makes the processes; each is to run `body` with a number of its own, from 0.
+    Crowd(int size, const std::function<void(int)>& body)
+    {
+        children.reserve(static_cast<std::size_t>(size));
+        for (int i = 0; i < size; ++i) {
+            children.push_back(std::make_unique<ChildProcess>([&body, i](ChildProcess::Link& link) {
+                link.Tell();
+                if (!link.Await()) return;
+                ::alarm(DeadlineSeconds);
+                body(i);
+            }));
+        }
+    }
+
+    // Lets all of them begin. False when one is not ready to.
+    bool Start() const
+    {
+        const bool ready = std::all_of(children.begin(), children.end(),
+                                       [](const auto& child) { return child->Await(); });
+        for (const auto& child : children) child->Tell();
+        return ready;
+    }
+
+    // Waits for their ends. False when one has failed.
+    bool Join() const
+    {
+        int failed = 0;
+        for (const auto& child : children) failed += child->Join() != 0 ? 1 : 0;
+        return failed == 0;
+    }
+
+  private:
+    std::vector<std::unique_ptr<ChildProcess>> children;
+};
+
+#endif

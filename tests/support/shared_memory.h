@@ -1,0 +1,33 @@
+// An object that a test and the processes it forks have in common.
+#ifndef ORVADRCORE_TESTS_SHARED_MEMORY_H
+#define ORVADRCORE_TESTS_SHARED_MEMORY_H
+
+#include <sys/mman.h>
+
+#include <cstdlib>
+#include <new>
+#include <type_traits>
+
+template <class T>
+class SharedMemory {
+  public:
+    SharedMemory()
+    {
+        static_assert(std::is_trivially_destructible_v<T>, "it goes with the mapping");
+        void* memory =
+            ::mmap(nullptr, sizeof(T), PROT_READ | PROT_WRITE, MAP_SHARED | MAP_ANONYMOUS, -1, 0);
+        if (memory == MAP_FAILED) std::abort();
+        object = new (memory) T{};
+    }
+    SharedMemory(const SharedMemory&) = delete;
+    SharedMemory& operator=(const SharedMemory&) = delete;
+    ~SharedMemory() { ::munmap(object, sizeof(T)); }
+
+    T& operator*() const { return *object; }
+    T* operator->() const { return object; }
+
+  private:
+    T* object = nullptr;
+};
+
+#endif
