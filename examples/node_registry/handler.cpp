@@ -1,21 +1,40 @@
 #include "handler.h"
 
+#include <algorithm>
+#include <ctime>
+#include <filesystem>
+#include <map>
+#include <system_error>
+
 #include <orvadrcore/errors.h>
+#include <orvadrcore/file.h>
+#include <orvadrcore/file_lock.h>
 #include <orvadrcore/request.h>
 
+#include "documents.h"
 #include "json_line.h"
 #include "parameters.h"
 #include "reply.h"
+#include "status_cache.h"
+#include "text.h"
 
 namespace NodeRegistry {
 
 using OrvaDRCore::ERR;
+using OrvaDRCore::File;
+using OrvaDRCore::FileLock;
 using OrvaDRCore::Request;
 
 namespace {
 
 constexpr const char* Api = "DR.Node";
 constexpr int ApiVersion = 1;
+
+constexpr const char* ImportVolume = "/volume1/replica";
+
+// How an export or a restore keeps others away, and how often it tries to; a second apart.
+constexpr int LockAlone = LOCK_EX | LOCK_NB;
+constexpr unsigned int LockRetries = 3;
 
 Json::Value BadRequest(const std::string& reason)
 {
@@ -40,7 +59,55 @@ Json::Value DoneWith(const std::string& id)
     return Success(data);
 }
 
+// {"success":true,"data":{"count":count}}
+Json::Value DoneWith(std::size_t count)
+{
+    Json::Value data(Json::objectValue);
+    data["count"] = Json::UInt64{count};
+    return Success(data);
+}
+
+Json::Value BadFile(const std::string& reason)
+{
+    return Failure(ERR::BAD_PARAMETER, Reason("file", reason));
+}
+
+Json::Value NotAlone(int code)
+{
+    return Failure(code, Reason("lock", "is held by another handler, or may not be opened"));
+}
+
+// A missing file would read as an empty one, and a pipe or a device perhaps without end.
+bool IsReadable(const std::string& file)
+{
+    std::error_code ignored;
+    return std::filesystem::is_regular_file(file, ignored);
+}
+
+// What is there already is overwritten when it is a file, but not the database.
+bool IsWritable(const std::string& file, const std::string& database)
+{
+    std::error_code ignored;
+    return !std::filesystem::exists(file, ignored) ||
+           (std::filesystem::is_regular_file(file, ignored) &&
+            !std::filesystem::equivalent(file, database, ignored));
+}
+
+// Links resolved, so that all handlers of a file have one name for it.
+std::string ToFullPath(const std::string& path)
+{
+    std::error_code error;
+    const std::filesystem::path full =
+        std::filesystem::weakly_canonical(std::filesystem::absolute(path, error), error);
+    return error ? path : full.string();
+}
+
 }  // namespace
+
+Handler::Handler(const std::string& database, long statusTimeoutSeconds)
+    : registry(database), fullPath(ToFullPath(database)), statusTimeout(statusTimeoutSeconds)
+{
+}
 
 Json::Value Handler::Answer(const std::string& line)
 {
@@ -57,6 +124,10 @@ Json::Value Handler::Answer(const std::string& line)
     if (method == "set") return Set(request.getParams());
     if (method == "delete") return Delete(request.getParams());
     if (method == "list") return List(request.getParams());
+    if (method == "status") return Status(request.getParams());
+    if (method == "import") return Import(request.getParams());
+    if (method == "export") return Export(request.getParams());
+    if (method == "restore") return Restore(request.getParams());
     return NoSuchApi("method");
 }
 
@@ -144,6 +215,100 @@ Json::Value Handler::List(const Json::Value& params)
     data["nodes"] = Json::Value(Json::arrayValue);
     for (const Node& node : nodes) data["nodes"].append(node.ToJson());
     return Success(data);
+}
+
+Json::Value Handler::Status(const Json::Value& params) const
+{
+    Parameters parameters(params);
+    if (!parameters.AreOnly({})) return BadParameter(parameters);
+    if (!StatusCache::IsUsable(fullPath)) {
+        return Failure(ERR::ERR_NO_PERMISSION,
+                       Reason("status", "has no directory or no lock that may be used"));
+    }
+    const StatusCache cache(fullPath, statusTimeout);
+    Json::Value status = cache.Read();
+    if (cache.IsValidData(status)) {
+        const Json::Int64 age = std::time(nullptr) - status["time"].asInt64();
+        status["age"] = std::max(age, Json::Int64{0});
+        return Success(status);
+    }
+    if (cache.GetErrCode() != 0) return Failure(cache.GetErrCode(), cache.GetErr());
+    return Failure(ERR::ERR_NODE_GET, Reason("status", "could not be taken or stored"));
+}
+
+// Node by node, as that many create requests: those that are refused keep no other one out.
+Json::Value Handler::Import(const Json::Value& params)
+{
+    Parameters parameters(params);
+    std::string file;
+    Node common;
+    common.volume = ImportVolume;
+    if (!parameters.AreOnly({"file", "volume"}) || !parameters.ReadFile(file) ||
+        (parameters.Has("volume") && !parameters.ReadFields({"volume"}, common))) {
+        return BadParameter(parameters);
+    }
+    std::map<std::string, std::string> lines;
+    if (!IsReadable(file) || File::Read(file, lines) < 0) return BadFile("cannot be read");
+
+    int created = 0;
+    Json::Value refused(Json::objectValue);
+    for (const auto& [name, endpoint] : lines) {
+        Node node;
+        std::string reason = "name belongs to another node";
+        if (FromLine(name, endpoint, common.volume, node, reason)) {
+            if (registry.Create(node)) {
+                ++created;
+                continue;
+            }
+            if (registry.GetErrCode() != ERR::ERR_NODE_EXIST) return RegistryFailure();
+        }
+        refused[ToPrintable(name, MaxNameBytes)] = reason;
+    }
+    Json::Value data(Json::objectValue);
+    data["created"] = created;
+    data["refused"] = refused;
+    return Success(data);
+}
+
+// The lock keeps other exports and restores away, nobody else: the file is written in place, and
+// who reads it without the lock may see a part of it.
+Json::Value Handler::Export(const Json::Value& params)
+{
+    Parameters parameters(params);
+    std::string file;
+    if (!parameters.AreOnly({"file"}) || !parameters.ReadFile(file)) {
+        return BadParameter(parameters);
+    }
+    if (!IsWritable(file, fullPath)) return BadFile("is the database, or no regular file");
+    FileLock lock(fullPath + ".lock");
+    if (!lock.lock(LockAlone, LockRetries)) return NotAlone(ERR::ERR_NODE_GET);
+
+    std::vector<Node> nodes;
+    if (!registry.List("", nodes)) return RegistryFailure();
+    if (!File::Write(file, ToDocument(nodes))) {
+        return Failure(ERR::ERR_NODE_GET, Reason("file", "cannot be written"));
+    }
+    return DoneWith(nodes.size());
+}
+
+Json::Value Handler::Restore(const Json::Value& params)
+{
+    Parameters parameters(params);
+    std::string file;
+    if (!parameters.AreOnly({"file"}) || !parameters.ReadFile(file)) {
+        return BadParameter(parameters);
+    }
+    if (!IsReadable(file)) return BadFile("cannot be read");
+    FileLock lock(fullPath + ".lock");
+    if (!lock.lock(LockAlone, LockRetries)) return NotAlone(ERR::ERR_NODE_SET);
+
+    Json::Value document;
+    if (!File::Read(file, document)) return BadFile("cannot be read, or is no JSON document");
+    std::vector<Node> nodes;
+    std::string reason;
+    if (!FromDocument(document, nodes, reason)) return BadFile(reason);
+    if (!registry.Replace(nodes)) return RegistryFailure();
+    return DoneWith(nodes.size());
 }
 
 Json::Value Handler::RegistryFailure() const

@@ -12,8 +12,9 @@ namespace NodeRegistry {
 
 class Handler {
   public:
-    // `database` is the file that keeps the nodes.
-    explicit Handler(const std::string& database) : registry(database) {}
+    // `database` is the file that keeps the nodes; a status older than `statusTimeoutSeconds` is
+    // taken anew.
+    Handler(const std::string& database, long statusTimeoutSeconds);
 
     // Answers every line, whatever it holds.
     Json::Value Answer(const std::string& line);
@@ -24,10 +25,16 @@ class Handler {
     Json::Value Set(const Json::Value& params);
     Json::Value Delete(const Json::Value& params);
     Json::Value List(const Json::Value& params);
+    Json::Value Status(const Json::Value& params) const;
+    Json::Value Import(const Json::Value& params);
+    Json::Value Export(const Json::Value& params);
+    Json::Value Restore(const Json::Value& params);
 
     Json::Value RegistryFailure() const;
 
     Registry registry;
+    std::string fullPath;  // of the database; caches and locks are called after it
+    long statusTimeout;
 };
 
 }  // namespace NodeRegistry

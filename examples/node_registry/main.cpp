@@ -41,7 +41,7 @@ int Print(const std::string& text)
 int Serve(const Options& options)
 {
     LineReader reader(options.input);
-    Handler handler(options.database);
+    Handler handler(options.database, options.statusTimeout);
     std::string line;
     while (reader.Read(line)) {
         if (options.isPretty && Print(DescribeRequest(line) + "\n") != EXIT_SUCCESS) {

@@ -9,6 +9,7 @@ namespace NodeRegistry {
 struct Options {
     std::string database = "./node_registry.db";
     std::string input = "-";  // standard input
+    int statusTimeout = 30;   // in seconds
     bool isVerbose = false;
     bool isPretty = false;
     bool wantsHelp = false;
@@ -17,7 +18,7 @@ struct Options {
 // False for a command line that the usage does not allow.
 bool ReadOptions(int argc, const char* const* argv, Options& ret_options);
 
-// How the program is called: one line for those who called it wrongly, and all there is to know.
+// How the program is called: in short for those who called it wrongly, and all there is to know.
 extern const char* const UsageText;
 extern const char* const HelpText;
 

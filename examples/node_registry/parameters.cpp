@@ -15,6 +15,8 @@ using OrvaDRCore::Validator;
 
 namespace {
 
+constexpr std::size_t MaxFileBytes = 4095;  // what the system takes for a path
+
 bool TakeText(const Json::Value& value, std::size_t maxBytes, std::string& ret_text)
 {
     if (!value.isString() || !IsPlainText(value.asString(), maxBytes)) return false;
@@ -86,8 +88,9 @@ bool Parameters::AreOnly(const std::vector<std::string>& names)
 {
     for (const std::string& member : params.getMemberNames()) {
         if (std::find(names.begin(), names.end(), member) == names.end()) {
-            return Refuse("parameters",
-                          "only these can be given: " + Container::ToString(names, ", "));
+            return Refuse("parameters", names.empty() ? "none can be given"
+                                                      : "only these can be given: " +
+                                                            Container::ToString(names, ", "));
         }
     }
     return true;
@@ -115,6 +118,13 @@ bool Parameters::ReadField(const std::string& name, Node& node)
     const auto* rule = std::find_if(std::begin(Rules), std::end(Rules),
                                     [&](const Rule& each) { return each.field == name; });
     return rule->take(params[name], node) || Refuse(name, rule->words);
+}
+
+bool Parameters::ReadFile(std::string& ret_path)
+{
+    if (!Has("file")) return Refuse("file", "is missing");
+    return TakeText(params["file"], MaxFileBytes, ret_path) ||
+           Refuse("file", "must be a path of at most 4095 bytes without control characters");
 }
 
 bool Parameters::ReadFilter(std::string& ret_condition)

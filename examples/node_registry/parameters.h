@@ -35,6 +35,9 @@ class Parameters {
     // Fills the named fields of a node. All must be there; on failure some may be filled.
     bool ReadFields(const std::vector<std::string>& names, Node& node);
 
+    // The path "file".
+    bool ReadFile(std::string& ret_path);
+
     // The condition of a list; empty, for all nodes, without a "filter".
     bool ReadFilter(std::string& ret_condition);
 

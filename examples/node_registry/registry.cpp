@@ -1,5 +1,6 @@
 #include "registry.h"
 
+#include <algorithm>
 #include <map>
 
 #include <orvadrcore/errors.h>
@@ -55,11 +56,7 @@ bool Registry::Create(Node& node)
     if (!IsNameFree(node)) return false;
     node.id = GenerateUUID();
     if (node.id.empty()) return Fail(ERR::ERR_NODE_CREATE, Reason("id", "cannot be made"));
-
-    InsertCommand insert;
-    insert.SetTable(table);
-    insert.SetFieldValues(node.ToSqliteRecord());
-    return db.InsertRecord(insert) || FailAsWrite();
+    return Insert(node) || FailAsWrite();
 }
 
 bool Registry::Find(const NodeKey& key, Node& ret_node)
@@ -112,6 +109,32 @@ bool Registry::Change(const Node& node, const std::vector<std::string>& fields)
 bool Registry::Remove(const std::string& id)
 {
     return db.DeleteRecord(Matches({"id", id}).GetCondition(), table) || FailAsDb();
+}
+
+bool Registry::Replace(const std::vector<Node>& nodes)
+{
+    if (!db.Open()) return Fail(ERR::ERR_DATABASE_OPERATION, Json::Value());
+    // Each statement by itself: a text of several would be repeated whole.
+    if (!db.Exec("BEGIN IMMEDIATE")) return FailAsDb();
+    if (FillAnew(nodes) && db.Exec("COMMIT")) return true;
+    FailAsWrite();
+    // SQLite may have rolled back by itself, and then refuses. Closing ends what is left.
+    if (!db.DoExecSqliteCommand("ROLLBACK")) db.Close();
+    return false;
+}
+
+bool Registry::Insert(const Node& node)
+{
+    InsertCommand insert;
+    insert.SetTable(table);
+    insert.SetFieldValues(node.ToSqliteRecord());
+    return db.InsertRecord(insert);
+}
+
+bool Registry::FillAnew(const std::vector<Node>& nodes)
+{
+    return db.DeleteAllRecords(table) &&
+           std::all_of(nodes.begin(), nodes.end(), [&](const Node& node) { return Insert(node); });
 }
 
 bool Registry::SelectFirst(const NodeKey& key, SqliteValueList& ret_record)

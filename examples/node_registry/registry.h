@@ -39,12 +39,18 @@ class Registry {
     // Removes a node. That it is not there is no failure.
     bool Remove(const std::string& id);
 
+    // Makes these the nodes, with the ids that they have, in one transaction: on failure all is as
+    // it was. No two may have the same id or name.
+    bool Replace(const std::vector<Node>& nodes);
+
     int GetErrCode() const { return errCode; }
     const Json::Value& GetErr() const { return err; }
 
   private:
     bool SelectFirst(const NodeKey& key, OrvaDRCore::SqliteValueList& ret_record);
     bool IsNameFree(const Node& node);
+    bool Insert(const Node& node);
+    bool FillAnew(const std::vector<Node>& nodes);
     bool Fail(int code, const Json::Value& errors);
     bool FailAsDb();
     bool FailAsWrite();

@@ -1,0 +1,80 @@
+// Ports on this machine's loopback for those who connect to them.
+#ifndef ORVADRCORE_TESTS_LISTENER_H
+#define ORVADRCORE_TESTS_LISTENER_H
+
+#include <netinet/in.h>
+#include <poll.h>
+#include <sys/socket.h>
+#include <unistd.h>
+
+#include <array>
+#include <cstdlib>
+#include <vector>
+
+// Takes connections on a free port.
+class Listener {
+  public:
+    explicit Listener(int backlog = SOMAXCONN)
+        : fd(::socket(AF_INET, SOCK_STREAM | SOCK_NONBLOCK | SOCK_CLOEXEC, 0))
+    {
+        address.sin_family = AF_INET;
+        address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+        socklen_t size = sizeof address;
+        auto* any = reinterpret_cast<sockaddr*>(&address);
+        if (::bind(fd, any, size) != 0 || ::listen(fd, backlog) != 0 ||
+            ::getsockname(fd, any, &size) != 0) {
+            std::abort();
+        }
+    }
+    Listener(const Listener&) = delete;
+    Listener& operator=(const Listener&) = delete;
+    ~Listener() { ::close(fd); }
+
+    int Port() const { return ntohs(address.sin_port); }
+
+    // How many connections there have been.
+    int Count()
+    {
+        for (int taken = Accept(); taken >= 0; taken = Accept()) {
+            ::close(taken);
+            ++count;
+        }
+        return count;
+    }
+
+  protected:
+    sockaddr_in address{};
+
+  private:
+    int Accept() const { return ::accept(fd, nullptr, nullptr); }
+
+    int fd;
+    int count = 0;
+};
+
+// Has a port that neither takes nor refuses a connection: its queue is full.
+class SilentListener : public Listener {
+  public:
+    SilentListener() : Listener(0)
+    {
+        constexpr int SettleMSec = 200;
+        bool isTaken = true;
+        while (isTaken) {
+            callers.push_back(::socket(AF_INET, SOCK_STREAM | SOCK_NONBLOCK | SOCK_CLOEXEC, 0));
+            (void)::connect(callers.back(), reinterpret_cast<sockaddr*>(&address), sizeof address);
+            pollfd waiting{callers.back(), POLLOUT, 0};
+            isTaken = ::poll(&waiting, 1, SettleMSec) == 1;
+        }
+    }
+    SilentListener(const SilentListener&) = delete;
+    SilentListener& operator=(const SilentListener&) = delete;
+    ~SilentListener()
+    {
+        for (const int caller : callers) ::close(caller);
+    }
+
+  private:
+    std::vector<int> callers;
+};
+
+#endif
