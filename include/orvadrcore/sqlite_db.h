@@ -185,8 +185,7 @@ class ORVADRCORE_API SqliteDB {
     /// \param message     SQLite's text; null takes the connection's last one
     void SetDBErr(const std::string& command, int sqliteCode, const char* message) const;
 
-    // ---------------------------------------------------------------------------------- single
-    // tries
+    // ---------------------------------------------------------------------------- single tries
 
     /// One try of Exec(): no checks and no retries. On success the error code stays as it was.
     bool DoExecSqliteCommand(const std::string& command);

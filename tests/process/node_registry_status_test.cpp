@@ -29,6 +29,7 @@ namespace {
 using OrvaDRCore::File;
 using OrvaDRCore::FileLock;
 using OrvaDRCore::Response;
+using ::testing::AnyOf;
 using ::testing::ElementsAre;
 
 constexpr const char* Injection = "x';DROP/**/TABLE/**/nodes;--";  // a single word
@@ -216,7 +217,8 @@ TEST_F(NodeStatusTest, AStatusIsKeptUntilItIsOld)
     const std::time_t old = std::time(nullptr) - 60;
     const std::array<timespec, 2> times{{{old, 0}, {old, 0}}};
     ASSERT_EQ(::utimensat(AT_FDCWD, cacheFile.c_str(), times.data(), 0), 0);
-    EXPECT_EQ(AskStatus()["total"], 0);
+    // The old status, or the new one where the child is quicker than its parent.
+    EXPECT_THAT(AskStatus()["total"].asInt(), AnyOf(0, 1));
     EXPECT_TRUE(AwaitUntil([&] { return TotalInCache() == 1; }));
     EXPECT_EQ(AskStatus()["total"], 1);
 }
@@ -295,7 +297,7 @@ TEST_F(NodeStatusTest, TheChildOpensTheDatabaseItself)
     std::filesystem::rename(database, dir.File("moved.db"));
     for (const char* name : {"b", "c"}) Create(name);
 
-    EXPECT_EQ(TotalBy(handler), 0);
+    EXPECT_THAT(TotalBy(handler), AnyOf(0, 2));  // the child may be quicker than its parent
     EXPECT_TRUE(AwaitUntil([&] { return TotalInCache() == 2; }));
     handler.Send(Call("list") + "\n");
     const Json::Value nodes = Response(handler.ReadLine()).getDataField("nodes");
