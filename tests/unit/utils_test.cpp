@@ -39,6 +39,7 @@ class ProgramStandIn {
                                         char* const* environment) mutable {
             notes.Note(arguments);
             std::vector<char*> texts;
+            texts.reserve(command.size() + 1);
             for (std::string& text : command) texts.push_back(text.data());
             texts.push_back(nullptr);
             return RealExecve(texts[0], texts.data(), environment);
