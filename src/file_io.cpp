@@ -1,10 +1,11 @@
 #include "file_io.h"
 
-#include <sys/file.h>
+#include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include <cerrno>
+#include <climits>
 #include <cstdio>
 #include <utility>
 
@@ -19,11 +20,19 @@ constexpr mode_t NewFileMode = 0666;  // the kernel takes the umask off
 constexpr mode_t OwnerOnly = 0600;    // until the bits that the file is to have are set
 
 constexpr const char* TemporarySuffix = ".orvadr-tmp";
-constexpr int MaxWriters = 64;  // of one file, at once
+constexpr int MaxWriters = 64;             // of one file, at once
+constexpr std::size_t RoomForSuffix = 13;  // the suffix and two digits
 
-bool TryLock(const FileDescriptor& file)
+enum class Lock { Ours, Others, None };  // None: a file system that has no locks
+
+// A lock of the open file, which goes with it. It is none of those that lock files are made of.
+Lock TryLock(const FileDescriptor& file)
 {
-    return ::flock(file.Get(), LOCK_EX | LOCK_NB) == 0;
+    struct flock whole {};
+    whole.l_type = F_WRLCK;
+    whole.l_whence = SEEK_SET;
+    if (::fcntl(file.Get(), F_OFD_SETLK, &whole) == 0) return Lock::Ours;
+    return errno == EAGAIN || errno == EACCES ? Lock::Others : Lock::None;
 }
 
 // Whether `path` still is the name of the open file.
@@ -38,8 +47,9 @@ bool IsNamed(const FileDescriptor& file, const std::string& path)
 // Removes the temporary file of a writer that is no more, on which nobody holds a lock.
 bool RemoveLeftOver(const std::string& path)
 {
-    const FileDescriptor file(path, O_RDONLY | O_NOFOLLOW | O_NONBLOCK);
-    return file.IsOpen() && TryLock(file) && IsNamed(file, path) && ::unlink(path.c_str()) == 0;
+    const FileDescriptor file(path, O_WRONLY | O_NOFOLLOW | O_NONBLOCK);
+    return file.IsOpen() && TryLock(file) == Lock::Ours && IsNamed(file, path) &&
+           ::unlink(path.c_str()) == 0;
 }
 
 // Makes and locks the temporary file of that name, if there is none yet. Never goes through a
@@ -49,20 +59,23 @@ FileDescriptor MakeLocked(const std::string& path, mode_t mode)
     FileDescriptor file(path, O_WRONLY | O_CREAT | O_EXCL, mode);
     if (!file.IsOpen()) return file;
     // A file that is not locked yet looks like a left-over: another writer may be removing it.
-    if (TryLock(file) && IsNamed(file, path)) return file;
-
-    const int error = errno;
-    const bool taken = error == EWOULDBLOCK || !IsNamed(file, path);
-    if (!taken) ::unlink(path.c_str());  // a file system without locks
-    errno = taken ? EEXIST : error;
+    if (TryLock(file) != Lock::Others && IsNamed(file, path)) return file;
+    errno = EEXIST;
     return {};
+}
+
+// A path of which a name of full length leaves room for what goes behind it.
+std::string ShortName(const std::string& path)
+{
+    const std::size_t name = path.rfind('/') + 1;  // 0 when there is none
+    return path.substr(0, name + NAME_MAX - RoomForSuffix);
 }
 
 // Makes and locks a temporary file of the caller's own beside the file `path`, which becomes its
 // name, and removes left-overs under the next names.
 FileDescriptor MakeTemporary(std::string& path, mode_t mode)
 {
-    const std::string stem = path + TemporarySuffix;
+    const std::string stem = ShortName(path) + TemporarySuffix;
     int writer = 0;
     while (true) {
         path = stem + std::to_string(writer);

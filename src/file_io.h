@@ -43,9 +43,9 @@ bool WriteAll(int fd, std::string_view text);
 // bits `mode`, if given, otherwise those of the old file, or 0666 less the umask.
 //
 // On failure the old file is as it was and the temporary file gone. Temporary files are called
-// `path` + ".orvadr-tmp0", 1 and so on, for as many writers as there are at once; a writer holds a
-// flock on its own as long as it lives, so that what a killed one left is known and removed by the
-// next.
+// `path` + ".orvadr-tmp0", 1 and so on, for as many writers as there are at once; a name without
+// room for that is cut. A writer holds a lock on its own as long as it lives, so that what a killed
+// one left is known and removed by the next.
 bool ReplaceFile(const std::string& path, std::string_view text,
                  std::optional<mode_t> mode = std::nullopt);
 

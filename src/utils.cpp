@@ -52,7 +52,10 @@ std::string GenerateUUID()
     }
     char* line = nullptr;
     std::size_t size = 0;
-    if (::getline(&line, &size, output) >= 0) uuid = CoreLibStrTrim(line, nullptr, nullptr);
+    if (::getline(&line, &size, output) >= 0) {
+        CoreLibStrTrim(line, nullptr, nullptr);
+        uuid = line;
+    }
     CoreLibPclose(output);
     std::free(line);
     return uuid;

@@ -73,6 +73,11 @@ int RealFlock(int fd, int operation)
     return RealFunction<decltype(::flock)>("flock")(fd, operation);
 }
 
+int RealFcntl(int fd, int command, void* argument)
+{
+    return RealFunction<decltype(::fcntl)>("fcntl")(fd, command, argument);
+}
+
 int RealRename(const char* from, const char* to)
 {
     return RealFunction<decltype(::rename)>("rename")(from, to);
@@ -134,6 +139,15 @@ extern "C" int fsync(int fd)
 extern "C" int flock(int fd, int operation) noexcept
 {
     return Answer(&SyscallAnswers::flock, RealFlock, fd, operation);
+}
+
+extern "C" int fcntl(int fd, int command, ...)
+{
+    va_list rest;
+    va_start(rest, command);
+    void* const argument = va_arg(rest, void*);  // as the C library takes it, whatever is behind it
+    va_end(rest);
+    return Answer(&SyscallAnswers::fcntl, RealFcntl, fd, command, argument);
 }
 
 extern "C" int rename(const char* from, const char* to) noexcept

@@ -20,6 +20,7 @@ struct SyscallAnswers {
     std::function<int(int, mode_t)> fchmod;
     std::function<int(int)> fsync;
     std::function<int(int, int)> flock;
+    std::function<int(int, int, void*)> fcntl;
     std::function<int(const char*, const char*)> rename;
     std::function<int(const char*, struct stat*)> stat;
     std::function<unsigned int(unsigned int)> sleep;
@@ -55,6 +56,7 @@ ssize_t RealWrite(int fd, const void* buffer, std::size_t size);
 int RealFchmod(int fd, mode_t mode);
 int RealFsync(int fd);
 int RealFlock(int fd, int operation);
+int RealFcntl(int fd, int command, void* argument);
 int RealRename(const char* from, const char* to);
 int RealStat(const char* path, struct stat* status);
 unsigned int RealSleep(unsigned int seconds);

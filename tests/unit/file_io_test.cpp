@@ -1,13 +1,14 @@
 // FileDescriptor, ReadAll, WriteAll and ReplaceFile; what stands on them is in json_file_test.cpp.
 #include "file_io.h"
 
+#include <fcntl.h>
 #include <gmock/gmock.h>
 #include <signal.h>
-#include <sys/file.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <climits>
 #include <filesystem>
 #include <functional>
 #include <set>
@@ -37,6 +38,15 @@ constexpr std::size_t MaxWriters = 64;
 
 constexpr const char* Name = "doc";
 constexpr const char* FirstTemporary = "doc.orvadr-tmp0";
+
+// Takes the lock by which the file of a living writer is known.
+bool TakeLock(int fd)
+{
+    struct flock whole {};
+    whole.l_type = F_WRLCK;
+    whole.l_whence = SEEK_SET;
+    return ::fcntl(fd, F_OFD_SETLK, &whole) == 0;
+}
 
 // Nothing here logs: the fixture fails on every line.
 class FileIoTest : public LoggedTest {
@@ -356,9 +366,9 @@ TEST_F(ReplaceFileTest, ASecretIsAtNoTimeReadableByOthers)
         EXPECT_EQ(::fstat(fd, &status), 0);
         modes.push_back(status.st_mode & 07777);
     };
-    faults.flock = [&](int fd, int operation) {
+    faults.fcntl = [&](int fd, int command, void* argument) {
         note(fd);
-        return RealFlock(fd, operation);
+        return RealFcntl(fd, command, argument);
     };
     faults.write = [&](int fd, const void* buffer, std::size_t size) {
         note(fd);
@@ -536,7 +546,7 @@ TEST_F(ReplaceFileTest, TooManyLiveWritersRefuseTheNext)
     std::vector<FileDescriptor> live;
     for (std::size_t writer = 0; writer < MaxWriters; ++writer) {
         live.emplace_back(Temporary(writer), O_WRONLY | O_CREAT, 0600);
-        ASSERT_EQ(::flock(live.back().Get(), LOCK_EX | LOCK_NB), 0);
+        ASSERT_TRUE(TakeLock(live.back().Get()));
     }
     errno = 0;
     EXPECT_FALSE(ReplaceFile(path, "new"));
@@ -554,11 +564,11 @@ TEST_F(ReplaceFileTest, TooManyLiveWritersRefuseTheNext)
 TEST_F(ReplaceFileTest, AWriterWhoseTemporaryIsTakenForALeftOverTakesAnother)
 {
     bool raced = false;
-    faults.flock = [&](int fd, int operation) {
+    faults.fcntl = [&](int fd, int command, void* argument) {
         if (!std::exchange(raced, true)) {
             EXPECT_EQ(::unlink(Temporary(0).c_str()), 0);
         }
-        return RealFlock(fd, operation);
+        return RealFcntl(fd, command, argument);
     };
     EXPECT_TRUE(ReplaceFile(path, "text"));
     EXPECT_TRUE(raced);
@@ -570,12 +580,12 @@ TEST_F(ReplaceFileTest, AWriterWhoseTemporaryIsBeingRemovedTakesAnother)
 {
     int remover = -1;
     std::string used;
-    faults.flock = [&](int fd, int operation) {
+    faults.fcntl = [&](int fd, int command, void* argument) {
         if (remover < 0) {
-            remover = OpenFile(Temporary(0), O_RDONLY);
-            EXPECT_EQ(RealFlock(remover, operation), 0);
+            remover = OpenFile(Temporary(0), O_WRONLY);
+            EXPECT_TRUE(TakeLock(remover));
         }
-        return RealFlock(fd, operation);
+        return RealFcntl(fd, command, argument);
     };
     faults.rename = [&](const char* from, const char* to) {
         used = from;
@@ -593,11 +603,11 @@ TEST_F(ReplaceFileTest, ALeftOverWhoseNameALiveWriterHasTakenMeanwhileIsNotRemov
     WriteFile(Temporary(0), "left over");
     WriteFile(dir.File("live"), "live");
     bool raced = false;
-    faults.flock = [&](int fd, int operation) {
+    faults.fcntl = [&](int fd, int command, void* argument) {
         if (!std::exchange(raced, true)) {
             EXPECT_EQ(::rename(dir.File("live").c_str(), Temporary(0).c_str()), 0);
         }
-        return RealFlock(fd, operation);
+        return RealFcntl(fd, command, argument);
     };
     EXPECT_TRUE(ReplaceFile(path, "text"));
     EXPECT_TRUE(raced);
@@ -657,15 +667,36 @@ TEST_F(ReplaceFileTest, AFailureLeavesTheOldFileAndNoTemporary)
     EXPECT_EQ(ReadFile(path), "the new text");
 }
 
-TEST_F(ReplaceFileTest, AFileSystemWithoutLocksIsRefusedAndKeepsNoTemporary)
+// Left-overs cannot be told from the files of living writers then, and stay.
+TEST_F(ReplaceFileTest, AFileSystemWithoutLocksServesAllTheSame)
 {
     WriteFile(path, "old");
-    faults.flock = Failing(ENOLCK);
-    errno = 0;
-    EXPECT_FALSE(ReplaceFile(path, "new"));
-    EXPECT_EQ(errno, ENOLCK);
-    EXPECT_EQ(ReadFile(path), "old");
-    EXPECT_THAT(NamesIn(dir.Path()), ElementsAre(Name));
+    WriteFile(Temporary(0), "of somebody, dead or alive");
+    faults.fcntl = Failing(ENOLCK);
+    EXPECT_TRUE(ReplaceFile(path, "new"));
+    EXPECT_EQ(ReadFile(path), "new");
+    EXPECT_EQ(ReadFile(Temporary(0)), "of somebody, dead or alive");
+    EXPECT_EQ(NamesIn(dir.Path()).size(), 2U);
+}
+
+// The locks of lock files are others: who counts or refuses those does not meet these.
+TEST_F(ReplaceFileTest, NoFlockIsTaken)
+{
+    faults.flock = [](int /*fd*/, int /*operation*/) {
+        ADD_FAILURE();
+        return Failing(ENOLCK)();
+    };
+    EXPECT_TRUE(ReplaceFile(path, "text"));
+    EXPECT_EQ(ReadFile(path), "text");
+}
+
+TEST_F(ReplaceFileTest, ANameOfFullLengthIsReplaced)
+{
+    const std::string longest = dir.File(std::string(NAME_MAX, 'n'));
+    EXPECT_TRUE(ReplaceFile(longest, "old"));
+    EXPECT_TRUE(ReplaceFile(longest, "new"));
+    EXPECT_EQ(ReadFile(longest), "new");
+    EXPECT_EQ(NamesIn(dir.Path()).size(), 1U);
 }
 
 TEST_F(ReplaceFileTest, AFailureMakesNoFileWhereNoneWas)
@@ -701,7 +732,6 @@ TEST_F(ReplaceFileTest, PlacesWhereNoFileCanBeAreRefused)
         {"dir", EISDIR},
         {"file/doc", ENOTDIR},
         {std::string(300, 'n'), ENAMETOOLONG},
-        {std::string(250, 'n'), ENAMETOOLONG},  // for its temporary, with the suffix
     };
     for (const Row& row : table) {
         errno = 0;
