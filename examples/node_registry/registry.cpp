@@ -40,11 +40,12 @@ SqliteEqual Matches(const NodeKey& key)
     return {key.field, SqliteValue::EscapeText(key.text)};
 }
 
-// Whether the last try of a failed statement met a row that the schema refuses.
-bool IsConstraintFailure(const Json::Value& tries)
+// Whether a statement's only or last try met a row that the schema refuses.
+bool IsConstraintFailure(const Json::Value& record)
 {
-    if (!tries.isArray() || tries.empty()) return false;
-    return tries[tries.size() - 1]["err_msg"]["sqlite_errcode"] == SqliteConstraint;
+    const bool isList = record.isArray() && !record.empty();
+    const Json::Value& failure = isList ? record[record.size() - 1]["err_msg"] : record;
+    return failure.isObject() && failure["sqlite_errcode"] == SqliteConstraint;
 }
 
 }  // namespace
@@ -56,7 +57,7 @@ bool Registry::Create(Node& node)
     if (!IsNameFree(node)) return false;
     node.id = GenerateUUID();
     if (node.id.empty()) return Fail(ERR::ERR_NODE_CREATE, Reason("id", "cannot be made"));
-    return Insert(node) || FailAsWrite();
+    return db.InsertRecord(Insertion(node)) || FailAsWrite();
 }
 
 bool Registry::Find(const NodeKey& key, Node& ret_node)
@@ -114,6 +115,7 @@ bool Registry::Remove(const std::string& id)
 bool Registry::Replace(const std::vector<Node>& nodes)
 {
     if (!db.Open()) return Fail(ERR::ERR_DATABASE_OPERATION, Json::Value());
+    if (!db.CreateTable(table)) return FailAsDb();
     // Each statement by itself: a text of several would be repeated whole.
     if (!db.Exec("BEGIN IMMEDIATE")) return FailAsDb();
     if (FillAnew(nodes) && db.Exec("COMMIT")) return true;
@@ -123,18 +125,22 @@ bool Registry::Replace(const std::vector<Node>& nodes)
     return false;
 }
 
-bool Registry::Insert(const Node& node)
+InsertCommand Registry::Insertion(const Node& node) const
 {
     InsertCommand insert;
     insert.SetTable(table);
     insert.SetFieldValues(node.ToSqliteRecord());
-    return db.InsertRecord(insert);
+    return insert;
 }
 
+// Single tries alone: where SQLite has ended the transaction, another try would stay outside it.
 bool Registry::FillAnew(const std::vector<Node>& nodes)
 {
-    return db.DeleteAllRecords(table) &&
-           std::all_of(nodes.begin(), nodes.end(), [&](const Node& node) { return Insert(node); });
+    const auto insert = [&](const Node& node) {
+        return db.DoExecSqliteCommand(Insertion(node).GetCommand());
+    };
+    return db.DoExecSqliteCommand(db.GenerateDeleteCommand(table.GetName(), "")) &&
+           std::all_of(nodes.begin(), nodes.end(), insert);
 }
 
 bool Registry::SelectFirst(const NodeKey& key, SqliteValueList& ret_record)

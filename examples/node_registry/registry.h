@@ -49,7 +49,7 @@ class Registry {
   private:
     bool SelectFirst(const NodeKey& key, OrvaDRCore::SqliteValueList& ret_record);
     bool IsNameFree(const Node& node);
-    bool Insert(const Node& node);
+    OrvaDRCore::InsertCommand Insertion(const Node& node) const;
     bool FillAnew(const std::vector<Node>& nodes);
     bool Fail(int code, const Json::Value& errors);
     bool FailAsDb();
