@@ -171,24 +171,8 @@ bool File::parseLineKeyValue(const std::string& line, const std::string& separat
            toType(line.substr(at + separator.size()), value, V{});
 }
 
-template <class In, class Out>
-bool File::toType(const In& in, Out& out, const Out& fallback)
-{
-    std::stringstream stream;
-    stream << in;
-    if (stream.str().empty()) {
-        out = fallback;
-        return false;
-    }
-    stream >> out;  // its success is not looked at, on purpose
-    return true;
-}
-
 template int File::Read(const std::string&, std::map<std::string, std::string>&);
 template int File::Read(const std::string&, std::map<std::string, int>&);
 template int File::Read(const std::string&, std::map<std::string, double>&);
-template bool File::toType(const std::string&, std::string&, const std::string&);
-template bool File::toType(const std::string&, int&, const int&);
-template bool File::toType(const std::string&, double&, const double&);
 
 }  // namespace OrvaDRCore

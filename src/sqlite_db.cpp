@@ -73,7 +73,7 @@ SqliteValueList ParseRecord(sqlite3_stmt* statement)
 // How a statement with retries went.
 struct SqliteDB::Tries {
     bool succeeded;
-    unsigned long long failures;
+    unsigned int failures;
     std::string errors;  // the failed tries, as text for the log; empty when there are none
 };
 
@@ -226,10 +226,10 @@ bool SqliteDB::Exec(const std::string& command)
     }
     const Tries tries = TryRepeatedly([&] { return DoExecSqliteCommand(command); });
     if (!tries.succeeded) {
-        DR_LOG(Warn, "Reach retry limit [%llu], failed to exec command [%s] with err[%s]",
+        DR_LOG(Warn, "Reach retry limit [%u], failed to exec command [%s] with err[%s]",
                tries.failures, command.c_str(), tries.errors.c_str());
     } else if (tries.failures > 0) {
-        DR_LOG(Info, "After retry [%llu] times, success to exec command [%s], previous errors[%s]",
+        DR_LOG(Info, "After retry [%u] times, success to exec command [%s], previous errors[%s]",
                tries.failures, command.c_str(), tries.errors.c_str());
     }
     return tries.succeeded;
@@ -244,10 +244,10 @@ bool SqliteDB::SelectByCommand(const std::string& command, SqliteValueList& reco
     }
     const Tries tries = TryRepeatedly([&] { return DoSelectSqliteRecord(command, record); });
     if (!tries.succeeded) {
-        DR_LOG(Warn, "Reach retry limit [%llu], failed to select command with errors[%s] ",
+        DR_LOG(Warn, "Reach retry limit [%u], failed to select command with errors[%s] ",
                tries.failures, tries.errors.c_str());
     } else if (tries.failures > 0) {
-        DR_LOG(Info, "After retry [%llu] times, success to exec command [%s], previous errs[%s]",
+        DR_LOG(Info, "After retry [%u] times, success to exec command [%s], previous errs[%s]",
                tries.failures, command.c_str(), tries.errors.c_str());
     }
     return tries.succeeded;
@@ -262,10 +262,10 @@ bool SqliteDB::SelectByCommand(const std::string& command, std::vector<SqliteVal
     }
     const Tries tries = TryRepeatedly([&] { return DoSelectSqliteRecords(command, records); });
     if (!tries.succeeded) {
-        DR_LOG(Warn, "Reach retry limit [%llu], failed to exec command [%s] with errors [%s]",
+        DR_LOG(Warn, "Reach retry limit [%u], failed to exec command [%s] with errors [%s]",
                tries.failures, command.c_str(), tries.errors.c_str());
     } else if (tries.failures > 0) {
-        DR_LOG(Info, "After retry [%llu] times, success to select command, previous errs [%s]",
+        DR_LOG(Info, "After retry [%u] times, success to select command, previous errs [%s]",
                tries.failures, tries.errors.c_str());
     }
     return tries.succeeded;
@@ -354,7 +354,7 @@ SqliteDB::Tries SqliteDB::TryRepeatedly(Attempt attempt)
     const auto pause = [] { RandomSleepInMSec(MinPauseMSec, MaxPauseMSec); };
     const RetryOutcome outcome = Retry(retryLimit, attemptAndNote, pause);
 
-    Tries tries{outcome.succeeded, outcome.failures, {}};
+    Tries tries{outcome.succeeded, static_cast<unsigned int>(outcome.failures), {}};
     if (outcome.failures > 0) tries.errors = toString(errors);
     if (!outcome.succeeded) {
         errCode = ERR::ERR_DATABASE_OPERATION;

@@ -28,7 +28,8 @@
 /// **What runs in the child.** GetUpdatedData(), GetInfo(), IsValidData() and what they call may
 /// run in a forked child, which ends without exit handlers or destructors. They must not use what
 /// the caller had open: not its SqliteDB (SQLite connections do not survive a fork), not its
-/// sockets, not its locks. Open your own. What they compute reaches others through the cache file
+/// sockets, not its locks. Open your own; a database in which the caller is inside a transaction is
+/// closed to them. What they compute reaches others through the cache file
 /// alone. An exception out of them ends the child; in a caller that waits it goes on to the caller,
 /// behind the removal of the pid file.
 ///
@@ -54,20 +55,24 @@
 
 namespace OrvaDRCore {
 
-/// A cache of one JSON value; subclasses say what it holds. The order of the virtual operations is
-/// part of the binary interface.
+/// A cache of one JSON value; subclasses say what it holds. The head of cache.h tells when data is
+/// fresh, who waits, what may run in a child and what holds for threads. The order of the virtual
+/// operations is part of the binary interface.
 class ORVADRCORE_API Cache {
   public:
-    /// Nothing is read yet. The cache file is `dir` + "/" + `file` + ".cached"; beside it lies,
-    /// while a refresh runs, the same with ".pid". \param dir              its directory, made with
-    /// mode 0755 when missing \param file             its name, without ".cached" \param
-    /// timeoutSeconds   data whose file is older is stale \param updatedRequired  callers always
-    /// need fresh data: refresh in the caller, and wait \param retries          how often producing
-    /// and writing are tried again: this many times plus
-    ///                         one; not at all when negative
-    /// \note Logs WARN "Invalid dir[%s] and file[%s] to cache" when one of them is empty and ERR
-    ///       "Failed to create [%s]" when the directory cannot be made (function `GetCachedPath`).
-    ///       The cache file is then /tmp/default_dr_cache, which all such caches share.
+    /// Names the cache; nothing is read yet. The cache file is `dir` + "/" + `file` + ".cached";
+    /// beside it lies, while a refresh runs, the same with ".pid".
+    /// \param dir              its directory, made with mode 0755 when missing
+    /// \param file             its name, without ".cached"
+    /// \param timeoutSeconds   data whose file is older is stale, counted in whole seconds; with a
+    ///                         negative time-out every file is
+    /// \param updatedRequired  callers always need fresh data: refresh in the caller, and wait
+    /// \param retries          how often producing and writing are tried again: this many times
+    ///                         plus one; not at all when negative
+    /// \note Logs WARN `Invalid dir[%s] and file[%s] to cache` when one of them is empty and ERR
+    ///       `Failed to create [%s]`, behind the lines of File::CreateDir(), when the directory
+    ///       cannot be made (function `GetCachedPath`). The cache file is then
+    ///       /tmp/default_dr_cache, which all such caches share.
     Cache(const std::string& dir, const std::string& file, long timeoutSeconds,
           bool updatedRequired, int retries);
 
@@ -76,9 +81,11 @@ class ORVADRCORE_API Cache {
     // -------------------------------------------------------------- what a subclass has to say
 
     /// A value that names this cache and its parameters: stored in the file, printed in log lines.
+    /// \return any value
     virtual Json::Value GetInfo() const = 0;
 
-    /// What GetCachedData() gives when nothing can be loaded; null by default.
+    /// What GetCachedData() gives when nothing can be loaded.
+    /// \return the value; null by default
     virtual Json::Value GetDefaultValue() const;
 
     /// Produces fresh data; may run in a forked child.
@@ -87,47 +94,54 @@ class ORVADRCORE_API Cache {
     virtual bool GetUpdatedData(Json::Value& data) const = 0;
 
     /// Whether data may be cached, and given out without a refresh.
+    /// \param data  what was produced or loaded, or the default value
+    /// \return true when it may
     virtual bool IsValidData(const Json::Value& data) const = 0;
 
     /// Whether data that is neither old nor invalid is to be refreshed all the same, for instance
-    /// because it says that it is incomplete; false by default.
+    /// because it says that it is incomplete.
+    /// \param data  valid data
+    /// \return true for a refresh; false by default
     virtual bool IsNeedUpdate(const Json::Value& data) const;
 
-    /// Whether callers have to wait for fresh data. By default so when the constructor was told,
-    /// and otherwise when the cached data is not valid.
+    /// Whether callers have to wait for fresh data.
+    /// \return by default true when the constructor was told so, and otherwise when the cached data
+    ///         is not valid
     virtual bool IsUpdatedDataRequired() const;
 
     // ------------------------------------------------------------------------------------- reading
 
-    /// The data, refreshed when it is stale: see the head of this file.
+    /// The data, refreshed when it is stale: see the head of cache.h.
     /// \return fresh data; old data while another process refreshes, or when the refresh failed,
-    ///         with "Failed to update cache [%s], use old cache data."; the default value when
-    ///         there is none
+    ///         with DEBUG `Failed to update cache [%s], use old cache data.`; the default value
+    ///         when there is none
     /// \note Where callers wait, there is no limit to it: the wait ends when the file is fresh or
-    /// no
-    ///       updater lives any more.
+    ///       no updater lives any more.
     Json::Value Read() const;
 
     /// The data as it is, from memory while the file's modification time is that of the last load
-    /// or write, otherwise from the file. \return the data; the default value when the file cannot
-    /// be loaded, with
-    ///         "Failed to load cache [%s], use default cache data" behind the line of Load()
+    /// or write, otherwise from the file.
+    /// \return the data; the default value when the file cannot be loaded, with DEBUG
+    ///         `Failed to load cache [%s], use default cache data` behind the line of Load()
     Json::Value GetCachedData() const;
 
     /// Reads the file into memory. A document without "cached_data" counts as loaded and leaves the
     /// data in memory as it was.
-    /// \return false with "no data is cached in [%s]" (no file) or "Failed to read data from cache
-    ///         [%s]" (no JSON document); the data in memory is as it was then
+    /// \return false with DEBUG `no data is cached in [%s]` (no file) or
+    ///         `Failed to read data from cache [%s]` (no JSON document); the data in memory is as
+    ///         it was then
     bool Load() const;
 
-    /// Whether the file is missing or older than the time-out.
+    /// Whether the file is older than the time-out. A missing file counts as one from before 1970.
+    /// \return true when it is older, or when the time cannot be told
     bool IsTimeout() const;
 
-    /// The longest refresh so far in seconds, as the file says; 0 when it does not.
+    /// The longest refresh so far, as the file says.
+    /// \return seconds; 0 when the file does not say, or not as an integer
     int GetMaxUpdateTime() const;
 
     /// Deletes the cache file. Data in memory and the pid file stay.
-    /// \return 0, or -1 with errno set
+    /// \return 0, or -1 with errno set, also when there is no file
     int Remove();
 
     // ---------------------------------------------------------------------------------- refreshing
@@ -135,19 +149,26 @@ class ORVADRCORE_API Cache {
     /// Gets the data refreshed, whether it is stale or not: here, in a child, or by waiting for
     /// another process, as IsUpdatedDataRequired() says.
     /// \return true after a refresh here, when a child was started, when another process is at
-    /// work,
-    ///         and after waiting for one, whatever came of it. False when the refresh here failed,
-    ///         and with WARN "Failed to fork(). errno=[%d/%m]"
-    /// \note Lines: "start to block wait cache [%s] ", "finish to block wait cache [%s] ",
-    ///       "Failed to lock [%s]", "there is other process to update cache [%s]",
-    ///       "Failed to set cache [%s] updating", "---> Start to update cache [%s]",
-    ///       "<--- Finish to update cache [%s]",
-    ///       "Failed to unset updating cache [%s] since different pid[%d]"
+    ///         work, and after waiting for one, whatever came of it. False when the refresh here
+    ///         failed, or when another process was faster to begin one; and with WARN
+    ///         `Failed to fork(). errno=[%d/%m]` when no child could be made
+    /// \note A caller that waits looks again after pauses of 300 to 1000 milliseconds. It logs, at
+    ///       DEBUG, `start to block wait cache [%s] ` before and
+    ///       `finish to block wait cache [%s] ` after, both with a blank at the end.
+    /// \note A refresh logs, at DEBUG, `---> Start to update cache [%s]` once it is marked in the
+    ///       pid file, or why it was not (function `SetUpdating`): `Failed to lock [%s]` (not to be
+    ///       had within six tries, a second apart), `there is other process to update cache [%s]`
+    ///       or `Failed to set cache [%s] updating` (the pid file could not be written). At its end
+    ///       it logs, at DEBUG, `<--- Finish to update cache [%s]`, or
+    ///       `Failed to unset updating cache [%s] since different pid[%d]` when the pid file is by
+    ///       then that of another living process (function `UnsetUpdating`). In between come the
+    ///       lines of DoUpdate(); those of the lock are at ERR, see FileLock::lock().
     bool Update() const;
 
     /// Produces data, with retries after pauses of 500 to 1000 milliseconds, and writes it. Takes
-    /// no lock and marks nothing. \return false with "Failed to get updated cache [%s] and reach
-    /// the retry limit[%d]", or as
+    /// no lock and marks nothing.
+    /// \return false with DEBUG
+    ///         `Failed to get updated cache [%s] and reach the retry limit[%d]`, or as
     ///         UpdateWithData()
     bool DoUpdate() const;
 
@@ -155,24 +176,26 @@ class ORVADRCORE_API Cache {
     /// whole. Takes no lock and marks nothing.
     /// \param data    the data
     /// \param begin   when producing began, in seconds since the epoch; below 1 if not known
-    /// \param finish  when it ended, likewise
-    /// \return false with "[%s] is not valid to update for cache [%s]" or
-    ///         "Failed to write cache to file [%s] and reach retry limit[%d]"; the file is as it
-    ///         was
+    /// \param finish  when it ended, likewise; when one is not known, both are stored as 0
+    /// \return false with DEBUG `[%s] is not valid to update for cache [%s]` or
+    ///         `Failed to write cache to file [%s] and reach retry limit[%d]`; file and data in
+    ///         memory are as they were
     bool UpdateWithData(const Json::Value& data, long begin, long finish) const;
 
     /// As above, times not known.
+    /// \param data  the data
+    /// \return as above
     bool UpdateWithData(const Json::Value& data) const;
 
   private:
-    std::string PidPath() const;
-    std::string LockName() const;
+    ORVADRCORE_LOCAL std::string PidPath() const;
+    ORVADRCORE_LOCAL std::string LockName() const;
     bool IsUpdating() const;
     bool SetUpdating() const;
     void UnsetUpdating() const;
-    void WaitForUpdater() const;
-    bool Refresh() const;
-    [[noreturn]] void RefreshInChild() const;
+    ORVADRCORE_LOCAL void WaitForUpdater() const;
+    ORVADRCORE_LOCAL bool Refresh() const;
+    [[noreturn]] ORVADRCORE_LOCAL void RefreshInChild() const;
 
     std::string cachedPath;
     long timeout;

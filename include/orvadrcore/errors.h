@@ -8,7 +8,8 @@
 ///
 /// Codes are plain `int` values and success is 0, which has no name. Of these codes the library
 /// itself stores only BAD_PARAMETER, ERR_NULL_POINTER and ERR_DATABASE_OPERATION (in SqliteDB); the
-/// others are for the programs that use it. Any thread may call ToString() at any time.
+/// others are for the programs that use it. Any thread may call ToString() at any time; nothing is
+/// logged.
 #ifndef ORVADRCORE_ERRORS_H
 #define ORVADRCORE_ERRORS_H
 
@@ -69,8 +70,8 @@ class ORVADRCORE_API ERR {
 
     /// The name of a code, spelled as its enumerator.
     /// \param code  any number
-    /// \return the name; "<UNKNOWN ERR CODE>" for every number that is no code, 0 included.
-    ///         Takes constant time and allocates nothing but the text that it returns.
+    /// \return the name; `<UNKNOWN ERR CODE>` for every number that is no code, 0 included
+    /// \note Takes constant time and allocates nothing but the text that it returns.
     static std::string ToString(int code);
 };
 

@@ -15,6 +15,7 @@
 #define ORVADRCORE_FILE_H
 
 #include <map>
+#include <sstream>
 #include <string>
 
 #include <json/value.h>
@@ -30,11 +31,12 @@ class ORVADRCORE_API File {
 
     // ------------------------------------------------------------------------------ JSON documents
 
-    /// Reads a file that holds one JSON document. A missing file is a success that reads nothing.
+    /// Reads a file that holds one JSON document. A missing file is a success that reads nothing,
+    /// and so is one in a directory that the process may not search.
     /// \param path        the file
     /// \param[out] value  the document; untouched when the file is missing, and on failure
     /// \return false for a file that does not parse or is a directory, without a line, and for one
-    ///         that cannot be opened, with ERR "File[%s] is not opened."
+    ///         that cannot be opened, with ERR `File[%s] is not opened.`
     static bool Read(const std::string& path, Json::Value& value);
 
     /// Reads a JSON document from a descriptor, from where it stands to its end.
@@ -42,47 +44,55 @@ class ORVADRCORE_API File {
     ///                    held through it ends), unless the stream cannot be made
     /// \param[out] value  the document; untouched on failure
     /// \return false for a text that does not parse, without a line, and when no stream can be made
-    ///         of the descriptor, with ERR "Failed to open file descriptor [%d]"
+    ///         of the descriptor, with ERR `Failed to open file descriptor [%d]`
     static bool Read(int fd, Json::Value& value);
 
-    /// Writes a JSON document and a newline into a file, which is made or emptied first.
-    /// \return false with ERR "Empty path to write.", "File [%s] is not opened." or
-    ///         "Failed to write [%s] to [%s]." (the document, the path)
+    /// Writes a JSON document and a newline into a file, which is made, with mode 0666 less the
+    /// umask, or emptied first.
+    /// \param path   the file; its directory must be there
+    /// \param value  the document
+    /// \return false with ERR `Empty path to write.`, `File [%s] is not opened.` or
+    ///         `Failed to write [%s] to [%s].` (the document, the path)
     /// \warning The file is written in place: a reader may see a part of it, and a write that fails
     ///          leaves a part behind. A Cache replaces its file whole.
     static bool Write(const std::string& path, const Json::Value& value);
 
     /// Writes a JSON document, without a newline, at the place where a descriptor stands.
     /// \param fd     a descriptor open for writing; **closed** by the call, unless the stream
-    /// cannot
-    ///               be made. Nothing is truncated: do that first where it is needed
+    ///               cannot be made. Nothing is truncated: do that first where it is needed
     /// \param value  the document
-    /// \return false with ERR "Failed to open file descriptor [%d]" or
-    ///         "Failed to write [%s] to fd[%d]" (the document, the descriptor)
+    /// \return false with ERR `Failed to open file descriptor [%d]` or
+    ///         `Failed to write [%s] to fd[%d]` (the document, the descriptor)
     static bool Write(int fd, const Json::Value& value);
 
     // --------------------------------------------------------------------------------- directories
 
     /// Makes a directory, and its parents, with /bin/mkdir.
-    /// \param path  the directory; one that is there already is left as it is
+    /// \param path  the directory; one that is there already is left as it is, whatever the mode
     /// \param mode  its permission bits, at most 0777; parents are made with the usual ones
-    /// \return false for an empty path, without a line; with ERR "Directory mode error: %o" for a
-    ///         mode above 0777, "snprintf error with mode [%o]" for a negative one, and
-    ///         "Failed to create dir [%s] with mode [%o]"
+    /// \return false for an empty path, without a line; with ERR `Directory mode error: %o` for a
+    ///         mode above 0777, `snprintf error with mode [%o]` for a negative one, and
+    ///         `Failed to create dir [%s] with mode [%o]` when mkdir fails
     /// \note Starts a process when the directory is missing. A path that begins with "-" is taken
     ///       for an option by mkdir.
     static bool CreateDir(const std::string& path, int mode);
 
     /// Removes a directory and all that is in it, with /bin/rm.
-    /// \return true also when there is no such directory; nothing is logged
+    /// \param path  the directory; a path that names anything else is left as it is
+    /// \return false when rm fails; true also when there is no such directory. Nothing is logged
+    /// \note Starts a process when the directory is there. A path that begins with "-" is taken for
+    ///       options by rm, and fails.
     static bool RemoveDir(const std::string& path);
 
-    /// The text before the last "/": "/a/b" of "/a/b/c". A path without a slash is given back
-    /// whole,
-    /// "/a" and "/" have the empty text, and "/a/b/" has "/a/b".
+    /// The text before the last "/".
+    /// \param path  the path; it is not looked up
+    /// \return "/a/b" for "/a/b/c" and for "/a/b/"; the empty text for "/a" and "/"; a path without
+    ///         a slash whole
     static std::string GetParentDir(const std::string& path);
 
     /// Whether a descriptor is open on a regular file.
+    /// \param fd  any number
+    /// \return true when it is
     static bool IsRegularFile(int fd);
 
     // --------------------------------------------------------------------------- "key=value" files
@@ -92,24 +102,31 @@ class ORVADRCORE_API File {
     /// Of key and value the first word counts; blanks around them do not. Numbers are what the
     /// standard streams read from the beginning of the text: "12abc" is 12, "abc" is 0, a number
     /// too large the largest there is. Of two lines with the same key the first counts. There are
-    /// no comments: a line with "=" is a pair, whatever it begins with. \tparam K  `std::string`
-    /// \tparam V  `std::string`, `int` or `double`
-    /// \param path      the file
+    /// no comments: a line with "=" is a pair, whatever it begins with, unless one of its sides is
+    /// empty.
+    /// \tparam K        `std::string`
+    /// \tparam V        `std::string`, `int` or `double`
+    /// \param path      the file; a directory reads like an empty file
     /// \param[out] out  the pairs; untouched when the file is missing or cannot be opened
     /// \return the number of pairs; 0 when the file is missing; -1 when it cannot be opened, with
-    ///         WARN "File[%s] is not opened." Lines that are no pair are passed over, with NOTICE
-    ///         "Failed to parse line[%s] from file [%s]", before it WARN "Bad Parameter." for an
-    ///         empty line and NOTICE "Cannot find separator[%s] in line[%s]" for one without "="
+    ///         WARN `File[%s] is not opened.`
+    /// \note A line that is no pair is passed over, with NOTICE
+    ///       `Failed to parse line[%s] from file [%s]`; before it stands WARN `Bad Parameter.` for
+    ///       an empty line and NOTICE `Cannot find separator[%s] in line[%s]` for one without "="
+    ///       (both in the function `parseLineKeyValue`).
     template <class K, class V>
     static int Read(const std::string& path, std::map<K, V>& out);
 
     /// Reads a value from a text, as the standard streams do: the first word, or the number that
-    /// the text begins with. \tparam In   `std::string` \tparam Out  `std::string`, `int` or
-    /// `double` \param in        the text \param[out] out  the value. Where there is none to read:
-    /// 0 for a text that is no number;
+    /// the text begins with.
+    /// \tparam In       any type that a stream writes
+    /// \tparam Out      any type that a stream reads
+    /// \param in        the text
+    /// \param[out] out  the value. Where there is none to read: 0 for a text that is no number;
     ///                  untouched for a text of blanks
     /// \param fallback  the value for an empty text
-    /// \return false for an empty text; true for all others, whether a value was read or not
+    /// \return false for an empty text; true for all others, whether a value was read or not.
+    ///         Nothing is logged
     template <class In, class Out>
     static bool toType(const In& in, Out& out, const Out& fallback);
 
@@ -119,12 +136,24 @@ class ORVADRCORE_API File {
                                   V& value);
 };
 
+/// \cond INSTANTIATIONS
 extern template int File::Read(const std::string&, std::map<std::string, std::string>&);
 extern template int File::Read(const std::string&, std::map<std::string, int>&);
 extern template int File::Read(const std::string&, std::map<std::string, double>&);
-extern template bool File::toType(const std::string&, std::string&, const std::string&);
-extern template bool File::toType(const std::string&, int&, const int&);
-extern template bool File::toType(const std::string&, double&, const double&);
+
+template <class In, class Out>
+bool File::toType(const In& in, Out& out, const Out& fallback)
+{
+    std::stringstream stream;
+    stream << in;
+    if (stream.str().empty()) {
+        out = fallback;
+        return false;
+    }
+    stream >> out;  // its success is not looked at, on purpose
+    return true;
+}
+/// \endcond
 
 }  // namespace OrvaDRCore
 

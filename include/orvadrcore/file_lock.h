@@ -31,13 +31,15 @@
 
 namespace OrvaDRCore {
 
-/// A lock file, open from the first use until the object goes.
+/// A lock file, open from the first use until the object goes. The head of file_lock.h tells what
+/// holds for processes, threads, forks and rights.
 class ORVADRCORE_API FileLock {
   public:
     /// No lock file yet: see setLockFile().
     FileLock() = default;
 
-    /// The lock of that name; nothing is opened yet. For an empty name as getLockFilePath().
+    /// The lock of that name; nothing is opened yet.
+    /// \param name  the name; for an empty one as getLockFilePath()
     explicit FileLock(const std::string& name);
 
     FileLock(const FileLock&) = delete;
@@ -46,41 +48,47 @@ class ORVADRCORE_API FileLock {
     /// Closes the file, which frees the lock.
     ~FileLock();
 
-    /// The file of a lock: "/tmp/.orvadr_lock/" and the name as it stands. Slashes in it make
-    /// directories, a leading one a double slash.
-    /// \return the path; empty for an empty name, with "Bad lock file[%s]"
+    /// The file of a lock: "/tmp/.orvadr_lock/" and the name as it stands.
+    /// \param name  the name; slashes in it make directories, a leading one a double slash
+    /// \return the path; empty for an empty name, with ERR `Bad lock file[%s]`
     static std::string getLockFilePath(const std::string& name);
 
     /// Points the object at another name, as long as its file is not open.
-    /// \return false for an empty name, with "Failed to set lock path [%s]"; and for another name
-    ///         than that of the open file, with
-    ///         "File [%s] has been open, can not set file path to [%s]"
+    /// \param name  the name, as in getLockFilePath()
+    /// \return false for an empty name, with ERR `Failed to set lock path [%s]`; and for another
+    ///         name than that of the open file, with ERR
+    ///         `File [%s] has been open, can not set file path to [%s]`. The name stays then
     bool setLockFile(const std::string& name);
 
     /// Makes the directory of the lock file, with mode 0755, when it is missing.
-    /// \return false when there is no lock file; and when the directory cannot be made, with
-    ///         "Failed to create lock dir [%s] in local host" behind the lines of File::CreateDir()
+    /// \return false when the object has no name, without a line; and when the directory cannot be
+    ///         made, with ERR `Failed to create lock dir [%s] in local host` behind the lines of
+    ///         File::CreateDir()
     bool checkLockDir() const;
 
     /// Opens the lock file, unless it is open, and makes it when it is missing.
-    /// \return false with "Bad Lock File" (no name), "Failed to check lock dir of lock file [%s]."
-    ///         or "Failed to open lock file[%s], errno=%m"
+    /// \return false with ERR: `Bad Lock File` (no name),
+    ///         `Failed to check lock dir of lock file [%s].` behind the lines of checkLockDir(), or
+    ///         `Failed to open lock file[%s], errno=%m`
     bool openLockedFile();
 
-    /// Takes the lock, opening the file first.
+    /// Takes the lock, opening the file first. A lock of the other kind that the object holds is
+    /// given up for it.
     /// \param operation  `LOCK_SH` or `LOCK_EX`; with `LOCK_NB` it is tried, otherwise waited for
     /// \param retries    how often a try that failed is made again, a second later each time
     /// \return false when the tries are used up, without a line; and when the file cannot be
-    /// opened,
-    ///         with "Bad fd [%d] to lock [%s]" behind the lines of openLockedFile()
+    ///         opened, with ERR `Bad fd [%d] to lock [%s]` behind the lines of openLockedFile()
     bool lock(int operation, unsigned int retries);
 
     /// Whether the lock could be taken right now: takes it once and frees it again.
     /// \param operation  as in lock(); without `LOCK_NB` the call waits
+    /// \return true when it was taken; false as lock()
     /// \warning The lock is not held afterwards, whatever the answer.
     bool tryLock(int operation);
 
-    /// Frees the lock; the file stays open. Logs "Failed to unlock [%s] with fd [%d], errno=[%m]".
+    /// Frees the lock; the file stays open.
+    /// \note Logs ERR `Failed to unlock [%s] with fd [%d], errno=[%m]` when the kernel refuses. An
+    ///       object whose file is not open is passed over.
     void unlock() const;
 
   private:

@@ -34,6 +34,7 @@ class ORVADRCORE_API Request {
     /// Not valid yet: no API, no method, version -1, time-out 300, no parameters.
     Request() = default;
 
+    /// A request with API, version, method and parameters; the other parts have their defaults.
     /// \param apiName     the API
     /// \param apiVersion  its version, valid above 0; note the place between the two names
     /// \param methodName  the method
@@ -42,17 +43,18 @@ class ORVADRCORE_API Request {
             const Json::Value& parameters);
 
     /// A default request, then setRequest().
+    /// \param request  as in setRequest()
     Request(const Json::Value& request);
 
-    Request(const Request&) = default;
-    Request& operator=(const Request&) = default;
+    Request(const Request&) = default;             ///< A copy of all parts.
+    Request& operator=(const Request&) = default;  ///< \return this request, now such a copy
     virtual ~Request();
 
     /// Takes a request in its JSON form: "api" and "method" where they are texts and "version"
     /// where it is an integer become the fields of those names; everything else becomes the
     /// parameters, a reserved key of the wrong type included. A field whose key is missing keeps
-    /// its value; time-out, upload file and encryption are never taken from JSON. \param request
-    /// the JSON form; a value that is no object is kept as parameters as it is
+    /// its value; time-out, upload file and encryption are never taken from JSON.
+    /// \param request  the JSON form; a value that is no object is kept as parameters as it is
     void setRequest(const Json::Value& request);
 
     /// Back to the defaults.
@@ -60,28 +62,73 @@ class ORVADRCORE_API Request {
     ///       an object becomes an empty one.
     void clear();
 
-    void setVersion(int apiVersion);                        ///< Stores the version, unchecked.
-    void setMethod(const std::string& methodName);          ///< Stores the method.
-    void setAPI(const std::string& apiName);                ///< Stores the API.
-    void setTimeout(int limit);                             ///< Stores the transport's time-out.
-    void setUploadFile(const UploadFileDescription& file);  ///< Stores the file to send along.
-    bool setEncryptRequired(bool required);                 ///< Stores the flag. \return true
+    // --------------------------------------------------------------------------- setting the parts
 
-    const std::string& getAPI() const { return api; }        ///< The API; empty by default.
-    const std::string& getMethod() const { return method; }  ///< The method; empty by default.
-    int getVersion() const { return version; }               ///< The version; -1 by default.
-    const Json::Value& getParams() const { return params; }  ///< The parameters; null by default.
-    int getTimeout() const { return timeout; }  ///< For the transport, in its unit; 300 by default.
-    const UploadFileDescription& getUploadFile() const
-    {
-        return uploadFile;
-    }                                                           ///< Empty by default.
-    bool isEncryptRequired() const { return encryptRequired; }  ///< False by default.
+    /// Stores the version.
+    /// \param apiVersion  any number; the request is valid with one above 0
+    void setVersion(int apiVersion);
 
-    /// Whether a key is free for parameters: every key is but "api", "method" and "version".
+    /// Stores the method.
+    /// \param methodName  any text; the request is valid with one that is not empty
+    void setMethod(const std::string& methodName);
+
+    /// Stores the API.
+    /// \param apiName  any text; the request is valid with one that is not empty
+    void setAPI(const std::string& apiName);
+
+    /// Stores the transport's time-out.
+    /// \param limit  any number, in the transport's unit
+    void setTimeout(int limit);
+
+    /// Stores the file to send along.
+    /// \param file  names the file, which is neither opened nor looked up
+    void setUploadFile(const UploadFileDescription& file);
+
+    /// Stores whether the transport has to encrypt.
+    /// \param required  true when it has to
+    /// \return true
+    bool setEncryptRequired(bool required);
+
+    // ---------------------------------------------------------------------------- asking for parts
+
+    /// The API.
+    /// \return its name; empty by default
+    const std::string& getAPI() const { return api; }
+
+    /// The method.
+    /// \return its name; empty by default
+    const std::string& getMethod() const { return method; }
+
+    /// The version.
+    /// \return the number; -1 by default
+    int getVersion() const { return version; }
+
+    /// The parameters.
+    /// \return what was set, an object in a useful request; null by default
+    const Json::Value& getParams() const { return params; }
+
+    /// The time-out, for the transport.
+    /// \return the number, in the transport's unit; 300 by default
+    int getTimeout() const { return timeout; }
+
+    /// The file to send along.
+    /// \return its names; both empty by default
+    const UploadFileDescription& getUploadFile() const { return uploadFile; }
+
+    /// Whether the transport has to encrypt.
+    /// \return what was set; false by default
+    bool isEncryptRequired() const { return encryptRequired; }
+
+    // ---------------------------------------------------------------------------------- parameters
+
+    /// Whether a key is free for parameters.
+    /// \param key  the key
+    /// \return false for "api", "method" and "version", true for all others
     static bool isValidKey(const std::string& key);
 
     /// Sets one parameter.
+    /// \param key    its key; of two with the same key the later counts
+    /// \param value  its value, copied
     /// \return false, nothing changed, for a reserved key and when the parameters are neither null
     ///         nor an object
     bool addParam(const std::string& key, const Json::Value& value);
@@ -93,18 +140,23 @@ class ORVADRCORE_API Request {
     ///         over a reserved key is no failure
     bool addParam(const Json::Value& object);
 
+    // ----------------------------------------------------------------------------------- the whole
+
     /// Whether API and method are given and the version is above 0.
+    /// \return true when all three are so
     bool isValid() const;
 
-    /// The JSON form: the parameters and the three reserved keys, in one object. Parameters that
-    /// are neither null nor an object are left out.
+    /// The JSON form: the parameters and the three reserved keys, in one object.
+    /// \return the object, of a request that is not valid, too. Parameters that are neither null
+    ///         nor an object are left out; one with a reserved key gives way
     Json::Value toJson() const;
 
-    /// "API/method/version", without parameters.
+    /// The request for a reader of the log, without parameters.
+    /// \return "API/method/version"
     std::string toStr() const;
 
   private:
-    bool takesParams() const;
+    ORVADRCORE_LOCAL bool takesParams() const;
 
     int version = -1;
     int timeout = 300;

@@ -36,62 +36,134 @@ class ORVADRCORE_API Response {
     /// A null reply: not valid.
     Response() = default;
 
-    Response(const Response& other);  ///< Copies the reply.
-    Response& operator=(const Response&) = default;
-    Response(const std::string& text);   ///< As setResp(), the answer dropped.
-    Response(const char* text);          ///< As above; null is a text that does not parse.
-    Response(const Json::Value& reply);  ///< Copies the reply.
+    /// A copy of the reply.
+    /// \param other  where it comes from
+    Response(const Response& other);
+    Response& operator=(const Response&) = default;  ///< \return this response, now a copy, too
+
+    /// As setResp(const std::string&), the answer dropped: ask isValid().
+    /// \param text  the reply as JSON text
+    Response(const std::string& text);
+
+    /// As above.
+    /// \param text  the reply as JSON text; null is a text that does not parse
+    Response(const char* text);
+
+    /// Takes a reply that is parsed already.
+    /// \param reply  the reply, copied; any value
+    Response(const Json::Value& reply);
     virtual ~Response();
 
     /// Parses a reply. The whole text must be one JSON document.
-    /// \return false when it is not; the reply is null then, whatever it was before
+    /// \param text  the reply as JSON text
+    /// \return false when it is no JSON document; the reply is null then, whatever it was before
     bool setResp(const std::string& text);
-    bool setResp(const char* text);          ///< As above; null is a text that does not parse.
-    void setResp(const Json::Value& reply);  ///< Copies the reply.
+
+    /// As above.
+    /// \param text  the reply as JSON text; null is a text that does not parse
+    /// \return as above
+    bool setResp(const char* text);
+
+    /// Takes a reply that is parsed already.
+    /// \param reply  the reply, copied; any value
+    void setResp(const Json::Value& reply);
 
     /// Drops the reply's content: an object or array becomes empty, anything else null.
     void clear();
 
-    const Json::Value& getResp() const { return resp; }  ///< The whole reply.
+    // ----------------------------------------------------------------------------- the whole reply
 
-    bool isValid() const;    ///< Whether the reply is an object with a member "success".
-    bool isSuccess() const;  ///< Whether the reply is valid and "success" is true, as a boolean.
+    /// The whole reply.
+    /// \return the reply as it is; null when there is none
+    const Json::Value& getResp() const { return resp; }
 
-    /// The "code" of "error", of a valid reply; -1 when it is absent or no integer.
+    /// Whether this is a reply at all.
+    /// \return true for an object with a member "success"
+    bool isValid() const;
+
+    /// Whether the call succeeded.
+    /// \return true for a valid reply whose "success" is true, as a boolean: a number that is not 0
+    ///         is true, a text never
+    bool isSuccess() const;
+
+    // -------------------------------------------------------------------------------------- errors
+
+    /// The "code" of "error", of a valid reply.
+    /// \return the code; -1 when it is absent or no integer of 32 bits
     int getErrCode() const;
 
-    /// A copy of "errors" of "error", of a valid reply; null when it is absent.
+    /// The "errors" of "error", of a valid reply.
+    /// \return a copy; null when it is absent
     Json::Value getErrMsg() const;
 
-    /// A copy of "error", of any reply; null when it is absent.
+    /// The "error" of any reply.
+    /// \return a copy; null when it is absent
     Json::Value getErr() const;
 
-    bool hasData() const;                ///< Whether the reply is a success and has "data".
-    const Json::Value& getData() const;  ///< "data" of a successful reply, otherwise null.
+    // ---------------------------------------------------------------------------------------- data
 
-    bool hasDataField(const char* key) const;                ///< Whether "data" has a member.
-    const Json::Value& getDataField(const char* key) const;  ///< A member of "data", or null.
+    /// Whether the reply is a success and has "data".
+    /// \return true when it is and has
+    bool hasData() const;
 
-    /// A member of "data" that is a text; empty for any other: numbers are not converted.
+    /// The "data" of a successful reply.
+    /// \return the value; null when there is none
+    const Json::Value& getData() const;
+
+    /// Whether "data" has a member.
+    /// \param key  the member's name
+    /// \return true when it is there
+    bool hasDataField(const char* key) const;
+
+    /// A member of "data".
+    /// \param key  the member's name
+    /// \return the member; null when it is absent
+    const Json::Value& getDataField(const char* key) const;
+
+    /// A member of "data" that is a text.
+    /// \param key  the member's name
+    /// \return the text; empty for any other member: numbers are not converted
     std::string getDataFieldtoStr(const char* key) const;
 
-    bool isPollFinish() const;   ///< Whether the task has ended: "finish" of "data", as a boolean.
-    bool isPollSuccess() const;  ///< Whether it succeeded: "success" of "data", as a boolean.
+    // ----------------------------------------------------------------------- a task that is polled
 
-    /// "task_id" of "data", as text: numbers and booleans are converted; empty when it is absent,
-    /// an array or an object.
+    /// Whether the task has ended.
+    /// \return the "finish" of "data" as a boolean, as in isSuccess()
+    bool isPollFinish() const;
+
+    /// Whether the task succeeded.
+    /// \return the "success" of "data" as a boolean, as in isSuccess()
+    bool isPollSuccess() const;
+
+    /// The "task_id" of "data", as text.
+    /// \return the id: numbers and booleans are converted; empty when it is absent, an array or an
+    ///         object
     std::string getTaskId() const;
 
-    bool hasField(const char* key) const;                ///< Whether any reply has a member.
-    const Json::Value& getField(const char* key) const;  ///< A member of any reply, or null.
+    // ---------------------------------------------------------------------------- any other member
 
-    bool hasAdditional() const;                ///< Whether "data" has "additional".
-    const Json::Value& getAdditional() const;  ///< "additional" of "data", or null.
+    /// Whether the reply has a member, be it a success or not.
+    /// \param key  the member's name
+    /// \return true when it is there
+    bool hasField(const char* key) const;
+
+    /// A member of the reply, be it a success or not.
+    /// \param key  the member's name
+    /// \return the member; null when it is absent
+    const Json::Value& getField(const char* key) const;
+
+    /// Whether "data" has "additional".
+    /// \return true when it is there
+    bool hasAdditional() const;
+
+    /// The "additional" of "data".
+    /// \return the value; null when it is absent
+    const Json::Value& getAdditional() const;
 
   private:
-    const Json::Value* findData() const;
-    const Json::Value* findDataField(const char* key) const;
-    const Json::Value* findErrorField(const char* key) const;
+    ORVADRCORE_LOCAL const Json::Value* findData() const;
+    ORVADRCORE_LOCAL const Json::Value* findDataField(const char* key) const;
+    ORVADRCORE_LOCAL const Json::Value* findErrorField(const char* key) const;
 
     // Behind the references that are given out for what is absent; always null.
     Json::Value emptyValue;

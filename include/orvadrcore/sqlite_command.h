@@ -36,17 +36,23 @@ class ORVADRCORE_API SqliteTableHandler {
   public:
     SqliteTableHandler() = default;
 
+    /// A table of that name.
     /// \param tableName    the table's name
     /// \param tableSchema  what stands between the parentheses of CREATE TABLE; with an empty text
     ///                     the table is never created
     SqliteTableHandler(const std::string& tableName, const std::string& tableSchema);
 
-    SqliteTableHandler(const SqliteTableHandler&) = default;
-    SqliteTableHandler& operator=(const SqliteTableHandler&) = default;
+    SqliteTableHandler(const SqliteTableHandler&) = default;             ///< A copy of both.
+    SqliteTableHandler& operator=(const SqliteTableHandler&) = default;  ///< \return this, a copy
     virtual ~SqliteTableHandler();
 
-    const std::string& GetName() const { return name; }      ///< The table's name.
-    const std::string& GetSchema() const { return schema; }  ///< The definition of its columns.
+    /// The table's name.
+    /// \return the name as it was given
+    const std::string& GetName() const { return name; }
+
+    /// The definition of its columns.
+    /// \return the schema as it was given; empty for a table that is never created
+    const std::string& GetSchema() const { return schema; }
 
   private:
     std::string name;
@@ -59,30 +65,35 @@ class ORVADRCORE_API SqliteCommand {
   public:
     virtual ~SqliteCommand();
 
-    /// The statement; empty, with a line at ERR, when the command is not valid.
+    /// The statement.
+    /// \return SQL text; empty, with a line at ERR, when the command is not valid
     virtual std::string GetCommand() const = 0;
 
     /// Whether everything is there that the statement needs.
+    /// \return true when GetCommand() has a statement
     virtual bool IsValid() const = 0;
 
     /// Writes the command's parameters for a reader of the log.
+    /// \param[out] out  takes the text, behind what it holds already
     virtual void DumpParam(std::stringstream& out) const = 0;
 
     /// Sets the table.
-    /// \return false when its name is empty, with ERR "Invalid table [%s]"
+    /// \param handler  the table, copied
+    /// \return false when its name is empty, with ERR `Invalid table [%s]`; the previous one stays
     bool SetTable(const SqliteTableHandler& handler);
 
-    /// The table; without a name until SetTable() succeeded.
+    /// The table.
+    /// \return the table; without a name until SetTable() succeeded
     const SqliteTableHandler& GetTable() const { return table; }
 
-    /// The command for a reader of the log: the table's name, "]" and the parameters. The bracket
-    /// has no partner, on purpose. Works on commands that are not valid, too.
+    /// The command for a reader of the log. Works on commands that are not valid, too.
+    /// \return the table's name, "]" and the parameters; the bracket has no partner, on purpose
     std::string ToStr() const;
 
   protected:
     SqliteCommand() = default;
-    SqliteCommand(const SqliteCommand&) = default;
-    SqliteCommand& operator=(const SqliteCommand&) = default;
+    SqliteCommand(const SqliteCommand&) = default;             ///< A copy of the table.
+    SqliteCommand& operator=(const SqliteCommand&) = default;  ///< \return this, now such a copy
 
   private:
     SqliteTableHandler table;
@@ -92,33 +103,56 @@ class ORVADRCORE_API SqliteCommand {
 class ORVADRCORE_API InsertCommand : public SqliteCommand {
   public:
     InsertCommand() = default;
-    InsertCommand(const InsertCommand&) = default;
-    InsertCommand& operator=(const InsertCommand&) = default;
+    InsertCommand(const InsertCommand&) = default;             ///< A copy of the command.
+    InsertCommand& operator=(const InsertCommand&) = default;  ///< \return this, now such a copy
     ~InsertCommand() override;
 
     /// Replaces all columns by the record's.
+    /// \param values  the columns and their values, copied; an empty record leaves none
     void SetFieldValues(const SqliteValueList& values);
 
-    /// With true the statement becomes INSERT OR REPLACE.
+    /// Decides what happens where a row with the same key is there.
+    /// \param allowed  true for INSERT OR REPLACE, false, the default, for INSERT
     void SetReplacable(bool allowed);
 
     /// Adds a column; of two with the same name the later counts.
-    /// \tparam T  `std::string`, `bool`, `int` or `unsigned int`
-    /// \return false when `field` is empty (or a text null), with ERR
-    ///         "Bad Field [%s] /value[%s]"
+    /// \tparam T     `std::string`, `bool`, `int` or `unsigned int`
+    /// \param field  the column's name, written as it stands
+    /// \param value  its value; a text is quoted but not escaped
+    /// \return false when `field` is empty, with ERR `Bad Field [%s] /value[%s]`; the columns are
+    ///         unchanged then
     template <class T>
     bool AddFieldValue(const std::string& field, const T& value);
-    bool AddFieldValue(const std::string& field, const char* text);  ///< A text, as above.
+
+    /// As above, for a text.
+    /// \param field  the column's name
+    /// \param text   its value
+    /// \return as above; false also when `text` is null
+    bool AddFieldValue(const std::string& field, const char* text);
+
+    /// As above, for a text in a buffer.
+    /// \param field  the column's name
+    /// \param text   its value
+    /// \return as above
+    bool AddFieldValue(const std::string& field, char* text)
+    {
+        return AddFieldValue(field, static_cast<const char*>(text));
+    }
 
     /// Whether there are a table and at least one column.
+    /// \return true when both are there
     bool IsValid() const override;
 
-    /// The columns and values: "(id,name) VALUES (1,'x')".
+    /// The columns and values, as they stand in the statement.
+    /// \return a text like "(id,name) VALUES (1,'x')"; "() VALUES ()" without columns
     std::string ToFormatedInsertValues() const;
 
-    /// The statement, ended by ";"; when not valid, empty with ERR "Bad insert parameter".
+    /// The statement.
+    /// \return SQL text, ended by ";"; when not valid, empty with ERR `Bad insert parameter`
     std::string GetCommand() const override;
 
+    /// Writes the values for a reader of the log: "values:[id=1,name='x']".
+    /// \param[out] out  takes the text
     void DumpParam(std::stringstream& out) const override;
 
   private:
@@ -130,32 +164,59 @@ class ORVADRCORE_API InsertCommand : public SqliteCommand {
 class ORVADRCORE_API UpdateCommand : public SqliteCommand {
   public:
     UpdateCommand() = default;
-    UpdateCommand(const UpdateCommand&) = default;
-    UpdateCommand& operator=(const UpdateCommand&) = default;
+    UpdateCommand(const UpdateCommand&) = default;             ///< A copy of the command.
+    UpdateCommand& operator=(const UpdateCommand&) = default;  ///< \return this, now such a copy
     ~UpdateCommand() override;
 
     /// Replaces all columns by the record's.
+    /// \param values  the columns and their values, copied; an empty record leaves none
     void SetFieldValues(const SqliteValueList& values);
 
-    /// As InsertCommand::AddFieldValue().
+    /// Adds a column; of two with the same name the later counts.
+    /// \tparam T     `std::string`, `bool`, `int` or `unsigned int`
+    /// \param field  the column's name, written as it stands
+    /// \param value  its new value; a text is quoted but not escaped
+    /// \return false as InsertCommand::AddFieldValue(), with the same line
     template <class T>
     bool AddFieldValue(const std::string& field, const T& value);
-    bool AddFieldValue(const std::string& field, const char* text);  ///< A text, as above.
 
-    /// Sets the condition, given without the word WHERE.
-    /// \return false when it is empty; nothing is logged, unlike in SelectCommand
+    /// As above, for a text.
+    /// \param field  the column's name
+    /// \param text   its new value
+    /// \return as above; false also when `text` is null
+    bool AddFieldValue(const std::string& field, const char* text);
+
+    /// As above, for a text in a buffer.
+    /// \param field  the column's name
+    /// \param text   its value
+    /// \return as above
+    bool AddFieldValue(const std::string& field, char* text)
+    {
+        return AddFieldValue(field, static_cast<const char*>(text));
+    }
+
+    /// Sets the condition.
+    /// \param text  the condition without the word WHERE, written as it stands
+    /// \return false when it is empty; the previous one stays and nothing is logged, unlike in
+    ///         SelectCommand
     bool SetCondition(const std::string& text);
 
     /// Sets the condition to the text of `object`.
-    /// \return false when it is not valid, with ERR "Invalid condition", or when its text is empty
+    /// \param object  the condition, copied
+    /// \return false when it is not valid, with ERR `Invalid condition`, or when its text is empty,
+    ///         without a line; the previous condition stays
     bool SetCondition(const SqliteCondition& object);
 
     /// Whether there are a table, a condition and at least one column.
+    /// \return true when all three are there
     bool IsValid() const override;
 
-    /// The statement, without ";" at its end; when not valid, empty with ERR "Bad update command".
+    /// The statement.
+    /// \return SQL text without ";" at its end; when not valid, empty with ERR `Bad update command`
     std::string GetCommand() const override;
 
+    /// Writes condition and values for a reader of the log: "condition:[id=1]/values:[name='x']".
+    /// \param[out] out  takes the text
     void DumpParam(std::stringstream& out) const override;
 
   private:
@@ -167,33 +228,40 @@ class ORVADRCORE_API UpdateCommand : public SqliteCommand {
 class ORVADRCORE_API SelectCommand : public SqliteCommand {
   public:
     SelectCommand() = default;
-    SelectCommand(const SelectCommand&) = default;
-    SelectCommand& operator=(const SelectCommand&) = default;
+    SelectCommand(const SelectCommand&) = default;             ///< A copy of the command.
+    SelectCommand& operator=(const SelectCommand&) = default;  ///< \return this, now such a copy
     ~SelectCommand() override;
 
     /// Selects all columns; columns added before are dropped.
     void SelectAll();
 
-    /// Adds a column, behind those added before; takes back SelectAll(). Any expression will do:
-    /// `CAST(size AS TEXT) AS size`.
+    /// Adds a column, behind those added before; takes back SelectAll().
+    /// \param field  the column's name, or any expression: `CAST(size AS TEXT) AS size`
     /// \return false when `field` is empty; nothing is logged
     bool AddField(const std::string& field);
 
-    /// Sets the condition, given without the word WHERE.
-    /// \return false when it is empty, with ERR "Empty condition"; the previous one stays
+    /// Sets the condition.
+    /// \param text  the condition without the word WHERE, written as it stands
+    /// \return false when it is empty, with ERR `Empty condition`; the previous one stays
     bool SetCondition(const std::string& text);
 
     /// Sets the condition to the text of `object`.
-    /// \return false when it is not valid, with ERR "Invalid condition", or when its text is empty,
-    ///         with ERR "Empty condition"; the previous condition stays
+    /// \param object  the condition, copied
+    /// \return false when it is not valid, with ERR `Invalid condition`, or when its text is empty,
+    ///         with ERR `Empty condition`; the previous condition stays
     bool SetCondition(const SqliteCondition& object);
 
     /// Whether there are a table and columns. The condition may be missing.
+    /// \return true when both are there
     bool IsValid() const override;
 
-    /// The statement, without ";" at its end; when not valid, empty with ERR "Bad select command".
+    /// The statement.
+    /// \return SQL text without ";" at its end; when not valid, empty with ERR `Bad select command`
     std::string GetCommand() const override;
 
+    /// Writes condition and columns for a reader of the log: "condition:[id=1]/fields:[id, name]",
+    /// with "all" for all columns.
+    /// \param[out] out  takes the text
     void DumpParam(std::stringstream& out) const override;
 
   private:
@@ -202,6 +270,7 @@ class ORVADRCORE_API SelectCommand : public SqliteCommand {
     std::string condition;
 };
 
+/// \cond INSTANTIATIONS
 extern template bool InsertCommand::AddFieldValue(const std::string&, const std::string&);
 extern template bool InsertCommand::AddFieldValue(const std::string&, const bool&);
 extern template bool InsertCommand::AddFieldValue(const std::string&, const int&);
@@ -210,6 +279,7 @@ extern template bool UpdateCommand::AddFieldValue(const std::string&, const std:
 extern template bool UpdateCommand::AddFieldValue(const std::string&, const bool&);
 extern template bool UpdateCommand::AddFieldValue(const std::string&, const int&);
 extern template bool UpdateCommand::AddFieldValue(const std::string&, const unsigned int&);
+/// \endcond
 
 }  // namespace OrvaDRCore
 

@@ -39,13 +39,17 @@ class ORVADRCORE_API SqliteCondition {
     /// No condition.
     SqliteCondition() = default;
 
-    /// A condition that is ready, without the word WHERE; nothing is checked.
+    /// A condition that is ready.
+    /// \param text  the condition without the word WHERE; nothing is checked
     SqliteCondition(const std::string& text);
 
-    /// Whether the text is not empty.
+    /// Whether there is a condition.
+    /// \return true when the text is not empty
     virtual bool IsValid() const;
 
-    /// The text, without the word WHERE; good until the condition changes.
+    /// The text, without the word WHERE.
+    /// \return a reference that is good until the condition changes; to an empty text when there is
+    ///         no condition
     const std::string& GetCondition() const { return condition; }
 
   protected:
@@ -56,11 +60,17 @@ class ORVADRCORE_API SqliteCondition {
 class ORVADRCORE_API SqliteEqual : public SqliteCondition {
   public:
     SqliteEqual() = default;
-    SqliteEqual(const std::string& lvalue, const SqliteValue& value);  ///< See SetValue().
+
+    /// As SetValue(), the answer dropped.
+    /// \param lvalue  the column
+    /// \param value   the value
+    SqliteEqual(const std::string& lvalue, const SqliteValue& value);
 
     /// Replaces the text by `lvalue`, "=" and the value's literal.
+    /// \param lvalue  the column, written as it stands
+    /// \param value   the value; a text is quoted but not escaped
     /// \return false when `lvalue` is empty or `value` not valid, with
-    ///         "Bad lvalue[%s] or rvalue[%s]"; the text stays as it was then
+    ///         ERR `Bad lvalue[%s] or rvalue[%s]`; the text stays as it was then
     bool SetValue(const std::string& lvalue, const SqliteValue& value);
 };
 
@@ -68,9 +78,16 @@ class ORVADRCORE_API SqliteEqual : public SqliteCondition {
 class ORVADRCORE_API SqliteNotEqual : public SqliteCondition {
   public:
     SqliteNotEqual() = default;
-    SqliteNotEqual(const std::string& lvalue, const SqliteValue& value);  ///< See SetValue().
 
-    /// As SqliteEqual::SetValue(), with "!=".
+    /// As SetValue(), the answer dropped.
+    /// \param lvalue  the column
+    /// \param value   the value
+    SqliteNotEqual(const std::string& lvalue, const SqliteValue& value);
+
+    /// Replaces the text by `lvalue`, "!=" and the value's literal.
+    /// \param lvalue  the column, written as it stands
+    /// \param value   the value; a text is quoted but not escaped
+    /// \return false as SqliteEqual::SetValue(), with the same line
     bool SetValue(const std::string& lvalue, const SqliteValue& value);
 };
 
@@ -78,11 +95,17 @@ class ORVADRCORE_API SqliteNotEqual : public SqliteCondition {
 class ORVADRCORE_API SqliteAnd : public SqliteCondition {
   public:
     SqliteAnd() = default;
-    SqliteAnd(const std::string& left, const std::string& right);  ///< See SetValue().
+
+    /// As SetValue(), the answer dropped.
+    /// \param left   the text of one condition
+    /// \param right  the text of the other
+    SqliteAnd(const std::string& left, const std::string& right);
 
     /// Appends `(left) AND (right)`, the operands being the texts of two other conditions.
-    /// \return false when an operand is empty, with "Bad lvalue[%s] or rvalue[%s]"; the text stays
-    ///         as it was then
+    /// \param left   the text of one condition, written as it stands
+    /// \param right  the text of the other
+    /// \return false when an operand is empty, with ERR `Bad lvalue[%s] or rvalue[%s]`; the text
+    ///         stays as it was then
     /// \warning The text is appended to, not replaced: a second call on the same object gives
     ///          `(a) AND (b)(c) AND (d)`, which is no SQL. Use a new object for each condition.
     bool SetValue(const std::string& left, const std::string& right);
@@ -92,41 +115,64 @@ class ORVADRCORE_API SqliteAnd : public SqliteCondition {
 class ORVADRCORE_API SqliteOr : public SqliteCondition {
   public:
     SqliteOr() = default;
-    SqliteOr(const std::string& left, const std::string& right);  ///< See SetValue().
 
-    /// As SqliteAnd::SetValue(), with "OR" and the same warning.
+    /// As SetValue(), the answer dropped.
+    /// \param left   the text of one condition
+    /// \param right  the text of the other
+    SqliteOr(const std::string& left, const std::string& right);
+
+    /// Appends `(left) OR (right)`, the operands being the texts of two other conditions.
+    /// \param left   the text of one condition, written as it stands
+    /// \param right  the text of the other
+    /// \return false as SqliteAnd::SetValue(), with the same line
+    /// \warning The text is appended to, not replaced, as in SqliteAnd.
     bool SetValue(const std::string& left, const std::string& right);
 };
 
 /// A column whose value is, or is not, one of many: what SqliteIn and SqliteNotIn share.
 class ORVADRCORE_API SqliteInFamily : public SqliteCondition {
   public:
+    /// No text yet.
     /// \param keyword  "IN" or "NOT IN", exactly; with any other the object refuses every value
     SqliteInFamily(const std::string& keyword);
+
+    /// As SetValue() with a list, the answer dropped.
+    /// \param keyword  "IN" or "NOT IN", exactly
+    /// \param lvalue   the column
+    /// \param values   the values
     SqliteInFamily(const std::string& keyword, const std::string& lvalue,
-                   const std::vector<SqliteValue>& values);  ///< See SetValue().
-    SqliteInFamily(const std::string& keyword, const std::string& lvalue,
-                   const std::string& value);  ///< See SetValue().
+                   const std::vector<SqliteValue>& values);
+
+    /// As SetValue() with a ready text, the answer dropped.
+    /// \param keyword  "IN" or "NOT IN", exactly
+    /// \param lvalue   the column
+    /// \param value    what stands between the parentheses
+    SqliteInFamily(const std::string& keyword, const std::string& lvalue, const std::string& value);
 
     /// Whether the keyword is "IN" or "NOT IN".
+    /// \return true when it is
     /// \warning The text is not looked at: a condition whose list was refused is empty and yet says
     ///          that it is valid, and a SELECT that is given it keeps its previous condition, or
     ///          none. Look at the answer of SetValue(), or at GetCondition().
     bool IsValid() const override;
 
-    /// Replaces the text by a list of literals: `id IN ( 1,2,3 )`. An empty list is accepted.
-    /// \return false, with a line that says why: "Bad keyword [%s]" and "Bad lvalue[%s]" (empty),
-    ///         which leave the text as it was; "Invalid rvalue [%s]" for a value that is not valid,
-    ///         which leaves the text empty
+    /// Replaces the text by a list of literals: `id IN ( 1,2,3 )`.
+    /// \param lvalue  the column, written as it stands
+    /// \param values  the values; an empty list is accepted; texts are quoted but not escaped
+    /// \return false, with a line at ERR that says why: `Bad keyword [%s]` and `Bad lvalue[%s]`
+    ///         (empty), which leave the text as it was; `Invalid rvalue [%s]` for a value that is
+    ///         not valid, which leaves the text empty
     bool SetValue(const std::string& lvalue, const std::vector<SqliteValue>& values);
 
     /// Replaces the text by a sub-select or list that is ready: `id IN ( SELECT id FROM jobs )`.
-    /// \return false for a bad keyword, with "Bad keyword [%s]", and when `lvalue` or `value` is
-    ///         empty, with "Bad lvalue[%s] or value[%s]"; the text stays as it was then
+    /// \param lvalue  the column, written as it stands
+    /// \param value   what stands between the parentheses, likewise
+    /// \return false for a bad keyword, with ERR `Bad keyword [%s]`, and when `lvalue` or `value`
+    ///         is empty, with ERR `Bad lvalue[%s] or value[%s]`; the text stays as it was then
     bool SetValue(const std::string& lvalue, const std::string& value);
 
   private:
-    bool CheckKeyword() const;
+    ORVADRCORE_LOCAL bool CheckKeyword() const;
 
     std::string keyword;
 };
@@ -134,16 +180,34 @@ class ORVADRCORE_API SqliteInFamily : public SqliteCondition {
 /// A column whose value is one of many.
 class ORVADRCORE_API SqliteIn : public SqliteInFamily {
   public:
+    /// No text yet; valid all the same, see SqliteInFamily::IsValid().
     SqliteIn();
+
+    /// As SqliteInFamily::SetValue() with a list, the answer dropped.
+    /// \param lvalue  the column
+    /// \param values  the values
     SqliteIn(const std::string& lvalue, const std::vector<SqliteValue>& values);
+
+    /// As SqliteInFamily::SetValue() with a ready text, the answer dropped.
+    /// \param lvalue  the column
+    /// \param value   what stands between the parentheses
     SqliteIn(const std::string& lvalue, const std::string& value);
 };
 
 /// A column whose value is none of many.
 class ORVADRCORE_API SqliteNotIn : public SqliteInFamily {
   public:
+    /// No text yet; valid all the same, see SqliteInFamily::IsValid().
     SqliteNotIn();
+
+    /// As SqliteInFamily::SetValue() with a list, the answer dropped.
+    /// \param lvalue  the column
+    /// \param values  the values
     SqliteNotIn(const std::string& lvalue, const std::vector<SqliteValue>& values);
+
+    /// As SqliteInFamily::SetValue() with a ready text, the answer dropped.
+    /// \param lvalue  the column
+    /// \param value   what stands between the parentheses
     SqliteNotIn(const std::string& lvalue, const std::string& value);
 };
 

@@ -14,11 +14,12 @@
 /// for long. Many processes may use one file at the same time.
 ///
 /// **Errors.** Operations answer true or false. GetErrCode() and GetErr() describe the last one: 0
-/// and null after a success, otherwise a code of ERR and, for what SQLite refused, the failed
+/// and null after a success, otherwise an ERR::Code and, for what SQLite refused, the failed
 /// tries. Nothing throws. Log lines name the file `sqlite_db.cpp`.
 ///
 /// **Threads and forks.** An object is used by one thread at a time. A connection must not be used,
-/// closed or destroyed in a child made by fork: open a new object there.
+/// closed or destroyed in a child made by fork: open a new object there. That one is refused for
+/// good where the parent was inside a transaction at the fork.
 #ifndef ORVADRCORE_SQLITE_DB_H
 #define ORVADRCORE_SQLITE_DB_H
 
@@ -35,23 +36,35 @@ struct sqlite3;
 
 namespace OrvaDRCore {
 
-/// A connection to an SQLite file.
+/// A connection to an SQLite file. The head of sqlite_db.h tells what holds for retries, errors,
+/// threads and forks.
 ///
-/// Error record: an object for a single failure, {"command": statement, "sqlite_errcode": SQLite's
-/// result code, "sqlite_errmsg": SQLite's text}; after retries an array with one entry a failed
-/// try, {"err_code": 404, "err_code_str": "ERR_DATABASE_OPERATION", "err_msg": such an object}.
+/// **Error record.** For a single try that failed, the error object:
+/// \code
+///     {"command": "the statement", "sqlite_errcode": 5, "sqlite_errmsg": "database is locked"}
+/// \endcode
+/// Where operations with retries gave up, an array with one entry for each try:
+/// \code
+///     [{"err_code": 404, "err_code_str": "ERR_DATABASE_OPERATION", "err_msg": {"command": ...}}]
+/// \endcode
 class ORVADRCORE_API SqliteDB {
   public:
     /// Nothing is opened yet.
-    /// \param file   the database file; SQLite creates a missing one when it is first written
-    /// \param limit  how often a failed statement is tried again
+    /// \param file   the database file; Open() creates a missing one
+    /// \param limit  how often a failed statement is tried again; 0 for a single try
     SqliteDB(const std::string& file, unsigned int limit);
 
     SqliteDB(const SqliteDB&) = delete;
     SqliteDB& operator=(const SqliteDB&) = delete;
 
-    /// Takes the connection over; `other` is closed then and still names its file.
+    /// Takes the connection over, with error code and record; `other` is closed then and still
+    /// names its file.
+    /// \param other  the connection to take
     SqliteDB(SqliteDB&& other) noexcept;
+
+    /// Closes this connection and takes the other over, as the constructor does.
+    /// \param other  the connection to take
+    /// \return this connection
     SqliteDB& operator=(SqliteDB&& other) noexcept;
 
     /// Closes the connection.
@@ -60,73 +73,96 @@ class ORVADRCORE_API SqliteDB {
     // ------------------------------------------------------------------ records, the usual way in
 
     /// Opens the file, makes the table when it is missing and its handler has a schema, and
-    /// inserts. The connection stays open. \return false, with the error code, the lines below at
-    /// ERR and those of what was called:
-    ///         - 404 and "invalid insert command [%s]" for a command that is not valid (the other
+    /// inserts. The connection stays open.
+    /// \param command  the statement
+    /// \return false, with the error code, the lines below at ERR and those of what was called:
+    ///         - 404 and `invalid insert command [%s]` for a command that is not valid (the other
     ///           operations give 401);
-    ///         - 404 and "Failed to open db [%s]", behind the WARN line of Open();
-    ///         - 404 and "Failed to create table";
-    ///         - 404 and "Failed to exec [%s] in db[%s]"; the error record holds the failed tries
+    ///         - 404 and `Failed to open db [%s]`, behind the WARN line of Open();
+    ///         - 404 and `Failed to create table`, behind the lines of CreateTable();
+    ///         - 404 and `Failed to exec [%s] in db[%s]`, behind the WARN line of Exec(); the error
+    ///           record holds the failed tries
     /// \warning The look for the table, its creation and the statement are retried one after the
-    ///          other: on a file that stays locked the call takes three times as long as one
+    ///          other: on a file that stays locked the call takes twice as long as one
     ///          statement.
     bool InsertRecord(const InsertCommand& command);
 
-    /// As InsertRecord(); a command that is not valid gives 401 and "invalid update command [%s]".
+    /// Updates rows; otherwise as InsertRecord().
+    /// \param command  the statement
+    /// \return false as InsertRecord(); but a command that is not valid gives 401 and
+    ///         ERR `invalid update command [%s]`. True also when no row meets the condition
     bool UpdateRecord(const UpdateCommand& command);
 
-    /// As InsertRecord(), for a SELECT whose rows are appended to `records`. A command that is not
-    /// valid gives 401 and "invalid select command [%s]"; a statement that fails 404 and
-    /// "Failed to select by command [%s]". What comes out of a row, and the warnings, stand at
-    /// SelectByCommand().
+    /// Selects rows; otherwise as InsertRecord(). What comes out of a row, and the warnings, stand
+    /// at SelectByCommand().
+    /// \param command          the statement
+    /// \param[in,out] records  the rows are appended to it; a failure may leave rows there, too
+    /// \return false as InsertRecord(); but a command that is not valid gives 401 and
+    ///         ERR `invalid select command [%s]`, and a statement that fails
+    ///         404 and ERR `Failed to select by command [%s]`. True also without a row
     bool SelectRecords(const SelectCommand& command, std::vector<SqliteValueList>& records);
 
-    /// As SelectRecords(), for the first row alone; without a row `record` stays as it was.
+    /// As SelectRecords(), for the first row alone.
+    /// \param command      the statement
+    /// \param[out] record  the row; untouched when there is none, and on failure
+    /// \return as above
     bool SelectRecord(const SelectCommand& command, SqliteValueList& record);
 
-    /// Deletes the rows that meet a condition, given without the word WHERE. Note the order of the
-    /// arguments.
-    /// \return false with 401 and ERR "invalid delete command: condition[%s]" for an empty
+    /// Deletes the rows that meet a condition. Note the order of the arguments.
+    /// \param condition  the condition without the word WHERE, written as it stands
+    /// \param table      the table
+    /// \return false with 401 and ERR `invalid delete command: condition[%s]` for an empty
     ///         condition, otherwise as DoDelete()
     bool DeleteRecord(const std::string& condition, const SqliteTableHandler& table);
 
     /// Deletes all rows. As DoDelete() without a condition.
+    /// \param table  the table
+    /// \return as DoDelete()
     bool DeleteAllRecords(const SqliteTableHandler& table);
 
     /// Opens the file, makes the table when it is missing, and deletes the rows that meet the
     /// condition, or all rows when it is empty.
-    /// \return false, with the error code and a line at ERR: 401 and "invalid table:[%s]" for a
-    ///         table without a name; 404 and "Failed to open db [%s]", "Failed to create table
-    ///         [%s]" or "Failed to exec [%s] in db[%s]"
+    /// \param table      the table
+    /// \param condition  the condition without the word WHERE, written as it stands
+    /// \return false, with the error code and a line at ERR: 401 and `invalid table:[%s]` for a
+    ///         table without a name; 404 and `Failed to open db [%s]`,
+    ///         `Failed to create table [%s]` or `Failed to exec [%s] in db[%s]`, each behind the
+    ///         lines of what was called. True also when no row meets the condition
     bool DoDelete(const SqliteTableHandler& table, const std::string& condition);
 
     // ------------------------------------------------------------------------------------- tables
 
     /// Whether a table is there: one query with retries, on an open connection.
-    /// \return false also when the query fails
+    /// \param table  the table's name
+    /// \return true when it is; false also when the query fails, with the code and the line of
+    ///         SelectByCommand()
     /// \warning The name is not escaped.
     bool IsTableExisted(const std::string& table);
 
     /// Makes a table that is missing, on an open connection. Without a schema it does nothing.
-    /// \return false when there is a schema but no name, with ERR "Invalid table [%s]" and the
-    /// error
-    ///         code left as it was; and when the creation fails, with 404 and ERR
-    ///         "Failed to create table [%s] with cmd[%s]"
+    /// \param table  the table
+    /// \return false when there is a schema but no name, with ERR `Invalid table [%s]` and the
+    ///         error code left as it was; and when the creation fails, with the code of Exec() and
+    ///         ERR `Failed to create table [%s] with cmd[%s]` behind its line
     bool CreateTable(const SqliteTableHandler& table);
 
-    /// The statement that deletes: "DELETE FROM t WHERE c;", or "DELETE FROM t;" for an empty
-    /// condition.
-    /// \return the text; empty for an empty table name, with ERR "empty table"
+    /// The statement that deletes.
+    /// \param table      the table's name, written as it stands
+    /// \param condition  the condition without the word WHERE, likewise; empty for all rows
+    /// \return "DELETE FROM t WHERE c;", or "DELETE FROM t;" for an empty condition; empty for an
+    ///         empty table name, with ERR `empty table`
     std::string GenerateDeleteCommand(const std::string& table, const std::string& condition) const;
 
     // --------------------------------------------------------------------------------- statements
 
     /// Runs a statement that gives no rows, on an open connection, with retries.
-    /// \return false, with the error code and a line: 403 and ERR "DB[%s] is not opened"; 401 and
-    ///         ERR "empty command to exec db[%s]"; 404 and WARN
-    ///         "Reach retry limit [%u], failed to exec command [%s] with err[%s]" (the number is
-    ///         that of the tries). A success after failures says so at INFO,
-    ///         "After retry [%u] times, success to exec command [%s], previous errors[%s]"
+    /// \param command  the statement
+    /// \return false, with the error code and a line: 403 and ERR `DB[%s] is not opened`; 401 and
+    ///         ERR `empty command to exec db[%s]`; 404 and WARN
+    ///         `Reach retry limit [%u], failed to exec command [%s] with err[%s]` (the number is
+    ///         that of the tries)
+    /// \note A success after failures says so at INFO:
+    ///       `After retry [%u] times, success to exec command [%s], previous errors[%s]`.
     /// \warning The whole text is run on each try. Of several statements in one text the first ones
     ///          are repeated when a later one fails, and a failing "BEGIN; ..." leaves its
     ///          transaction open: run BEGIN, the statements and COMMIT one by one.
@@ -135,26 +171,34 @@ class ORVADRCORE_API SqliteDB {
     /// Runs a SELECT, on an open connection, with retries, and gives its first row.
     ///
     /// A row becomes a record by column name, `AS` included. A text is read up to its first zero
-    /// byte. NULL columns are left out, with WARN "field [%s] has null value", and so are real
-    /// numbers and blobs, with WARN "Not supported type [%d] with field [%s]". Of two columns with
-    /// one name the later that is not NULL counts.
+    /// byte. NULL columns are left out, with WARN `field [%s] has null value`, and so are real
+    /// numbers and blobs, with WARN `Not supported type [%d] with field [%s]` (SQLite's number of
+    /// the type), both in the function `ParseRecord`. Of two columns with one name the later that
+    /// is not NULL counts. A column whose name is empty is left out with the line of
+    /// SqliteValueList::AddValue().
     /// \param command      the statement
     /// \param[out] record  the first row; untouched when there is none, and on failure
-    /// \return true also without a row. False with 401 and ERR "Empty command to select record"; or
-    ///         404 and WARN "Reach retry limit [%u], failed to select command with errors[%s] "
-    ///         (a closed connection ends here, too). A success after failures says so at INFO,
-    ///         "After retry [%u] times, success to exec command [%s], previous errs[%s]"
+    /// \return true also without a row. False with 401 and ERR `Empty command to select record`; or
+    ///         404 and WARN `Reach retry limit [%u], failed to select command with errors[%s] `,
+    ///         with a blank at the end (a closed connection ends here, too)
+    /// \note A success after failures says so at INFO:
+    ///       `After retry [%u] times, success to exec command [%s], previous errs[%s]`.
+    /// \note The line ERR `Null Pointer` (function `ParseRecord`) guards the reading of rows; no
+    ///       statement leads to it.
     /// \warning Integers are read as 32 bits: larger ones arrive truncated. Select such a column as
     ///          text, `CAST(size AS TEXT) AS size`.
     /// \warning A statement that changes the file runs through here, too, and is stepped once a
-    /// try.
+    ///          try.
     bool SelectByCommand(const std::string& command, SqliteValueList& record);
 
-    /// As above, for all rows, which are appended to `records`.
-    /// \return false with 401 and ERR "Empty command to select records"; or 404 and WARN
-    ///         "Reach retry limit [%u], failed to exec command [%s] with errors [%s]". A success
-    ///         after failures says so at INFO,
-    ///         "After retry [%u] times, success to select command, previous errs [%s]"
+    /// As above, for all rows.
+    /// \param command          the statement
+    /// \param[in,out] records  the rows are appended to it
+    /// \return true also without a row. False with 401 and ERR `Empty command to select records`;
+    ///         or 404 and WARN
+    ///         `Reach retry limit [%u], failed to exec command [%s] with errors [%s]`
+    /// \note A success after failures says so at INFO:
+    ///       `After retry [%u] times, success to select command, previous errs [%s]`.
     /// \warning The vector is never emptied. A try that fails in the middle leaves its rows there
     ///          and the next try appends all rows again: where a row must not come twice, compare
     ///          keys, or take GetErrCode() and a fresh vector and call again.
@@ -163,20 +207,23 @@ class ORVADRCORE_API SqliteDB {
     // --------------------------------------------------------------------------------- connection
 
     /// Opens the file, unless it is open. The error code and record stay as they are.
-    /// \return false, with WARN "Failed to open db[%s]", the connection closed; or with WARN
-    ///         "Failed to set busy timeout with error", the connection open: the next call answers
+    /// \return false, with WARN `Failed to open db[%s]`, the connection closed; or with WARN
+    ///         `Failed to set busy timeout with error`, the connection open: the next call answers
     ///         true
     bool Open();
 
-    /// Closes the connection, if there is one.
+    /// Closes the connection, if there is one. A transaction that is open is rolled back.
     void Close();
 
     // ------------------------------------------------------------------------------------- errors
 
-    /// 0 after a success, otherwise a code of ERR.
+    /// The error code of the last operation.
+    /// \return 0 after a success, otherwise an ERR::Code
     int GetErrCode() const { return errCode; }
 
-    /// Null after a success, otherwise the error record; good until the next operation.
+    /// The error record of the last operation.
+    /// \return null after a success and where SQLite was not asked, otherwise the record; good
+    ///         until the next operation
     const Json::Value& GetErr() const { return errRecord; }
 
     /// Records a failure of SQLite: code 404 and an error object.
@@ -187,28 +234,36 @@ class ORVADRCORE_API SqliteDB {
 
     // ---------------------------------------------------------------------------- single tries
 
-    /// One try of Exec(): no checks and no retries. On success the error code stays as it was.
+    /// One try of Exec(): no checks, no retries and no line.
+    /// \param command  the statement
+    /// \return false with 404 and the error object. On success the error code stays as it was
     bool DoExecSqliteCommand(const std::string& command);
 
-    /// One try of the one-row SelectByCommand().
+    /// One try of the one-row SelectByCommand(), without its checks and its line.
+    /// \param command      the statement
+    /// \param[out] record  the first row; untouched when there is none, and on failure
+    /// \return true, with 0, also without a row; false with 404 and the error object
     bool DoSelectSqliteRecord(const std::string& command, SqliteValueList& record);
 
-    /// One try of the many-rows SelectByCommand().
+    /// One try of the many-rows SelectByCommand(), without its checks and its line.
+    /// \param command          the statement
+    /// \param[in,out] records  the rows are appended to it, those before a failure, too
+    /// \return as above
     bool DoSelectSqliteRecords(const std::string& command, std::vector<SqliteValueList>& records);
 
   private:
     struct Tries;
     struct Operation;
 
-    void SetErr(int code) const;
+    ORVADRCORE_LOCAL void SetErr(int code) const;
     template <class Attempt>
     Tries TryRepeatedly(Attempt attempt);
     template <class TakeRow>
     bool DoSelect(const std::string& command, TakeRow takeRow);
 
-    bool OpenFor(const char* function);
-    bool Prepare(const Operation& operation, const SqliteCommand& command);
-    bool ExecCommand(const Operation& operation, const SqliteCommand& command);
+    ORVADRCORE_LOCAL bool OpenFor(const char* function);
+    ORVADRCORE_LOCAL bool Prepare(const Operation& operation, const SqliteCommand& command);
+    ORVADRCORE_LOCAL bool ExecCommand(const Operation& operation, const SqliteCommand& command);
     template <class Output>
     bool SelectCommandInto(const Operation& operation, const SelectCommand& command,
                            Output& output);

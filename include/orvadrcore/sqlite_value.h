@@ -33,18 +33,35 @@ class ORVADRCORE_API SqliteValue {
     /// No value: IsValid() is false and ToFormatedValue() empty.
     SqliteValue() = default;
 
-    SqliteValue(int number);               ///< A signed integer.
-    SqliteValue(unsigned int number);      ///< An unsigned integer.
-    SqliteValue(bool truth);               ///< A boolean, written as 1 or 0.
-    SqliteValue(const std::string& text);  ///< A text; see the warning at ToFormatedValue().
-    SqliteValue(const char* text);         ///< A text; no value when `text` is null.
+    /// A signed integer.
+    /// \param number  any of 32 bits
+    SqliteValue(int number);
+
+    /// An unsigned integer.
+    /// \param number  any of 32 bits; SqliteDB reads integers back as signed ones
+    SqliteValue(unsigned int number);
+
+    /// A boolean, written as 1 or 0.
+    /// \param truth  the boolean
+    SqliteValue(bool truth);
+
+    /// A text.
+    /// \param text  the text, copied; see the warning at ToFormatedValue()
+    SqliteValue(const std::string& text);
+
+    /// A text.
+    /// \param text  the text, copied; no value when it is null
+    SqliteValue(const char* text);
+
     SqliteValue(std::nullptr_t) = delete;
 
-    SqliteValue(const SqliteValue&) = default;
-    SqliteValue(SqliteValue&&) noexcept = default;
+    SqliteValue(const SqliteValue&) = default;      ///< A copy, as valid as the other.
+    SqliteValue(SqliteValue&&) noexcept = default;  ///< Takes the value; the other is empty then.
     ~SqliteValue() = default;
 
     /// Takes over the other's payload and nothing else.
+    /// \param other  the value to take from
+    /// \return this value
     /// \warning Whether a value is valid is decided when it is built and does not travel with an
     ///          assignment: `SqliteValue v; v = SqliteValue(1);` leaves `v` invalid, and a valid
     ///          value that is assigned an empty one is not valid either. Build values, or put them
@@ -52,28 +69,33 @@ class ORVADRCORE_API SqliteValue {
     SqliteValue& operator=(const SqliteValue& other);
 
     /// Whether the value was built from a number, boolean or text and still holds one.
+    /// \return true when it was and does
     bool IsValid() const;
 
     /// Reads the value as `T`: `std::string`, `unsigned int`, `int` or `bool`.
     ///
     /// A text is read from a text only and a number from a number that fits `T`; a boolean also
     /// from the integers 0 and 1. Nothing is converted: the text "12" is no number, true is no 1.
+    /// \tparam T        one of those four
     /// \param[out] out  the result; untouched on failure
-    /// \return false when the value is of another kind, with WARN "[%s] is not string",
-    ///         "[%s] is not int" (both integer types) or "[%s] is not bool", filled with the value
-    ///         as JSON; the line's function is "GetValue<int>" and the like
+    /// \return false when the value is of another kind, with WARN `[%s] is not string`,
+    ///         `[%s] is not int` (both integer types) or `[%s] is not bool`, filled with the value
+    ///         as JSON; the line's function is `GetValue<int>` and the like
     template <class T>
     bool GetValue(T& out) const = delete;
 
-    /// The value as an SQL literal: a text between single quotes, a number in decimals, a boolean
-    /// as 1 or 0; empty when there is no value.
+    /// The value as an SQL literal.
+    /// \return a text between single quotes, a number in decimals, a boolean as 1 or 0; empty when
+    ///         there is no value
     /// \warning A text is quoted but not escaped: a single quote inside it ends the literal, and
     ///          what follows is read as SQL. Pass texts that you do not control through
     ///          EscapeText() when you build the value.
     std::string ToFormatedValue() const;
 
-    /// The text with every single quote doubled: a value built from the result is written as the
-    /// literal of the original text.
+    /// Doubles every single quote: a value built from the result is written as the literal of the
+    /// original text.
+    /// \param text  any text
+    /// \return the text to build a value from
     /// \code
     ///     SqliteValue(SqliteValue::EscapeText("it's")).ToFormatedValue();   // "'it''s'"
     /// \endcode
@@ -85,6 +107,7 @@ class ORVADRCORE_API SqliteValue {
     Json::Value value;
 };
 
+/// \cond SPECIALISATIONS
 template <>
 ORVADRCORE_API bool SqliteValue::GetValue<std::string>(std::string& out) const;
 template <>
@@ -93,50 +116,67 @@ template <>
 ORVADRCORE_API bool SqliteValue::GetValue<int>(int& out) const;
 template <>
 ORVADRCORE_API bool SqliteValue::GetValue<bool>(bool& out) const;
+/// \endcond
 
 /// One record: values by field name, in the byte order of the names, whatever the order of adding.
 /// No name is empty and every value is valid.
 class ORVADRCORE_API SqliteValueList {
   public:
     SqliteValueList() = default;
-    SqliteValueList(const SqliteValueList&) = default;
-    SqliteValueList(SqliteValueList&&) noexcept = default;
+    SqliteValueList(const SqliteValueList&) = default;      ///< A copy of all fields.
+    SqliteValueList(SqliteValueList&&) noexcept = default;  ///< Takes all fields of the other.
     virtual ~SqliteValueList();
 
-    /// Replaces all fields by the other's.
+    /// Replaces all fields by copies of the other's.
+    /// \param other  the record to copy
+    /// \return this record
     SqliteValueList& operator=(const SqliteValueList& other);
+
+    /// Takes all fields of the other, which gets those of this record for them.
+    /// \param other  the record to take from
+    /// \return this record
     SqliteValueList& operator=(SqliteValueList&& other) noexcept;
 
     /// Adds a field, or replaces the value of a field that is there already.
+    /// \param field  the field's name
+    /// \param value  its value, copied
     /// \return false when `field` is empty or `value` not valid, with ERR
-    ///         "Bad Field[%s] or value [%s]"; the record is unchanged then
+    ///         `Bad Field[%s] or value [%s]`; the record is unchanged then
     bool AddValue(const std::string& field, const SqliteValue& value);
 
     /// Adds every field of the other record; where both have a field, the other's value wins.
+    /// \param other  the record to copy from
+    /// \return this record
     SqliteValueList& operator+=(const SqliteValueList& other);
 
-    /// Whether a field is there. An empty name is not, with ERR "Invalid field [%s]".
+    /// Whether a field is there.
+    /// \param field  the field's name
+    /// \return true when it is; false for an empty name, with ERR `Invalid field [%s]`
     bool HasField(const std::string& field) const;
 
     /// The value of a field.
+    /// \param field  the field's name
     /// \return a reference that is good until the record changes; to a value that is not valid when
-    ///         there is none, with ERR "Invalid field [%s]" for an empty name and WARN
-    ///         "Failed to find field [%s]" for a missing field
+    ///         there is none, with ERR `Invalid field [%s]` for an empty name and WARN
+    ///         `Failed to find field [%s]` for a missing field
     const SqliteValue& GetValue(const std::string& field) const;
 
-    /// Reads a field as `T`: `std::string`, `bool`, `int` or `unsigned int`.
+    /// Reads a field as `T`, as SqliteValue::GetValue() does.
+    /// \tparam T        `std::string`, `bool`, `int` or `unsigned int`
     /// \param field     the field's name
     /// \param[out] out  the result; untouched on failure
-    /// \return false for an empty name, with ERR "Invalid field [%s]"; for a missing field, with
-    ///         DEBUG "field [%s] is not existed"; for a value of another kind, with the line of
+    /// \return false for an empty name, with ERR `Invalid field [%s]`; for a missing field, with
+    ///         DEBUG `field [%s] is not existed`; for a value of another kind, with the line of
     ///         SqliteValue::GetValue()
     template <class T>
     bool GetValue(const std::string& field, T& out) const;
 
     /// All fields, for walking over a record whose columns are not known beforehand.
+    /// \return values by name; a reference that is good until the record goes
     const std::map<std::string, SqliteValue>& GetValues() const { return values; }
 
-    /// The record for a reader: "id:3, name:'abc'".
+    /// The record for a reader.
+    /// \return a text like "id:3, name:'abc'"; empty for a record without fields
     std::string ToStr() const;
 
   private:
@@ -145,10 +185,12 @@ class ORVADRCORE_API SqliteValueList {
     std::map<std::string, SqliteValue> values;
 };
 
+/// \cond INSTANTIATIONS
 extern template bool SqliteValueList::GetValue(const std::string&, std::string&) const;
 extern template bool SqliteValueList::GetValue(const std::string&, bool&) const;
 extern template bool SqliteValueList::GetValue(const std::string&, int&) const;
 extern template bool SqliteValueList::GetValue(const std::string&, unsigned int&) const;
+/// \endcond
 
 /// Base of a program's own record types, which turn themselves into a SqliteValueList.
 ///
@@ -156,24 +198,29 @@ extern template bool SqliteValueList::GetValue(const std::string&, unsigned int&
 class ORVADRCORE_API SqliteRecord {
   public:
     /// The record with the named fields.
+    /// \param fields  the names, of those that GetRecordFields() gives
+    /// \return the record
     virtual SqliteValueList BuildRecord(const std::vector<std::string>& fields) const = 0;
 
     /// Takes the object's content from a record. The library never calls it.
+    /// \param record  the record, as a SELECT gave it
     /// \return whether the record was taken; false by default
     virtual bool LoadRecord(const SqliteValueList& record);
 
     /// The names of all fields of this type.
+    /// \return the names, in any order
     virtual std::vector<std::string> GetRecordFields() const = 0;
 
     virtual ~SqliteRecord();
 
-    /// BuildRecord() with all of GetRecordFields().
+    /// The record with all fields: BuildRecord() with all of GetRecordFields().
+    /// \return the record
     SqliteValueList ToSqliteRecord() const;
 
   protected:
     SqliteRecord() = default;
-    SqliteRecord(const SqliteRecord&) = default;
-    SqliteRecord& operator=(const SqliteRecord&) = default;
+    SqliteRecord(const SqliteRecord&) = default;             ///< Nothing to copy here.
+    SqliteRecord& operator=(const SqliteRecord&) = default;  ///< \return this object
 };
 
 }  // namespace OrvaDRCore

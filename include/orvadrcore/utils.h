@@ -19,18 +19,19 @@
 
 #include <orvadrcore/export.h>
 
+/// All that the library has for its callers.
 namespace OrvaDRCore {
 
 /// A new UUID: the first line that `/usr/bin/uuidgen` prints, without blanks around it.
 /// \return the text; empty when the program printed nothing, without a log line, or when it could
-///         not be started, with ERR "Failed to exec the command [%s]."
+///         not be started, with ERR `Failed to exec the command [%s].`
 /// \note Starts a process; the process inherits no descriptor but 0, 1 and 2.
 ORVADRCORE_API std::string GenerateUUID();
 
 /// Sleeps for a random time between two bounds, both included.
 /// \param min  shortest sleep in milliseconds, above 0
 /// \param max  longest sleep in milliseconds, above `min`: equal bounds are refused on purpose
-/// \return true after the sleep; false at once, with ERR "Invalid period [%u - %u] to sleep", when
+/// \return true after the sleep; false at once, with ERR `Invalid period [%u - %u] to sleep`, when
 ///         the bounds are not as said
 /// \note A signal handler that runs in the meantime may cut the sleep short.
 ORVADRCORE_API bool RandomSleepInMSec(unsigned int min, unsigned int max);
@@ -42,11 +43,17 @@ class ORVADRCORE_API Container {
     Container() = delete;
 
     /// The elements, in order, as a JSON array of text, integers, booleans or numbers.
+    /// \tparam T      the type of the elements
+    /// \param values  the elements
     /// \return the array; an empty array, not null, for an empty vector
     template <class T>
     static Json::Value ToJsonArray(const std::vector<T>& values);
 
     /// The elements one after the other, with `separator` between them.
+    /// \tparam T         the type of the elements
+    /// \param values     the elements
+    /// \param separator  any text
+    /// \return the text; empty for an empty vector
     /// \warning Numbers are appended as characters, not in decimals: an `int` as the character of
     ///          its low 8 bits (65 and 66 joined with "," give "A,B"), a `bool` as the character 1
     ///          or 0, a `double` as the character of the low 8 bits of its value without the
@@ -57,6 +64,7 @@ class ORVADRCORE_API Container {
     static std::string ToString(const std::vector<T>& values, const std::string& separator);
 };
 
+/// \cond INSTANTIATIONS
 extern template Json::Value Container::ToJsonArray(const std::vector<std::string>&);
 extern template Json::Value Container::ToJsonArray(const std::vector<int>&);
 extern template Json::Value Container::ToJsonArray(const std::vector<bool>&);
@@ -66,14 +74,17 @@ extern template std::string Container::ToString(const std::vector<std::string>&,
 extern template std::string Container::ToString(const std::vector<int>&, const std::string&);
 extern template std::string Container::ToString(const std::vector<bool>&, const std::string&);
 extern template std::string Container::ToString(const std::vector<double>&, const std::string&);
+/// \endcond
 
 /// Tests of texts.
 class ORVADRCORE_API Validator {
   public:
     Validator() = delete;
 
-    /// Whether a path begins with "/volume". What follows is not looked at: "/volume", "/volume1/x"
-    /// and "/volumeUSB" all pass, an empty path does not.
+    /// Whether a path begins with "/volume".
+    /// \param path  the path; it is not looked up, and its case counts
+    /// \return true when it does. What follows is not looked at: "/volume", "/volume1/x" and
+    ///         "/volumeUSB" all pass, an empty path does not
     static bool IsVolPath(const std::string& path);
 };
 

@@ -239,8 +239,7 @@ TEST_F(ManyReadersTest, LateComersMayProduceAgainButNeverTwoAtATime)
     ReportCount("productions", all);
 }
 
-// ------------------------------------------------------------------------------ readers and
-// updaters
+// ---------------------------------------------------------------------------- readers and updaters
 
 class CacheProcessTest : public ProcessTest {
   protected:

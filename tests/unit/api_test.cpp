@@ -305,6 +305,21 @@ TEST(ApiTest, AStringLiteralIsATextAndNeverABoolean)
     EXPECT_EQ(request.getParams()["name"].asString(), "abc");
 }
 
+TEST(ApiTest, ABufferIsATextToo)
+{
+    char buffer[] = "abc";
+    char* const pointer = buffer;
+    InsertCommand insert;
+    EXPECT_TRUE(insert.AddFieldValue("a", buffer));
+    EXPECT_TRUE(insert.AddFieldValue("b", pointer));
+    EXPECT_EQ(insert.ToFormatedInsertValues(), "(a,b) VALUES ('abc','abc')");
+
+    UpdateCommand update;
+    EXPECT_TRUE(update.AddFieldValue("a", buffer));
+    EXPECT_TRUE(update.AddFieldValue("b", pointer));
+    EXPECT_EQ(update.ToStr(), "]condition:[]/values:[a='abc',b='abc']");
+}
+
 TEST(ApiTest, NumbersAndBooleansKeepTheirKind)
 {
     InsertCommand insert;

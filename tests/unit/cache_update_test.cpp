@@ -840,8 +840,7 @@ TEST_F(CacheUpdateTest, ALockDirectoryThatCannotBeMadeLooksLikeAnUpdater)
          Err("lock", "Bad fd [-1] to lock [" + lockPath + "]").In("file_lock.cpp")});
 }
 
-// ------------------------------------------------------------------------ a refresh in the
-// background
+// --------------------------------------------------------------------- a refresh in the background
 
 TEST_F(CacheUpdateTest, ABackgroundReadGivesTheOldDataAtOnceAndAChildWritesTheNew)
 {
@@ -1179,8 +1178,7 @@ TEST_F(CacheUpdateTest, WaitingForALockEndsWhenTheFileIsFresh)
         {LockIsNotOpened(), {StartWait()}, LockIsNotOpened(), LockIsNotOpened(), {FinishWait()}}));
 }
 
-// ----------------------------------------------------------------------------------- killed
-// updaters
+// --------------------------------------------------------------------------------- killed updaters
 
 TEST_F(CacheUpdateTest, AnUpdaterThatIsKilledWhileItProducesIsReplacedByTheNextReader)
 {

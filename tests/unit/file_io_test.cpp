@@ -615,8 +615,7 @@ TEST_F(ReplaceFileTest, ALeftOverWhoseNameALiveWriterHasTakenMeanwhileIsNotRemov
     EXPECT_EQ(ReadFile(path), "text");
 }
 
-// ------------------------------------------------------------------------------ ReplaceFile:
-// failures
+// --------------------------------------------------------------------------- ReplaceFile: failures
 
 struct Fault {
     const char* what;

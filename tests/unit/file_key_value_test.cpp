@@ -390,4 +390,17 @@ TEST_F(FileKeyValueTest, ATextThatIsNoNumberGivesZeroAndSucceeds)
     EXPECT_EQ(number, 0.0);
 }
 
+TEST_F(FileKeyValueTest, WhateverAStreamTakesAndGivesIsConverted)
+{
+    long large = 0;
+    EXPECT_TRUE(File::toType(std::string("4294967297"), large, 0L));
+    EXPECT_EQ(large, 4294967297);
+    std::string text;
+    EXPECT_TRUE(File::toType(12, text, std::string()));
+    EXPECT_EQ(text, "12");
+    int number = 0;
+    EXPECT_TRUE(File::toType("12abc", number, 7));
+    EXPECT_EQ(number, 12);
+}
+
 }  // namespace

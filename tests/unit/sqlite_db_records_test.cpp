@@ -626,8 +626,7 @@ TEST_F(SqliteDbRecordsTest, ASchemaThatSqliteRefusesIsToldWithItsStatement)
     ExpectPauses(3);
 }
 
-// --------------------------------------------------------------------------------- two
-// processes
+// ----------------------------------------------------------------------------------- two processes
 
 TEST(SqliteDbProcessesTest, TwoThatInsertAtTheSameTimeLoseNothing)
 {
