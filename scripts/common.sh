@@ -8,6 +8,8 @@ cd "$(dirname "${BASH_SOURCE[0]}")/.."
 build_packages=(g++ make cmake libsqlite3-dev libjsoncpp-dev uuid-runtime)
 # shellcheck disable=SC2034
 test_packages=(libgtest-dev libgmock-dev)
+# shellcheck disable=SC2034
+package_packages=(dpkg-dev file)
 
 step() { printf '==> %s\n' "$*"; }
 
@@ -59,3 +61,12 @@ build() {
     step "building build/$preset"
     quietly "$preset-build" cmake --build --preset "$preset" -j "$(nproc)"
 }
+
+# build_package: builds what is packaged, with the flags of Debian's own packages; CMake knows no
+# CPPFLAGS.
+build_package() (
+    CXXFLAGS="$(dpkg-buildflags --get CXXFLAGS) $(dpkg-buildflags --get CPPFLAGS)"
+    LDFLAGS="$(dpkg-buildflags --get LDFLAGS) -Wl,-z,now"
+    export CXXFLAGS LDFLAGS
+    build package
+)

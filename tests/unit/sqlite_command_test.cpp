@@ -1,8 +1,6 @@
 #include <orvadrcore/sqlite_command.h>
 
 #include <climits>
-#include <cstdint>
-#include <cstring>
 #include <locale>
 #include <type_traits>
 
@@ -20,7 +18,6 @@ using OrvaDRCore::SqliteCondition;
 using OrvaDRCore::SqliteEqual;
 using OrvaDRCore::SqliteIn;
 using OrvaDRCore::SqliteInFamily;
-using OrvaDRCore::SqliteRecord;
 using OrvaDRCore::SqliteTableHandler;
 using OrvaDRCore::SqliteValue;
 using OrvaDRCore::SqliteValueList;
@@ -597,66 +594,6 @@ TEST_F(SqliteCommandTest, NumbersAreWrittenPlainlyUnderEveryLocale)
     select.SelectAll();
     EXPECT_TRUE(select.SetCondition(SqliteIn("id", std::vector<SqliteValue>{1234567, UINT_MAX})));
     EXPECT_EQ(select.ToStr(), "jobs]condition:[id IN ( 1234567,4294967295 )]/fields:[all]");
-}
-
-// The slots of the virtual operations are part of the binary interface of every class here that
-// callers derive from or call through. A pointer to a virtual operation tells its slot: it holds
-// the offset in the table of operations, and a low bit, in one place or the other, that tells it
-// from the address of an operation that is not virtual.
-template <class Operation>
-int Slot(Operation operation)
-{
-    struct {
-        std::intptr_t position;
-        std::intptr_t adjustment;
-    } parts{};
-    static_assert(sizeof parts == sizeof operation);
-    std::memcpy(&parts, &operation, sizeof parts);
-    EXPECT_EQ((parts.position | parts.adjustment) & 1, 1) << "not virtual";
-    return static_cast<int>(parts.position / static_cast<std::intptr_t>(sizeof(void*)));
-}
-
-// How many slots a class has: its subclass's first new operation comes behind them. A virtual
-// destructor takes two.
-template <class Base>
-int SlotCount()
-{
-    struct Derived : Base {  // NOLINT(cppcoreguidelines-virtual-class-destructor)
-        virtual void Added() {}
-    };
-    return Slot(&Derived::Added);
-}
-
-TEST(SlotTest, ACommandsOperationsKeepTheirSlots)
-{
-    EXPECT_EQ(Slot(&SqliteCommand::GetCommand), 2);  // behind the destructor
-    EXPECT_EQ(Slot(&SqliteCommand::IsValid), 3);
-    EXPECT_EQ(Slot(&SqliteCommand::DumpParam), 4);
-    EXPECT_EQ(SlotCount<SqliteCommand>(), 5);
-    EXPECT_EQ(SlotCount<InsertCommand>(), 5);
-    EXPECT_EQ(SlotCount<UpdateCommand>(), 5);
-    EXPECT_EQ(SlotCount<SelectCommand>(), 5);
-}
-
-TEST(SlotTest, ARecordsOperationsKeepTheirSlots)
-{
-    EXPECT_EQ(Slot(&SqliteRecord::BuildRecord), 0);
-    EXPECT_EQ(Slot(&SqliteRecord::LoadRecord), 1);
-    EXPECT_EQ(Slot(&SqliteRecord::GetRecordFields), 2);
-    EXPECT_EQ(SlotCount<SqliteRecord>(), 5);  // the destructor at the end
-}
-
-TEST(SlotTest, AConditionsOneOperationIsItsValidity)
-{
-    EXPECT_EQ(Slot(&SqliteCondition::IsValid), 0);
-    EXPECT_EQ(SlotCount<SqliteCondition>(), 1);
-    EXPECT_EQ(SlotCount<SqliteInFamily>(), 1);
-}
-
-TEST(SlotTest, TablesAndListsHaveNothingButTheirDestructor)
-{
-    EXPECT_EQ(SlotCount<SqliteTableHandler>(), 2);
-    EXPECT_EQ(SlotCount<SqliteValueList>(), 2);
 }
 
 }  // namespace

@@ -1,0 +1,95 @@
+// Named locks: alone, shared, with several tries, across a fork and between threads. For root.
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <cstdlib>
+#include <iostream>
+#include <string>
+#include <thread>
+
+#include <orvadrcore/file_lock.h>
+
+using OrvaDRCore::FileLock;
+
+namespace {
+
+// [alone]
+bool ChangeRegistry(const std::string& name)
+{
+    FileLock lock(name);
+    if (!lock.lock(LOCK_EX | LOCK_NB, 5)) return false;  // six tries, a second apart
+    // What is done here is done by one process at a time.
+    std::cout << "changed\n";
+    return true;  // the object goes, and the lock with it
+}
+// [/alone]
+
+bool Share(const std::string& name)
+{
+    // [shared]
+    FileLock reader(name);
+    FileLock otherReader(name);
+    FileLock writer(name);
+    std::cout << "reader:       " << reader.lock(LOCK_SH | LOCK_NB, 0) << '\n';
+    std::cout << "other reader: " << otherReader.lock(LOCK_SH | LOCK_NB, 0) << '\n';
+    std::cout << "writer:       " << writer.lock(LOCK_EX | LOCK_NB, 0) << '\n';
+    reader.unlock();
+    otherReader.unlock();
+    std::cout << "writer again: " << writer.lock(LOCK_EX | LOCK_NB, 0) << '\n';
+    // [/shared]
+    return true;
+}
+
+// [fork]
+// A lock that the child is to have for itself is taken by an object that the child makes.
+bool LockInChild(const std::string& name)
+{
+    const pid_t child = ::fork();
+    if (child == 0) {
+        FileLock lock(name);
+        const bool locked = lock.lock(LOCK_EX | LOCK_NB, 0);
+        ::_exit(locked ? EXIT_SUCCESS : EXIT_FAILURE);  // a process that ends leaves no lock
+    }
+    int status = 0;
+    return child > 0 && ::waitpid(child, &status, 0) == child && status == 0;
+}
+// [/fork]
+
+// [threads]
+// Each thread has an object of its own. Two objects exclude each other within a process, too.
+int CountInTwoThreads(const std::string& name)
+{
+    int count = 0;
+    std::atomic<bool> failed{false};
+    const auto add = [&] {
+        FileLock lock(name);
+        for (int i = 0; i < 1000; ++i) {
+            if (!lock.lock(LOCK_EX, 0)) failed = true;  // waits
+            ++count;
+            lock.unlock();
+        }
+    };
+    std::thread one(add);
+    std::thread other(add);
+    one.join();
+    other.join();
+    return failed ? -1 : count;
+}
+// [/threads]
+
+}  // namespace
+
+int main()
+{
+    const std::string name = "guide." + std::to_string(::getpid());
+    std::cout << std::boolalpha;
+    bool done = ChangeRegistry(name) && Share(name) && LockInChild(name);
+    std::cout << "counted: " << CountInTwoThreads(name) << '\n';
+
+    FileLock mine(name);
+    done = done && mine.lock(LOCK_EX, 0) && !LockInChild(name);
+    // Nobody else knows this name. A lock file that others may use must stay.
+    ::unlink(FileLock::getLockFilePath(name).c_str());
+    return done ? EXIT_SUCCESS : EXIT_FAILURE;
+}

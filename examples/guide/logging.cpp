@@ -1,0 +1,66 @@
+// Makes the library log, on standard error as well, and takes the lines apart.
+#include <syslog.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cstdio>
+#include <cstdlib>
+#include <fstream>
+#include <iostream>
+#include <map>
+#include <string>
+
+#include <json/value.h>
+
+#include <orvadrcore/file.h>
+
+using OrvaDRCore::File;
+
+namespace {
+
+// [apart]
+// The text before a mark, which both go off the line.
+std::string Take(std::string& line, const std::string& mark)
+{
+    const std::size_t at = std::min(line.find(mark), line.size());
+    std::string part = line.substr(0, at);
+    line.erase(0, at + mark.size());
+    return part;
+}
+
+// Of "guide: file.cpp:60(Write)[ERR][4242]: Empty path to write."
+void PrintParts(std::string line)
+{
+    Take(line, ": ");  // what syslog puts first
+    const std::string file = Take(line, ":");
+    const std::string number = Take(line, "(");
+    const std::string function = Take(line, ")[");
+    const std::string level = Take(line, "][");
+    const std::string process = Take(line, "]: ");
+    const bool isMine = process == std::to_string(::getpid());
+    std::cout << file << ' ' << function << ' ' << level << (isMine ? " mine: " : " other: ")
+              << line << '\n';
+}
+// [/apart]
+
+}  // namespace
+
+int main()
+{
+    // Standard error becomes a file, to be read again below.
+    if (std::freopen("lines.txt", "w", stderr) == nullptr) return EXIT_FAILURE;
+
+    // [setup]
+    ::openlog("guide", LOG_PERROR, LOG_DAEMON);  // in service: LOG_PID, without LOG_PERROR
+    // [/setup]
+
+    File::Write("", Json::Value());
+    File::CreateDir("state", 01777);
+    std::ofstream("limits.conf") << "timeout 30\n";
+    std::map<std::string, int> limits;
+    File::Read("limits.conf", limits);
+
+    std::ifstream lines("lines.txt");
+    for (std::string line; std::getline(lines, line);) PrintParts(line);
+    return EXIT_SUCCESS;
+}

@@ -1,0 +1,116 @@
+// A cache whose producer may fail: after a failure it is left alone for a while, and then longer.
+// Needs root, as every cache does; ends with 77 without it.
+#include <unistd.h>
+
+#include <algorithm>
+#include <cstdlib>
+#include <ctime>
+#include <filesystem>
+#include <functional>
+#include <iostream>
+#include <string>
+#include <utility>
+
+#include <json/json.h>
+
+#include <orvadrcore/cache.h>
+
+using OrvaDRCore::Cache;
+
+namespace {
+
+constexpr int ExitSkipped = 77;
+
+// [cache]
+// Holds {"value": the last good one or null, "failures": in a row, "retry_at": seconds}. A failure
+// is stored like a value, so that all processes know of it.
+class NodeStatus : public Cache {
+  public:
+    using Producer = std::function<bool(Json::Value& ret_value)>;
+    using Clock = std::function<std::time_t()>;
+
+    NodeStatus(const std::string& dir, Producer ask, Clock now)
+        : Cache(dir, "status", TimeoutSeconds, true, SingleTry),
+          produce(std::move(ask)),
+          clock(std::move(now))
+    {
+    }
+
+    Json::Value GetInfo() const override { return "status of the node"; }
+
+    bool GetUpdatedData(Json::Value& data) const override
+    {
+        const Json::Value last = GetCachedData();
+        Json::Value value;
+        int failures = 0;
+        if (!produce(value)) {
+            failures = 1;
+            if (IsValidData(last)) {
+                failures = std::min(last["failures"].asInt() + 1, MostFailures);
+                value = last["value"];
+            }
+        }
+        data = Json::Value(Json::objectValue);
+        data["value"] = value;
+        data["failures"] = failures;
+        data["retry_at"] = Json::Int64{clock() + (PauseSeconds << failures)};
+        return true;
+    }
+
+    // A failure counts as data, or else each read would ask again.
+    bool IsValidData(const Json::Value& data) const override
+    {
+        return data.isObject() && data.isMember("value") && data["failures"].isInt() &&
+               data["retry_at"].isInt64();
+    }
+
+    // After a failure: not before the pause is over, but then at once.
+    bool IsNeedUpdate(const Json::Value& data) const override
+    {
+        return data["failures"].asInt() > 0 && clock() >= data["retry_at"].asInt64();
+    }
+
+  private:
+    static constexpr std::time_t PauseSeconds = 5;  // doubled by each failure: 10, 20, ...
+    static constexpr int MostFailures = 5;          // ... 160
+    static constexpr long TimeoutSeconds = 300;     // longer than the longest pause
+    static constexpr int SingleTry = -1;
+
+    Producer produce;
+    Clock clock;
+};
+// [/cache]
+
+}  // namespace
+
+int main()
+{
+    if (::geteuid() != 0) return ExitSkipped;
+    const std::string dir = std::filesystem::current_path();
+    std::time_t now = 1700000000;  // a clock that can be put forward
+    bool isUp = false;
+    int asked = 0;
+    const auto ask = [&](Json::Value& ret_value) {
+        ++asked;
+        if (isUp) ret_value = "reachable";
+        return isUp;
+    };
+    const NodeStatus status(dir, ask, [&] { return now; });
+    const auto read = [&](const char* what) {
+        const Json::Value data = status.Read();
+        std::cout << what << ": value " << data["value"] << ", failures " << data["failures"]
+                  << ", asked " << asked << '\n';
+    };
+
+    read("first read, node is down");
+    read("again");
+    now += 10;
+    read("after 10 seconds");
+    now += 10;
+    read("after 10 more");
+    now += 10;
+    isUp = true;
+    read("after 20, node is up");
+    read("again");
+    return asked == 3 ? EXIT_SUCCESS : EXIT_FAILURE;
+}

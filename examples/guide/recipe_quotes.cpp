@@ -1,0 +1,71 @@
+// Texts that hold quotes and patterns, in values, in conditions and in LIKE.
+#include <cstdlib>
+#include <iostream>
+#include <string>
+#include <vector>
+
+#include <orvadrcore/sqlite_command.h>
+#include <orvadrcore/sqlite_condition.h>
+#include <orvadrcore/sqlite_db.h>
+
+using OrvaDRCore::InsertCommand;
+using OrvaDRCore::SelectCommand;
+using OrvaDRCore::SqliteCondition;
+using OrvaDRCore::SqliteDB;
+using OrvaDRCore::SqliteEqual;
+using OrvaDRCore::SqliteIn;
+using OrvaDRCore::SqliteTableHandler;
+using OrvaDRCore::SqliteValue;
+using OrvaDRCore::SqliteValueList;
+
+namespace {
+
+// [like]
+// The condition that a column's text begins with `prefix`, taken literally.
+SqliteCondition BeginsWith(const std::string& column, const std::string& prefix)
+{
+    std::string pattern;
+    for (const char character : prefix) {
+        if (character == '%' || character == '_' || character == '\\') pattern += '\\';
+        pattern += character;
+    }
+    return {column + " LIKE '" + SqliteValue::EscapeText(pattern) + "%' ESCAPE '\\'"};
+}
+// [/like]
+
+bool Print(SqliteDB& db, const SqliteTableHandler& table, const SqliteCondition& condition)
+{
+    SelectCommand select;
+    select.SetTable(table);
+    select.AddField("name");
+    std::vector<SqliteValueList> rows;
+    if (!select.SetCondition(condition) || !db.SelectRecords(select, rows)) return false;
+    std::cout << condition.GetCondition() << " -> " << rows.size() << '\n';
+    return true;
+}
+
+}  // namespace
+
+int main()
+{
+    SqliteDB db("recipe_quotes.db", 3);
+    const SqliteTableHandler nodes("nodes", "name TEXT PRIMARY KEY");
+    for (const std::string name : {"O'Brien's NAS", "'; DROP TABLE nodes; --", "50%_a", "50-b"}) {
+        InsertCommand insert;
+        insert.SetTable(nodes);
+        insert.AddFieldValue("name", SqliteValue::EscapeText(name));
+        if (!db.InsertRecord(insert)) return EXIT_FAILURE;
+    }
+
+    // [conditions]
+    const std::vector<std::string> wanted = {"O'Brien's NAS", "'; DROP TABLE nodes; --"};
+    const SqliteEqual first("name", SqliteValue::EscapeText(wanted.front()));
+    std::vector<SqliteValue> literals;
+    literals.reserve(wanted.size());
+    for (const std::string& name : wanted) literals.emplace_back(SqliteValue::EscapeText(name));
+    const SqliteIn both("name", literals);
+    // [/conditions]
+    const bool isPrinted = Print(db, nodes, first) && Print(db, nodes, both) &&
+                           Print(db, nodes, BeginsWith("name", "50%"));
+    return isPrinted ? EXIT_SUCCESS : EXIT_FAILURE;
+}

@@ -1,0 +1,26 @@
+#!/usr/bin/env bash
+# The table of docs/errors.md has the numbers and names of the header, in its order, and the source
+# names the same codes.
+#
+#   error_table_test.sh SOURCE-DIRECTORY
+set -euo pipefail
+cd "$1"
+
+# "401 BAD_PARAMETER" for each row and each enumerator.
+# shellcheck disable=SC2016  # the backticks are those of the page
+shown=$(sed -n 's/^| \([0-9]\{1,\}\) | `\([A-Z_]\{1,\}\)` |.*/\1 \2/p' docs/errors.md)
+declared=$(sed -n 's/^ *\([A-Z_]\{1,\}\) = \([0-9]\{1,\}\),.*/\2 \1/p' include/orvadrcore/errors.h)
+[[ -n $declared ]] || { echo "no codes found in include/orvadrcore/errors.h" >&2; exit 1; }
+diff <(printf '%s\n' "$declared") <(printf '%s\n' "$shown") || {
+    echo "docs/errors.md (>) differs from include/orvadrcore/errors.h (<)" >&2
+    exit 1
+}
+
+# Each enumerator's case gives its own name; a case and its text may stand on two lines.
+named=$(tr '\n' ' ' <src/errors.cpp |
+    grep -o 'case ERR::[A-Z_]*: *return "[A-Z_]*";' |
+    sed 's/case ERR::\([A-Z_]*\): *return "\([A-Z_]*\)";/\1 \2/')
+diff <(printf '%s\n' "$declared" | sed 's/^[0-9]* \(.*\)/\1 \1/') <(printf '%s\n' "$named") || {
+    echo "src/errors.cpp (>) names other codes than include/orvadrcore/errors.h (<)" >&2
+    exit 1
+}

@@ -1,0 +1,176 @@
+// What programs that are already linked rely on: the slots of virtual operations and the places of
+// data members. This source is compiled without access control, to see the latter.
+#include <gtest/gtest.h>
+#include <orvadrcore/cache.h>
+#include <orvadrcore/file_lock.h>
+#include <orvadrcore/request.h>
+#include <orvadrcore/response.h>
+#include <orvadrcore/sqlite_command.h>
+#include <orvadrcore/sqlite_condition.h>
+#include <orvadrcore/sqlite_db.h>
+#include <orvadrcore/sqlite_value.h>
+
+#include <algorithm>
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+#include <functional>
+#include <initializer_list>
+
+namespace {
+
+using OrvaDRCore::Cache;
+using OrvaDRCore::FileLock;
+using OrvaDRCore::InsertCommand;
+using OrvaDRCore::Request;
+using OrvaDRCore::Response;
+using OrvaDRCore::SelectCommand;
+using OrvaDRCore::SqliteCommand;
+using OrvaDRCore::SqliteCondition;
+using OrvaDRCore::SqliteDB;
+using OrvaDRCore::SqliteInFamily;
+using OrvaDRCore::SqliteRecord;
+using OrvaDRCore::SqliteTableHandler;
+using OrvaDRCore::SqliteValue;
+using OrvaDRCore::SqliteValueList;
+using OrvaDRCore::UpdateCommand;
+
+// ------------------------------------------------------------------------------------------- slots
+
+// The slots of the virtual operations are part of the binary interface of every class that callers
+// derive from or call through. A pointer to a virtual operation tells its slot: it holds
+// the offset in the table of operations, and a low bit, in one place or the other, that tells it
+// from the address of an operation that is not virtual.
+template <class Operation>
+int Slot(Operation operation)
+{
+    struct {
+        std::intptr_t position;
+        std::intptr_t adjustment;
+    } parts{};
+    static_assert(sizeof parts == sizeof operation);
+    std::memcpy(&parts, &operation, sizeof parts);
+    EXPECT_EQ((parts.position | parts.adjustment) & 1, 1) << "not virtual";
+    return static_cast<int>(parts.position / static_cast<std::intptr_t>(sizeof(void*)));
+}
+
+// How many slots a class has: its subclass's first new operation comes behind them. A virtual
+// destructor takes two.
+template <class Base>
+int SlotCount()
+{
+    struct Derived : Base {  // NOLINT(cppcoreguidelines-virtual-class-destructor)
+        virtual void Added() {}
+    };
+    return Slot(&Derived::Added);
+}
+
+TEST(SlotTest, ACommandsOperationsKeepTheirSlots)
+{
+    EXPECT_EQ(Slot(&SqliteCommand::GetCommand), 2);  // behind the destructor
+    EXPECT_EQ(Slot(&SqliteCommand::IsValid), 3);
+    EXPECT_EQ(Slot(&SqliteCommand::DumpParam), 4);
+    EXPECT_EQ(SlotCount<SqliteCommand>(), 5);
+    EXPECT_EQ(SlotCount<InsertCommand>(), 5);
+    EXPECT_EQ(SlotCount<UpdateCommand>(), 5);
+    EXPECT_EQ(SlotCount<SelectCommand>(), 5);
+}
+
+TEST(SlotTest, ARecordsOperationsKeepTheirSlots)
+{
+    EXPECT_EQ(Slot(&SqliteRecord::BuildRecord), 0);
+    EXPECT_EQ(Slot(&SqliteRecord::LoadRecord), 1);
+    EXPECT_EQ(Slot(&SqliteRecord::GetRecordFields), 2);
+    EXPECT_EQ(SlotCount<SqliteRecord>(), 5);  // the destructor at the end
+}
+
+TEST(SlotTest, AConditionsOneOperationIsItsValidity)
+{
+    EXPECT_EQ(Slot(&SqliteCondition::IsValid), 0);
+    EXPECT_EQ(SlotCount<SqliteCondition>(), 1);
+    EXPECT_EQ(SlotCount<SqliteInFamily>(), 1);
+}
+
+TEST(SlotTest, TablesAndListsHaveNothingButTheirDestructor)
+{
+    EXPECT_EQ(SlotCount<SqliteTableHandler>(), 2);
+    EXPECT_EQ(SlotCount<SqliteValueList>(), 2);
+}
+
+TEST(SlotTest, ACachesOperationsKeepTheirSlots)
+{
+    EXPECT_EQ(Slot(&Cache::GetInfo), 2);  // behind the destructor
+    EXPECT_EQ(Slot(&Cache::GetDefaultValue), 3);
+    EXPECT_EQ(Slot(&Cache::GetUpdatedData), 4);
+    EXPECT_EQ(Slot(&Cache::IsValidData), 5);
+    EXPECT_EQ(Slot(&Cache::IsNeedUpdate), 6);
+    EXPECT_EQ(Slot(&Cache::IsUpdatedDataRequired), 7);
+    EXPECT_EQ(SlotCount<Cache>(), 8);
+}
+
+TEST(SlotTest, RequestsAndResponsesHaveNothingButTheirDestructor)
+{
+    EXPECT_EQ(SlotCount<Request>(), 2);
+    EXPECT_EQ(SlotCount<Response>(), 2);
+}
+
+// ----------------------------------------------------------------------------------------- members
+
+// The first member's place, and each other's behind the one before it.
+void ExpectInOrder(std::size_t first, std::initializer_list<std::size_t> offsets)
+{
+    EXPECT_EQ(*offsets.begin(), first);
+    EXPECT_EQ(std::adjacent_find(offsets.begin(), offsets.end(), std::greater_equal<>()),
+              offsets.end());
+}
+
+constexpr std::size_t BehindTable = sizeof(void*);  // of virtual operations
+constexpr std::size_t BehindCommand = sizeof(SqliteCommand);
+
+TEST(MemberTest, ValuesAndRecordsKeepTheirOrder)
+{
+    ExpectInOrder(0, {offsetof(SqliteValue, valid), offsetof(SqliteValue, value)});
+    ExpectInOrder(BehindTable,
+                  {offsetof(SqliteValueList, invalidValue), offsetof(SqliteValueList, values)});
+    EXPECT_EQ(sizeof(SqliteRecord), BehindTable);
+}
+
+TEST(MemberTest, CommandsKeepTheirOrder)
+{
+    ExpectInOrder(BehindTable,
+                  {offsetof(SqliteTableHandler, name), offsetof(SqliteTableHandler, schema)});
+    ExpectInOrder(BehindTable, {offsetof(SqliteCommand, table)});
+    ExpectInOrder(BehindCommand,
+                  {offsetof(InsertCommand, replacable), offsetof(InsertCommand, fieldValues)});
+    ExpectInOrder(BehindCommand,
+                  {offsetof(UpdateCommand, condition), offsetof(UpdateCommand, fieldValues)});
+    ExpectInOrder(BehindCommand,
+                  {offsetof(SelectCommand, selectAll), offsetof(SelectCommand, fields),
+                   offsetof(SelectCommand, condition)});
+}
+
+TEST(MemberTest, ConnectionsKeepTheirOrder)
+{
+    ExpectInOrder(
+        0, {offsetof(SqliteDB, errCode), offsetof(SqliteDB, errRecord), offsetof(SqliteDB, handle),
+            offsetof(SqliteDB, path), offsetof(SqliteDB, retryLimit)});
+}
+
+TEST(MemberTest, LocksAndCachesKeepTheirOrder)
+{
+    ExpectInOrder(0, {offsetof(FileLock, fd), offsetof(FileLock, path)});
+    ExpectInOrder(BehindTable, {offsetof(Cache, cachedPath), offsetof(Cache, timeout),
+                                offsetof(Cache, updatedDataRequired), offsetof(Cache, retryLimit),
+                                offsetof(Cache, cachedData), offsetof(Cache, loadedModifyTime)});
+}
+
+TEST(MemberTest, RequestsAndResponsesKeepTheirOrder)
+{
+    ExpectInOrder(BehindTable,
+                  {offsetof(Request, version), offsetof(Request, timeout), offsetof(Request, api),
+                   offsetof(Request, method), offsetof(Request, params),
+                   offsetof(Request, encryptRequired), offsetof(Request, uploadFile)});
+    ExpectInOrder(BehindTable, {offsetof(Response, emptyValue), offsetof(Response, resp)});
+}
+
+}  // namespace
