@@ -2,6 +2,8 @@
 
 #include <sqlite3.h>
 
+#include <algorithm>
+#include <map>
 #include <memory>
 #include <utility>
 
@@ -36,6 +38,61 @@ int PrepareStatement(sqlite3* handle, const std::string& command, Statement& sta
     statement.reset(made);
     return code;
 }
+
+// Whether SQLite can store a record: a field at least, and values that are there. A list holds no
+// others, unless somebody has written into it through a reference that promised not to be.
+bool IsStorable(const SqliteValueList& record)
+{
+    const auto& values = record.GetValues();
+    return !values.empty() && std::all_of(values.begin(), values.end(),
+                                          [](const auto& field) { return field.second.IsValid(); });
+}
+
+bool HaveSameFields(const SqliteValueList& one, const SqliteValueList& other)
+{
+    const auto& left = one.GetValues();
+    const auto& right = other.GetValues();
+    return std::equal(left.begin(), left.end(), right.begin(), right.end(),
+                      [](const auto& a, const auto& b) { return a.first == b.first; });
+}
+
+// Orders records by the names of their fields: statements are kept by the first record of a kind.
+struct ByFields {
+    bool operator()(const SqliteValueList* one, const SqliteValueList* other) const
+    {
+        const auto& left = one->GetValues();
+        const auto& right = other->GetValues();
+        return std::lexicographical_compare(
+            left.begin(), left.end(), right.begin(), right.end(),
+            [](const auto& a, const auto& b) { return a.first < b.first; });
+    }
+};
+
+// The INSERT of records with these fields, with placeholders for the values.
+std::string InsertStatement(const std::string& table, const SqliteValueList& record,
+                            bool replacable)
+{
+    std::string fields;
+    std::string places;
+    for (const auto& [field, value] : record.GetValues()) {
+        const char* separator = fields.empty() ? "" : ",";
+        fields.append(separator).append(field);
+        places.append(separator).append("?");
+    }
+    const char* verb = replacable ? "INSERT OR REPLACE INTO " : "INSERT INTO ";
+    return verb + table + " (" + fields + ") VALUES (" + places + ");";
+}
+
+// What begins, ends and undoes work that happens whole or not at all.
+struct Bracket {
+    const char* begin;
+    const char* end;
+    const char* undo;
+};
+// IMMEDIATE: another writer is met, and waited for, before the first row.
+constexpr Bracket Transaction{"BEGIN IMMEDIATE", "COMMIT", "ROLLBACK"};
+constexpr Bracket Savepoint{"SAVEPOINT orvadr_insert", "RELEASE orvadr_insert",
+                            "ROLLBACK TO orvadr_insert; RELEASE orvadr_insert"};
 
 // The current row of a statement.
 SqliteValueList ParseRecord(sqlite3_stmt* statement)
@@ -118,6 +175,29 @@ bool SqliteDB::InsertRecord(const InsertCommand& command)
 {
     // An invalid insert stays at 404 where the other operations answer 401, on purpose.
     return ExecCommand({__func__, "insert", ERR::ERR_DATABASE_OPERATION}, command);
+}
+
+bool SqliteDB::InsertRecords(const SqliteTableHandler& table,
+                             const std::vector<SqliteValueList>& records, bool replacable)
+{
+    SetErr(0);
+    if (records.empty()) return true;
+    if (table.GetName().empty() || !std::all_of(records.begin(), records.end(), IsStorable)) {
+        SetErr(ERR::BAD_PARAMETER);
+        DR_LOG(Err, "invalid insert records: table[%s]", table.GetName().c_str());
+        return false;
+    }
+    // Asked before the look for the table, which may be what SQLite ends a transaction at.
+    const bool isNested = IsInTransaction();
+    SetErr(ERR::ERR_DATABASE_OPERATION);
+    if (!OpenWithTable(__func__, table)) return false;
+    const Tries tries = TryRepeatedly([&] {
+        return DoWhole(isNested, [&] { return InsertRows(table.GetName(), records, replacable); });
+    });
+    if (!tries.succeeded) {
+        DR_LOG(Err, "Failed to insert [%zu] records in db[%s]", records.size(), path.c_str());
+    }
+    return tries.succeeded;
 }
 
 bool SqliteDB::UpdateRecord(const UpdateCommand& command)
@@ -383,6 +463,82 @@ bool SqliteDB::DoSelect(const std::string& command, TakeRow takeRow)
     return true;
 }
 
+bool SqliteDB::IsInTransaction() const
+{
+    return handle != nullptr && sqlite3_get_autocommit(handle) == 0;
+}
+
+// Stores what the literal of ToFormatedValue() would. Texts are not copied: the value outlives the
+// statement. Answers SQLite's code.
+int SqliteDB::BindValue(sqlite3_stmt* statement, int place, const SqliteValue& value)
+{
+    const Json::Value& payload = value.value;
+    if (payload.isString()) {
+        const char* begin = nullptr;
+        const char* end = nullptr;
+        payload.getString(&begin, &end);
+        return sqlite3_bind_text64(statement, place, begin,
+                                   static_cast<sqlite3_uint64>(end - begin), SQLITE_STATIC,
+                                   SQLITE_UTF8);
+    }
+    return sqlite3_bind_int64(statement, place, payload.asInt64());
+}
+
+// Answers SQLite's code, SQLITE_DONE when the row is stored.
+int SqliteDB::InsertRow(sqlite3_stmt* statement, const SqliteValueList& record)
+{
+    int place = 0;
+    for (const auto& [field, value] : record.GetValues()) {
+        const int code = BindValue(statement, ++place, value);
+        if (code != SQLITE_OK) return code;
+    }
+    return sqlite3_step(statement);
+}
+
+// Inserts row by row, up to the first that fails, with one statement for all records of a kind.
+bool SqliteDB::InsertRows(const std::string& table, const std::vector<SqliteValueList>& records,
+                          bool replacable)
+{
+    std::map<const SqliteValueList*, Statement, ByFields> statements;
+    Statement* insert = nullptr;
+    const SqliteValueList* last = nullptr;
+    for (const SqliteValueList& record : records) {
+        if (last == nullptr || !HaveSameFields(*last, record)) insert = &statements[&record];
+        last = &record;
+        int code = SQLITE_OK;
+        if (*insert == nullptr) {
+            code = PrepareStatement(handle, InsertStatement(table, record, replacable), *insert);
+        }
+        if (code == SQLITE_OK) code = InsertRow(insert->get(), record);
+        if (code != SQLITE_DONE) {
+            SetDBErr(InsertStatement(table, record, replacable), code, nullptr);
+            return false;
+        }
+        sqlite3_reset(insert->get());
+    }
+    return true;
+}
+
+// One try of work that happens whole or not at all; nested, within the caller's transaction.
+template <class Work>
+bool SqliteDB::DoWhole(bool isNested, Work work)
+{
+    const Bracket& bracket = isNested ? Savepoint : Transaction;
+    if (isNested && !IsInTransaction()) {
+        // SQLite has ended it by itself. A savepoint would begin another, which nobody asked for.
+        SetDBErr(bracket.begin, SQLITE_ABORT, "the transaction was rolled back");
+        return false;
+    }
+    if (!DoExecSqliteCommand(bracket.begin)) return false;
+    if (work() && DoExecSqliteCommand(bracket.end)) return true;
+    // The error record stays that of the failure. What cannot be undone ends with the connection.
+    if (IsInTransaction() &&
+        sqlite3_exec(handle, bracket.undo, nullptr, nullptr, nullptr) != SQLITE_OK) {
+        Close();
+    }
+    return false;
+}
+
 bool SqliteDB::OpenFor(const char* function)
 {
     if (Open()) return true;
@@ -390,7 +546,18 @@ bool SqliteDB::OpenFor(const char* function)
     return false;
 }
 
-// What comes before the statement in every record operation.
+// What comes before the statement in nearly every record operation; deletes have words of their own.
+bool SqliteDB::OpenWithTable(const char* function, const SqliteTableHandler& table)
+{
+    if (!OpenFor(function)) return false;
+    if (!CreateTable(table)) {
+        DR_LOG_AS(function, Err, "Failed to create table");
+        return false;
+    }
+    return true;
+}
+
+// What comes before the statement in the record operations that take a command.
 bool SqliteDB::Prepare(const Operation& operation, const SqliteCommand& command)
 {
     SetErr(ERR::ERR_DATABASE_OPERATION);
@@ -400,12 +567,7 @@ bool SqliteDB::Prepare(const Operation& operation, const SqliteCommand& command)
                   command.ToStr().c_str());
         return false;
     }
-    if (!OpenFor(operation.function)) return false;
-    if (!CreateTable(command.GetTable())) {
-        DR_LOG_AS(operation.function, Err, "Failed to create table");
-        return false;
-    }
-    return true;
+    return OpenWithTable(operation.function, command.GetTable());
 }
 
 bool SqliteDB::ExecCommand(const Operation& operation, const SqliteCommand& command)

@@ -1,6 +1,4 @@
-// Many rows at once: one statement for each few hundred of them.
-#include <algorithm>
-#include <cstddef>
+// Many rows at once: all of them or none.
 #include <cstdlib>
 #include <iostream>
 #include <string>
@@ -8,57 +6,12 @@
 
 #include <orvadrcore/sqlite_command.h>
 #include <orvadrcore/sqlite_db.h>
-#include <orvadrcore/utils.h>
 
-using OrvaDRCore::Container;
 using OrvaDRCore::SqliteDB;
 using OrvaDRCore::SqliteTableHandler;
-using OrvaDRCore::SqliteValue;
 using OrvaDRCore::SqliteValueList;
 
 namespace {
-
-// [insert_all]
-constexpr std::size_t RowsPerStatement = 500;
-
-std::vector<std::string> FieldsOf(const SqliteValueList& record)
-{
-    std::vector<std::string> fields;
-    for (const auto& [field, value] : record.GetValues()) fields.push_back(field);
-    return fields;
-}
-
-std::string LiteralsOf(const SqliteValueList& record)
-{
-    std::vector<std::string> literals;
-    for (const auto& [field, value] : record.GetValues())
-        literals.push_back(value.ToFormatedValue());
-    return "(" + Container::ToString(literals, ",") + ")";
-}
-
-// Inserts records that all have the same fields. On failure the statements before the failing one
-// have happened, and of its rows none.
-bool InsertAll(SqliteDB& db, const SqliteTableHandler& table,
-               const std::vector<SqliteValueList>& records)
-{
-    if (records.empty()) return true;
-    const std::vector<std::string> fields = FieldsOf(records.front());
-    const bool areAlike = std::all_of(records.begin(), records.end(), [&](const auto& record) {
-        return FieldsOf(record) == fields;
-    });
-    if (fields.empty() || !areAlike || !db.Open() || !db.CreateTable(table)) return false;
-
-    const std::string head =
-        "INSERT INTO " + table.GetName() + " (" + Container::ToString(fields, ",") + ") VALUES ";
-    for (std::size_t begin = 0; begin < records.size(); begin += RowsPerStatement) {
-        const std::size_t end = std::min(begin + RowsPerStatement, records.size());
-        std::vector<std::string> rows;
-        for (std::size_t row = begin; row < end; ++row) rows.push_back(LiteralsOf(records[row]));
-        if (!db.Exec(head + Container::ToString(rows, ","))) return false;
-    }
-    return true;
-}
-// [/insert_all]
 
 bool PrintCount(SqliteDB& db)
 {
@@ -73,21 +26,34 @@ bool PrintCount(SqliteDB& db)
 
 int main()
 {
+    // [insert]
     SqliteDB db("recipe_many_rows.db", 0);
     const SqliteTableHandler nodes("nodes", "name TEXT PRIMARY KEY, port INTEGER");
     std::vector<SqliteValueList> records;
     for (int number = 1; number <= 1200; ++number) {
         SqliteValueList record;
-        record.AddValue("name", SqliteValue::EscapeText("node '" + std::to_string(number) + "'"));
-        record.AddValue("port", number);
+        record.AddValue("name", "O'Brien's node " + std::to_string(number));  // not escaped
+        record.AddValue("port", 5000);
         records.push_back(record);
     }
-    if (!InsertAll(db, nodes, records) || !PrintCount(db)) return EXIT_FAILURE;
+    if (!db.InsertRecords(nodes, records)) return EXIT_FAILURE;
+    // [/insert]
+    if (!PrintCount(db)) return EXIT_FAILURE;
 
-    // One row of these is there already: none of them comes in.
-    for (SqliteValueList& record : records) record.AddValue("port", 5001);
+    // One of these two is there already: neither comes in.
+    // [refused]
     records.resize(2);
     records.front().AddValue("name", "new");
-    if (InsertAll(db, nodes, records) || !PrintCount(db)) return EXIT_FAILURE;
-    return EXIT_SUCCESS;
+    for (SqliteValueList& record : records) record.AddValue("port", 5001);
+    if (db.InsertRecords(nodes, records)) return EXIT_FAILURE;
+    const Json::Value& last = db.GetErr()[0]["err_msg"];
+    std::cout << last["command"].asString() << '\n' << last["sqlite_errmsg"].asString() << '\n';
+    // [/refused]
+    if (!PrintCount(db)) return EXIT_FAILURE;
+
+    // [replace]
+    const bool replacable = true;
+    if (!db.InsertRecords(nodes, records, replacable)) return EXIT_FAILURE;
+    // [/replace]
+    return PrintCount(db) ? EXIT_SUCCESS : EXIT_FAILURE;
 }

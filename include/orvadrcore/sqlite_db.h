@@ -33,6 +33,7 @@
 #include <orvadrcore/sqlite_value.h>
 
 struct sqlite3;
+struct sqlite3_stmt;
 
 namespace OrvaDRCore {
 
@@ -86,6 +87,33 @@ class ORVADRCORE_API SqliteDB {
     ///          other: on a file that stays locked the call takes twice as long as one
     ///          statement.
     bool InsertRecord(const InsertCommand& command);
+
+    /// Inserts records, all of them or none, in one transaction and hundreds of times faster than
+    /// one by one. Opens the file and makes the table as InsertRecord() does; a table that was made
+    /// stays. Records may differ in their fields; their order is kept.
+    ///
+    /// A try is everything: BEGIN IMMEDIATE, which waits for another writer, the rows, and COMMIT;
+    /// what fails is rolled back whole before the next try. Inside a transaction that is open on
+    /// the connection it is a savepoint, and committing is left to whoever began.
+    /// \param table       the table; its name and the fields' names are written as they stand
+    /// \param records     the rows; for none nothing is opened, and the answer is true
+    /// \param replacable  true for INSERT OR REPLACE, false, the default, for INSERT
+    /// \return false, with the error code and a line at ERR:
+    ///         - 401 and `invalid insert records: table[%s]`, before anything is opened, for a table
+    ///           without a name or a record without a field;
+    ///         - 404 and `Failed to open db [%s]` or `Failed to create table`, as InsertRecord();
+    ///         - 404 and `Failed to insert [%zu] records in db[%s]`; the error record holds the
+    ///           failed tries, and the command of each is the statement that failed: the INSERT with
+    ///           its placeholders, `INSERT INTO nodes (id,name) VALUES (?,?);`, or what begins or
+    ///           ends the transaction
+    /// \note Where rolling back fails, for want of memory, the connection is closed to the same end.
+    /// \warning Texts are stored as they are, byte for byte: unlike everywhere else they must *not*
+    ///          go through SqliteValue::EscapeText(), or each quote is stored twice.
+    /// \warning At some failures, such as a full disk, SQLite rolls back the whole transaction by
+    ///          itself. Where that was the caller's the further tries fail without doing anything, so
+    ///          that no row is stored outside of it.
+    bool InsertRecords(const SqliteTableHandler& table, const std::vector<SqliteValueList>& records,
+                       bool replacable = false);
 
     /// Updates rows; otherwise as InsertRecord().
     /// \param command  the statement
@@ -261,7 +289,17 @@ class ORVADRCORE_API SqliteDB {
     template <class TakeRow>
     bool DoSelect(const std::string& command, TakeRow takeRow);
 
+    ORVADRCORE_LOCAL bool IsInTransaction() const;
+    ORVADRCORE_LOCAL static int BindValue(sqlite3_stmt* statement, int place,
+                                          const SqliteValue& value);
+    ORVADRCORE_LOCAL static int InsertRow(sqlite3_stmt* statement, const SqliteValueList& record);
+    ORVADRCORE_LOCAL bool InsertRows(const std::string& table,
+                                     const std::vector<SqliteValueList>& records, bool replacable);
+    template <class Work>
+    bool DoWhole(bool isNested, Work work);
+
     ORVADRCORE_LOCAL bool OpenFor(const char* function);
+    ORVADRCORE_LOCAL bool OpenWithTable(const char* function, const SqliteTableHandler& table);
     ORVADRCORE_LOCAL bool Prepare(const Operation& operation, const SqliteCommand& command);
     ORVADRCORE_LOCAL bool ExecCommand(const Operation& operation, const SqliteCommand& command);
     template <class Output>

@@ -103,6 +103,8 @@ class ORVADRCORE_API SqliteValue {
     static std::string EscapeText(const std::string& text);
 
   private:
+    friend class SqliteDB;  // binds the payload to a statement
+
     bool valid = false;
     Json::Value value;
 };

@@ -192,6 +192,8 @@ static_assert(Has<bool (SqliteDB::*)(const string&, std::vector<SqliteValueList>
 static_assert(Has<bool (SqliteDB::*)(const string&)>(&SqliteDB::IsTableExisted));
 static_assert(Has<bool (SqliteDB::*)(const SqliteTableHandler&)>(&SqliteDB::CreateTable));
 static_assert(Has<bool (SqliteDB::*)(const InsertCommand&)>(&SqliteDB::InsertRecord));
+static_assert(Has<bool (SqliteDB::*)(const SqliteTableHandler&, const std::vector<SqliteValueList>&,
+                                     bool)>(&SqliteDB::InsertRecords));
 static_assert(Has<bool (SqliteDB::*)(const UpdateCommand&)>(&SqliteDB::UpdateRecord));
 static_assert(
     Has<bool (SqliteDB::*)(const SelectCommand&, SqliteValueList&)>(&SqliteDB::SelectRecord));
