@@ -1,49 +1,29 @@
-// Several statements that happen all or not at all, also when one of them fails.
+// Several operations that happen all or not at all, also when one of them fails.
+#include <cstddef>
 #include <cstdlib>
-#include <functional>
 #include <iostream>
 #include <string>
+#include <vector>
 
 #include <orvadrcore/sqlite_command.h>
 #include <orvadrcore/sqlite_condition.h>
 #include <orvadrcore/sqlite_db.h>
+#include <orvadrcore/sqlite_transaction.h>
 
 using OrvaDRCore::InsertCommand;
-using OrvaDRCore::SqliteCommand;
 using OrvaDRCore::SqliteDB;
 using OrvaDRCore::SqliteEqual;
 using OrvaDRCore::SqliteTableHandler;
+using OrvaDRCore::SqliteTransaction;
 using OrvaDRCore::SqliteValue;
 using OrvaDRCore::SqliteValueList;
 using OrvaDRCore::UpdateCommand;
 
 namespace {
 
-// [transaction]
-// Runs `work` in a transaction. `work` uses single tries only: DoExecSqliteCommand,
-// DoSelectSqliteRecord, DoSelectSqliteRecords. On failure all is as it was, and `ret_error` holds
-// what SQLite said.
-bool InTransaction(SqliteDB& db, const std::function<bool()>& work, Json::Value& ret_error)
-{
-    if (!db.Open()) return false;
-    const bool isBegun = db.Exec("BEGIN IMMEDIATE");
-    if (isBegun && work() && db.Exec("COMMIT")) return true;
-    ret_error = db.GetErr();  // before the rollback replaces it
-    // SQLite may have rolled back by itself, and then refuses. Closing ends what is left.
-    if (isBegun && !db.DoExecSqliteCommand("ROLLBACK")) db.Close();
-    return false;
-}
-
-// One try. A command that is not valid has an empty text, which SQLite would take for done.
-bool RunOnce(SqliteDB& db, const SqliteCommand& command)
-{
-    return command.IsValid() && db.DoExecSqliteCommand(command.GetCommand());
-}
-// [/transaction]
-
 // [work]
-bool MoveVolume(SqliteDB& db, const std::string& volume, const std::string& node,
-                Json::Value& ret_error)
+// Moves a volume and notes it. On failure nothing has happened, and db.GetErr() tells why.
+bool MoveVolume(SqliteDB& db, const std::string& volume, const std::string& node)
 {
     UpdateCommand move;
     move.SetTable(SqliteTableHandler("volumes", ""));
@@ -55,10 +35,34 @@ bool MoveVolume(SqliteDB& db, const std::string& volume, const std::string& node
     note.AddFieldValue("volume", SqliteValue::EscapeText(volume));
     note.AddFieldValue("node", SqliteValue::EscapeText(node));
 
-    return InTransaction(
-        db, [&] { return RunOnce(db, move) && RunOnce(db, note); }, ret_error);
+    SqliteTransaction transaction(db);
+    return transaction.Begin() && db.UpdateRecord(move) && db.InsertRecord(note) &&
+           transaction.Commit();
+    // What is not committed is rolled back here.
 }
 // [/work]
+
+// [decide]
+// Moves all volumes away from a node, unless more than `most` are there.
+bool Evacuate(SqliteDB& db, const std::string& from, const std::string& to, std::size_t most)
+{
+    SqliteTransaction transaction(db);
+    if (!transaction.Begin()) return false;
+    std::vector<SqliteValueList> rows;
+    const std::string isThere = SqliteEqual("node", SqliteValue::EscapeText(from)).GetCondition();
+    if (!db.SelectByCommand("SELECT name FROM volumes WHERE " + isThere, rows)) return false;
+    if (rows.size() > most) {
+        transaction.Rollback();  // at once: others may write again while we go on
+        std::cout << "too many volumes: " << rows.size() << '\n';
+        return false;
+    }
+    UpdateCommand move;
+    move.SetTable(SqliteTableHandler("volumes", ""));
+    move.AddFieldValue("node", SqliteValue::EscapeText(to));
+    move.SetCondition(isThere);
+    return db.UpdateRecord(move) && transaction.Commit();
+}
+// [/decide]
 
 bool Print(SqliteDB& db)
 {
@@ -85,16 +89,19 @@ int main()
     if (!isReady || !db.Exec("INSERT INTO volumes VALUES ('replica', 'backup-01')")) {
         return EXIT_FAILURE;
     }
-    Json::Value error;
-    if (!MoveVolume(db, "replica", "backup-02", error) || !Print(db)) return EXIT_FAILURE;
+    if (!MoveVolume(db, "replica", "backup-02") || !Print(db)) return EXIT_FAILURE;
     if (!db.Exec("UPDATE volumes SET node='backup-03'")) return EXIT_FAILURE;
 
-    // The second statement of this one is refused; the first must not stay.
-    if (MoveVolume(db, "replica", "backup-02", error)) return EXIT_FAILURE;
-    std::cout << error["sqlite_errmsg"].asString() << '\n';
+    // The second operation of this one is refused; the first must not stay.
+    // [fails]
+    if (MoveVolume(db, "replica", "backup-02")) return EXIT_FAILURE;
+    std::cout << db.GetErr()[0]["err_msg"]["sqlite_errmsg"].asString() << '\n';
+    // [/fails]
     if (!Print(db)) return EXIT_FAILURE;
 
     // The connection is as good as before.
-    if (!MoveVolume(db, "replica", "backup-04", error) || !Print(db)) return EXIT_FAILURE;
+    if (!MoveVolume(db, "replica", "backup-04") || !Print(db)) return EXIT_FAILURE;
+    if (Evacuate(db, "backup-04", "backup-05", 0) || !Print(db)) return EXIT_FAILURE;
+    if (!Evacuate(db, "backup-04", "backup-05", 1) || !Print(db)) return EXIT_FAILURE;
     return EXIT_SUCCESS;
 }

@@ -280,6 +280,8 @@ class ORVADRCORE_API SqliteDB {
     bool DoSelectSqliteRecords(const std::string& command, std::vector<SqliteValueList>& records);
 
   private:
+    friend class SqliteTransaction;  // asks whether one is open; keeps retries out of it
+
     struct Tries;
     struct Operation;
 

@@ -8,6 +8,7 @@
 #include <orvadrcore/sqlite_command.h>
 #include <orvadrcore/sqlite_condition.h>
 #include <orvadrcore/sqlite_db.h>
+#include <orvadrcore/sqlite_transaction.h>
 #include <orvadrcore/sqlite_value.h>
 
 #include <algorithm>
@@ -31,6 +32,7 @@ using OrvaDRCore::SqliteDB;
 using OrvaDRCore::SqliteInFamily;
 using OrvaDRCore::SqliteRecord;
 using OrvaDRCore::SqliteTableHandler;
+using OrvaDRCore::SqliteTransaction;
 using OrvaDRCore::SqliteValue;
 using OrvaDRCore::SqliteValueList;
 using OrvaDRCore::UpdateCommand;
@@ -154,6 +156,13 @@ TEST(MemberTest, ConnectionsKeepTheirOrder)
     ExpectInOrder(
         0, {offsetof(SqliteDB, errCode), offsetof(SqliteDB, errRecord), offsetof(SqliteDB, handle),
             offsetof(SqliteDB, path), offsetof(SqliteDB, retryLimit)});
+}
+
+TEST(MemberTest, TransactionsKeepTheirOrder)
+{
+    // The connection is a reference, which has no offset.
+    ExpectInOrder(sizeof(void*),
+                  {offsetof(SqliteTransaction, begun), offsetof(SqliteTransaction, retryLimit)});
 }
 
 TEST(MemberTest, LocksAndCachesKeepTheirOrder)

@@ -7,6 +7,7 @@
 #include <orvadrcore/sqlite_command.h>
 #include <orvadrcore/sqlite_condition.h>
 #include <orvadrcore/sqlite_db.h>
+#include <orvadrcore/sqlite_transaction.h>
 #include <orvadrcore/sqlite_value.h>
 #include <orvadrcore/utils.h>
 
@@ -204,6 +205,18 @@ static_assert(
 static_assert(Has<bool (SqliteDB::*)(const SqliteTableHandler&)>(&SqliteDB::DeleteAllRecords));
 static_assert(
     Has<bool (SqliteDB::*)(const string&, const SqliteTableHandler&)>(&SqliteDB::DeleteRecord));
+
+static_assert(!std::is_polymorphic_v<SqliteTransaction>);
+static_assert(std::is_constructible_v<SqliteTransaction, SqliteDB&>);
+static_assert(!std::is_convertible_v<SqliteDB&, SqliteTransaction>);
+static_assert(!std::is_constructible_v<SqliteTransaction, SqliteDB>);
+static_assert(!std::is_copy_constructible_v<SqliteTransaction> &&
+              !std::is_copy_assignable_v<SqliteTransaction>);
+static_assert(!std::is_move_constructible_v<SqliteTransaction> &&
+              !std::is_move_assignable_v<SqliteTransaction>);
+static_assert(Has<bool (SqliteTransaction::*)()>(&SqliteTransaction::Begin));
+static_assert(Has<bool (SqliteTransaction::*)()>(&SqliteTransaction::Commit));
+static_assert(Has<bool (SqliteTransaction::*)()>(&SqliteTransaction::Rollback));
 
 // ------------------------------------------------------------------------------ request and reply
 
