@@ -106,22 +106,20 @@ bool Cache::IsUpdatedDataRequired() const
 
 Json::Value Cache::Read() const
 {
+    // A copy: the refresh may replace what is in memory, and fail.
     Json::Value data = GetCachedData();
-    if (!IsTimeout() && IsValidData(data) && !IsNeedUpdate(data)) return data;
-    if (Update()) return GetCachedData();
-    DR_LOG(Debug, "Failed to update cache [%s], use old cache data.", toString(GetInfo()).c_str());
+    if (GivesWay(__func__, data)) data = GetCachedData();
     return data;
+}
+
+const Json::Value& Cache::View() const
+{
+    return GivesWay(__func__, LoadedData()) ? LoadedData() : cachedData;
 }
 
 Json::Value Cache::GetCachedData() const
 {
-    const std::time_t modifyTime = GetModifyTime(cachedPath);
-    if (modifyTime != -1 && modifyTime == loadedModifyTime) return cachedData;
-    if (!Load()) {
-        cachedData = GetDefaultValue();
-        DR_LOG(Debug, "Failed to load cache [%s], use default cache data", cachedPath.c_str());
-    }
-    return cachedData;
+    return LoadedData();
 }
 
 bool Cache::Load() const
@@ -241,6 +239,29 @@ std::string Cache::PidPath() const
 std::string Cache::LockName() const
 {
     return cachedPath + ".lock";
+}
+
+// What is in memory, after a look whether the file has changed.
+const Json::Value& Cache::LoadedData() const
+{
+    const std::time_t modifyTime = GetModifyTime(cachedPath);
+    if (modifyTime != -1 && modifyTime == loadedModifyTime) return cachedData;
+    if (!Load()) {
+        cachedData = GetDefaultValue();
+        DR_LOG_AS("GetCachedData", Debug, "Failed to load cache [%s], use default cache data",
+                  cachedPath.c_str());
+    }
+    return cachedData;
+}
+
+// Whether stale data gives way to what a refresh has left, or is in the making.
+bool Cache::GivesWay(const char* function, const Json::Value& data) const
+{
+    if (!IsTimeout() && IsValidData(data) && !IsNeedUpdate(data)) return false;
+    if (Update()) return true;
+    DR_LOG_AS(function, Debug, "Failed to update cache [%s], use old cache data.",
+              toString(GetInfo()).c_str());
+    return false;
 }
 
 // Whether a living process is marked as updater. The lock is free again when this returns.

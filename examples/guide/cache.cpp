@@ -43,6 +43,16 @@ void Tell(const std::string& who, const NodeStatus& status)
     // [/read]
 }
 
+void TellAll(const NodeStatus& status)
+{
+    // [view]
+    const Json::Value& nodes = status.View();
+    for (const std::string& name : nodes.getMemberNames()) {
+        std::cout << name << " is " << nodes[name].asString() << std::endl;
+    }
+    // [/view]
+}
+
 }  // namespace
 
 int main()
@@ -51,6 +61,7 @@ int main()
     const NodeStatus status(dir);
     Tell("first", status);
     Tell("again", status);
+    TellAll(status);
 
     const pid_t child = ::fork();
     if (child == 0) {

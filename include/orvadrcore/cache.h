@@ -119,6 +119,15 @@ class ORVADRCORE_API Cache {
     ///       no updater lives any more.
     Json::Value Read() const;
 
+    /// As Read(), without a copy: for large data that is looked at often.
+    /// \return the data in memory; a reference that is good until the next operation on the object,
+    ///         whichever it is, and not longer than the object. Where Read() gives old data because
+    ///         the refresh failed, this is what is in memory by then, which may be newer
+    /// \note Logs as Read(), under its own name.
+    /// \warning IsValidData() and IsNeedUpdate() get this very data. One that calls an operation of
+    ///          its object, such as GetCachedData(), may lose what it was given.
+    const Json::Value& View() const;
+
     /// The data as it is, from memory while the file's modification time is that of the last load
     /// or write, otherwise from the file.
     /// \return the data; the default value when the file cannot be loaded, with DEBUG
@@ -190,6 +199,8 @@ class ORVADRCORE_API Cache {
   private:
     ORVADRCORE_LOCAL std::string PidPath() const;
     ORVADRCORE_LOCAL std::string LockName() const;
+    ORVADRCORE_LOCAL const Json::Value& LoadedData() const;
+    ORVADRCORE_LOCAL bool GivesWay(const char* function, const Json::Value& data) const;
     bool IsUpdating() const;
     bool SetUpdating() const;
     void UnsetUpdating() const;

@@ -1,6 +1,7 @@
 // What callers may do with the public classes, most of it checked by the compiler alone.
 #include <gtest/gtest.h>
 #include <json/value.h>
+#include <orvadrcore/cache.h>
 #include <orvadrcore/errors.h>
 #include <orvadrcore/request.h>
 #include <orvadrcore/response.h>
@@ -217,6 +218,12 @@ static_assert(!std::is_move_constructible_v<SqliteTransaction> &&
 static_assert(Has<bool (SqliteTransaction::*)()>(&SqliteTransaction::Begin));
 static_assert(Has<bool (SqliteTransaction::*)()>(&SqliteTransaction::Commit));
 static_assert(Has<bool (SqliteTransaction::*)()>(&SqliteTransaction::Rollback));
+
+// ------------------------------------------------------------------------------------------ cache
+
+static_assert(Has<Json::Value (Cache::*)() const>(&Cache::Read));
+static_assert(Has<const Json::Value& (Cache::*)() const>(&Cache::View));
+static_assert(Has<Json::Value (Cache::*)() const>(&Cache::GetCachedData));
 
 // ------------------------------------------------------------------------------ request and reply
 

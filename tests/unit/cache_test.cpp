@@ -599,6 +599,114 @@ TEST_F(CacheTest, ReadGivesWhatIsThereAfterTheRefresh)
     ExpectLines({Start(), Finish()});
 }
 
+// ------------------------------------------------------------------------------------------- View
+
+TEST_F(CacheTest, AViewOfFreshDataIsTheDataInMemory)
+{
+    WriteCache("data");
+    const Json::Value& first = cache.View();
+    EXPECT_EQ(first, "data");
+    EXPECT_THAT(cache.TakeCalls(), ElementsAre("IsValidData", "IsNeedUpdate"));
+    EXPECT_EQ(&cache.View(), &first);
+    EXPECT_EQ(CountOpened(path), 1U);
+    EXPECT_EQ(CountOpened(lockPath), 0U);
+}
+
+TEST_F(CacheTest, AViewCopiesNothing)
+{
+    WriteCache("data");
+    const char* const text = cache.View().asCString();
+    EXPECT_EQ(cache.View().asCString(), text);
+    EXPECT_EQ(cache.Read(), "data");
+    EXPECT_EQ(cache.View().asCString(), text);
+    const void* seen = nullptr;
+    cache.isValid = [&](const Json::Value& data) {
+        seen = &data;
+        return true;
+    };
+    const void* given = &cache.View();
+    EXPECT_EQ(seen, given);
+}
+
+TEST_F(CacheTest, AViewOfAChangedFileIsOfTheNewData)
+{
+    StopClock();
+    WriteCache("first", Now);
+    EXPECT_EQ(cache.View(), "first");
+    WriteCache("second", Now - 1);
+    EXPECT_EQ(cache.View(), "second");
+}
+
+TEST_F(CacheTest, AViewDecidesAsReadDoes)
+{
+    FailForks(EAGAIN);
+    StopClock();
+    struct Row {
+        long age;
+        bool isValid;
+        bool isNeedUpdate;
+    };
+    for (const Row& row : {Row{0, true, false}, Row{2 * Timeout, true, false}, Row{0, false, false},
+                           Row{0, true, true}}) {
+        WriteCache("data", Now - row.age);
+        cache.isValid = [&](const Json::Value&) { return row.isValid; };
+        cache.isNeedUpdate = [&](const Json::Value&) { return row.isNeedUpdate; };
+        cache.isRequired = [] { return false; };
+        EXPECT_EQ(cache.Read(), "data");
+        const std::vector<std::string> asked = cache.TakeCalls();
+        const std::size_t lines = TakeLines().size();
+        EXPECT_EQ(cache.View(), "data");
+        EXPECT_EQ(cache.TakeCalls(), asked);
+        if (lines > 0) {
+            ExpectLines(
+                {Warn("Update", "Failed to fork(). errno=[11/Resource temporarily unavailable]"),
+                 Debug("View", R"(Failed to update cache ["test cache"], use old cache data.)")});
+        }
+    }
+}
+
+TEST_F(CacheTest, ADefaultValueLivesInTheObject)
+{
+    FailForks(EAGAIN);
+    cache.defaultValue = [] { return "default"; };
+    cache.isRequired = [] { return false; };
+    const Json::Value& data = cache.View();
+    EXPECT_EQ(data, "default");
+    ExpectLines({NoData(), UsesDefault(),
+                 Warn("Update", "Failed to fork(). errno=[11/Resource temporarily unavailable]"),
+                 Debug("View", R"(Failed to update cache ["test cache"], use old cache data.)")});
+    EXPECT_EQ(data, "default");
+}
+
+TEST_F(CacheTest, AViewIsOfWhatIsThereAfterTheRefresh)
+{
+    WriteStale("old");
+    cache.isRequired = [] { return true; };
+    EXPECT_EQ(cache.View(), "new");
+    ExpectLines({Start(), Finish()});
+}
+
+TEST_F(CacheTest, AViewIsOfTheDataInMemoryWhenTheRefreshFails)
+{
+    TestCache waiting = Another(true);
+    WriteStale("old");
+    waiting.produce = [this](const Json::Value&) {
+        WriteCache("by somebody else");
+        return false;
+    };
+    EXPECT_EQ(waiting.View(), "old");  // not loaded again
+    EXPECT_EQ(TakeLines().size(), 4U);
+
+    WriteStale("old");
+    waiting.produce = [&](const Json::Value&) {
+        WriteCache("by somebody else");
+        EXPECT_EQ(waiting.GetCachedData(), "by somebody else");
+        return false;
+    };
+    EXPECT_EQ(waiting.View(), "by somebody else");
+    EXPECT_EQ(TakeLines().size(), 4U);
+}
+
 // ----------------------------------------------------------------------------------------- Remove
 
 TEST_F(CacheTest, RemoveDeletesTheCacheFileAndNothingElse)
