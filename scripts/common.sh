@@ -9,6 +9,11 @@ build_packages=(g++ make cmake libsqlite3-dev libjsoncpp-dev uuid-runtime)
 # shellcheck disable=SC2034
 test_packages=(libgtest-dev libgmock-dev)
 # shellcheck disable=SC2034
+bench_packages=(libbenchmark-dev pkg-config)
+# What the benchmarks measure beside the library; they do without what is not to be had.
+# shellcheck disable=SC2034
+peer_packages=(libsqlitecpp-dev libsoci-dev libinih-dev libglib2.0-dev libboost-dev)
+# shellcheck disable=SC2034
 package_packages=(dpkg-dev file)
 
 step() { printf '==> %s\n' "$*"; }

@@ -1,0 +1,375 @@
+// How the cost grows: with rows, columns, tables in the file, values in a list, and processes that
+// insert into one file.
+#include <sqlite3.h>
+#include <sys/mman.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <chrono>
+#include <cstdio>
+#include <numeric>
+
+#include <orvadrcore/sqlite_condition.h>
+
+#include "support/bench.h"
+#include "support/engines.h"
+#include "support/report.h"
+
+namespace Bench {
+
+namespace {
+
+using Clock = std::chrono::steady_clock;
+
+std::string ToText(int number)
+{
+    return std::to_string(number);
+}
+
+template <class Engine>
+struct SelectRows {
+    explicit SelectRows(int rows)
+    {
+        FillNodes(path, rows);
+        engine = std::make_unique<Engine>(path);
+    }
+    void Run() { engine->SelectAll(); }
+    std::string Result() { return engine->Selected(); }
+
+    TempDir dir{Place::Memory};
+    std::string path = dir.File("nodes.db");
+    std::unique_ptr<Engine> engine;
+};
+
+// In a file with that many tables, within a transaction.
+template <class Engine>
+struct InsertBesideTables {
+    explicit InsertBesideTables(int tables)
+    {
+        FillNodes(path, 0, tables);
+        engine = std::make_unique<Engine>(path);
+        engine->Exec("BEGIN");
+    }
+    void Run()
+    {
+        ++node.id;
+        engine->Insert(node);
+    }
+    std::string Result()
+    {
+        engine->Exec("COMMIT");
+        return DumpNodes(path);
+    }
+
+    TempDir dir{Place::Memory};
+    std::string path = dir.File("nodes.db");
+    std::unique_ptr<Engine> engine;
+    Node node = MakeNode(0);
+};
+
+// A hundred rows of that many columns of numbers.
+struct Wide {
+    static constexpr int Rows = 100;
+
+    explicit Wide(int count) : columns(count)
+    {
+        std::string schema;
+        std::string values;
+        for (int column = 0; column < columns; ++column) {
+            if (column > 0) {
+                schema += ',';
+                values += ',';
+            }
+            schema += "c" + ToText(column) + " INTEGER";
+            values += ToText(column);
+        }
+        const Database db = OpenDatabase(path);
+        ExecText(db.get(), "CREATE TABLE wide (" + schema + ")");
+        for (int row = 0; row < Rows; ++row) {
+            ExecText(db.get(), "INSERT INTO wide VALUES (" + values + ")");
+        }
+    }
+
+    TempDir dir{Place::Memory};
+    std::string path = dir.File("wide.db");
+    int columns;
+};
+
+struct OurWide : Wide {
+    explicit OurWide(int count) : Wide(count) { Require(db.Open(), "cannot open"); }
+    void Run()
+    {
+        rows.clear();
+        Require(db.SelectByCommand("SELECT * FROM wide", rows), "cannot select");
+    }
+    std::string Result() const
+    {
+        long sum = 0;
+        for (const auto& row : rows) {
+            for (int column = 0; column < columns; ++column) {
+                int number = 0;
+                Require(row.GetValue("c" + ToText(column), number), "no column");
+                sum += number;
+            }
+        }
+        return std::to_string(sum) + " in " + std::to_string(rows.size());
+    }
+
+    OrvaDRCore::SqliteDB db{path, 0};
+    std::vector<OrvaDRCore::SqliteValueList> rows;
+};
+
+struct BareWide : Wide {
+    explicit BareWide(int count) : Wide(count), db(OpenDatabase(path))
+    {
+        select = Prepare(db.get(), "SELECT * FROM wide");
+    }
+    void Run()
+    {
+        rows.clear();
+        while (sqlite3_step(select.get()) == SQLITE_ROW) {
+            std::vector<int>& row = rows.emplace_back(static_cast<std::size_t>(columns));
+            for (int column = 0; column < columns; ++column) {
+                row[static_cast<std::size_t>(column)] = sqlite3_column_int(select.get(), column);
+            }
+        }
+        sqlite3_reset(select.get());
+    }
+    std::string Result() const
+    {
+        long sum = 0;
+        for (const auto& row : rows) sum = std::accumulate(row.begin(), row.end(), sum);
+        return std::to_string(sum) + " in " + std::to_string(rows.size());
+    }
+
+    Database db;
+    Statement select;
+    std::vector<std::vector<int>> rows;
+};
+
+// A condition on a table of 1,000 rows, from the numbers to the rows.
+struct InList {
+    explicit InList(int count) : ids(static_cast<std::size_t>(count))
+    {
+        std::iota(ids.begin(), ids.end(), 1);
+        FillNodes(path, 1000);
+    }
+
+    TempDir dir{Place::Memory};
+    std::string path = dir.File("nodes.db");
+    std::vector<int> ids;
+};
+
+struct OurInList : InList {
+    explicit OurInList(int count) : InList(count)
+    {
+        command.SetTable({"nodes", NodesSchema});
+        command.AddField("id");
+    }
+    void Run()
+    {
+        const std::vector<OrvaDRCore::SqliteValue> values(ids.begin(), ids.end());
+        command.SetCondition(OrvaDRCore::SqliteIn("id", values));
+        rows.clear();
+        Require(db.SelectRecords(command, rows), "cannot select");
+    }
+    std::string Result() const { return std::to_string(rows.size()); }
+
+    OrvaDRCore::SelectCommand command;
+    OrvaDRCore::SqliteDB db{path, 0};
+    std::vector<OrvaDRCore::SqliteValueList> rows;
+};
+
+struct BareInList : InList {
+    explicit BareInList(int count) : InList(count), db(OpenDatabase(path)) {}
+    void Run()
+    {
+        std::string text = "SELECT id FROM nodes WHERE id IN (";
+        for (const int id : ids) {
+            AppendLiteral(text, id);
+            text += ',';
+        }
+        text.back() = ')';
+        const Statement select = Prepare(db.get(), text);
+        rows.clear();
+        while (sqlite3_step(select.get()) == SQLITE_ROW) {
+            rows.push_back(sqlite3_column_int(select.get(), 0));
+        }
+    }
+    std::string Result() const { return std::to_string(rows.size()); }
+
+    Database db;
+    std::vector<int> rows;
+};
+
+template <template <class> class Task>
+void AddEngines(const std::string& item, int number, benchmark::IterationCount iterations = 0)
+{
+    AddBounded<Task<OurEngine>>({iterations}, item, Ours, number);
+    AddBounded<Task<BareEngine>>({iterations}, item, Bare, number);
+    AddBounded<Task<ContractEngine>>({iterations}, item, Contract, number);
+}
+
+// ------------------------------------------------------------------------------------- processes
+
+struct Waits {
+    std::size_t inserts = 0;
+    double perSecond = 0;
+    double median = 0;
+    double percentile99 = 0;
+    double worst = 0;
+};
+
+constexpr std::size_t MaxInserts = 1'000'000;  // of all processes of a crowd
+
+// Numbers in memory that processes share; the count comes first.
+struct Board {
+    std::size_t count;
+    std::array<float, MaxInserts> msec;
+};
+
+// Inserts until the time is over and notes how long each insert took.
+template <class Engine>
+void InsertUntil(const std::string& path, Clock::time_point end, int process, Board& board)
+{
+    constexpr int IdsOfProcess = 10'000'000;
+    Engine engine(path);
+    Node node = MakeNode(process * IdsOfProcess);
+    while (Clock::now() < end) {
+        ++node.id;
+        const auto begin = Clock::now();
+        engine.Insert(node);
+        const std::chrono::duration<float, std::milli> took = Clock::now() - begin;
+        const std::size_t at = __atomic_fetch_add(&board.count, 1U, __ATOMIC_RELAXED);
+        if (at < MaxInserts) board.msec[at] = took.count();
+    }
+}
+
+Waits Summarize(const Board& board, double seconds)
+{
+    const std::size_t count = std::min(board.count, MaxInserts);
+    Require(count > 0, "nothing was inserted");
+    std::vector<float> all(board.msec.begin(), board.msec.begin() + static_cast<long>(count));
+    std::sort(all.begin(), all.end());
+    return {board.count, static_cast<double>(board.count) / seconds, all[count / 2],
+            all[count * 99 / 100], all.back()};
+}
+
+// The rows that are there, counted behind the back of the engines.
+std::size_t CountRows(const std::string& path)
+{
+    const Database db = OpenDatabase(path);
+    const Statement count = Prepare(db.get(), "SELECT count(*) FROM nodes");
+    Require(sqlite3_step(count.get()) == SQLITE_ROW, "no count");
+    return static_cast<std::size_t>(sqlite3_column_int64(count.get(), 0));
+}
+
+template <class Engine>
+Waits RunCrowd(Place place, int processes, int seconds)
+{
+    const TempDir dir(place);
+    const std::string path = dir.File("nodes.db");
+    FillNodes(path, 0);
+    void* memory =
+        ::mmap(nullptr, sizeof(Board), PROT_READ | PROT_WRITE, MAP_SHARED | MAP_ANONYMOUS, -1, 0);
+    Require(memory != MAP_FAILED, "no shared memory");
+    auto* board = static_cast<Board*>(memory);
+    const auto begin = Clock::now();
+    const auto end = begin + std::chrono::seconds(seconds);
+    std::vector<pid_t> children;
+    for (int process = 0; process < processes; ++process) {
+        const pid_t child = ::fork();
+        Require(child >= 0, "cannot fork");
+        if (child == 0) {
+            int code = 0;
+            try {
+                InsertUntil<Engine>(path, end, process, *board);
+            } catch (const std::exception& failure) {
+                (void)std::fprintf(stderr, "process %d: %s\n", process, failure.what());
+                code = 1;
+            }
+            ::_exit(code);
+        }
+        children.push_back(child);
+    }
+    bool good = true;
+    for (const pid_t child : children) {
+        int status = 0;
+        good = ::waitpid(child, &status, 0) == child && status == 0 && good;
+    }
+    const std::chrono::duration<double> took = Clock::now() - begin;
+    const Waits waits = Summarize(*board, took.count());
+    ::munmap(memory, sizeof(Board));
+    Require(good, "a process failed");
+    Require(CountRows(path) == waits.inserts, "rows are missing");
+    return waits;
+}
+
+// Our connection, with a retry limit that is not reached.
+struct PatientEngine : OurEngine {
+    explicit PatientEngine(const std::string& path) : OurEngine(path, CrowdRetries) {}
+    static constexpr unsigned int CrowdRetries = 100;
+};
+
+// Waits within SQLite for as long as it takes.
+struct WaitingEngine : BareEngine {
+    explicit WaitingEngine(const std::string& path) : BareEngine(path, CrowdTimeoutMSec) {}
+    static constexpr int CrowdTimeoutMSec = 600'000;
+};
+
+}  // namespace
+
+void RunCrowds(const std::string& csv, int seconds)
+{
+    std::FILE* file = csv.empty() ? nullptr : std::fopen(csv.c_str(), "we");
+    if (file != nullptr) {
+        (void)std::fputs("place,contestant,processes,per_second,median_ms,p99_ms,worst_ms\n", file);
+    }
+    std::printf("\n%-26s %-9s %9s %11s %11s %11s %11s\n", "processes into one file", "who",
+                "processes", "inserts/s", "median", "99 %", "worst");
+    for (const Place place : {Place::Disk, Place::Memory}) {
+        const char* where = place == Place::Disk ? "disk" : "memory";
+        for (const int processes : {1, 2, 4, 8}) {
+            for (const bool ours : {true, false}) {
+                const char* who = ours ? Ours : Bare;
+                const Waits waits = ours ? RunCrowd<PatientEngine>(place, processes, seconds)
+                                         : RunCrowd<WaitingEngine>(place, processes, seconds);
+                std::printf("%-26s %-9s %9d %11.0f %8.3f ms %8.3f ms %8.1f ms\n", where, who,
+                            processes, waits.perSecond, waits.median, waits.percentile99,
+                            waits.worst);
+                (void)std::fflush(stdout);
+                if (file != nullptr) {
+                    (void)std::fprintf(file, "%s,%s,%d,%.1f,%.3f,%.3f,%.3f\n", where, who,
+                                       processes, waits.perSecond, waits.median, waits.percentile99,
+                                       waits.worst);
+                }
+            }
+        }
+    }
+    if (file != nullptr) Require(std::fclose(file) == 0, "cannot write the CSV file");
+}
+
+void AddCurves()
+{
+    for (const int rows : {1000, 10'000, 100'000, 1'000'000}) {
+        AddEngines<SelectRows>("select all, " + ToText(rows) + " rows", rows,
+                               rows == 1'000'000 ? 1 : 0);
+    }
+    for (const int columns : {1, 5, 20, 200}) {
+        const std::string item = "select 100 rows, " + ToText(columns) + " columns";
+        Add<OurWide>(item, Ours, columns);
+        Add<BareWide>(item, Bare, columns);
+    }
+    for (const int tables : {1, 10, 100, 1000}) {
+        AddEngines<InsertBesideTables>("insert, " + ToText(tables) + " tables", tables);
+    }
+    for (const int values : {1, 100, 10'000, 100'000}) {
+        const std::string item = "select by an IN list of " + ToText(values);
+        Add<OurInList>(item, Ours, values);
+        Add<BareInList>(item, Bare, values);
+    }
+}
+
+}  // namespace Bench

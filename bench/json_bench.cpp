@@ -1,0 +1,177 @@
+// JSON documents, read and written by path. The files lie in memory: a disk would hide the rest.
+#include <unistd.h>
+
+#include <fstream>
+
+#include <orvadrcore/file.h>
+
+#include "support/bench.h"
+#include "support/by_hand.h"
+
+#if BENCH_HAS_BOOST
+#include <boost/property_tree/json_parser.hpp>
+#include <boost/property_tree/ptree.hpp>
+#endif
+
+namespace Bench {
+
+namespace {
+
+struct JsonFile {
+    explicit JsonFile(std::size_t bytes) : document(MakeDocument(bytes))
+    {
+        WriteFile(path, ToLine(document) + "\n");
+    }
+
+    TempDir dir{Place::Memory};
+    std::string path = dir.File("document.json");
+    Json::Value document;
+};
+
+struct ReadJson : JsonFile {
+    using JsonFile::JsonFile;
+    std::string Result() const { return Flatten(read); }
+
+    Json::Value read;
+};
+
+struct OurRead : ReadJson {
+    using ReadJson::ReadJson;
+    void Run() { Require(OrvaDRCore::File::Read(path, read), "cannot read"); }
+};
+
+struct BareRead : ReadJson {
+    using ReadJson::ReadJson;
+    void Run()
+    {
+        const std::string text = ReadFile(path);
+        Require(reader->parse(text.data(), text.data() + text.size(), &read, nullptr), "no JSON");
+    }
+
+    std::unique_ptr<Json::CharReader> reader{Json::CharReaderBuilder().newCharReader()};
+};
+
+// A missing file is none to complain of; the lines are joined; comments, trailing commas and a
+// second document are refused, as are zero bytes; what fails leaves the caller's document alone.
+struct ContractRead : ReadJson {
+    explicit ContractRead(std::size_t bytes) : ReadJson(bytes)
+    {
+        Json::CharReaderBuilder builder;
+        builder["allowComments"] = false;
+        builder["allowTrailingCommas"] = false;
+        builder["failIfExtra"] = true;
+        reader.reset(builder.newCharReader());
+    }
+    void Run()
+    {
+        if (::access(path.c_str(), F_OK) != 0) return;
+        std::string text = ReadFile(path);
+        text.erase(std::remove(text.begin(), text.end(), '\n'), text.end());
+        Require(text.find('\0') == std::string::npos, "a zero byte");
+        Json::Value parsed;
+        Require(reader->parse(text.data(), text.data() + text.size(), &parsed, nullptr), "no JSON");
+        read.swap(parsed);
+    }
+
+    std::unique_ptr<Json::CharReader> reader;
+};
+
+struct StreamRead : ReadJson {
+    using ReadJson::ReadJson;
+    void Run()
+    {
+        std::ifstream file(path);
+        file >> read;
+    }
+};
+
+struct WriteJson : JsonFile {
+    using JsonFile::JsonFile;
+    std::string Result() const { return Flatten(Parse(ReadFile(path))); }
+};
+
+struct OurWrite : WriteJson {
+    using WriteJson::WriteJson;
+    void Run() { Require(OrvaDRCore::File::Write(path, document), "cannot write"); }
+};
+
+struct BareWrite : WriteJson {
+    using WriteJson::WriteJson;
+    void Run() { WriteFile(path, ToLine(document) + "\n"); }
+};
+
+struct StreamWrite : WriteJson {
+    using WriteJson::WriteJson;
+    void Run()
+    {
+        std::ofstream file(path);
+        file << document;
+    }
+};
+
+#if BENCH_HAS_BOOST
+using Tree = boost::property_tree::ptree;
+
+void AppendLeaves(std::string& text, const std::string& path, const Tree& tree)
+{
+    if (tree.empty()) text += path + "=" + tree.data() + "\n";
+    for (const auto& [name, child] : tree) {
+        std::string below = path;
+        below += '.';
+        below += name;
+        AppendLeaves(text, below, child);
+    }
+}
+
+struct BoostRead : JsonFile {
+    using JsonFile::JsonFile;
+    void Run() { boost::property_tree::read_json(path, tree); }
+    std::string Result() const
+    {
+        std::string text;
+        AppendLeaves(text, "", tree);
+        return text;
+    }
+
+    Tree tree;
+};
+
+// Its numbers and booleans become texts.
+struct BoostWrite : WriteJson {
+    explicit BoostWrite(std::size_t bytes) : WriteJson(bytes)
+    {
+        boost::property_tree::read_json(path, tree);
+    }
+    void Run() { boost::property_tree::write_json(path, tree, {}, false); }
+
+    Tree tree;
+};
+#endif
+
+void AddSize(const std::string& size, std::size_t bytes)
+{
+    Add<OurRead>("JSON read, " + size, Ours, bytes);
+    Add<BareRead>("JSON read, " + size, Bare, bytes);
+    Add<ContractRead>("JSON read, " + size, Contract, bytes);
+    Add<StreamRead>("JSON read, " + size, "jsoncpp stream", bytes);
+#if BENCH_HAS_BOOST
+    Add<BoostRead>("JSON read, " + size, "Boost ptree", bytes);
+#endif
+    Add<OurWrite>("JSON write, " + size, Ours, bytes);
+    Add<BareWrite>("JSON write, " + size, Bare, bytes);
+    Add<StreamWrite>("JSON write, " + size, "jsoncpp stream", bytes);
+#if BENCH_HAS_BOOST
+    Add<BoostWrite>("JSON write, " + size, "Boost ptree", bytes);
+#endif
+}
+
+}  // namespace
+
+void AddJson()
+{
+    AddSize("1 KB", 1000);
+    AddSize("100 KB", 100'000);
+    AddSize("5 MB", 5'000'000);
+}
+
+}  // namespace Bench

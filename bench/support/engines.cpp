@@ -1,0 +1,316 @@
+#include "support/engines.h"
+
+#include <sqlite3.h>
+
+#include "support/bench.h"
+
+namespace Bench {
+
+namespace {
+
+using OrvaDRCore::SqliteEqual;
+using OrvaDRCore::SqliteValueList;
+
+void CreateNodes(sqlite3* handle)
+{
+    ExecText(handle, std::string("CREATE TABLE IF NOT EXISTS nodes (") + NodesSchema + ")");
+}
+
+void BindText(sqlite3_stmt* statement, int column, const std::string& text)
+{
+    sqlite3_bind_text(statement, column, text.data(), static_cast<int>(text.size()), SQLITE_STATIC);
+}
+
+void BindNode(sqlite3_stmt* statement, const Node& node)
+{
+    sqlite3_bind_int(statement, 1, node.id);
+    BindText(statement, 2, node.name);
+    BindText(statement, 3, node.address);
+    sqlite3_bind_int(statement, 4, node.port);
+    sqlite3_bind_int(statement, 5, node.state);
+}
+
+void Finish(sqlite3_stmt* statement)
+{
+    const int code = sqlite3_step(statement);
+    sqlite3_reset(statement);
+    Require(code == SQLITE_DONE, "a statement failed");
+}
+
+Node NodeOfRow(sqlite3_stmt* statement)
+{
+    return {sqlite3_column_int(statement, 0), ColumnText(statement, 1), ColumnText(statement, 2),
+            sqlite3_column_int(statement, 3), sqlite3_column_int(statement, 4)};
+}
+
+void CollectNodes(sqlite3_stmt* statement, std::vector<Node>& nodes)
+{
+    int code = SQLITE_OK;
+    while ((code = sqlite3_step(statement)) == SQLITE_ROW) nodes.push_back(NodeOfRow(statement));
+    sqlite3_reset(statement);
+    Require(code == SQLITE_DONE, "a select failed");
+}
+
+// For rows by column name: `get(row, name, out)` reads a column.
+template <class Row, class Get>
+std::vector<Node> ToNodes(const std::vector<Row>& rows, Get get)
+{
+    std::vector<Node> nodes;
+    for (const Row& row : rows) {
+        Node node;
+        get(row, "id", node.id);
+        get(row, "name", node.name);
+        get(row, "address", node.address);
+        get(row, "port", node.port);
+        get(row, "state", node.state);
+        nodes.push_back(node);
+    }
+    return nodes;
+}
+
+}  // namespace
+
+Node MakeNode(int id)
+{
+    return {id, "node-" + std::to_string(id % 1000), "192.168.10." + std::to_string(id % 250),
+            5000 + id % 1000, id % 3};
+}
+
+std::string ToText(const Node& node)
+{
+    return std::to_string(node.id) + "|" + node.name + "|" + node.address + "|" +
+           std::to_string(node.port) + "|" + std::to_string(node.state) + "\n";
+}
+
+std::string ToText(const std::vector<Node>& nodes)
+{
+    std::string text = std::to_string(nodes.size()) + " rows\n";
+    for (const Node& node : nodes) text += ToText(node);
+    return text;
+}
+
+void FillNodes(const std::string& path, int rows, int tables)
+{
+    BareEngine engine(path);
+    engine.Exec("BEGIN");
+    for (int table = 1; table < tables; ++table) {
+        const std::string other = "CREATE TABLE other" + std::to_string(table) + " (a, b, c)";
+        engine.Exec(other.c_str());
+    }
+    for (int id = 1; id <= rows; ++id) engine.Insert(MakeNode(id));
+    engine.Exec("COMMIT");
+}
+
+std::string DumpNodes(const std::string& path)
+{
+    BareEngine engine(path);
+    engine.SelectAll();
+    return engine.Selected();
+}
+
+OurEngine::OurEngine(const std::string& path, unsigned int retries)
+    : table("nodes", NodesSchema), db(path, retries)
+{
+    Require(db.Open(), "cannot open a database");
+    Require(db.CreateTable(table), "cannot make a table");
+}
+
+void OurEngine::Exec(const char* statement)
+{
+    Require(db.Exec(statement), statement);
+}
+
+void OurEngine::Insert(const Node& node)
+{
+    OrvaDRCore::InsertCommand command;
+    command.SetTable(table);
+    command.AddFieldValue("id", node.id);
+    command.AddFieldValue("name", node.name);
+    command.AddFieldValue("address", node.address);
+    command.AddFieldValue("port", node.port);
+    command.AddFieldValue("state", node.state);
+    Require(db.InsertRecord(command), "an insert failed");
+}
+
+void OurEngine::Select(int id)
+{
+    OrvaDRCore::SelectCommand command;
+    command.SetTable(table);
+    command.SelectAll();
+    command.SetCondition(SqliteEqual("id", id));
+    rows.clear();
+    SqliteValueList row;
+    Require(db.SelectRecord(command, row), "a select failed");
+    rows.push_back(std::move(row));
+}
+
+void OurEngine::SelectAll()
+{
+    OrvaDRCore::SelectCommand command;
+    command.SetTable(table);
+    command.SelectAll();
+    rows.clear();
+    Require(db.SelectRecords(command, rows), "a select failed");
+}
+
+void OurEngine::Update(int id, int state)
+{
+    OrvaDRCore::UpdateCommand command;
+    command.SetTable(table);
+    command.AddFieldValue("state", state);
+    command.SetCondition(SqliteEqual("id", id));
+    Require(db.UpdateRecord(command), "an update failed");
+}
+
+void OurEngine::Delete(int id)
+{
+    Require(db.DeleteRecord(SqliteEqual("id", id).GetCondition(), table), "a delete failed");
+}
+
+std::string OurEngine::Selected() const
+{
+    return ToText(ToNodes(rows, [](const SqliteValueList& row, const char* name, auto& out) {
+        Require(row.GetValue(name, out), name);
+    }));
+}
+
+BareEngine::BareEngine(const std::string& path, int busyTimeoutMSec)
+    : handle(OpenDatabase(path, busyTimeoutMSec))
+{
+    CreateNodes(handle.get());
+    insert = Prepare(handle.get(), "INSERT INTO nodes VALUES (?,?,?,?,?)");
+    select = Prepare(handle.get(), "SELECT * FROM nodes WHERE id=?");
+    selectAll = Prepare(handle.get(), "SELECT * FROM nodes");
+    update = Prepare(handle.get(), "UPDATE nodes SET state=? WHERE id=?");
+    remove = Prepare(handle.get(), "DELETE FROM nodes WHERE id=?");
+}
+
+void BareEngine::Exec(const char* statement)
+{
+    ExecText(handle.get(), statement);
+}
+
+void BareEngine::Insert(const Node& node)
+{
+    BindNode(insert.get(), node);
+    Finish(insert.get());
+}
+
+void BareEngine::Select(int id)
+{
+    rows.clear();
+    sqlite3_bind_int(select.get(), 1, id);
+    Require(sqlite3_step(select.get()) == SQLITE_ROW, "no row");
+    rows.push_back(NodeOfRow(select.get()));
+    sqlite3_reset(select.get());
+}
+
+void BareEngine::SelectAll()
+{
+    rows.clear();
+    CollectNodes(selectAll.get(), rows);
+}
+
+void BareEngine::Update(int id, int state)
+{
+    sqlite3_bind_int(update.get(), 1, state);
+    sqlite3_bind_int(update.get(), 2, id);
+    Finish(update.get());
+}
+
+void BareEngine::Delete(int id)
+{
+    sqlite3_bind_int(remove.get(), 1, id);
+    Finish(remove.get());
+}
+
+ContractEngine::ContractEngine(const std::string& path) : handle(OpenDatabase(path))
+{
+    CreateNodes(handle.get());
+}
+
+void ContractEngine::Exec(const char* statement)
+{
+    ExecText(handle.get(), statement);
+}
+
+void ContractEngine::LookForTable()
+{
+    const Statement look = Prepare(
+        handle.get(), "SELECT 1 FROM sqlite_master WHERE type='table' AND name='" + name + "';");
+    Require(sqlite3_step(look.get()) == SQLITE_ROW, "no table");
+}
+
+void ContractEngine::Insert(const Node& node)
+{
+    LookForTable();
+    std::string text = "INSERT INTO " + name + " (address,id,name,port,state) VALUES (";
+    AppendLiteral(text, std::string_view(node.address));
+    AppendLiteral(text += ',', node.id);
+    AppendLiteral(text += ',', std::string_view(node.name));
+    AppendLiteral(text += ',', node.port);
+    AppendLiteral(text += ',', node.state);
+    ExecText(handle.get(), text += ");");
+}
+
+// Reads all rows of a select. The names are read once for each row, as rows are made one by one.
+void ContractEngine::Collect(const std::string& text)
+{
+    rows.clear();
+    const Statement statement = Prepare(handle.get(), text);
+    int code = SQLITE_OK;
+    while ((code = sqlite3_step(statement.get())) == SQLITE_ROW) {
+        std::map<std::string, Value>& row = rows.emplace_back();
+        const int columns = sqlite3_column_count(statement.get());
+        for (int column = 0; column < columns; ++column) {
+            const char* field = sqlite3_column_name(statement.get(), column);
+            if (sqlite3_column_type(statement.get(), column) == SQLITE_INTEGER) {
+                row.emplace(field, sqlite3_column_int(statement.get(), column));
+            } else {
+                row.emplace(field, ColumnText(statement.get(), column));
+            }
+        }
+    }
+    Require(code == SQLITE_DONE, "a select failed");
+}
+
+void ContractEngine::Select(int id)
+{
+    LookForTable();
+    std::string text = "SELECT  * FROM " + name + " WHERE id=";
+    AppendLiteral(text, id);
+    Collect(text);
+}
+
+void ContractEngine::SelectAll()
+{
+    LookForTable();
+    Collect("SELECT  * FROM " + name);
+}
+
+void ContractEngine::Update(int id, int state)
+{
+    LookForTable();
+    std::string text = "UPDATE " + name + " SET state=";
+    AppendLiteral(text, state);
+    AppendLiteral(text += " WHERE id=", id);
+    ExecText(handle.get(), text);
+}
+
+void ContractEngine::Delete(int id)
+{
+    LookForTable();
+    std::string text = "DELETE FROM " + name + " WHERE id=";
+    AppendLiteral(text, id);
+    ExecText(handle.get(), text += ';');
+}
+
+std::string ContractEngine::Selected() const
+{
+    using Row = std::map<std::string, Value>;
+    return ToText(ToNodes(rows, [](const Row& row, const char* field, auto& out) {
+        out = std::get<std::decay_t<decltype(out)>>(row.at(field));
+    }));
+}
+
+}  // namespace Bench

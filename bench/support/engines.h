@@ -1,0 +1,148 @@
+// The ways to the same rows: ours, SQLite's C interface by hand, and other libraries. Each engine has
+// the same operations on the table `nodes`, and keeps what it selected in the form that its users
+// get.
+#ifndef ORVADRCORE_BENCH_SUPPORT_ENGINES_H
+#define ORVADRCORE_BENCH_SUPPORT_ENGINES_H
+
+#include <map>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include <orvadrcore/sqlite_db.h>
+
+#include "support/by_hand.h"
+
+namespace Bench {
+
+inline constexpr const char* NodesSchema =
+    "id INTEGER PRIMARY KEY, name TEXT, address TEXT, port INTEGER, state INTEGER";
+
+// A row of the table `nodes`.
+struct Node {
+    int id = 0;
+    std::string name;
+    std::string address;
+    int port = 0;
+    int state = 0;
+};
+
+Node MakeNode(int id);
+std::string ToText(const Node& node);
+std::string ToText(const std::vector<Node>& nodes);
+
+// A new database with nodes 1 to `rows`, beside `tables` - 1 other tables.
+void FillNodes(const std::string& path, int rows, int tables = 1);
+
+// All nodes of a file, as text, in the order of their ids.
+std::string DumpNodes(const std::string& path);
+
+class OurEngine {
+  public:
+    // The retry limit is that of the connection.
+    explicit OurEngine(const std::string& path, unsigned int retries = 0);
+    void Exec(const char* statement);
+    void Insert(const Node& node);
+    void Select(int id);
+    void SelectAll();
+    void Update(int id, int state);
+    void Delete(int id);
+    std::string Selected() const;
+
+  private:
+    OrvaDRCore::SqliteTableHandler table;
+    OrvaDRCore::SqliteDB db;
+    std::vector<OrvaDRCore::SqliteValueList> rows;
+};
+
+// Statements that are prepared once, rows as a struct.
+class BareEngine {
+  public:
+    explicit BareEngine(const std::string& path, int busyTimeoutMSec = BusyTimeoutMSec);
+    void Exec(const char* statement);
+    void Insert(const Node& node);
+    void Select(int id);
+    void SelectAll();
+    void Update(int id, int state);
+    void Delete(int id);
+    std::string Selected() const { return ToText(rows); }
+
+  private:
+    Database handle;
+    Statement insert;
+    Statement select;
+    Statement selectAll;
+    Statement update;
+    Statement remove;
+    std::vector<Node> rows;
+};
+
+// What our documents promise, by hand: before each statement the look for the table; the statement
+// as a text with literals; rows as values by column name.
+class ContractEngine {
+  public:
+    explicit ContractEngine(const std::string& path);
+    void Exec(const char* statement);
+    void Insert(const Node& node);
+    void Select(int id);
+    void SelectAll();
+    void Update(int id, int state);
+    void Delete(int id);
+    std::string Selected() const;
+
+  private:
+    void LookForTable();
+    void Collect(const std::string& text);
+
+    Database handle;
+    std::string name = "nodes";
+    std::vector<std::map<std::string, Value>> rows;
+};
+
+#if BENCH_HAS_SQLITECPP
+class SqliteCppEngine {
+  public:
+    explicit SqliteCppEngine(const std::string& path);
+    ~SqliteCppEngine();
+    SqliteCppEngine(const SqliteCppEngine&) = delete;
+    SqliteCppEngine& operator=(const SqliteCppEngine&) = delete;
+    void Exec(const char* statement);
+    void Insert(const Node& node);
+    void Select(int id);
+    void SelectAll();
+    void Update(int id, int state);
+    void Delete(int id);
+    std::string Selected() const { return ToText(rows); }
+
+  private:
+    struct State;
+    std::unique_ptr<State> state;
+    std::vector<Node> rows;
+};
+#endif
+
+#if BENCH_HAS_SOCI
+class SociEngine {
+  public:
+    explicit SociEngine(const std::string& path);
+    ~SociEngine();
+    SociEngine(const SociEngine&) = delete;
+    SociEngine& operator=(const SociEngine&) = delete;
+    void Exec(const char* statement);
+    void Insert(const Node& node);
+    void Select(int id);
+    void SelectAll();
+    void Update(int id, int state);
+    void Delete(int id);
+    std::string Selected() const { return ToText(rows); }
+
+  private:
+    struct State;
+    std::unique_ptr<State> state;
+    std::vector<Node> rows;
+};
+#endif
+
+}  // namespace Bench
+
+#endif

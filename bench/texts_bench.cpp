@@ -1,0 +1,164 @@
+// Statement texts, made and thrown away.
+#include <sqlite3.h>
+
+#include <map>
+#include <numeric>
+
+#include <orvadrcore/sqlite_command.h>
+
+#include "support/bench.h"
+#include "support/by_hand.h"
+
+namespace Bench {
+
+namespace {
+
+using OrvaDRCore::SqliteValue;
+
+struct Row {
+    int id = 4711;
+    std::string name = "backup-of-the-node";
+    std::string address = "192.168.10.17";
+    bool enabled = true;
+};
+
+struct InsertText {
+    std::string Result() const { return text; }
+
+    Row row;
+    std::string table = "nodes";
+    std::string text;
+};
+
+struct OurInsert : InsertText {
+    void Run()
+    {
+        OrvaDRCore::InsertCommand command;
+        command.SetTable(handler);
+        command.AddFieldValue("id", row.id);
+        command.AddFieldValue("name", row.name);
+        command.AddFieldValue("address", row.address);
+        command.AddFieldValue("enabled", row.enabled);
+        text = command.GetCommand();
+    }
+
+    OrvaDRCore::SqliteTableHandler handler{table, "id INTEGER PRIMARY KEY"};
+};
+
+struct BareInsert : InsertText {
+    void Run()
+    {
+        std::string made = "INSERT INTO " + table + " (address,enabled,id,name) VALUES (";
+        AppendLiteral(made, std::string_view(row.address));
+        made += row.enabled ? ",1," : ",0,";
+        AppendLiteral(made, row.id);
+        AppendLiteral(made += ',', std::string_view(row.name));
+        made += ");";
+        text = std::move(made);
+    }
+};
+
+// The columns are named one by one and stand in the order of their names; the builder owns copies.
+struct ContractInsert : InsertText {
+    void Run()
+    {
+        const std::string tableCopy = table;
+        std::map<std::string, Value> fields;
+        fields.insert_or_assign("id", row.id);
+        fields.insert_or_assign("name", row.name);
+        fields.insert_or_assign("address", row.address);
+        fields.insert_or_assign("enabled", row.enabled);
+        std::string made = "INSERT INTO " + tableCopy + " (";
+        std::string literals;
+        for (const auto& [field, value] : fields) {
+            if (!literals.empty()) {
+                made += ',';
+                literals += ',';
+            }
+            made += field;
+            AppendLiteral(literals, value);
+        }
+        made += ") VALUES (";
+        made += literals;
+        made += ");";
+        text = std::move(made);
+    }
+};
+
+struct SqliteInsert : InsertText {
+    void Run()
+    {
+        char* made = sqlite3_mprintf(
+            "INSERT INTO %s (address,enabled,id,name) VALUES ('%q',%d,%d,'%q');", table.c_str(),
+            row.address.c_str(), row.enabled ? 1 : 0, row.id, row.name.c_str());
+        text = made;
+        sqlite3_free(made);
+    }
+};
+
+struct InText {
+    explicit InText(int count) : ids(static_cast<std::size_t>(count))
+    {
+        std::iota(ids.begin(), ids.end(), 100000);
+    }
+    std::string Result() const { return text; }
+
+    std::vector<int> ids;
+    std::string text;
+};
+
+struct OurIn : InText {
+    using InText::InText;
+    void Run()
+    {
+        const std::vector<SqliteValue> values(ids.begin(), ids.end());
+        text = OrvaDRCore::SqliteIn("id", values).GetCondition();
+    }
+};
+
+struct BareIn : InText {
+    using InText::InText;
+    void Run()
+    {
+        std::string made = "id IN ( ";
+        for (const int id : ids) {
+            AppendLiteral(made, id);
+            made += ',';
+        }
+        made.pop_back();
+        made += " )";
+        text = std::move(made);
+    }
+};
+
+// The list is one of typed values.
+struct ContractIn : InText {
+    using InText::InText;
+    void Run()
+    {
+        const std::vector<Value> values(ids.begin(), ids.end());
+        std::string made = "id IN ( ";
+        for (const Value& value : values) {
+            AppendLiteral(made, value);
+            made += ',';
+        }
+        made.pop_back();
+        made += " )";
+        text = std::move(made);
+    }
+};
+
+}  // namespace
+
+void AddTexts()
+{
+    Add<OurInsert>("text of an insert of 4 values", Ours);
+    Add<BareInsert>("text of an insert of 4 values", Bare);
+    Add<ContractInsert>("text of an insert of 4 values", Contract);
+    Add<SqliteInsert>("text of an insert of 4 values", "sqlite3_mprintf");
+    Add<OurIn>("text of an IN list of 1,000", Ours, 1000);
+    Add<BareIn>("text of an IN list of 1,000", Bare, 1000);
+    Add<ContractIn>("text of an IN list of 1,000", Contract, 1000);
+}
+
+}  // namespace Bench
