@@ -4,6 +4,7 @@
 #include <map>
 
 #include <orvadrcore/errors.h>
+#include <orvadrcore/sqlite_transaction.h>
 #include <orvadrcore/utils.h>
 
 #include "reply.h"
@@ -15,6 +16,7 @@ using OrvaDRCore::GenerateUUID;
 using OrvaDRCore::InsertCommand;
 using OrvaDRCore::SelectCommand;
 using OrvaDRCore::SqliteEqual;
+using OrvaDRCore::SqliteTransaction;
 using OrvaDRCore::SqliteValue;
 using OrvaDRCore::SqliteValueList;
 using OrvaDRCore::UpdateCommand;
@@ -116,13 +118,9 @@ bool Registry::Replace(const std::vector<Node>& nodes)
 {
     if (!db.Open()) return Fail(ERR::ERR_DATABASE_OPERATION, Json::Value());
     if (!db.CreateTable(table)) return FailAsDb();
-    // Each statement by itself: a text of several would be repeated whole.
-    if (!db.Exec("BEGIN IMMEDIATE")) return FailAsDb();
-    if (FillAnew(nodes) && db.Exec("COMMIT")) return true;
-    FailAsWrite();
-    // SQLite may have rolled back by itself, and then refuses. Closing ends what is left.
-    if (!db.DoExecSqliteCommand("ROLLBACK")) db.Close();
-    return false;
+    SqliteTransaction transaction(db);
+    if (!transaction.Begin()) return FailAsDb();
+    return (FillAnew(nodes) && transaction.Commit()) || FailAsWrite();
 }
 
 InsertCommand Registry::Insertion(const Node& node) const
