@@ -1,21 +1,23 @@
 #include <orvadrcore/sqlite_command.h>
 
+#include <utility>
+
 #include <orvadrcore/utils.h>
 
 #include "log.h"
-#include "pairs.h"
+#include "sqlite_internals.h"
 
 namespace OrvaDRCore {
 
 namespace {
 
-bool AddFieldValue(SqliteValueList& record, const std::string& field, const SqliteValue& value)
+bool AddFieldValue(SqliteValueList& record, const std::string& field, SqliteValue&& value)
 {
     if (field.empty() || !value.IsValid()) {
         DR_LOG(Err, "Bad Field [%s] /value[%s]", field.c_str(), value.ToFormatedValue().c_str());
         return false;
     }
-    return record.AddValue(field, value);
+    return record.AddValue(field, std::move(value));
 }
 
 // The text of a condition object, for the caller's setter of texts; null when it is not valid.
@@ -92,14 +94,17 @@ bool InsertCommand::IsValid() const
 
 std::string InsertCommand::ToFormatedInsertValues() const
 {
-    std::vector<std::string> names;
-    std::vector<std::string> literals;
+    std::string names;
+    std::string literals;
     for (const auto& [field, value] : fieldValues.GetValues()) {
-        names.push_back(field);
-        literals.push_back(value.ToFormatedValue());
+        if (!names.empty()) {
+            names += ',';
+            literals += ',';
+        }
+        names += field;
+        AppendLiteral(literals, value);
     }
-    return "(" + Container::ToString(names, ",") + ") VALUES (" +
-           Container::ToString(literals, ",") + ")";
+    return "(" + names + ") VALUES (" + literals + ")";
 }
 
 std::string InsertCommand::GetCommand() const

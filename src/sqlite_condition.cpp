@@ -1,6 +1,7 @@
 #include <orvadrcore/sqlite_condition.h>
 
 #include "log.h"
+#include "sqlite_internals.h"
 
 namespace OrvaDRCore {
 
@@ -123,16 +124,16 @@ bool SqliteInFamily::SetValue(const std::string& lvalue, const std::vector<Sqlit
         return false;
     }
     condition = lvalue + " " + keyword + " ( ";
-    const char* separator = "";
     for (const SqliteValue& value : values) {
         if (!value.IsValid()) {
             condition.clear();
             DR_LOG(Err, "Invalid rvalue [%s]", value.ToFormatedValue().c_str());
             return false;
         }
-        condition += separator + value.ToFormatedValue();
-        separator = ",";
+        AppendLiteral(condition, value);
+        condition += ',';
     }
+    if (!values.empty()) condition.pop_back();
     condition += " )";
     return true;
 }

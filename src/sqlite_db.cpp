@@ -13,6 +13,8 @@
 #include "json_helpers.h"
 #include "log.h"
 #include "retry.h"
+#include "sqlite_internals.h"
+#include "sqlite_statement.h"
 
 namespace OrvaDRCore {
 
@@ -24,20 +26,6 @@ constexpr int BusyTimeoutMSec = 1000;
 // The pause between tries: random, so that competing writers come apart.
 constexpr unsigned int MinPauseMSec = 500;
 constexpr unsigned int MaxPauseMSec = 1000;
-
-struct Finalize {
-    void operator()(sqlite3_stmt* statement) const { sqlite3_finalize(statement); }
-};
-using Statement = std::unique_ptr<sqlite3_stmt, Finalize>;
-
-// Fills `statement`, with null for a text that holds no statement. Answers SQLite's code.
-int PrepareStatement(sqlite3* handle, const std::string& command, Statement& statement)
-{
-    sqlite3_stmt* made = nullptr;
-    const int code = sqlite3_prepare_v2(handle, command.c_str(), -1, &made, nullptr);
-    statement.reset(made);
-    return code;
-}
 
 // Whether SQLite can store a record: a field at least, and values that are there. A list holds no
 // others, unless somebody has written into it through a reference that promised not to be.
@@ -68,21 +56,6 @@ struct ByFields {
     }
 };
 
-// The INSERT of records with these fields, with placeholders for the values.
-std::string InsertStatement(const std::string& table, const SqliteValueList& record,
-                            bool replacable)
-{
-    std::string fields;
-    std::string places;
-    for (const auto& [field, value] : record.GetValues()) {
-        const char* separator = fields.empty() ? "" : ",";
-        fields.append(separator).append(field);
-        places.append(separator).append("?");
-    }
-    const char* verb = replacable ? "INSERT OR REPLACE INTO " : "INSERT INTO ";
-    return verb + table + " (" + fields + ") VALUES (" + places + ");";
-}
-
 // What begins, ends and undoes work that happens whole or not at all.
 struct Bracket {
     const char* begin;
@@ -94,33 +67,42 @@ constexpr Bracket Transaction{"BEGIN IMMEDIATE", "COMMIT", "ROLLBACK"};
 constexpr Bracket Savepoint{"SAVEPOINT orvadr_insert", "RELEASE orvadr_insert",
                             "ROLLBACK TO orvadr_insert; RELEASE orvadr_insert"};
 
+// The names of a statement's columns, which are the same for all of its rows.
+std::vector<std::string> ColumnNames(sqlite3_stmt* statement)
+{
+    std::vector<std::string> names;
+    const int columns = sqlite3_column_count(statement);
+    for (int column = 0; column < columns; ++column) {
+        const char* name = sqlite3_column_name(statement, column);  // null when memory is short
+        names.emplace_back(name != nullptr ? name : "");
+    }
+    return names;
+}
+
 // The current row of a statement.
-SqliteValueList ParseRecord(sqlite3_stmt* statement)
+SqliteValueList ParseRecord(sqlite3_stmt* statement, const std::vector<std::string>& names)
 {
     SqliteValueList record;
     if (statement == nullptr) {
         DR_LOG(Err, "Null Pointer");
         return record;
     }
-    const int columns = sqlite3_column_count(statement);
-    for (int column = 0; column < columns; ++column) {
-        const char* given = sqlite3_column_name(statement, column);  // null when memory is short
-        const char* name = given != nullptr ? given : "";
+    int column = 0;
+    for (const std::string& name : names) {
         const int type = sqlite3_column_type(statement, column);
-        if (type == SQLITE_INTEGER) {
-            record.AddValue(name, SqliteValue(sqlite3_column_int(statement, column)));
-            continue;
-        }
-        // The pointer is null for a NULL column, and for a text when memory is short.
+        // The pointer is null for a text when memory is short.
         const unsigned char* text =
             type == SQLITE_TEXT ? sqlite3_column_text(statement, column) : nullptr;
-        if (text != nullptr) {
-            record.AddValue(name, SqliteValue(reinterpret_cast<const char*>(text)));
+        if (type == SQLITE_INTEGER) {
+            SqliteInternals::Add(record, name, sqlite3_column_int(statement, column));
+        } else if (text != nullptr) {
+            SqliteInternals::Add(record, name, reinterpret_cast<const char*>(text));
         } else if (type == SQLITE_NULL || type == SQLITE_TEXT) {
-            DR_LOG(Warn, "field [%s] has null value", name);
+            DR_LOG(Warn, "field [%s] has null value", name.c_str());
         } else {
-            DR_LOG(Warn, "Not supported type [%d] with field [%s]", type, name);
+            DR_LOG(Warn, "Not supported type [%d] with field [%s]", type, name.c_str());
         }
+        ++column;
     }
     return record;
 }
@@ -149,7 +131,8 @@ SqliteDB::SqliteDB(SqliteDB&& other) noexcept
       handle(std::exchange(other.handle, nullptr)),
       // A copy: for an empty path SQLite would open a temporary file.
       path(other.path),  // NOLINT(performance-move-constructor-init)
-      retryLimit(other.retryLimit)
+      retryLimit(other.retryLimit),
+      selects(std::move(other.selects))
 {
 }
 
@@ -162,6 +145,7 @@ SqliteDB& SqliteDB::operator=(SqliteDB&& other) noexcept
         handle = std::exchange(other.handle, nullptr);
         path = other.path;
         retryLimit = other.retryLimit;
+        selects = std::move(other.selects);
     }
     return *this;
 }
@@ -369,6 +353,7 @@ bool SqliteDB::Open()
 
 void SqliteDB::Close()
 {
+    selects.reset();  // the connection would outlive its close with them
     if (handle == nullptr) return;
     sqlite3_close(handle);
     handle = nullptr;
@@ -448,17 +433,20 @@ template <class TakeRow>
 bool SqliteDB::DoSelect(const std::string& command, TakeRow takeRow)
 {
     SetErr(ERR::ERR_DATABASE_OPERATION);
+    if (selects == nullptr) selects = std::make_unique<KeptSelects>();
     Statement statement;
-    int code = PrepareStatement(handle, command, statement);
-    if (code == SQLITE_OK) {
-        do {
-            code = sqlite3_step(statement.get());
-        } while (code == SQLITE_ROW && takeRow(ParseRecord(statement.get())));
+    int code = selects->Take(handle, command, statement);
+    if (code == SQLITE_OK) code = sqlite3_step(statement.get());
+    // Asked behind the first step, in which a kept statement meets columns that are new.
+    const auto names = ColumnNames(statement.get());
+    while (code == SQLITE_ROW && takeRow(ParseRecord(statement.get(), names))) {
+        code = sqlite3_step(statement.get());
     }
     if (code != SQLITE_ROW && code != SQLITE_DONE) {
         SetDBErr(command, code, nullptr);
         return false;
     }
+    selects->Keep(command, std::move(statement));
     SetErr(0);
     return true;
 }
@@ -466,33 +454,6 @@ bool SqliteDB::DoSelect(const std::string& command, TakeRow takeRow)
 bool SqliteDB::IsInTransaction() const
 {
     return handle != nullptr && sqlite3_get_autocommit(handle) == 0;
-}
-
-// Stores what the literal of ToFormatedValue() would. Texts are not copied: the value outlives the
-// statement. Answers SQLite's code.
-int SqliteDB::BindValue(sqlite3_stmt* statement, int place, const SqliteValue& value)
-{
-    const Json::Value& payload = value.value;
-    if (payload.isString()) {
-        const char* begin = nullptr;
-        const char* end = nullptr;
-        payload.getString(&begin, &end);
-        return sqlite3_bind_text64(statement, place, begin,
-                                   static_cast<sqlite3_uint64>(end - begin), SQLITE_STATIC,
-                                   SQLITE_UTF8);
-    }
-    return sqlite3_bind_int64(statement, place, payload.asInt64());
-}
-
-// Answers SQLite's code, SQLITE_DONE when the row is stored.
-int SqliteDB::InsertRow(sqlite3_stmt* statement, const SqliteValueList& record)
-{
-    int place = 0;
-    for (const auto& [field, value] : record.GetValues()) {
-        const int code = BindValue(statement, ++place, value);
-        if (code != SQLITE_OK) return code;
-    }
-    return sqlite3_step(statement);
 }
 
 // Inserts row by row, up to the first that fails, with one statement for all records of a kind.
@@ -510,11 +471,10 @@ bool SqliteDB::InsertRows(const std::string& table, const std::vector<SqliteValu
             code = PrepareStatement(handle, InsertStatement(table, record, replacable), *insert);
         }
         if (code == SQLITE_OK) code = InsertRow(insert->get(), record);
-        if (code != SQLITE_DONE) {
+        if (code != SQLITE_OK) {
             SetDBErr(InsertStatement(table, record, replacable), code, nullptr);
             return false;
         }
-        sqlite3_reset(insert->get());
     }
     return true;
 }

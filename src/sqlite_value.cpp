@@ -4,7 +4,7 @@
 
 #include "json_helpers.h"
 #include "log.h"
-#include "pairs.h"
+#include "sqlite_internals.h"
 
 namespace OrvaDRCore {
 
@@ -30,7 +30,10 @@ SqliteValue& SqliteValue::operator=(const SqliteValue& other)
 
 bool SqliteValue::IsValid() const
 {
-    return valid && (value.isString() || value.isBool() || value.isIntegral());
+    // The kinds that a value is built from; it may have lost its payload to another since.
+    const Json::ValueType kind = value.type();
+    return valid && (kind == Json::intValue || kind == Json::uintValue ||
+                     kind == Json::stringValue || kind == Json::booleanValue);
 }
 
 template <>
@@ -81,11 +84,9 @@ bool SqliteValue::GetValue(bool& out) const
 
 std::string SqliteValue::ToFormatedValue() const
 {
-    if (value.isString()) return "'" + value.asString() + "'";
-    if (value.isBool()) return value.asBool() ? "1" : "0";
-    if (value.isInt()) return std::to_string(value.asInt());
-    if (value.isUInt()) return std::to_string(value.asUInt());
-    return {};
+    std::string text;
+    AppendLiteral(text, *this);
+    return text;
 }
 
 std::string SqliteValue::EscapeText(const std::string& text)
@@ -97,6 +98,10 @@ std::string SqliteValue::EscapeText(const std::string& text)
         escaped += character;
     }
     return escaped;
+}
+
+SqliteValueList::SqliteValueList(SqliteValueList&& other) noexcept : values(std::move(other.values))
+{
 }
 
 SqliteValueList::~SqliteValueList() = default;
@@ -115,12 +120,17 @@ SqliteValueList& SqliteValueList::operator=(SqliteValueList&& other) noexcept
 
 bool SqliteValueList::AddValue(const std::string& field, const SqliteValue& value)
 {
+    return AddValue(field, SqliteValue(value));
+}
+
+bool SqliteValueList::AddValue(const std::string& field, SqliteValue&& value)
+{
     if (field.empty() || !value.IsValid()) {
         DR_LOG(Err, "Bad Field[%s] or value [%s]", field.c_str(), value.ToFormatedValue().c_str());
         return false;
     }
-    const auto [entry, added] = values.try_emplace(field, value);
-    if (!added) entry->second = value;
+    const auto [entry, added] = values.try_emplace(field, std::move(value));
+    if (!added) entry->second = value;  // try_emplace has left it alone
     return true;
 }
 

@@ -23,6 +23,7 @@
 #ifndef ORVADRCORE_SQLITE_DB_H
 #define ORVADRCORE_SQLITE_DB_H
 
+#include <memory>
 #include <string>
 #include <vector>
 
@@ -33,9 +34,10 @@
 #include <orvadrcore/sqlite_value.h>
 
 struct sqlite3;
-struct sqlite3_stmt;
 
 namespace OrvaDRCore {
+
+class KeptSelects;
 
 /// A connection to an SQLite file. The head of sqlite_db.h tells what holds for retries, errors,
 /// threads and forks.
@@ -292,9 +294,6 @@ class ORVADRCORE_API SqliteDB {
     bool DoSelect(const std::string& command, TakeRow takeRow);
 
     ORVADRCORE_LOCAL bool IsInTransaction() const;
-    ORVADRCORE_LOCAL static int BindValue(sqlite3_stmt* statement, int place,
-                                          const SqliteValue& value);
-    ORVADRCORE_LOCAL static int InsertRow(sqlite3_stmt* statement, const SqliteValueList& record);
     ORVADRCORE_LOCAL bool InsertRows(const std::string& table,
                                      const std::vector<SqliteValueList>& records, bool replacable);
     template <class Work>
@@ -313,6 +312,7 @@ class ORVADRCORE_API SqliteDB {
     sqlite3* handle = nullptr;
     std::string path;
     unsigned int retryLimit;
+    std::unique_ptr<KeptSelects> selects;  // none before the first
 };
 
 }  // namespace OrvaDRCore

@@ -103,7 +103,7 @@ class ORVADRCORE_API SqliteValue {
     static std::string EscapeText(const std::string& text);
 
   private:
-    friend class SqliteDB;  // binds the payload to a statement
+    friend struct SqliteInternals;  // writes the payload into statements
 
     bool valid = false;
     Json::Value value;
@@ -126,7 +126,7 @@ class ORVADRCORE_API SqliteValueList {
   public:
     SqliteValueList() = default;
     SqliteValueList(const SqliteValueList&) = default;      ///< A copy of all fields.
-    SqliteValueList(SqliteValueList&&) noexcept = default;  ///< Takes all fields of the other.
+    SqliteValueList(SqliteValueList&& other) noexcept;  ///< Takes all fields of the other.
     virtual ~SqliteValueList();
 
     /// Replaces all fields by copies of the other's.
@@ -145,6 +145,12 @@ class ORVADRCORE_API SqliteValueList {
     /// \return false when `field` is empty or `value` not valid, with ERR
     ///         `Bad Field[%s] or value [%s]`; the record is unchanged then
     bool AddValue(const std::string& field, const SqliteValue& value);
+
+    /// As above, without a copy of the value.
+    /// \param field  the field's name
+    /// \param value  its value; empty afterwards if it was taken
+    /// \return as above
+    bool AddValue(const std::string& field, SqliteValue&& value);
 
     /// Adds every field of the other record; where both have a field, the other's value wins.
     /// \param other  the record to copy from
@@ -182,6 +188,8 @@ class ORVADRCORE_API SqliteValueList {
     std::string ToStr() const;
 
   private:
+    friend struct SqliteInternals;  // fills records with rows
+
     // Behind the reference that is given out for what is not there; never changes.
     SqliteValue invalidValue;
     std::map<std::string, SqliteValue> values;

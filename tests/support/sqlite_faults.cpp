@@ -57,8 +57,9 @@ extern "C" int sqlite3_open(const char* filename, sqlite3** db)
 
 extern "C" int sqlite3_close(sqlite3* db)
 {
-    if (db != nullptr) ++connections.closed;
-    return Real<decltype(sqlite3_close)>("sqlite3_close")(db);
+    const int code = Real<decltype(sqlite3_close)>("sqlite3_close")(db);
+    if (db != nullptr && code == SQLITE_OK) ++connections.closed;  // not one with statements
+    return code;
 }
 
 extern "C" int sqlite3_busy_timeout(sqlite3* db, int milliseconds)

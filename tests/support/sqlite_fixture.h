@@ -101,6 +101,12 @@ inline bool IsStatement(sqlite3_stmt* statement, const std::string& text)
     return sql != nullptr && sql == text;
 }
 
+// The query by which a table is looked for.
+inline std::string LookFor(const std::string& table)
+{
+    return "SELECT 1 FROM sqlite_master WHERE type='table' AND name='" + table + "';";
+}
+
 // What SQLite answered to a statement.
 struct Failure {
     std::string command;

@@ -74,6 +74,8 @@ static_assert(IsPlainValue<SqliteValueList>);
 static_assert(std::has_virtual_destructor_v<SqliteValueList>);
 static_assert(std::is_nothrow_move_constructible_v<SqliteValueList>);
 static_assert(
+    Has<bool (SqliteValueList::*)(const string&, SqliteValue&&)>(&SqliteValueList::AddValue));
+static_assert(
     Has<bool (SqliteValueList::*)(const string&, const SqliteValue&)>(&SqliteValueList::AddValue));
 static_assert(Has<bool (SqliteValueList::*)(const string&) const>(&SqliteValueList::HasField));
 static_assert(

@@ -280,7 +280,7 @@ TEST_F(SqliteDbInsertTest, AFieldsNameIsWrittenAsItStandsAndCannotEndTheStatemen
     EXPECT_EQ(Run("SELECT count(*) FROM jobs"), "0");
 }
 
-TEST_F(SqliteDbInsertTest, NoStatementOutlivesTheCall)
+TEST_F(SqliteDbInsertTest, NoInsertOutlivesTheCall)
 {
     MakeTable();
     sqlite3* handle = nullptr;
@@ -289,12 +289,18 @@ TEST_F(SqliteDbInsertTest, NoStatementOutlivesTheCall)
         handle = connection;
         return RealPrepare(connection, sql, statement);
     };
+    const auto expectNoneLeft = [&] {
+        sqlite3_stmt* const look = sqlite3_next_stmt(handle, nullptr);
+        ASSERT_NE(look, nullptr);
+        EXPECT_TRUE(IsStatement(look, LookFor("jobs")));
+        EXPECT_EQ(sqlite3_next_stmt(handle, look), nullptr);
+    };
     EXPECT_TRUE(db.InsertRecords(jobs, {Job(1, "a"), Only("id", 2)}));
-    EXPECT_EQ(sqlite3_next_stmt(handle, nullptr), nullptr);
+    expectNoneLeft();
     EXPECT_FALSE(db.InsertRecords(jobs, {Only("id", 3), Job(1, "a")}));
-    EXPECT_EQ(sqlite3_next_stmt(handle, nullptr), nullptr);
+    expectNoneLeft();
     EXPECT_FALSE(db.InsertRecords(jobs, {Only("id", 3), Only("size", 1)}));
-    EXPECT_EQ(sqlite3_next_stmt(handle, nullptr), nullptr);
+    expectNoneLeft();
     ExpectLines({GaveUp(2), GaveUp(2)});
 }
 

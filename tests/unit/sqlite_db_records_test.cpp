@@ -19,11 +19,6 @@ using OrvaDRCore::UpdateCommand;
 
 using Records = std::vector<SqliteValueList>;
 
-std::string LookFor(const std::string& table)
-{
-    return "SELECT 1 FROM sqlite_master WHERE type='table' AND name='" + table + "';";
-}
-
 template <class Command = InsertCommand>
 Command Insert(const SqliteTableHandler& table, int id, const std::string& name)
 {

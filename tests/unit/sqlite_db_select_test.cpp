@@ -517,7 +517,7 @@ TEST_F(SqliteDbSelectTest, UntilItHasSucceededATryCountsAsFailed)
     ExpectRow("SELECT 1 AS x", "x:1");
 }
 
-TEST_F(SqliteDbSelectTest, EveryStatementIsFinalized)
+TEST_F(SqliteDbSelectTest, NoStatementIsLeftRunning)
 {
     sqlite3* connection = nullptr;
     SqliteFaults faults;
@@ -528,23 +528,33 @@ TEST_F(SqliteDbSelectTest, EveryStatementIsFinalized)
     ASSERT_TRUE(db.Open());
     SqliteValueList record;
     Records records;
-    const auto expectNoneLeft = [&](const std::string& statement) {
+    const auto countLeft = [&] {
+        int left = 0;
+        sqlite3_stmt* statement = nullptr;
+        while ((statement = sqlite3_next_stmt(connection, statement)) != nullptr) {
+            EXPECT_EQ(sqlite3_stmt_busy(statement), 0);
+            ++left;
+        }
+        return left;
+    };
+    const auto expectLeft = [&](const std::string& statement, int left) {
         SCOPED_TRACE(statement);
         db.DoSelectSqliteRecord(statement, record);
-        EXPECT_EQ(sqlite3_next_stmt(connection, nullptr), nullptr);
+        EXPECT_EQ(countLeft(), left);
         db.DoSelectSqliteRecords(statement, records);
-        EXPECT_EQ(sqlite3_next_stmt(connection, nullptr), nullptr);
+        EXPECT_EQ(countLeft(), left);
     };
-    expectNoneLeft("SELECT 1 AS x UNION SELECT 2");  // the one-row form leaves a row
-    expectNoneLeft("SELECT 1 AS x WHERE 0");
-    expectNoneLeft("SELECT abs(-9223372036854775808) AS x");
+    expectLeft("SELECT abs(-9223372036854775808) AS x", 0);  // fails
+    expectLeft("SELECT 1 AS x UNION SELECT 2", 1);           // the one-row form leaves a row
+    expectLeft("SELECT 1 AS x WHERE 0", 2);
+    expectLeft("SELECT abs(-9223372036854775808) AS x", 2);
 
     // A statement that comes with a failure.
     faults.prepare = [](sqlite3* handle, const char* sql, sqlite3_stmt** statement) {
         EXPECT_EQ(RealPrepare(handle, sql, statement), SQLITE_OK);
         return SQLITE_NOMEM;
     };
-    expectNoneLeft("SELECT 1 AS x");
+    expectLeft("SELECT 1 AS x", 2);
     EXPECT_EQ(db.GetErr()["sqlite_errcode"], SQLITE_NOMEM);
     EXPECT_EQ(ToText(records), "{x:1}{x:2}");
 }

@@ -435,6 +435,21 @@ TEST_F(SqliteValueListTest, AnEmptyNameOrABadValueIsRefused)
     EXPECT_EQ(Text(list), "a:5");
 }
 
+TEST_F(SqliteValueListTest, AValueThatIsGivenAwayIsTakenUnlessItIsRefused)
+{
+    SqliteValueList record;
+    SqliteValue text("a text that is not short");
+    // What is left of the value is what this is about. NOLINTBEGIN(bugprone-use-after-move)
+    EXPECT_FALSE(record.AddValue("", std::move(text)));
+    EXPECT_TRUE(text.IsValid());
+    EXPECT_TRUE(record.AddValue("name", std::move(text)));
+    EXPECT_FALSE(text.IsValid());
+    // NOLINTEND(bugprone-use-after-move)
+    EXPECT_TRUE(record.AddValue("name", SqliteValue("another")));
+    EXPECT_EQ(record.ToStr(), "name:'another'");
+    ExpectLines({Err("AddValue", "Bad Field[] or value ['a text that is not short']")});
+}
+
 TEST_F(SqliteValueListTest, AListsOwnValueCanBeAdded)
 {
     SqliteValueList list = List({{"a", "x"}});

@@ -1,0 +1,94 @@
+#include "sqlite_statement.h"
+
+#include <algorithm>
+#include <utility>
+
+#include "sqlite_internals.h"
+
+namespace OrvaDRCore {
+
+namespace {
+
+// The look for the table and the selects that a program has in its loops.
+constexpr std::size_t MaxKept = 8;
+
+// A list of thousands of values is not likely to come twice, and its statement is large.
+constexpr std::size_t MaxKeptLength = 1024;
+
+// A PRAGMA may do its work when it is prepared: selects alone can run again as they are.
+bool IsWorthKeeping(const std::string& command, sqlite3_stmt* statement)
+{
+    return command.size() <= MaxKeptLength && command.compare(0, 7, "SELECT ") == 0 &&
+           sqlite3_stmt_readonly(statement) != 0;
+}
+
+// Texts are not copied: the record outlives the statement's run. Answers SQLite's code.
+int BindValue(sqlite3_stmt* statement, int place, const SqliteValue& value)
+{
+    const Json::Value& payload = SqliteInternals::Payload(value);
+    if (payload.isString()) {
+        const char* begin = nullptr;
+        const char* end = nullptr;
+        payload.getString(&begin, &end);
+        return sqlite3_bind_text64(statement, place, begin,
+                                   static_cast<sqlite3_uint64>(end - begin), SQLITE_STATIC,
+                                   SQLITE_UTF8);
+    }
+    return sqlite3_bind_int64(statement, place, payload.asInt64());
+}
+
+}  // namespace
+
+int PrepareStatement(sqlite3* handle, const std::string& command, Statement& statement)
+{
+    sqlite3_stmt* made = nullptr;
+    const int code = sqlite3_prepare_v2(handle, command.c_str(), -1, &made, nullptr);
+    statement.reset(made);
+    return code;
+}
+
+std::string InsertStatement(const std::string& table, const SqliteValueList& record,
+                            bool replacable)
+{
+    std::string fields;
+    std::string places;
+    for (const auto& [field, value] : record.GetValues()) {
+        const char* separator = fields.empty() ? "" : ",";
+        fields.append(separator).append(field);
+        places.append(separator).append("?");
+    }
+    const char* verb = replacable ? "INSERT OR REPLACE INTO " : "INSERT INTO ";
+    return verb + table + " (" + fields + ") VALUES (" + places + ");";
+}
+
+int InsertRow(sqlite3_stmt* statement, const SqliteValueList& record)
+{
+    int place = 0;
+    for (const auto& [field, value] : record.GetValues()) {
+        const int code = BindValue(statement, ++place, value);
+        if (code != SQLITE_OK) return code;
+    }
+    const int code = sqlite3_step(statement);
+    sqlite3_reset(statement);
+    return code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
+int KeptSelects::Take(sqlite3* handle, const std::string& command, Statement& statement)
+{
+    const auto kept = std::find_if(selects.begin(), selects.end(),
+                                   [&](const Select& select) { return select.command == command; });
+    if (kept == selects.end()) return PrepareStatement(handle, command, statement);
+    statement = std::move(kept->statement);
+    selects.erase(kept);
+    return SQLITE_OK;
+}
+
+void KeptSelects::Keep(const std::string& command, Statement statement)
+{
+    if (!IsWorthKeeping(command, statement.get())) return;
+    sqlite3_reset(statement.get());
+    if (selects.size() == MaxKept) selects.erase(selects.begin());
+    selects.push_back({command, std::move(statement)});
+}
+
+}  // namespace OrvaDRCore
