@@ -93,6 +93,15 @@ struct BareRead : ReadCache {
     const Json::Value* given = nullptr;
 };
 
+struct OurView : ReadCache {
+    using ReadCache::ReadCache;
+    void Run() { given = &cache.View(); }
+    std::string Result() const { return Flatten(*given); }
+
+    Status cache{dir.Path()};
+    const Json::Value* given = nullptr;
+};
+
 struct ContractRead : ReadCache {
     using ReadCache::ReadCache;
     void Run()
@@ -181,15 +190,27 @@ struct GlibWrite : WriteCache {
 
 void AddRead(const std::string& size, std::size_t bytes)
 {
+    constexpr double OfStatAndCopy = 1.15;
     const std::string item = "cache read, fresh, " + size;
     Add<OurRead>(item, Ours, bytes);
     Add<BareRead>(item, Bare, bytes);
     Add<ContractRead>(item, Contract, bytes);
     Add<StreamRead>(item, "jsoncpp stream", bytes);
+    Aim({Contract}, OfStatAndCopy);
+}
+
+void AddView(const std::string& size, std::size_t bytes)
+{
+    constexpr double OfStat = 1.5;
+    const std::string item = "cache view, fresh, " + size;
+    Add<OurView>(item, Ours, bytes);
+    Add<BareRead>(item, Bare, bytes);
+    Aim({Bare}, OfStat);
 }
 
 void AddWrite(const std::string& where, Place place, const std::string& size, std::size_t bytes)
 {
+    constexpr double OfReplacing = 1.1;
     const std::string item = "cache write, " + where + ", " + size;
     Add<OurWrite>(item, Ours, place, bytes);
     Add<BareWrite>(item, Bare, place, bytes);
@@ -197,6 +218,7 @@ void AddWrite(const std::string& where, Place place, const std::string& size, st
 #if BENCH_HAS_GLIB
     Add<GlibWrite>(item, "jsoncpp and GLib", place, bytes);
 #endif
+    Aim({place == Place::Disk ? Bare : Contract}, OfReplacing);
 }
 
 }  // namespace
@@ -205,7 +227,9 @@ void AddCache()
 {
     AddRead("1 KB", 1000);
     AddRead("100 KB", 100'000);
+    AddView("100 KB", 100'000);
     AddWrite("disk", Place::Disk, "1 KB", 1000);
+    AddWrite("disk", Place::Disk, "100 KB", 100'000);
     AddWrite("memory", Place::Memory, "1 KB", 1000);
     AddWrite("memory", Place::Memory, "100 KB", 100'000);
 }

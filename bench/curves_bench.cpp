@@ -319,51 +319,97 @@ struct WaitingEngine : BareEngine {
     static constexpr int CrowdTimeoutMSec = 600'000;
 };
 
+// What a place, a number of processes and a contestant gave.
+struct Crowd {
+    Place place = Place::Disk;
+    int processes = 0;
+    const char* who = "";
+    std::vector<Waits> runs;
+};
+
+// The median over the runs.
+double MedianOf(const Crowd& crowd, double Waits::*number)
+{
+    std::vector<double> numbers;
+    for (const Waits& waits : crowd.runs) numbers.push_back(waits.*number);
+    const auto half = numbers.begin() + static_cast<long>(numbers.size() / 2);
+    std::nth_element(numbers.begin(), half, numbers.end());
+    return *half;
+}
+
+Waits Summarize(const Crowd& crowd)
+{
+    Waits waits{0, MedianOf(crowd, &Waits::perSecond), MedianOf(crowd, &Waits::median),
+                MedianOf(crowd, &Waits::percentile99), 0};
+    for (const Waits& run : crowd.runs) waits.worst = std::max(waits.worst, run.worst);
+    return waits;
+}
+
+// A line for each crowd: place, who, processes, and the four figures.
+void PrintCrowds(std::FILE* file, const char* format, const std::vector<Crowd>& crowds)
+{
+    for (const Crowd& crowd : crowds) {
+        const Waits waits = Summarize(crowd);
+        (void)std::fprintf(file, format, crowd.place == Place::Disk ? "disk" : "memory", crowd.who,
+                           crowd.processes, waits.perSecond, waits.median, waits.percentile99,
+                           waits.worst);
+    }
+}
+
+void WriteCrowds(const std::string& path, const char* caption, const char* format,
+                 const std::vector<Crowd>& crowds)
+{
+    std::FILE* file = std::fopen(path.c_str(), "we");
+    Require(file != nullptr, "cannot write the figures of processes");
+    (void)std::fputs(caption, file);
+    PrintCrowds(file, format, crowds);
+    Require(std::fclose(file) == 0, "cannot write the figures of processes");
+}
+
 }  // namespace
 
-void RunCrowds(const std::string& csv, int seconds)
+void RunCrowds(const std::string& out, int runs, int seconds)
 {
-    std::FILE* file = csv.empty() ? nullptr : std::fopen(csv.c_str(), "we");
-    if (file != nullptr) {
-        (void)std::fputs("place,contestant,processes,per_second,median_ms,p99_ms,worst_ms\n", file);
-    }
-    std::printf("\n%-26s %-9s %9s %11s %11s %11s %11s\n", "processes into one file", "who",
-                "processes", "inserts/s", "median", "99 %", "worst");
+    std::vector<Crowd> crowds;
+    std::printf("\n%-10s %-9s %9s %11s %11s %11s %11s\n", "one file", "who", "processes",
+                "inserts/s", "median ms", "99 % ms", "worst ms");
     for (const Place place : {Place::Disk, Place::Memory}) {
-        const char* where = place == Place::Disk ? "disk" : "memory";
         for (const int processes : {1, 2, 4, 8}) {
-            for (const bool ours : {true, false}) {
-                const char* who = ours ? Ours : Bare;
-                const Waits waits = ours ? RunCrowd<PatientEngine>(place, processes, seconds)
-                                         : RunCrowd<WaitingEngine>(place, processes, seconds);
-                std::printf("%-26s %-9s %9d %11.0f %8.3f ms %8.3f ms %8.1f ms\n", where, who,
-                            processes, waits.perSecond, waits.median, waits.percentile99,
-                            waits.worst);
-                (void)std::fflush(stdout);
-                if (file != nullptr) {
-                    (void)std::fprintf(file, "%s,%s,%d,%.1f,%.3f,%.3f,%.3f\n", where, who,
-                                       processes, waits.perSecond, waits.median, waits.percentile99,
-                                       waits.worst);
-                }
+            Crowd ours{place, processes, Ours, {}};
+            Crowd bare{place, processes, Bare, {}};
+            for (int run = 0; run < runs; ++run) {
+                ours.runs.push_back(RunCrowd<PatientEngine>(place, processes, seconds));
+                bare.runs.push_back(RunCrowd<WaitingEngine>(place, processes, seconds));
             }
+            PrintCrowds(stdout, "%-10s %-9s %9d %11.0f %11.3f %11.3f %11.1f\n", {ours, bare});
+            (void)std::fflush(stdout);
+            crowds.insert(crowds.end(), {ours, bare});
         }
     }
-    if (file != nullptr) Require(std::fclose(file) == 0, "cannot write the CSV file");
+    if (out.empty()) return;
+    WriteCrowds(out + ".csv", "place,contestant,processes,per_second,median_ms,p99_ms,worst_ms\n",
+                "%s,%s,%d,%.1f,%.3f,%.3f,%.3f\n", crowds);
+    WriteCrowds(out + ".md",
+                "| file on | who | processes | inserts/s | median ms | 99 % ms | worst ms |\n"
+                "|---|---|--:|--:|--:|--:|--:|\n",
+                "| %s | %s | %d | %.0f | %.3f | %.3f | %.1f |\n", crowds);
 }
 
 void AddCurves()
 {
+    constexpr double OfTransaction = 1.25;
     for (const int rows : {1000, 10'000, 100'000, 1'000'000}) {
-        AddEngines<SelectRows>("select all, " + ToText(rows) + " rows", rows,
+        AddEngines<SelectRows>("select all of " + ToText(rows) + " rows", rows,
                                rows == 1'000'000 ? 1 : 0);
     }
     for (const int columns : {1, 5, 20, 200}) {
-        const std::string item = "select 100 rows, " + ToText(columns) + " columns";
+        const std::string item = "select 100 rows of " + ToText(columns) + " columns";
         Add<OurWide>(item, Ours, columns);
         Add<BareWide>(item, Bare, columns);
     }
     for (const int tables : {1, 10, 100, 1000}) {
-        AddEngines<InsertBesideTables>("insert, " + ToText(tables) + " tables", tables);
+        AddEngines<InsertBesideTables>("insert beside " + ToText(tables) + " tables", tables);
+        Aim({Contract}, OfTransaction);
     }
     for (const int values : {1, 100, 10'000, 100'000}) {
         const std::string item = "select by an IN list of " + ToText(values);

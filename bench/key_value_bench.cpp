@@ -206,6 +206,8 @@ struct BoostPairs : KeyValue<V> {
 };
 #endif
 
+constexpr double AheadOfPeers = 1.5;
+
 template <class V>
 void AddLines(const std::string& count, int lines)
 {
@@ -222,6 +224,7 @@ void AddLines(const std::string& count, int lines)
 #if BENCH_HAS_BOOST
     Add<BoostPairs<V>>(item, "Boost ptree", lines);
 #endif
+    Aim({"inih", "GKeyFile", "Boost ptree"}, 1 / AheadOfPeers);
 }
 
 void AddKinds(const std::string& count, int lines)

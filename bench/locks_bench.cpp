@@ -67,7 +67,6 @@ struct ContractLock {
     bool Take()
     {
         struct stat status {};
-        const std::string dir = path.substr(0, path.rfind('/'));
         if (::stat(dir.c_str(), &status) != 0 || !S_ISDIR(status.st_mode)) return false;
         if (fd < 0) {
             fd = ::open(path.c_str(), O_RDONLY | O_CREAT, 0600);
@@ -79,6 +78,7 @@ struct ContractLock {
     void Free() const { ::flock(fd, LOCK_UN); }
 
     std::string path;
+    std::string dir = path.substr(0, path.rfind('/'));
     int fd = -1;
 };
 
@@ -164,8 +164,11 @@ void AddAll(const std::string& item)
 
 void AddLocks()
 {
+    constexpr double OfSystemCalls = 1.1;
     AddAll<LockAndUnlock>("lock and unlock");
+    Aim({Contract}, OfSystemCalls);
     AddAll<OpenLockClose>("open, lock and close");
+    Aim({Contract}, OfSystemCalls);
 }
 
 }  // namespace Bench

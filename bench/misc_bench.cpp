@@ -255,9 +255,12 @@ struct LibraryDir : NewDir {
 
 void AddMisc()
 {
+    constexpr double OfSyslog = 1.25;
+    constexpr double OfSpawn = 1.1;
     Add<OurLine>("log line", Ours);
     Add<BareLine>("log line", Bare);
     Add<ContractLine>("log line", Contract);
+    Aim({Bare}, OfSyslog);
     Add<OurMasked>("log line, masked", Ours);
     Add<BareMasked>("log line, masked", Bare);
     Add<OurName>("name of an error code", Ours);
@@ -265,9 +268,11 @@ void AddMisc()
     Add<OurUuid>("new UUID", Ours);
     Add<BareUuid>("new UUID", Bare);
     Add<PopenUuid>("new UUID", "popen");
+    Aim({Bare}, OfSpawn);
     Add<OurDir>("new directory", Ours);
     Add<BareDir>("new directory", Bare);
     Add<LibraryDir>("new directory", "std::filesystem");
+    Aim({Bare}, OfSpawn);
 }
 
 }  // namespace Bench

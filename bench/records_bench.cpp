@@ -1,4 +1,8 @@
 // Rows of a table: inserted, selected, changed and deleted.
+#include <sqlite3.h>
+
+#include <map>
+
 #include "support/bench.h"
 #include "support/engines.h"
 
@@ -69,6 +73,60 @@ struct SelectAll {
     Connection<Engine> connection{Place::Memory, Rows, Mode::Autocommit};
 };
 
+// The loop that a careful programmer writes who wants rows by column name, with values of any type.
+class LoopEngine {
+  public:
+    explicit LoopEngine(const std::string& path)
+        : handle(OpenDatabase(path)), select(Prepare(handle.get(), "SELECT * FROM nodes"))
+    {
+    }
+    void Exec(const char* statement) { ExecText(handle.get(), statement); }
+    void SelectAll()
+    {
+        rows.clear();
+        const int columns = sqlite3_column_count(select.get());
+        std::vector<std::string> fields;
+        fields.reserve(static_cast<std::size_t>(columns));
+        for (int column = 0; column < columns; ++column) {
+            fields.emplace_back(sqlite3_column_name(select.get(), column));
+        }
+        while (sqlite3_step(select.get()) == SQLITE_ROW) AppendRow(fields);
+        sqlite3_reset(select.get());
+    }
+    std::string Selected() const
+    {
+        std::vector<Node> nodes;
+        for (const auto& row : rows) {
+            nodes.push_back({row.at("id").asInt(), row.at("name").asString(),
+                             row.at("address").asString(), row.at("port").asInt(),
+                             row.at("state").asInt()});
+        }
+        return ToText(nodes);
+    }
+
+  private:
+    void AppendRow(const std::vector<std::string>& fields)
+    {
+        std::map<std::string, Json::Value>& row = rows.emplace_back();
+        int column = 0;
+        for (const std::string& field : fields) {
+            if (sqlite3_column_type(select.get(), column) == SQLITE_INTEGER) {
+                row.emplace(field, sqlite3_column_int(select.get(), column));
+            } else {
+                const auto* text =
+                    reinterpret_cast<const char*>(sqlite3_column_text(select.get(), column));
+                row.emplace(field,
+                            Json::Value(text, text + sqlite3_column_bytes(select.get(), column)));
+            }
+            ++column;
+        }
+    }
+
+    Database handle;
+    Statement select;
+    std::vector<std::map<std::string, Json::Value>> rows;
+};
+
 template <class Engine>
 struct Update {
     explicit Update(Mode mode) : connection(Place::Memory, Rows, mode) {}
@@ -111,14 +169,25 @@ void AddAll(const Bounds& bounds, const std::string& item, Arguments... argument
 
 void AddRecords()
 {
+    constexpr double OfAutocommit = 1.05;
+    constexpr double OfTransaction = 1.25;
+    constexpr double OfLoop = 1.05;
     AddAll<Insert>({}, "insert, autocommit, disk", Place::Disk, Mode::Autocommit);
+    Aim({Bare}, OfAutocommit);
     AddAll<Insert>({}, "insert, autocommit, memory", Place::Memory, Mode::Autocommit);
     AddAll<Insert>({}, "insert, transaction", Place::Memory, Mode::Transaction);
+    Aim({Contract}, OfTransaction);
     AddAll<Select>({}, "select 1 of 10,000 rows");
+    Aim({Contract}, OfTransaction);
     AddAll<SelectAll>({}, "select 10,000 rows of 5 columns");
+    Add<SelectAll<LoopEngine>>("select 10,000 rows of 5 columns", "C loop");
+    Aim({"C loop"}, OfLoop);
+    Aim({"SQLiteCpp", "SOCI"}, 1);
     AddAll<Update>({}, "update, autocommit, memory", Mode::Autocommit);
     AddAll<Update>({}, "update, transaction", Mode::Transaction);
+    Aim({Contract}, OfTransaction);
     AddAll<Delete>({Deletes}, "delete, transaction");
+    Aim({Contract}, OfTransaction);
 }
 
 }  // namespace Bench

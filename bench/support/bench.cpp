@@ -14,8 +14,13 @@ std::vector<Item>& Items()
 void AddContestant(const std::string& item, Contestant contestant)
 {
     std::vector<Item>& items = Items();
-    if (items.empty() || items.back().name != item) items.push_back({item, {}});
+    if (items.empty() || items.back().name != item) items.push_back({item, {}, {}});
     items.back().contestants.push_back(std::move(contestant));
+}
+
+void Aim(const std::vector<std::string>& of, double most)
+{
+    Items().back().targets.push_back({of, most});
 }
 
 TempDir::TempDir(Place place)

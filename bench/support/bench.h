@@ -6,6 +6,8 @@
 //         std::string text;
 //     };
 //     Add<Ours>("error name", "ours");
+//     ...
+//     Aim({Bare}, 1.1);                                   // where we want to be
 //
 // An item is one task, named without characters that are special in a regular expression. Its
 // contestants are "ours", "bare", "contract" and peers by name. The first contestant of an item gives
@@ -47,9 +49,16 @@ struct Contestant {
     std::function<std::string()> result;  // of a single run
 };
 
+// Ours is to take at most `most` times as long as each of those.
+struct Target {
+    std::vector<std::string> of;
+    double most = 0;
+};
+
 struct Item {
     std::string name;
     std::vector<Contestant> contestants;
+    std::vector<Target> targets;
 };
 
 // All items, in the order in which they were added.
@@ -57,6 +66,10 @@ std::vector<Item>& Items();
 
 // Adds a contestant to its item, which is made when it is the first.
 void AddContestant(const std::string& item, Contestant contestant);
+
+// Sets the item that was added last a target, by one contestant or by several. One that is not on
+// this system does not count.
+void Aim(const std::vector<std::string>& of, double most);
 
 // The bounds that an item may set itself.
 struct Bounds {
@@ -112,6 +125,7 @@ class TempDir {
 
 // The families.
 void AddRecords();
+void AddMany();
 void AddTexts();
 void AddJson();
 void AddKeyValue();
@@ -120,8 +134,9 @@ void AddCache();
 void AddMisc();
 void AddCurves();
 
-// Processes that insert into one file at the same time; prints a table of its own.
-void RunCrowds(const std::string& csv, int seconds);
+// Processes that insert into one file at the same time, in so many runs of so many seconds; prints a
+// table of its own and writes it to `out`.csv and `out`.md, unless that is empty.
+void RunCrowds(const std::string& out, int runs, int seconds);
 
 }  // namespace Bench
 

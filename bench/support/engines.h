@@ -31,7 +31,7 @@ Node MakeNode(int id);
 std::string ToText(const Node& node);
 std::string ToText(const std::vector<Node>& nodes);
 
-// A new database with nodes 1 to `rows`, beside `tables` - 1 other tables.
+// A new database with nodes 1 to `rows`, and `tables` - 1 other tables, half of them older than nodes.
 void FillNodes(const std::string& path, int rows, int tables = 1);
 
 // All nodes of a file, as text, in the order of their ids.
@@ -77,8 +77,8 @@ class BareEngine {
     std::vector<Node> rows;
 };
 
-// What our documents promise, by hand: before each statement the look for the table; the statement
-// as a text with literals; rows as values by column name.
+// What our documents promise, by hand: before each statement the look for the table, by a query that
+// stays prepared; the statement as a text with literals; rows as values by column name.
 class ContractEngine {
   public:
     explicit ContractEngine(const std::string& path);
@@ -96,6 +96,7 @@ class ContractEngine {
 
     Database handle;
     std::string name = "nodes";
+    Statement look;
     std::vector<std::map<std::string, Value>> rows;
 };
 

@@ -1,8 +1,9 @@
 // Checks the contestants of each item against each other, measures them by turns, and prints a table.
 //
-//     orvadr_bench [--quick] [--curves] [--csv FILE] [TEXT]
+//     orvadr_bench [--quick] [--curves] [--out NAME] [TEXT]
 //
-// TEXT picks the items whose name holds it. Files of the benchmarks lie in the working directory, in
+// TEXT picks the items whose name holds it. The figures go to NAME.csv, as a table to NAME.md, and
+// those of processes to NAME-processes.csv and .md. Files of the benchmarks lie in the working directory, in
 // /dev/shm and, for locks, in /tmp/.orvadr_lock; they are removed at the end.
 #include <benchmark/benchmark.h>
 
@@ -21,7 +22,7 @@ using Bench::Item;
 struct Options {
     bool quick = false;
     bool curves = false;
-    std::string csv;
+    std::string out;
     std::string text;
 };
 
@@ -33,8 +34,8 @@ Options ParseOptions(const std::vector<std::string>& arguments)
             options.quick = true;
         } else if (*at == "--curves") {
             options.curves = true;
-        } else if (*at == "--csv" && at + 1 != arguments.end()) {
-            options.csv = *++at;
+        } else if (*at == "--out" && at + 1 != arguments.end()) {
+            options.out = *++at;
         } else {
             Bench::Require(at->compare(0, 2, "--") != 0, "unknown option");
             options.text = *at;
@@ -65,6 +66,7 @@ void AddItems(bool curves)
         return;
     }
     Bench::AddRecords();
+    Bench::AddMany();
     Bench::AddTexts();
     Bench::AddJson();
     Bench::AddKeyValue();
@@ -89,10 +91,11 @@ void NamePeersLeftOut()
 // All contestants of an item give what the first one gives.
 void CheckResults(const Item& item)
 {
-    const std::string expected = item.contestants.front().result();
-    Bench::Require(!expected.empty(), ("no result: " + item.name).c_str());
+    std::string expected;
     for (const Bench::Contestant& contestant : item.contestants) {
         const std::string result = contestant.result();
+        Bench::Require(!result.empty(), ("no result: " + item.name).c_str());
+        if (expected.empty()) expected = result;
         if (result == expected) continue;
         throw Bench::Failure(item.name + ": " + contestant.name + " gives\n" +
                              result.substr(0, 1000) + "\nbut " + item.contestants.front().name +
@@ -117,10 +120,14 @@ void Run(const Options& options)
         benchmark::RunSpecifiedBenchmarks(&collector, "^" + item.name + "/");
         Bench::PrintItem(item, collector);
     }
-    const std::string& csv = options.csv;
-    if (!csv.empty()) Bench::WriteCsv(csv, chosen, collector);
+    const std::string& out = options.out;
+    if (!out.empty()) {
+        Bench::WriteCsv(out + ".csv", chosen, collector);
+        Bench::WriteMarkdown(out + ".md", chosen, collector);
+    }
     if (options.curves && std::string("processes").find(options.text) != std::string::npos) {
-        Bench::RunCrowds(csv.empty() ? "" : csv + ".processes", options.quick ? 1 : 5);
+        const std::string processes = out.empty() ? "" : out + "-processes";
+        Bench::RunCrowds(processes, options.quick ? 1 : 5, options.quick ? 1 : 2);
     }
 }
 

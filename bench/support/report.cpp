@@ -48,6 +48,74 @@ bool IsPeer(const std::string& name)
     return name != Ours && name != Bare && name != Contract;
 }
 
+// How many times as long as the fastest of those in the target ours takes; nothing when none of them
+// was measured.
+std::optional<double> Reached(const Item& item, const Target& target, const Collector& collected)
+{
+    const auto ours = MedianOf(item.name, Ours, collected);
+    std::optional<double> most;
+    for (const std::string& name : target.of) {
+        const auto time = MedianOf(item.name, name, collected);
+        if (ours && time) most = std::max(most.value_or(0), *ours / *time);
+    }
+    return most;
+}
+
+// An item's row as texts, for both kinds of tables.
+struct Row {
+    std::string ours;
+    std::string bare;
+    std::string contract;
+    std::string perBare;
+    std::string perContract;
+    std::string target;
+    std::string verdict;
+    std::string peers;
+};
+
+void Join(std::string& list, const std::string& next)
+{
+    if (!list.empty()) list += ", ";
+    list += next;
+}
+
+Row MakeRow(const Item& item, const Collector& collected)
+{
+    const auto ours = MedianOf(item.name, Ours, collected);
+    const auto bare = MedianOf(item.name, Bare, collected);
+    const auto contract = MedianOf(item.name, Contract, collected);
+    Row row{ToCell(ours),
+            ToCell(bare),
+            ToCell(contract),
+            ToRatio(ours, bare, "-"),
+            ToRatio(ours, contract, "-"),
+            {},
+            {},
+            {}};
+    for (const Target& target : item.targets) {
+        const auto reached = Reached(item, target, collected);
+        if (!reached) continue;
+        Join(row.target,
+             Format("%.3g ", target.most) + (target.of.size() == 1 ? target.of.front() : "peers"));
+        Join(row.verdict, Format(*reached <= target.most ? "met %.3g" : "missed %.3g", *reached));
+    }
+    for (const Contestant& contestant : item.contestants) {
+        if (!IsPeer(contestant.name)) continue;
+        Join(row.peers,
+             contestant.name + " " + ToCell(MedianOf(item.name, contestant.name, collected)));
+    }
+    return row;
+}
+
+void PrintRow(const std::string& item, const Row& row)
+{
+    std::printf("%-38s %9s %9s %9s %7s %9s  %-22s %-20s %s\n", item.c_str(), row.ours.c_str(),
+                row.bare.c_str(), row.contract.c_str(), row.perBare.c_str(),
+                row.perContract.c_str(), row.target.c_str(), row.verdict.c_str(),
+                row.peers.c_str());
+    (void)std::fflush(stdout);
+}
+
 }  // namespace
 
 bool Collector::ReportContext(const Context& /*context*/)
@@ -81,34 +149,43 @@ std::string ToTime(double nanoseconds)
 
 void PrintCaption()
 {
-    std::printf("%-38s %9s %9s %9s %7s %9s  %s\n", "item", "ours", "bare", "contract", "/bare",
-                "/contract", "peers");
+    PrintRow("item",
+             {"ours", "bare", "contract", "/bare", "/contract", "target", "reached", "peers"});
 }
 
 void PrintItem(const Item& item, const Collector& collected)
 {
-    const auto ours = MedianOf(item.name, Ours, collected);
-    const auto bare = MedianOf(item.name, Bare, collected);
-    const auto contract = MedianOf(item.name, Contract, collected);
-    std::string peers;
-    for (const Contestant& contestant : item.contestants) {
-        if (!IsPeer(contestant.name)) continue;
-        if (!peers.empty()) peers += ", ";
-        peers += contestant.name + " " + ToCell(MedianOf(item.name, contestant.name, collected));
+    PrintRow(item.name, MakeRow(item, collected));
+}
+
+void WriteMarkdown(const std::string& path, const std::vector<Item>& items,
+                   const Collector& collected)
+{
+    std::FILE* file = std::fopen(path.c_str(), "we");
+    Require(file != nullptr, "cannot write the table");
+    (void)std::fputs(
+        "| item | ours | bare | contract | /bare | /contract | target | reached | peers |\n"
+        "|---|--:|--:|--:|--:|--:|---|---|---|\n",
+        file);
+    for (const Item& item : items) {
+        const Row row = MakeRow(item, collected);
+        (void)std::fprintf(file, "| %s | %s | %s | %s | %s | %s | %s | %s | %s |\n",
+                           item.name.c_str(), row.ours.c_str(), row.bare.c_str(),
+                           row.contract.c_str(), row.perBare.c_str(), row.perContract.c_str(),
+                           row.target.c_str(), row.verdict.c_str(), row.peers.c_str());
     }
-    std::printf("%-38s %9s %9s %9s %7s %9s  %s\n", item.name.c_str(), ToCell(ours).c_str(),
-                ToCell(bare).c_str(), ToCell(contract).c_str(), ToRatio(ours, bare, "-").c_str(),
-                ToRatio(ours, contract, "-").c_str(), peers.c_str());
-    (void)std::fflush(stdout);
+    Require(std::fclose(file) == 0, "cannot write the table");
 }
 
 void WriteCsv(const std::string& path, const std::vector<Item>& items, const Collector& collected)
 {
     std::FILE* file = std::fopen(path.c_str(), "we");
     Require(file != nullptr, "cannot write the CSV file");
-    (void)std::fputs("item,contestant,repetitions,median_ns,min_ns,max_ns,per_bare,per_contract\n",
-                     file);
+    (void)std::fputs(
+        "item,contestant,repetitions,median_ns,min_ns,max_ns,per_bare,per_contract,per_ours\n",
+        file);
     for (const Item& item : items) {
+        const auto ours = MedianOf(item.name, Ours, collected);
         const auto bare = MedianOf(item.name, Bare, collected);
         const auto contract = MedianOf(item.name, Contract, collected);
         for (const Contestant& contestant : item.contestants) {
@@ -117,10 +194,11 @@ void WriteCsv(const std::string& path, const std::vector<Item>& items, const Col
             const std::vector<double>& times = found->second;
             const double median = Median(times);
             const auto [least, most] = std::minmax_element(times.begin(), times.end());
-            (void)std::fprintf(file, "\"%s\",%s,%zu,%.1f,%.1f,%.1f,%s,%s\n", item.name.c_str(),
+            (void)std::fprintf(file, "\"%s\",%s,%zu,%.1f,%.1f,%.1f,%s,%s,%s\n", item.name.c_str(),
                                contestant.name.c_str(), times.size(), median, *least, *most,
                                ToRatio(median, bare, "").c_str(),
-                               ToRatio(median, contract, "").c_str());
+                               ToRatio(median, contract, "").c_str(),
+                               (ours ? Format("%.4g", median / *ours) : "").c_str());
         }
     }
     Require(std::fclose(file) == 0, "cannot write the CSV file");

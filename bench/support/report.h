@@ -1,4 +1,4 @@
-// What the repetitions gave: one table for a reader, one CSV file for programs.
+// What the repetitions gave: a table on the screen and one for a page, and a CSV file for programs.
 #ifndef ORVADRCORE_BENCH_SUPPORT_REPORT_H
 #define ORVADRCORE_BENCH_SUPPORT_REPORT_H
 
@@ -24,11 +24,17 @@ class Collector : public benchmark::BenchmarkReporter {
     std::map<std::string, std::vector<double>> times;
 };
 
-// The caption of the table, and an item's row: medians, their ratios to the floors, the peers.
+// The caption of the table, and an item's row: medians, their ratios to the floors, the target and
+// whether it is met, the peers.
 void PrintCaption();
 void PrintItem(const Item& item, const Collector& collected);
 
-// Every contestant with its median, fastest and slowest repetition and its ratios to the floors.
+// The same table in Markdown.
+void WriteMarkdown(const std::string& path, const std::vector<Item>& items,
+                   const Collector& collected);
+
+// Every contestant with its median, fastest and slowest repetition and its ratios to the floors and
+// to ours.
 void WriteCsv(const std::string& path, const std::vector<Item>& items, const Collector& collected);
 
 // A time with three digits and its unit.
