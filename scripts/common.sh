@@ -10,6 +10,8 @@ build_packages=(g++ make cmake libsqlite3-dev libjsoncpp-dev uuid-runtime)
 test_packages=(libgtest-dev libgmock-dev)
 # shellcheck disable=SC2034
 bench_packages=(libbenchmark-dev pkg-config)
+# shellcheck disable=SC2034
+plot_packages=(gnuplot-nox)
 # What the benchmarks measure beside the library; they do without what is not to be had.
 # shellcheck disable=SC2034
 peer_packages=(libsqlitecpp-dev libsoci-dev libinih-dev libglib2.0-dev libboost-dev)
