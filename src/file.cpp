@@ -6,8 +6,11 @@
 #include <algorithm>
 #include <array>
 #include <cstdio>
-#include <sstream>
+#include <iterator>
+#include <string_view>
+#include <utility>
 
+#include "extraction.h"
 #include "file_io.h"
 #include "json_helpers.h"
 #include "log.h"
@@ -21,20 +24,54 @@ constexpr std::size_t ChunkSize = 1024;
 
 constexpr mode_t NewFileMode = 0666;  // less the umask
 
+constexpr char Separator = '=';
+
+// The line at the beginning of the text, which is taken off it.
+std::string_view TakeLine(std::string_view& text)
+{
+    const std::size_t end = std::min(text.find('\n'), text.size());
+    const std::string_view line = text.substr(0, end);
+    text.remove_prefix(std::min(end + 1, text.size()));
+    return line;
+}
+
+// Reads key and value out of a line, each as File::toType does.
+template <class K, class V>
+bool parseLineKeyValue(std::string_view line, Extraction& extraction, K& key, V& value)
+{
+    if (line.empty()) {
+        DR_LOG(Warn, "Bad Parameter.");
+        return false;
+    }
+    const std::size_t at = line.find(Separator);
+    if (at == std::string_view::npos) {
+        DR_LOG(Notice, "Cannot find separator[%c] in line[%s]", Separator,
+               std::string(line).c_str());
+        return false;
+    }
+    const std::string_view left = line.substr(0, at);
+    const std::string_view right = line.substr(at + 1);
+    if (left.empty() || right.empty()) return false;
+    extraction.Read(left, key);
+    extraction.Read(right, value);
+    return true;
+}
+
 }  // namespace
 
 bool File::Read(const std::string& path, Json::Value& value)
 {
     const FileDescriptor file(path, O_RDONLY);
-    if (!CoreLibFileExist(path.c_str())) return true;
     if (!file.IsOpen()) {
+        if (!CoreLibFileExist(path.c_str())) return true;
         DR_LOG(Err, "File[%s] is not opened.", path.c_str());
         return false;
     }
     std::string text;
     ReadAll(file.Get(), text);  // what a failure has cut off does not parse
     // The lines are joined with nothing between them.
-    text.erase(std::remove(text.begin(), text.end(), '\n'), text.end());
+    const std::size_t first = std::min(text.find('\n'), text.size());
+    text.erase(std::remove(&text[first], text.data() + text.size(), '\n') - text.data());
     return fromString(value, text);
 }
 
@@ -60,13 +97,14 @@ bool File::Write(const std::string& path, const Json::Value& value)
         DR_LOG(Err, "Empty path to write.");
         return false;
     }
-    const std::string text = toString(value);
+    std::string text = toString(value) + "\n";
     const FileDescriptor file(path, O_WRONLY | O_CREAT | O_TRUNC, NewFileMode);
     if (!file.IsOpen()) {
         DR_LOG(Err, "File [%s] is not opened.", path.c_str());
         return false;
     }
-    if (!WriteAll(file.Get(), text + "\n")) {
+    if (!WriteAll(file.Get(), text)) {
+        text.pop_back();
         DR_LOG(Err, "Failed to write [%s] to [%s].", text.c_str(), path.c_str());
         return false;
     }
@@ -132,8 +170,8 @@ template <class K, class V>
 int File::Read(const std::string& path, std::map<K, V>& out)
 {
     const FileDescriptor file(path, O_RDONLY);
-    if (!CoreLibFileExist(path.c_str())) return 0;
     if (!file.IsOpen()) {
+        if (!CoreLibFileExist(path.c_str())) return 0;
         DR_LOG(Warn, "File[%s] is not opened.", path.c_str());
         return -1;
     }
@@ -141,34 +179,21 @@ int File::Read(const std::string& path, std::map<K, V>& out)
     ReadAll(file.Get(), text);  // a failure counts as the end
 
     out.clear();
-    std::istringstream lines(text);
-    for (std::string line; std::getline(lines, line);) {
+    Extraction extraction;
+    auto next = out.end();
+    for (std::string_view rest = text; !rest.empty();) {
+        const std::string_view line = TakeLine(rest);
         K key{};
         V value{};
-        if (!parseLineKeyValue(line, std::string("="), key, value)) {
-            DR_LOG(Notice, "Failed to parse line[%s] from file [%s]", line.c_str(), path.c_str());
+        if (!parseLineKeyValue(line, extraction, key, value)) {
+            DR_LOG(Notice, "Failed to parse line[%s] from file [%s]", std::string(line).c_str(),
+                   path.c_str());
             continue;
         }
-        out.emplace(key, value);  // the first of two lines with one key counts
+        // The first of two lines with one key counts. Most files are sorted, more or less.
+        next = std::next(out.try_emplace(next, std::move(key), std::move(value)));
     }
     return static_cast<int>(out.size());
-}
-
-template <class K, class V>
-bool File::parseLineKeyValue(const std::string& line, const std::string& separator, K& key,
-                             V& value)
-{
-    if (line.empty() || separator.empty()) {
-        DR_LOG(Warn, "Bad Parameter.");
-        return false;
-    }
-    const std::size_t at = line.find(separator);
-    if (at == std::string::npos) {
-        DR_LOG(Notice, "Cannot find separator[%s] in line[%s]", separator.c_str(), line.c_str());
-        return false;
-    }
-    return toType(line.substr(0, at), key, K{}) &&
-           toType(line.substr(at + separator.size()), value, V{});
 }
 
 template int File::Read(const std::string&, std::map<std::string, std::string>&);

@@ -129,11 +129,6 @@ class ORVADRCORE_API File {
     ///         Nothing is logged
     template <class In, class Out>
     static bool toType(const In& in, Out& out, const Out& fallback);
-
-  private:
-    template <class K, class V>
-    static bool parseLineKeyValue(const std::string& line, const std::string& separator, K& key,
-                                  V& value);
 };
 
 /// \cond INSTANTIATIONS

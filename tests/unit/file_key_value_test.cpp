@@ -6,13 +6,14 @@
 
 #include <cfloat>
 #include <climits>
-#include <locale>
 #include <map>
+#include <random>
 #include <sstream>
 #include <string>
 #include <vector>
 
 #include "support/child_checks.h"
+#include "support/global_locale.h"
 #include "support/log_capture.h"
 #include "support/syscall_faults.h"
 #include "support/temp_dir.h"
@@ -36,28 +37,6 @@ Value Extracted(const std::string& text)
     std::istringstream(text) >> value;
     return value;
 }
-
-// "1.234,5" is one thousand and a bit.
-class CommaDecimals : public std::numpunct<char> {
-  protected:
-    char do_decimal_point() const override { return ','; }
-    char do_thousands_sep() const override { return '.'; }
-    std::string do_grouping() const override { return "\3"; }
-};
-
-class GlobalLocale {
-  public:
-    explicit GlobalLocale(std::numpunct<char>* facet)
-        : before(std::locale::global(std::locale(std::locale::classic(), facet)))
-    {
-    }
-    GlobalLocale(const GlobalLocale&) = delete;
-    GlobalLocale& operator=(const GlobalLocale&) = delete;
-    ~GlobalLocale() { std::locale::global(before); }
-
-  private:
-    std::locale before;
-};
 
 class FileKeyValueTest : public LoggedTest {
   protected:
@@ -262,6 +241,38 @@ TEST_F(FileKeyValueTest, NumbersAreThoseOfTheProgramsLocale)
         EXPECT_THAT(Read<double>(line), ElementsAre(Pair("n", Extracted<double>(text)))) << text;
         EXPECT_THAT(Read<int>(line), ElementsAre(Pair("n", Extracted<int>(text)))) << text;
     }
+}
+
+// Keys in any order, twice, odd and not at all: the map is that of one toType after the other.
+TEST_F(FileKeyValueTest, ManyLinesGiveWhatToTypeMakesOfEach)
+{
+    const std::vector<std::string> pieces = {"a", "b",  "key_1", "key_10", "=",     "=",  "=5",
+                                             " ", "\t", "-",     "1.5e3",  "12abc", "1,5"};
+    std::mt19937 random(20'211);  // the same lines each time
+    std::uniform_int_distribution<std::size_t> piece(0, pieces.size() - 1);
+    std::string content;
+    Pairs<double> expected;
+    std::vector<LogLine> lines;
+    for (int count = 0; count < 5000; ++count) {
+        std::string line;
+        for (std::size_t left = 2 + piece(random) % 4; left > 0; --left) {
+            line += pieces[piece(random)];
+        }
+        content += line + "\n";
+        const std::size_t at = line.find('=');
+        std::string key;
+        double value = 0;
+        if (at == std::string::npos) {
+            lines.insert(lines.end(), {NoSeparator(line), NotParsed(line)});
+        } else if (File::toType(line.substr(0, at), key, std::string()) &&
+                   File::toType(line.substr(at + 1), value, 0.0)) {
+            expected.emplace(key, value);
+        } else {
+            lines.push_back(NotParsed(line));
+        }
+    }
+    EXPECT_EQ(Read<double>(content), expected);
+    ExpectLines(lines);
 }
 
 // ------------------------------------------------------------------------------------------- files

@@ -1,0 +1,32 @@
+// Locales that need none of the system's: a facet put into that of C, as the program's own.
+#ifndef ORVADRCORE_TESTS_GLOBAL_LOCALE_H
+#define ORVADRCORE_TESTS_GLOBAL_LOCALE_H
+
+#include <locale>
+#include <string>
+
+// "1.234,5" is one thousand and a bit.
+class CommaDecimals : public std::numpunct<char> {
+  protected:
+    char do_decimal_point() const override { return ','; }
+    char do_thousands_sep() const override { return '.'; }
+    std::string do_grouping() const override { return "\3"; }
+};
+
+// As long as it lives, the program's locale has that facet, which it owns.
+class GlobalLocale {
+  public:
+    template <class Facet>
+    explicit GlobalLocale(Facet* facet)
+        : before(std::locale::global(std::locale(std::locale::classic(), facet)))
+    {
+    }
+    GlobalLocale(const GlobalLocale&) = delete;
+    GlobalLocale& operator=(const GlobalLocale&) = delete;
+    ~GlobalLocale() { std::locale::global(before); }
+
+  private:
+    std::locale before;
+};
+
+#endif
