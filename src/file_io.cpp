@@ -4,6 +4,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <array>
 #include <cerrno>
 #include <climits>
 #include <cstdio>
@@ -13,7 +14,7 @@ namespace OrvaDRCore {
 
 namespace {
 
-constexpr std::size_t ReadSize = 65536;
+constexpr std::size_t ReadSize = 16384;
 
 constexpr mode_t PermissionBits = 07777;
 constexpr mode_t NewFileMode = 0666;  // the kernel takes the umask off
@@ -119,14 +120,12 @@ FileDescriptor::~FileDescriptor()
 
 bool ReadAll(int fd, std::string& text)
 {
-    std::size_t size = text.size();
+    std::array<char, ReadSize> chunk;  // NOLINT(cppcoreguidelines-pro-type-member-init)
     ssize_t count = 0;
     do {
-        if (count > 0) size += static_cast<std::size_t>(count);
-        if (text.size() < size + ReadSize) text.resize(size + ReadSize + size / 2);
-        count = ::read(fd, &text[size], text.size() - size);
+        if (count > 0) text.append(chunk.data(), static_cast<std::size_t>(count));
+        count = ::read(fd, chunk.data(), chunk.size());
     } while (count > 0 || (count < 0 && errno == EINTR));
-    text.resize(size);
     return count == 0;
 }
 

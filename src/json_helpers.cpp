@@ -1,5 +1,6 @@
 #include "json_helpers.h"
 
+#include <atomic>
 #include <cstring>
 #include <memory>
 
@@ -10,17 +11,49 @@
 
 namespace OrvaDRCore {
 
+namespace {
+
+void Configure(Json::CharReaderBuilder& builder)
+{
+    builder["allowComments"] = false;
+    builder["allowTrailingCommas"] = false;
+    builder["failIfExtra"] = true;
+}
+
+void Configure(Json::StreamWriterBuilder& builder)
+{
+    builder["commentStyle"] = "None";
+    builder["emitUTF8"] = true;
+    builder["indentation"] = "";
+}
+
+// The configured builder, which takes longer to make than a small document to read. It is made at
+// the first use and stays as it is. Threads that come first at once make one each: a lock might be
+// held by another thread in a process that forks.
+template <class Builder>
+const Builder& Kept()
+{
+    static std::atomic<const Builder*> kept{nullptr};
+    const Builder* builder = kept.load(std::memory_order_acquire);
+    if (builder == nullptr) {
+        auto made = std::make_unique<Builder>();
+        Configure(*made);
+        if (kept.compare_exchange_strong(builder, made.get(), std::memory_order_acq_rel)) {
+            builder = made.release();
+        }
+    }
+    return *builder;
+}
+
+}  // namespace
+
 bool fromString(Json::Value& value, const std::string& text)
 {
     // The reader takes a zero byte for the end of the text and would pass over what follows it. No
     // JSON document holds one: in strings it is written \u0000.
     if (text.find('\0') != std::string::npos) return false;
 
-    Json::CharReaderBuilder builder;
-    builder["allowComments"] = false;
-    builder["allowTrailingCommas"] = false;
-    builder["failIfExtra"] = true;
-    const std::unique_ptr<Json::CharReader> reader(builder.newCharReader());
+    const std::unique_ptr<Json::CharReader> reader(Kept<Json::CharReaderBuilder>().newCharReader());
 
     // A document that breaks off leaves its first members behind in the reader's output.
     Json::Value document;
@@ -36,11 +69,7 @@ bool fromString(Json::Value& value, const std::string& text)
 
 std::string toString(const Json::Value& value)
 {
-    Json::StreamWriterBuilder builder;
-    builder["commentStyle"] = "None";
-    builder["emitUTF8"] = true;
-    builder["indentation"] = "";
-    return Json::writeString(builder, value);
+    return Json::writeString(Kept<Json::StreamWriterBuilder>(), value);
 }
 
 bool fromFile(Json::Value& value, const std::string& path)
