@@ -7,6 +7,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <ctime>
 #include <limits>
 
 #include <orvadrcore/file.h>
@@ -55,8 +56,39 @@ std::string GetCachedPath(const std::string& dir, const std::string& file)
 // In whole seconds since the epoch; -1 for what is not there.
 std::time_t GetModifyTime(const std::string& path)
 {
-    struct stat64 status {};
-    return ::stat64(path.c_str(), &status) == 0 ? status.st_mtime : -1;
+    struct stat status {};
+    return ::stat(path.c_str(), &status) == 0 ? status.st_mtime : -1;
+}
+
+bool IsSame(const std::timespec& left, const std::timespec& right)
+{
+    return left.tv_sec == right.tv_sec && left.tv_nsec == right.tv_nsec;
+}
+
+// Whether whatever is done to a file from now on gives it another time: some kernels' clocks go on
+// in steps of 10 milliseconds.
+bool IsSettled(const struct stat& status)
+{
+    std::timespec now{};
+    ::clock_gettime(CLOCK_REALTIME, &now);
+    return std::difftime(now.tv_sec, status.st_ctim.tv_sec) > 1;
+}
+
+// The longest refresh that a document speaks of; 0 when it does not say, or not as an integer.
+int GetLongestRefresh(const Json::Value& document)
+{
+    const Json::Value* longest = FindMember(document, "max_updated_time");
+    // A real number counts as absent, on purpose, although to jsoncpp 3.0 is an int.
+    const bool known = longest != nullptr && longest->isInt() && longest->type() != Json::realValue;
+    return known ? longest->asInt() : 0;
+}
+
+// A Cache's own words for a file; the type is private to it.
+template <class KnownFile>
+KnownFile Describe(const struct stat& status, int longestRefresh)
+{
+    return {status.st_dev,  status.st_ino,  status.st_size,
+            status.st_mtim, status.st_ctim, longestRefresh};
 }
 
 bool IsLiving(pid_t pid)
@@ -107,55 +139,55 @@ bool Cache::IsUpdatedDataRequired() const
 Json::Value Cache::Read() const
 {
     // A copy: the refresh may replace what is in memory, and fail.
-    Json::Value data = GetCachedData();
-    if (GivesWay(__func__, data)) data = GetCachedData();
+    std::time_t modifyTime = -1;
+    Json::Value data = LoadedData(modifyTime);
+    if (GivesWay(__func__, data, modifyTime)) data = GetCachedData();
     return data;
 }
 
 const Json::Value& Cache::View() const
 {
-    return GivesWay(__func__, LoadedData()) ? LoadedData() : cachedData;
+    std::time_t modifyTime = -1;
+    const Json::Value& data = LoadedData(modifyTime);
+    return GivesWay(__func__, data, modifyTime) ? LoadedData(modifyTime) : cachedData;
 }
 
 Json::Value Cache::GetCachedData() const
 {
-    return LoadedData();
+    std::time_t modifyTime = -1;
+    return LoadedData(modifyTime);
 }
 
 bool Cache::Load() const
 {
-    if (!CoreLibFileExist(cachedPath.c_str())) {
+    // Looked at before reading: a write in between is then seen as one by the next read.
+    struct stat status {};
+    if (::stat(cachedPath.c_str(), &status) != 0) {
         DR_LOG(Debug, "no data is cached in [%s]", cachedPath.c_str());
         return false;
     }
-    // Taken before reading: a write in between is then seen as one by the next read.
-    const std::time_t modifyTime = GetModifyTime(cachedPath);
     Json::Value document;
     if (!fromFile(document, cachedPath)) {
         DR_LOG(Debug, "Failed to read data from cache [%s]", cachedPath.c_str());
         return false;
     }
+    knownFile = KnownFile();
+    if (IsSettled(status)) knownFile = Describe<KnownFile>(status, GetLongestRefresh(document));
     // Without "cached_data" the file counts as loaded and the old data stays, on purpose.
     if (FindMember(document, "cached_data") != nullptr) cachedData.swap(document["cached_data"]);
-    loadedModifyTime = modifyTime;
+    loadedModifyTime = status.st_mtime;
     return true;
 }
 
 bool Cache::IsTimeout() const
 {
-    const std::time_t modifyTime = GetModifyTime(cachedPath);
-    const std::time_t now = std::time(nullptr);
-    return now == -1 || std::difftime(now, modifyTime) > static_cast<double>(timeout);
+    return IsTooOld(GetModifyTime(cachedPath));
 }
 
 int Cache::GetMaxUpdateTime() const
 {
     Json::Value document;
-    if (!fromFile(document, cachedPath)) return 0;
-    const Json::Value* longest = FindMember(document, "max_updated_time");
-    // A real number counts as absent, on purpose, although to jsoncpp 3.0 is an int.
-    const bool known = longest != nullptr && longest->isInt() && longest->type() != Json::realValue;
-    return known ? longest->asInt() : 0;
+    return fromFile(document, cachedPath) ? GetLongestRefresh(document) : 0;
 }
 
 int Cache::Remove()
@@ -213,16 +245,19 @@ bool Cache::UpdateWithData(const Json::Value& data, long begin, long finish) con
     document["begin_time_to_update"] = Json::Int64{begin};
     document["finish_time_to_update"] = Json::Int64{finish};
     document["updated_time"] = took;
-    document["max_updated_time"] = std::max(GetMaxUpdateTime(), ToWholeSeconds(took));
+    const int longest = std::max(LongestRefresh(), ToWholeSeconds(took));
+    document["max_updated_time"] = longest;
 
-    const auto write = [&] { return toFile(document, cachedPath); };
+    struct stat written {};
+    const auto write = [&] { return toFile(document, cachedPath, &written); };
     if (!Retry(RetriesOf(retryLimit), write, WritePause).succeeded) {
         DR_LOG(Debug, "Failed to write cache to file [%s] and reach retry limit[%d]",
                cachedPath.c_str(), retryLimit);
         return false;
     }
     cachedData.swap(document["cached_data"]);
-    loadedModifyTime = GetModifyTime(cachedPath);
+    loadedModifyTime = written.st_mtime;
+    knownFile = Describe<KnownFile>(written, longest);
     return true;
 }
 
@@ -241,23 +276,43 @@ std::string Cache::LockName() const
     return cachedPath + ".lock";
 }
 
-// What is in memory, after a look whether the file has changed.
-const Json::Value& Cache::LoadedData() const
+// What is in memory, after a look whether the file has changed, whose modification time goes into
+// `modifyTime`.
+const Json::Value& Cache::LoadedData(std::time_t& modifyTime) const
 {
-    const std::time_t modifyTime = GetModifyTime(cachedPath);
+    modifyTime = GetModifyTime(cachedPath);
     if (modifyTime != -1 && modifyTime == loadedModifyTime) return cachedData;
     if (!Load()) {
         cachedData = GetDefaultValue();
         DR_LOG_AS("GetCachedData", Debug, "Failed to load cache [%s], use default cache data",
                   cachedPath.c_str());
     }
+    modifyTime = GetModifyTime(cachedPath);
     return cachedData;
 }
 
-// Whether stale data gives way to what a refresh has left, or is in the making.
-bool Cache::GivesWay(const char* function, const Json::Value& data) const
+bool Cache::IsTooOld(std::time_t modifyTime) const
 {
-    if (!IsTimeout() && IsValidData(data) && !IsNeedUpdate(data)) return false;
+    const std::time_t now = std::time(nullptr);
+    return now == -1 || std::difftime(now, modifyTime) > static_cast<double>(timeout);
+}
+
+// What GetMaxUpdateTime() says. A file that is known is not read for it.
+int Cache::LongestRefresh() const
+{
+    const KnownFile& file = knownFile;
+    struct stat status {};
+    const bool known = ::stat(cachedPath.c_str(), &status) == 0 && file.device == status.st_dev &&
+                       file.inode == status.st_ino && file.size == status.st_size &&
+                       IsSame(file.modified, status.st_mtim) &&
+                       IsSame(file.changed, status.st_ctim);
+    return known ? file.longestRefresh : GetMaxUpdateTime();
+}
+
+// Whether stale data gives way to what a refresh has left, or is in the making.
+bool Cache::GivesWay(const char* function, const Json::Value& data, std::time_t modifyTime) const
+{
+    if (!IsTooOld(modifyTime) && IsValidData(data) && !IsNeedUpdate(data)) return false;
     if (Update()) return true;
     DR_LOG_AS(function, Debug, "Failed to update cache [%s], use old cache data.",
               toString(GetInfo()).c_str());

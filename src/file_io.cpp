@@ -140,7 +140,8 @@ bool WriteAll(int fd, std::string_view text)
     return true;
 }
 
-bool ReplaceFile(const std::string& path, std::string_view text, std::optional<mode_t> mode)
+bool ReplaceFile(const std::string& path, std::string_view text, std::optional<mode_t> mode,
+                 struct stat* made)
 {
     struct stat old {};
     if (!mode && ::stat(path.c_str(), &old) == 0) mode = old.st_mode & PermissionBits;
@@ -148,7 +149,11 @@ bool ReplaceFile(const std::string& path, std::string_view text, std::optional<m
     std::string temporary = path;
     const FileDescriptor file = MakeTemporary(temporary, mode ? OwnerOnly : NewFileMode);
     if (!file.IsOpen()) return false;
-    if (Complete(file, text, mode, temporary, path)) return true;
+    if (Complete(file, text, mode, temporary, path)) {
+        // Of the open file: the name may be another's by now.
+        if (made != nullptr && ::fstat(file.Get(), made) < 0) *made = {};
+        return true;
+    }
 
     const int error = errno;
     ::unlink(temporary.c_str());

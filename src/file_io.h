@@ -4,6 +4,7 @@
 #define ORVADRCORE_SRC_FILE_IO_H
 
 #include <fcntl.h>
+#include <sys/stat.h>
 
 #include <optional>
 #include <string>
@@ -46,8 +47,10 @@ bool WriteAll(int fd, std::string_view text);
 // `path` + ".orvadr-tmp0", 1 and so on, for as many writers as there are at once; a name without
 // room for that is cut. A writer holds a lock on its own as long as it lives, so that what a killed
 // one left is known and removed by the next.
+//
+// What the file system says of the new file goes into `made`, if given.
 bool ReplaceFile(const std::string& path, std::string_view text,
-                 std::optional<mode_t> mode = std::nullopt);
+                 std::optional<mode_t> mode = std::nullopt, struct stat* made = nullptr);
 
 }  // namespace OrvaDRCore
 

@@ -79,9 +79,9 @@ bool fromFile(Json::Value& value, const std::string& path)
     return file.IsOpen() && ReadAll(file.Get(), text) && fromString(value, text);
 }
 
-bool toFile(const Json::Value& value, const std::string& path)
+bool toFile(const Json::Value& value, const std::string& path, struct stat* made)
 {
-    return ReplaceFile(path, toString(value));
+    return ReplaceFile(path, toString(value), std::nullopt, made);
 }
 
 const Json::Value* FindMember(const Json::Value& object, const char* key)

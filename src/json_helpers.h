@@ -3,6 +3,8 @@
 #ifndef ORVADRCORE_SRC_JSON_HELPERS_H
 #define ORVADRCORE_SRC_JSON_HELPERS_H
 
+#include <sys/stat.h>
+
 #include <string>
 
 #include <json/value.h>
@@ -22,8 +24,8 @@ std::string toString(const Json::Value& value);
 bool fromFile(Json::Value& value, const std::string& path);
 
 // Replaces a file by the document, whole: see ReplaceFile. False with errno set; the old file is as
-// it was then.
-bool toFile(const Json::Value& value, const std::string& path);
+// it was then. What the file system says of the new file goes into `made`, if given.
+bool toFile(const Json::Value& value, const std::string& path, struct stat* made = nullptr);
 
 // The member `key` of an object; null when it is absent, when `object` is no object and when `key`
 // is null. The pointer is good until `object` changes.

@@ -199,8 +199,11 @@ class ORVADRCORE_API Cache {
   private:
     ORVADRCORE_LOCAL std::string PidPath() const;
     ORVADRCORE_LOCAL std::string LockName() const;
-    ORVADRCORE_LOCAL const Json::Value& LoadedData() const;
-    ORVADRCORE_LOCAL bool GivesWay(const char* function, const Json::Value& data) const;
+    ORVADRCORE_LOCAL const Json::Value& LoadedData(std::time_t& modifyTime) const;
+    ORVADRCORE_LOCAL bool GivesWay(const char* function, const Json::Value& data,
+                                   std::time_t modifyTime) const;
+    ORVADRCORE_LOCAL bool IsTooOld(std::time_t modifyTime) const;
+    ORVADRCORE_LOCAL int LongestRefresh() const;
     bool IsUpdating() const;
     bool SetUpdating() const;
     void UnsetUpdating() const;
@@ -214,6 +217,18 @@ class ORVADRCORE_API Cache {
     int retryLimit;
     mutable Json::Value cachedData;
     mutable std::time_t loadedModifyTime = -1;
+
+    // The file that was loaded or written last, as the file system tells files apart, and the
+    // longest refresh that it speaks of. No file has a size below 0.
+    struct KnownFile {
+        unsigned long device = 0;
+        unsigned long inode = 0;
+        long size = -1;
+        std::timespec modified{};
+        std::timespec changed{};
+        int longestRefresh = 0;
+    };
+    mutable KnownFile knownFile;
 };
 
 }  // namespace OrvaDRCore

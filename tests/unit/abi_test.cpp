@@ -170,7 +170,8 @@ TEST(MemberTest, LocksAndCachesKeepTheirOrder)
     ExpectInOrder(0, {offsetof(FileLock, fd), offsetof(FileLock, path)});
     ExpectInOrder(BehindTable, {offsetof(Cache, cachedPath), offsetof(Cache, timeout),
                                 offsetof(Cache, updatedDataRequired), offsetof(Cache, retryLimit),
-                                offsetof(Cache, cachedData), offsetof(Cache, loadedModifyTime)});
+                                offsetof(Cache, cachedData), offsetof(Cache, loadedModifyTime),
+                                offsetof(Cache, knownFile)});
 }
 
 TEST(MemberTest, RequestsAndResponsesKeepTheirOrder)

@@ -599,6 +599,22 @@ TEST_F(CacheTest, ReadGivesWhatIsThereAfterTheRefresh)
     ExpectLines({Start(), Finish()});
 }
 
+TEST_F(CacheTest, FreshDataInMemoryTakesOneLookAtTheFile)
+{
+    WriteCache("data");
+    EXPECT_EQ(cache.Read(), "data");
+    std::size_t looks = 0;
+    faults.stat = [&](const char* name, struct stat* status) {
+        if (name == path) ++looks;
+        return RealStat(name, status);
+    };
+    EXPECT_EQ(cache.Read(), "data");
+    EXPECT_EQ(looks, 1U);
+    EXPECT_EQ(cache.View(), "data");
+    EXPECT_EQ(looks, 2U);
+    EXPECT_EQ(CountOpened(path), 1U);
+}
+
 // ------------------------------------------------------------------------------------------- View
 
 TEST_F(CacheTest, AViewOfFreshDataIsTheDataInMemory)

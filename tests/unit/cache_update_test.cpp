@@ -290,6 +290,89 @@ TEST_F(CacheUpdateTest, TheLongestRefreshIsKeptAndRaised)
     }
 }
 
+TEST_F(CacheUpdateTest, TheFileThatTheObjectHasWrittenItselfIsNotReadForTheLongestRefresh)
+{
+    EXPECT_TRUE(cache.UpdateWithData("data", 100, 107));
+    ForgetOpened();
+    EXPECT_TRUE(cache.UpdateWithData("other", 100, 103));
+    EXPECT_TRUE(cache.UpdateWithData("last"));
+    EXPECT_EQ(CountOpened(path), 0U);
+    EXPECT_EQ(Document()["max_updated_time"], 7);
+}
+
+TEST_F(CacheUpdateTest, TheFileThatTheObjectHasLoadedIsNotReadForTheLongestRefresh)
+{
+    WriteFile(path, R"({"cached_data":"data","max_updated_time":7})");
+    long age = 10;
+    faults.stat = [&](const char* name, struct stat* status) {
+        const int result = RealStat(name, status);
+        status->st_ctim.tv_sec -= age;
+        return result;
+    };
+    EXPECT_TRUE(cache.Load());
+    ForgetOpened();
+    EXPECT_TRUE(cache.UpdateWithData("other"));
+    EXPECT_EQ(CountOpened(path), 0U);
+    EXPECT_EQ(Document()["max_updated_time"], 7);
+
+    // Of a file that has just been written the file system's clock may not tell the next change.
+    age = 0;
+    EXPECT_TRUE(cache.Load());
+    ForgetOpened();
+    EXPECT_TRUE(cache.UpdateWithData("last"));
+    EXPECT_EQ(CountOpened(path), 1U);
+}
+
+TEST_F(CacheUpdateTest, TheLongestRefreshIsTakenFromWhateverElseTheFileIsByNow)
+{
+    struct Row {
+        const char* what;
+        std::function<void()> change;
+        int longest;
+    };
+    const std::string text =
+        R"({"begin_time_to_update":0,"cached_data":"data","finish_time_to_update":0,)"
+        R"("info":"test cache","max_updated_time":9,"timeout":60,"updated_time":0.0})";
+    const std::vector<Row> table = {
+        {"another object's", [&] { EXPECT_TRUE(Another(false).UpdateWithData("data", 100, 109)); },
+         9},
+        {"written in place", [&] { WriteFile(path, text); }, 9},
+        {"replaced, with the same size and time",
+         [&] {
+             struct stat status {};
+             EXPECT_EQ(::stat(path.c_str(), &status), 0);
+             WriteFile(dir.File("new"), text);
+             SetModifyTime(dir.File("new"), status.st_mtim.tv_sec, status.st_mtim.tv_nsec);
+             std::filesystem::rename(dir.File("new"), path);
+         },
+         9},
+        {"gone", [&] { EXPECT_EQ(cache.Remove(), 0); }, 0},
+        {"garbage", [&] { WriteFile(path, "garbage"); }, 0},
+        {"without it", [&] { WriteCache("data"); }, 0},
+    };
+    for (const Row& row : table) {
+        SCOPED_TRACE(row.what);
+        cache.Remove();
+        EXPECT_TRUE(cache.UpdateWithData("data", 100, 105));
+        EXPECT_TRUE(cache.UpdateWithData("data"));
+        EXPECT_EQ(Document()["max_updated_time"], 5);
+        EXPECT_EQ(std::filesystem::file_size(path), text.size());
+        row.change();
+        EXPECT_TRUE(cache.UpdateWithData("data"));
+        EXPECT_EQ(Document()["max_updated_time"], row.longest);
+    }
+}
+
+TEST_F(CacheUpdateTest, AWriteThatFailsIsNotTheFileThatIsKnown)
+{
+    EXPECT_TRUE(cache.UpdateWithData("data", 100, 105));
+    faults.rename = Failing(EROFS);
+    EXPECT_FALSE(cache.UpdateWithData("data", 100, 109));
+    faults.rename = nullptr;
+    EXPECT_TRUE(cache.UpdateWithData("data"));
+    EXPECT_EQ(Document()["max_updated_time"], 5);
+}
+
 TEST_F(CacheUpdateTest, InvalidDataIsRefusedAndLeavesTheFile)
 {
     cache.isValid = [](const Json::Value& data) { return data.isString(); };

@@ -615,6 +615,24 @@ TEST_F(ReplaceFileTest, ALeftOverWhoseNameALiveWriterHasTakenMeanwhileIsNotRemov
     EXPECT_EQ(ReadFile(path), "text");
 }
 
+TEST_F(ReplaceFileTest, WhatIsToldOfTheNewFileIsTrueOfItAlsoWhenItsNameIsAnothersByNow)
+{
+    struct stat made {};
+    ino_t inode = 0;
+    faults.rename = [&](const char* from, const char* to) {
+        inode = InodeOf(from);
+        const int result = RealRename(from, to);
+        WriteFile(dir.File("another"), "another's");
+        EXPECT_EQ(RealRename(dir.File("another").c_str(), to), 0);
+        return result;
+    };
+    EXPECT_TRUE(ReplaceFile(path, "new", 0640, &made));
+    EXPECT_EQ(made.st_ino, inode);
+    EXPECT_EQ(made.st_size, 3);
+    EXPECT_EQ(made.st_mode & 07777, 0640U);
+    EXPECT_NE(InodeOf(path), inode);
+}
+
 // --------------------------------------------------------------------------- ReplaceFile: failures
 
 struct Fault {
