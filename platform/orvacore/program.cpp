@@ -3,6 +3,10 @@
 // the results of SIGCHLD children away when the caller ignores that signal, and a handler of the
 // caller's may fetch them before we do; of a child without a signal neither holds. The program
 // cannot be such a child itself: execve() makes SIGCHLD the signal of whoever calls it.
+//
+// The one between is forked, which takes the longer the more memory the caller has. It cannot live
+// in the caller's memory as long as the program runs: it would share the C library's state with the
+// thread that it came from. Its own child does live in its memory until it is the program.
 #include <orvacore/orvacore.h>
 
 #include <fcntl.h>
@@ -117,7 +121,8 @@ int StartProgram(const Start& start, pid_t& program)
 {
     std::array<int, 2> pipe{};  // closed by the start of the program
     if (::pipe2(pipe.data(), O_CLOEXEC) < 0) return errno;
-    program = ForkSilently();
+    // The child makes system calls only, and this process stands still until it is the program.
+    program = ::vfork();  // NOLINT(clang-analyzer-security.insecureAPI.vfork)
     if (program < 0) return errno;
     if (program == 0) BecomeProgram(start, pipe[1]);
     ::close(pipe[1]);
