@@ -22,7 +22,7 @@ namespace {
 using OrvaDRCore::Extraction;
 using OrvaDRCore::File;
 
-constexpr int Texts = 30'000;
+constexpr int Texts = 10'000;
 
 template <class Value>
 Value FromStream(const std::string& text, Value value)
