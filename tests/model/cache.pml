@@ -409,7 +409,7 @@ ltl { <>[]((fresh || !HasProcess(mark)) && !Exclusive) -> Ends }
 #ifdef CHECK_READ_ENDS_WITH_REFRESHES
 ltl { (<>retired && <>[](!IsUpdater(1) && !IsUpdater(2) && !IsUpdater(3))) -> Ends }
 #endif
-/* When the data is fresh again and again. */
+/* When the data is fresh again and again, and it looks again and again. */
 #ifdef CHECK_READ_ENDS_BY_FRESH_MOMENTS
-ltl { []<>fresh -> Ends }
+ltl { ([]<>fresh && []<>(at[1] == WaitSeen)) -> Ends }
 #endif
