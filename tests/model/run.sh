@@ -119,8 +119,8 @@ judge_all() {
 
 # Prints what changes in each step of the last search's trail.
 tell() {
-    local trails=("$folder"/*.trail)
-    spin "${@/#/-D}" -k "${trails[0]}" -t -p -g "$model" 2>/dev/null | awk '
+    cd "$folder" # where spin leaves a file of its own
+    spin "${@/#/-D}" -k ./*.trail -t -p -g "$model" 2>/dev/null | awk '
         NR == FNR {
             if ($0 ~ /^#define [A-Z][A-Za-z]* [0-9]+( |$)/) name[$3] = $2
             next
