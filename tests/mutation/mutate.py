@@ -1,0 +1,349 @@
+#!/usr/bin/env python3
+"""Puts small faults into src/, one at a time, and tells those that no test notices.
+
+Works in copies of the tree, build/mutation/0 and so on, one for each worker. A fault is met by the
+unit tests of its source, then by all unit tests, then by the quick process tests; the first failure
+catches it, and so does a time-out. A fault that does not compile is not counted. Faults that change
+nothing that could be seen are listed, with the reason, in tests/mutation/accepted.txt.
+"""
+
+import argparse
+import collections
+import ctypes
+import json
+import multiprocessing
+import os
+import queue
+import re
+import resource
+import shutil
+import signal
+import subprocess
+import sys
+import tempfile
+import time
+from pathlib import Path
+
+sys.dont_write_bytecode = True  # the tree stays as it is
+import faults  # noqa: E402
+
+ROOT = Path(__file__).resolve().parents[2]
+WORK = ROOT / "build" / "mutation"
+ACCEPTED = ROOT / "tests" / "mutation" / "accepted.txt"
+NOBODY = 65534
+CHUNK = 10  # faults that a worker takes at once
+SHARDS = 2  # processes of one test run
+QUICK_SECONDS = 1.0  # what a process test may take to be run here
+FOLDERS = ["cmake", "docs", "examples", "include", "platform", "src", "tests"]
+MIB = 1 << 20
+PR_SET_CHILD_SUBREAPER = 36
+
+
+Result = collections.namedtuple("Result", "source line before after caught_by")
+
+
+def become_subreaper():
+    """Processes that lose their parents become this one's children."""
+    ctypes.CDLL(None).prctl(PR_SET_CHILD_SUBREAPER, 1, 0, 0, 0)
+
+
+def descendants():
+    """This process's children and theirs, those that lost their parents included."""
+    parents = {}
+    for stat in Path("/proc").glob("[0-9]*/stat"):
+        try:
+            fields = stat.read_text().rpartition(")")[2].split()
+        except OSError:
+            continue
+        parents.setdefault(int(fields[1]), []).append(int(stat.parent.name))
+    found = [os.getpid()]
+    for pid in found:
+        found += parents.get(pid, [])
+    return found[1:]
+
+
+def end_descendants():
+    """A faulty child may have left its process group; it comes back to the subreaper."""
+    while pids := descendants():
+        for pid in pids:
+            try:
+                os.kill(pid, signal.SIGKILL)
+            except ProcessLookupError:
+                pass
+        try:
+            os.waitpid(-1, 0)
+        except ChildProcessError:
+            pass
+
+
+def set_limits():
+    """A faulty program may neither fill the machine nor run on."""
+    resource.setrlimit(resource.RLIMIT_CPU, (300, 300))
+    resource.setrlimit(resource.RLIMIT_AS, (4096 * MIB, 4096 * MIB))
+    resource.setrlimit(resource.RLIMIT_FSIZE, (1024 * MIB, 1024 * MIB))
+    resource.setrlimit(resource.RLIMIT_CORE, (0, 0))
+    resource.setrlimit(resource.RLIMIT_NPROC, (4096, 4096))
+
+
+class Tests:
+    """Some tests of one program, run by `SHARDS` processes."""
+
+    def __init__(self, name, program, chosen, seconds):
+        self.name = name
+        self.program = program
+        self.chosen = chosen
+        self.limit = 5 * seconds + 20
+
+    def fail_in(self, build):
+        """What shows that they fail: their name or "time-out"; an empty text when they pass."""
+        # In a directory of their own and not as root: a faulty path may be removed.
+        scratch = tempfile.mkdtemp(prefix="orvadr-mutation-")
+        os.chmod(scratch, 0o777)
+        try:
+            return self.outcome([self.start(build, scratch, shard) for shard in range(SHARDS)])
+        finally:
+            end_descendants()
+            shutil.rmtree(scratch, ignore_errors=True)
+
+    def start(self, build, scratch, shard):
+        rights = dict(user=NOBODY, group=NOBODY, extra_groups=[]) if os.geteuid() == 0 else {}
+        environment = dict(os.environ, TMPDIR=scratch, HOME=scratch, GTEST_FILTER=self.chosen,
+                           GTEST_TOTAL_SHARDS=str(SHARDS), GTEST_SHARD_INDEX=str(shard))
+        with open(build.with_name(f"tests-{shard}.log"), "wb") as log:
+            return subprocess.Popen(
+                [build / "tests" / self.program, "--gtest_fail_fast"], cwd=scratch, env=environment,
+                stdin=subprocess.DEVNULL, stdout=log, stderr=log, start_new_session=True,
+                preexec_fn=set_limits, **rights)
+
+    def outcome(self, started):
+        end = time.monotonic() + self.limit
+        while time.monotonic() < end:
+            codes = [process.poll() for process in started]
+            if any(codes):
+                return self.name
+            if None not in codes:
+                return ""
+            time.sleep(0.01)
+        return "time-out"
+
+
+class Copy:
+    """A copy of the tree, in which faults are put, and its build."""
+
+    def __init__(self, number):
+        self.tree = WORK / str(number) / "tree"
+        self.build = WORK / str(number) / "build"
+
+    def update(self):
+        tops = [ROOT / "CMakeLists.txt"] + [ROOT / name for name in FOLDERS]
+        files = [path for top in tops for path in [top, *top.rglob("*")] if path.is_file()]
+        wanted = {self.tree / path.relative_to(ROOT): path for path in files}
+        for path in self.tree.rglob("*"):
+            if path.is_file() and path not in wanted:
+                path.unlink()
+        for path, source in wanted.items():
+            content = source.read_bytes()
+            if not path.exists() or path.read_bytes() != content:
+                path.parent.mkdir(parents=True, exist_ok=True)
+                path.write_bytes(content)
+                shutil.copymode(source, path)
+
+    def prepare(self):
+        self.update()
+        if not (self.command("cmake", "-S", self.tree, "-B", self.build,
+                             "-DCMAKE_BUILD_TYPE=Debug", "-DCMAKE_CXX_FLAGS_DEBUG=-O0 -w",
+                             "-DORVADR_PRECOMPILE=ON")
+                and self.make("unit_tests", "process_tests")):
+            sys.exit(f"error: the build fails without a fault; see {self.build}.log")
+
+    def make(self, *targets):
+        return self.command("cmake", "--build", self.build, "--target", *targets)
+
+    def command(self, *command):
+        with open(self.build.with_suffix(".log"), "wb") as log:
+            return subprocess.run(command, stdin=subprocess.DEVNULL, stdout=log, stderr=log,
+                                  check=False).returncode == 0
+
+    def meet(self, source, text, fault, stages):
+        """What catches the fault: "" when nothing does, None when it does not compile."""
+        (self.tree / source).write_text(fault.apply(text))
+        for tests in stages:
+            if not self.make(tests.program):
+                return None
+            if outcome := tests.fail_in(self.build):
+                return outcome
+        return ""
+
+
+def durations(build, program):
+    """The seconds that each test takes; all must pass as long as there is no fault."""
+    if Tests(program, program, "*", 120).fail_in(build):
+        sys.exit(f"error: {program} fail without a fault; see {build.parent}/tests-*.log")
+    output = "".join(log.read_text(errors="replace") for log in build.parent.glob("tests-*.log"))
+    found = re.findall(r"\[       OK \] ([^\s,]+)[^\n]* \((\d+) ms\)$", output, re.M)
+    return {name: int(milliseconds) / 1000 for name, milliseconds in found}
+
+
+def suites_of(source):
+    """The suites of a source's own tests: those of NAME_test.cpp and of NAME_..._test.cpp."""
+    files = (ROOT / "tests" / "unit").glob(f"{Path(source).stem}_*test.cpp")
+    return {suite for file in files
+            for suite in re.findall(r"^(?:TYPED_)?TEST(?:_[FP])?\((\w+),", file.read_text(), re.M)}
+
+
+def stages_of(source, unit, process):
+    """The tests that a fault of this source meets, one after the other."""
+    suites = suites_of(source)
+    own = {name: took for name, took in unit.items() if suites & set(re.split("[./]", name))}
+    quick = {name: took for name, took in process.items() if took <= QUICK_SECONDS}
+    if own:
+        yield Tests("own tests", "unit_tests", ":".join(own), sum(own.values()))
+    yield Tests("unit tests", "unit_tests", "*", sum(unit.values()))
+    yield Tests("process tests", "process_tests", ":".join(quick), sum(quick.values()))
+
+
+def shares(count, sizes):
+    """Divides `count` by the sizes; each gets one at least."""
+    whole = sum(sizes.values())
+    return {name: max(1, round(count * size / whole)) for name, size in sizes.items()}
+
+
+def plan(arguments):
+    """What the workers do: sources with some of their faults and how many of these to try."""
+    chosen = arguments.sources or sorted(
+        str(path.relative_to(ROOT)) for path in (ROOT / "src").glob("*.[ch]*"))
+    found = {source: faults.find((ROOT / source).read_text(), f"{arguments.seed} {source}")
+             for source in chosen}
+    found = {source: some for source, some in found.items() if some}
+    jobs = []
+    wanted = shares(arguments.count, {source: len(some) for source, some in found.items()})
+    for source, some in found.items():
+        parts = -(-wanted[source] // CHUNK)
+        quota = -(-wanted[source] // parts)
+        jobs += [(source, some[part::parts], min(quota, wanted[source] - part * quota))
+                 for part in range(parts)]
+    return jobs
+
+
+def known(path):
+    """The faults that an earlier run of the same sources caught."""
+    if not path.exists():
+        return {}
+    results = [Result(*json.loads(line)) for line in path.read_text().splitlines()]
+    return {(result.source, result.line, result.before, result.after): result.caught_by
+            for result in results if result.caught_by != ""}
+
+
+def work(number, jobs, results, unit, process, caught_before):
+    become_subreaper()
+    copy = Copy(number)
+    copy.prepare()
+    while (job := jobs.get()) is not None:
+        source, some, quota = job
+        text = (ROOT / source).read_text()
+        stages = list(stages_of(source, unit, process))
+        for fault in some:
+            if quota == 0:
+                break
+            key = (source, fault.line(text), *fault.change(text))
+            outcome = caught_before.get(key, "")
+            if outcome == "":
+                outcome = copy.meet(source, text, fault, stages)
+            quota -= outcome is not None
+            results.put(Result(*key, outcome))
+        (copy.tree / source).write_text(text)
+    results.put(None)
+
+
+def run(arguments, unit, process):
+    """Gives the faults that compile, each with what caught it."""
+    record = WORK / "results.jsonl"
+    caught_before = known(record) if arguments.resume else {}
+    jobs, results = multiprocessing.Queue(), multiprocessing.Queue()
+    planned = plan(arguments)
+    for job in planned + [None] * arguments.jobs:
+        jobs.put(job)
+    workers = [multiprocessing.Process(target=work, args=(number, jobs, results, unit, process,
+                                                          caught_before))
+               for number in range(arguments.jobs)]
+    for worker in workers:
+        worker.start()
+    total = sum(job[2] for job in planned)
+    found = []
+    with open(record, "a" if arguments.resume else "w", encoding="utf-8") as log:
+        while any(worker.is_alive() for worker in workers) or not results.empty():
+            try:
+                result = results.get(timeout=1)
+            except queue.Empty:
+                continue
+            if result is None:
+                continue
+            print(json.dumps(result), file=log, flush=True)
+            if result.caught_by is not None:
+                found.append(result)
+                print(f"{len(found)}/{total} {result.source}:{result.line}: "
+                      f"{result.caught_by or 'SURVIVES: ' + result.after}", flush=True)
+    if any(worker.exitcode != 0 for worker in workers):
+        sys.exit("error: a worker failed")
+    return found
+
+
+def accepted_faults():
+    """From blocks of lines: "src/NAME", "- BEFORE", "+ AFTER", then the reason, indented."""
+    block = re.compile(r"^(src/\S+)\n- (.*)\n\+ (.*)\n((?:  .*\n)+)", re.M)
+    return {match.group(1, 2, 3): " ".join(match.group(4).split())
+            for match in block.finditer(ACCEPTED.read_text())}
+
+
+def report(found):
+    """Prints the table and the survivors; gives the percentage that was caught."""
+    accepted = accepted_faults()
+    rows = collections.defaultdict(collections.Counter)
+    survivors = []
+    for result in found:
+        state = "caught"
+        if result.caught_by == "":
+            key = (result.source, result.before, result.after)
+            state = "accepted" if key in accepted else "survived"
+            survivors.append((result, accepted.get(key)))
+        rows[result.source][state] += 1
+        rows["all"][state] += 1
+    print(f"\n{'source':30}{'caught':>9}{'survived':>9}{'accepted':>9}{'score':>9}")
+    for source in sorted(rows, key=lambda source: (source == "all", source)):
+        row = rows[source]
+        score = 100 * row["caught"] / max(1, row["caught"] + row["survived"])
+        print(f"{source:30}{row['caught']:9}{row['survived']:9}{row['accepted']:9}{score:8.1f}%")
+    for result, reason in survivors:
+        print(f"\n{result.source}:{result.line}: {'accepted' if reason else 'survived'}\n"
+              f"- {result.before}\n+ {result.after}" + (f"\n  {reason}" if reason else ""))
+    print("\ncaught by", *(f"{name}: {count}" for name, count in collections.Counter(
+        result.caught_by for result in found if result.caught_by).most_common()), sep=", ")
+    return score
+
+
+def main():
+    parser = argparse.ArgumentParser(description=__doc__,
+                                     formatter_class=argparse.RawDescriptionHelpFormatter)
+    parser.add_argument("--count", type=int, default=300, help="how many faults (300)")
+    parser.add_argument("--seed", type=int, default=1, help="which faults (1)")
+    parser.add_argument("--jobs", type=int, default=os.cpu_count(), help="how many workers")
+    parser.add_argument("--minimum", type=float, default=95, help="percent to be caught (95)")
+    parser.add_argument("--resume", action="store_true",
+                        help="go on where a run stopped; try survivors again")
+    parser.add_argument("sources", nargs="*", help="such as src/utils.cpp; without: all")
+    arguments = parser.parse_args()
+
+    begin = time.monotonic()
+    become_subreaper()
+    WORK.mkdir(parents=True, exist_ok=True)
+    first = Copy(0)
+    first.prepare()
+    unit = durations(first.build, "unit_tests")
+    process = durations(first.build, "process_tests")
+    score = report(run(arguments, unit, process))
+    print(f"seed {arguments.seed}, {time.monotonic() - begin:.0f} s: {score:.1f} %")
+    sys.exit(score < arguments.minimum)
+
+
+if __name__ == "__main__":
+    main()
