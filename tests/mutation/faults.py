@@ -13,6 +13,7 @@ LITERAL_OR_COMMENT = re.compile(
 NOT_CODE = re.compile(r"^#(?!define \w+\().*$", re.M)
 # In a text these stay whole: escapes and conversions.
 UNIT = re.compile(r"\\[0-7]{1,3}|\\.|%[-+ #0-9.*hlz]*[a-zA-Z%]|.", re.S)
+SHORT_LINE = 30
 BEFORE_CONDITION = re.compile(r"[,;?]|(?<![=!<>])= ")
 NUMBER = re.compile(r"(?<![\w.])(0x[0-9a-fA-F]+|\d+)(\.\d+)?([uUlL]*)(?![\w.])")
 LEVEL = re.compile(r"\bDR_LOG(?:_AS)?\((?:[\w\"]+, )?(Err|Warn|Notice|Info|Debug)\b")
@@ -48,9 +49,14 @@ class Fault:
         return text.count("\n", 0, self.begin) + 1
 
     def change(self, text):
-        """The lines that it changes, before and after, with single blanks."""
+        """The lines that it changes, before and after, with single blanks.
+
+        A short line, of which there may be several, comes with the line in front of it.
+        """
         begin = text.rfind("\n", 0, self.begin) + 1
         end = text.find("\n", self.end)
+        if len(text[begin:end].strip()) < SHORT_LINE:
+            begin = text.rfind("\n", 0, max(0, begin - 1)) + 1
         after = text[begin:self.begin] + self.new + text[self.end:end]
         return " ".join(text[begin:end].split()), " ".join(after.split())
 

@@ -282,7 +282,7 @@ def run(arguments, unit, process):
             if result.caught_by is not None:
                 found.append(result)
                 print(f"{len(found)}/{total} {result.source}:{result.line}: "
-                      f"{result.caught_by or 'SURVIVES: ' + result.after}", flush=True)
+                      f"{result.caught_by or 'survives'}", flush=True)
     if any(worker.exitcode != 0 for worker in workers):
         sys.exit("error: a worker failed")
     return found
@@ -291,13 +291,16 @@ def run(arguments, unit, process):
 def accepted_faults():
     """From blocks of lines: "src/NAME", "- BEFORE", "+ AFTER", then the reason, indented."""
     block = re.compile(r"^(src/\S+)\n- (.*)\n\+ (.*)\n((?:  .*\n)+)", re.M)
-    return {match.group(1, 2, 3): " ".join(match.group(4).split())
-            for match in block.finditer(ACCEPTED.read_text())}
+    found = {match.group(1, 2, 3): " ".join(match.group(4).split())
+             for match in block.finditer(ACCEPTED.read_text())}
+    for source, before, _ in found:
+        if before not in " ".join((ROOT / source).read_text().split()):
+            sys.exit(f"error: what {ACCEPTED} says of {source} is not there any more: {before}")
+    return found
 
 
-def report(found):
+def report(found, accepted):
     """Prints the table and the survivors; gives the percentage that was caught."""
-    accepted = accepted_faults()
     rows = collections.defaultdict(collections.Counter)
     survivors = []
     for result in found:
@@ -316,8 +319,8 @@ def report(found):
     for result, reason in survivors:
         print(f"\n{result.source}:{result.line}: {'accepted' if reason else 'survived'}\n"
               f"- {result.before}\n+ {result.after}" + (f"\n  {reason}" if reason else ""))
-    print("\ncaught by", *(f"{name}: {count}" for name, count in collections.Counter(
-        result.caught_by for result in found if result.caught_by).most_common()), sep=", ")
+    means = collections.Counter(result.caught_by for result in found if result.caught_by)
+    print("\ncaught by", ", ".join(f"{name}: {count}" for name, count in means.most_common()))
     return score
 
 
@@ -334,13 +337,14 @@ def main():
     arguments = parser.parse_args()
 
     begin = time.monotonic()
+    accepted = accepted_faults()
     become_subreaper()
     WORK.mkdir(parents=True, exist_ok=True)
     first = Copy(0)
     first.prepare()
     unit = durations(first.build, "unit_tests")
     process = durations(first.build, "process_tests")
-    score = report(run(arguments, unit, process))
+    score = report(run(arguments, unit, process), accepted)
     print(f"seed {arguments.seed}, {time.monotonic() - begin:.0f} s: {score:.1f} %")
     sys.exit(score < arguments.minimum)
 
