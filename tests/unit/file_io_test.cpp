@@ -716,6 +716,36 @@ TEST_F(ReplaceFileTest, ANameOfFullLengthIsReplaced)
     EXPECT_EQ(NamesIn(dir.Path()).size(), 1U);
 }
 
+// Each writer begins while the one before it writes.
+TEST_F(ReplaceFileTest, ANameOfFullLengthServesAsManyWritersAsAnyOther)
+{
+    const std::string longest = dir.File(std::string(NAME_MAX, 'n'));
+    std::size_t writers = 0;
+    faults.write = [&](int fd, const void* buffer, std::size_t size) {
+        if (++writers < MaxWriters) {
+            EXPECT_TRUE(ReplaceFile(longest, "text"));
+        }
+        return RealWrite(fd, buffer, size);
+    };
+    EXPECT_TRUE(ReplaceFile(longest, "text"));
+    EXPECT_EQ(writers, MaxWriters);
+    EXPECT_EQ(ReadFile(longest), "text");
+    EXPECT_EQ(NamesIn(dir.Path()).size(), 1U);
+}
+
+TEST_F(ReplaceFileTest, ANameWithRoomForTheTemporarysSuffixIsNotCut)
+{
+    const std::size_t room = std::string(".orvadr-tmp63").size();
+    const std::string file = dir.File(std::string(NAME_MAX - room, 'n'));
+    std::string used;
+    faults.rename = [&](const char* from, const char* to) {
+        used = from;
+        return RealRename(from, to);
+    };
+    EXPECT_TRUE(ReplaceFile(file, "text"));
+    EXPECT_EQ(used, file + ".orvadr-tmp0");
+}
+
 TEST_F(ReplaceFileTest, AFailureMakesNoFileWhereNoneWas)
 {
     faults.write = Failing(ENOSPC);
