@@ -2,17 +2,22 @@
 
 #include <signal.h>
 #include <sys/ptrace.h>
+#include <sys/uio.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <cstdlib>
+#include <map>
+#include <set>
 
 namespace {
 
 constexpr unsigned int DeadlineSeconds = 60;  // ends a child that hangs, and so the wait for it
 
 constexpr int SystemCallStop = SIGTRAP | 0x80;
+constexpr int UsualOptions = PTRACE_O_EXITKILL | PTRACE_O_TRACESYSGOOD;
 constexpr int StartEvents = PTRACE_O_TRACEFORK | PTRACE_O_TRACEVFORK | PTRACE_O_TRACECLONE;
 
 bool Trace(__ptrace_request request, pid_t pid, long data)
@@ -25,6 +30,83 @@ int EventOf(int status)
 {
     return WIFSTOPPED(status) ? status >> 16 : 0;
 }
+
+// The process that a stop at one of the StartEvents tells of.
+pid_t ForkedBy(pid_t pid)
+{
+    unsigned long forked = 0;
+    return ::ptrace(PTRACE_GETEVENTMSG, pid, nullptr, &forked) == 0 ? static_cast<pid_t>(forked)
+                                                                    : -1;
+}
+
+SystemCall CallOf(pid_t pid)
+{
+    __ptrace_syscall_info info{};
+    if (::ptrace(PTRACE_GET_SYSCALL_INFO, pid, sizeof info, &info) <= 0) std::abort();
+    SystemCall call{};
+    call.hasEnded = info.op == PTRACE_SYSCALL_INFO_EXIT;
+    if (call.hasEnded) {
+        call.result = info.exit.rval;
+    } else {
+        call.number = info.entry.nr;
+        std::copy(std::begin(info.entry.args), std::end(info.entry.args), call.arguments.begin());
+    }
+    return call;
+}
+
+// A process and all that comes of its forks, of whom one is to be killed.
+class Family {
+  public:
+    Family(pid_t first, int member, int call)
+        : victim(static_cast<std::size_t>(member)), callsLeft(call)
+    {
+        Meet(first);
+    }
+
+    bool IsAlive() const { return !living.empty(); }
+    bool HasKilled() const { return killed; }
+
+    void Go(pid_t pid, int signal)
+    {
+        const bool isWatched = !killed && members.at(pid) == victim;
+        Trace(isWatched ? PTRACE_SYSCALL : PTRACE_CONT, pid, signal);
+    }
+
+    // A member has stopped or ended.
+    void Take(pid_t pid, int status)
+    {
+        if (!WIFSTOPPED(status)) {
+            living.erase(pid);  // told of once more where the killed left it behind unreaped
+            return;
+        }
+        Meet(pid);
+        const int event = EventOf(status);
+        const int signal = WSTOPSIG(status);
+        if (event != 0) {
+            Meet(ForkedBy(pid));  // itself, at the start of a program
+        } else if (signal == SystemCallStop && !CallOf(pid).hasEnded && --callsLeft == 0) {
+            killed = true;
+            ::kill(pid, SIGKILL);
+            return;
+        }
+        // A new member begins with a stop, which is not to last.
+        const bool isSent = event == 0 && signal != SystemCallStop && signal != SIGSTOP;
+        Go(pid, isSent ? signal : 0);
+    }
+
+  private:
+    // A fork is told of by both sides, in any order, and the forked may have ended by then.
+    void Meet(pid_t pid)
+    {
+        if (pid > 0 && members.emplace(pid, members.size()).second) living.insert(pid);
+    }
+
+    std::map<pid_t, std::size_t> members;  // also those who have ended
+    std::set<pid_t> living;
+    std::size_t victim;
+    int callsLeft;
+    bool killed = false;
+};
 
 }  // namespace
 
@@ -43,7 +125,7 @@ TracedProcess::TracedProcess(const std::function<void()>& body)
         }
         ::_exit(0);
     }
-    if (!Await(pid) || !Trace(PTRACE_SETOPTIONS, pid, PTRACE_O_EXITKILL | PTRACE_O_TRACESYSGOOD)) {
+    if (!Await(pid) || !Trace(PTRACE_SETOPTIONS, pid, UsualOptions)) {
         std::abort();
     }
 }
@@ -68,6 +150,48 @@ bool TracedProcess::Step()
     return true;
 }
 
+SystemCall TracedProcess::Call() const
+{
+    return CallOf(pid);
+}
+
+std::string TracedProcess::Memory(std::uint64_t address, std::size_t size) const
+{
+    std::string bytes(size, '\0');
+    iovec ours{bytes.data(), size};
+    void* const there = reinterpret_cast<void*>(address);  // NOLINT(performance-no-int-to-ptr)
+    iovec theirs{there, size};
+    const ssize_t count = ::process_vm_readv(pid, &ours, 1, &theirs, 1, 0);
+    bytes.resize(static_cast<std::size_t>(std::max<ssize_t>(count, 0)));
+    return bytes;
+}
+
+std::string TracedProcess::Text(std::uint64_t address) const
+{
+    std::string text;
+    for (std::string byte; !(byte = Memory(address + text.size(), 1)).empty() && byte[0] != '\0';) {
+        text += byte;
+    }
+    return text;
+}
+
+bool TracedProcess::KillBefore(int member, int call)
+{
+    // Without the event a new program would begin with a signal that ends it.
+    Trace(PTRACE_SETOPTIONS, pid, UsualOptions | PTRACE_O_TRACEEXEC | StartEvents);
+    Family family(pid, member, call);
+    family.Go(pid, 0);
+    while (family.IsAlive()) {
+        int news = 0;
+        const pid_t who = ::waitpid(-1, &news, __WALL);
+        if (who < 0 && errno != EINTR) std::abort();
+        if (who > 0) family.Take(who, news);
+        if (who == pid) status = news;
+    }
+    pid = -1;
+    return family.HasKilled();
+}
+
 pid_t TracedProcess::RunToStartedProgram()
 {
     Trace(PTRACE_SETOPTIONS, pid, PTRACE_O_EXITKILL | PTRACE_O_TRACEEXEC | StartEvents);
@@ -76,12 +200,10 @@ pid_t TracedProcess::RunToStartedProgram()
     while (Await(newest)) {
         const int event = EventOf(status);
         if (event == PTRACE_EVENT_EXEC) return newest;
-        unsigned long forked = 0;
-        const bool hasForked =
-            event != 0 && ::ptrace(PTRACE_GETEVENTMSG, newest, nullptr, &forked) == 0;
+        const pid_t forked = event != 0 ? ForkedBy(newest) : -1;
         // A process between the child and the program is let go: nobody here waits for its end.
-        Trace(hasForked && newest != pid ? PTRACE_DETACH : PTRACE_CONT, newest, 0);
-        if (hasForked) newest = static_cast<pid_t>(forked);
+        Trace(forked > 0 && newest != pid ? PTRACE_DETACH : PTRACE_CONT, newest, 0);
+        if (forked > 0) newest = forked;
     }
     return -1;
 }
