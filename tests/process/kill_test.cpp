@@ -1,6 +1,7 @@
 // An updater that is killed, wherever it stands, leaves a cache that the next reader can use.
 #include <gmock/gmock.h>
 #include <signal.h>
+#include <sys/file.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -8,19 +9,26 @@
 #include <filesystem>
 #include <fstream>
 #include <functional>
+#include <stdexcept>
 #include <string>
 #include <system_error>
 
+#include <orvadrcore/file_lock.h>
+
 #include "support/await.h"
 #include "support/child_process.h"
+#include "support/kills.h"
+#include "support/pauses.h"
 #include "support/process_test.h"
 #include "support/scale.h"
 #include "support/traced_process.h"
 
 namespace {
 
+using OrvaDRCore::FileLock;
 using ::testing::AnyOf;
 using ::testing::ElementsAre;
+using ::testing::IsEmpty;
 using ::testing::IsSubsetOf;
 
 constexpr int Old = 1;
@@ -40,10 +48,10 @@ class KillTest : public ProcessTest {
 
     // Lets `inspect` see what is left of a refresh that was killed, for one refresh after the
     // other, each killed at another of the beginnings and ends of its system calls.
-    void KillEverywhere(const Action& prepare, const Action& inspect);
+    void KillRefreshes(const Action& prepare, const Action& inspect);
 
     // The cache file holds the old document (or none) or the new one, and the next reader makes it
-    // a later one and leaves nothing else behind.
+    // a later one, waits for nobody and leaves nothing else behind.
     void ExpectRecovery(int old);
 
     // A process that never ends to produce; it tells when it has begun to.
@@ -73,7 +81,7 @@ int KillTest::CountStops()
     return stops;
 }
 
-void KillTest::KillEverywhere(const Action& prepare, const Action& inspect)
+void KillTest::KillRefreshes(const Action& prepare, const Action& inspect)
 {
     constexpr int UsualKills = 40;
     prepare();
@@ -97,7 +105,10 @@ void KillTest::ExpectRecovery(int old)
     const int found = NumberInFile();
     EXPECT_THAT(found, AnyOf(old, New));
     if (found != NoDocument) MakeStale();
+    EXPECT_TRUE(FileLock(LockName()).tryLock(LOCK_EX | LOCK_NB));
+    const Pauses pauses;
     EXPECT_EQ(NumberOf(MakeCache(Mode::Blocking, Gives(Later)).Read()), Later);
+    EXPECT_THAT(pauses.Taken(), IsEmpty());
     EXPECT_EQ(NumberInFile(), Later);
     EXPECT_THAT(Files(), ElementsAre("x.cached"));
 }
@@ -105,7 +116,7 @@ void KillTest::ExpectRecovery(int old)
 TEST_F(KillTest, ARefreshKilledAnywhereLeavesTheOldDocumentOrTheNewOne)
 {
     if (!HasLocks()) return;
-    KillEverywhere([this] { WriteStale(Old); }, [this] { ExpectRecovery(Old); });
+    KillRefreshes([this] { WriteStale(Old); }, [this] { ExpectRecovery(Old); });
 }
 
 TEST_F(KillTest, AFirstRefreshKilledAnywhereLeavesNoDocumentOrTheNewOne)
@@ -115,7 +126,19 @@ TEST_F(KillTest, AFirstRefreshKilledAnywhereLeavesNoDocumentOrTheNewOne)
         MakeCache(Mode::Blocking, nullptr).Remove();
         RemoveLocks();
     };
-    KillEverywhere(removeAll, [this] { ExpectRecovery(NoDocument); });
+    KillRefreshes(removeAll, [this] { ExpectRecovery(NoDocument); });
+}
+
+// The caller, the child that refreshes and the one between them, each in its turn.
+TEST_F(KillTest, ABackgroundRefreshOfWhichAnyProcessIsKilledIsFollowedByAnother)
+{
+    if (!HasLocks()) return;
+    const auto read = [this] {
+        // The old data, or the new where the child is quicker than its parent.
+        const int number = NumberOf(MakeCache(Mode::Background, Gives(New)).Read());
+        if (number != Old && number != New) throw std::runtime_error("no document");
+    };
+    KillEverywhere({[this] { WriteStale(Old); }, read, [this] { ExpectRecovery(Old); }});
 }
 
 TEST_F(KillTest, WhatKilledRefreshesLeaveBehindDoesNotPileUp)
@@ -125,7 +148,7 @@ TEST_F(KillTest, WhatKilledRefreshesLeaveBehindDoesNotPileUp)
         if (NumberInFile() == NoDocument) WriteStale(Old);
         MakeStale();
     };
-    KillEverywhere(makeStale, [this] {
+    KillRefreshes(makeStale, [this] {
         EXPECT_THAT(Files(), IsSubsetOf({"x.cached", "x.cached.orvadr-tmp0", "x.cached.pid",
                                          "x.cached.pid.orvadr-tmp0"}));
     });
