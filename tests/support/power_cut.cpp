@@ -1,0 +1,412 @@
+#include "power_cut.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+
+#include <filesystem>
+#include <fstream>
+#include <optional>
+#include <sstream>
+#include <stdexcept>
+#include <tuple>
+#include <utility>
+
+#include "traced_process.h"
+
+namespace {
+
+constexpr std::size_t BlockSize = 4096;
+constexpr mode_t PermissionBits = 07777;
+
+StoredFile ReadStored(const std::string& path)
+{
+    struct stat status {};
+    if (::stat(path.c_str(), &status) < 0) throw std::runtime_error(path + " is not there");
+    std::ostringstream text;
+    text << std::ifstream(path, std::ios::binary).rdbuf();
+    return {text.str(), status.st_mode & PermissionBits};
+}
+
+// ----------------------------------------------------------------------------------- recording
+
+std::size_t ToSize(std::uint64_t argument)
+{
+    return static_cast<std::size_t>(argument);
+}
+
+// The changes that a process makes, from its system calls.
+class Recorder {
+  public:
+    Recorder(std::string path, const TracedProcess& traced) : dir(std::move(path)), process(traced)
+    {
+        for (const auto& [name, file] : ReadDirectory(dir)) names[name] = files++;
+    }
+
+    // A call that has begun: texts are read now, while they are there.
+    void Begin(const SystemCall& begun)
+    {
+        call = begun;
+        first = second = {};
+        const auto [one, other] = PathsOf(call);
+        if (one >= 0) first = NameIn(Argument(one));
+        if (other >= 0) second = NameIn(Argument(other));
+    }
+
+    void End(std::int64_t result)
+    {
+        if (result >= 0) Note(result);
+    }
+
+    Record Take() { return std::move(record); }
+
+  private:
+    static constexpr int Self = -1;  // the directory
+
+    struct Open {
+        int file;
+        std::size_t at;
+        bool appends;
+    };
+
+    std::uint64_t Argument(int place) const
+    {
+        return call.arguments.at(static_cast<std::size_t>(place));
+    }
+
+    // Which arguments are paths.
+    static std::pair<int, int> PathsOf(const SystemCall& call)
+    {
+        switch (call.number) {
+            case SYS_openat:
+            case SYS_unlinkat: return {1, -1};
+            case SYS_renameat:
+            case SYS_renameat2: return {1, 3};
+#ifdef SYS_open  // newer machines have the calls above alone
+            case SYS_open:
+            case SYS_unlink: return {0, -1};
+            case SYS_rename: return {0, 1};
+#endif
+            default: return {-1, -1};
+        }
+    }
+
+    // The name in the directory; "." for itself, none for what lies elsewhere.
+    std::optional<std::string> NameIn(std::uint64_t address) const
+    {
+        const std::string path = process.Text(address);
+        if (path == dir) return ".";
+        if (path.compare(0, dir.size() + 1, dir + "/") != 0) return {};
+        return path.substr(dir.size() + 1);
+    }
+
+    void Note(std::int64_t result)
+    {
+        switch (call.number) {
+            case SYS_openat: return NoteOpen(static_cast<int>(result), Argument(2));
+            case SYS_unlinkat: return NoteRemove();
+            case SYS_renameat:
+            case SYS_renameat2: return NoteRename();
+#ifdef SYS_open
+            case SYS_open: return NoteOpen(static_cast<int>(result), Argument(1));
+            case SYS_unlink: return NoteRemove();
+            case SYS_rename: return NoteRename();
+            case SYS_link:
+            case SYS_symlink:
+            case SYS_creat:
+#endif
+            case SYS_linkat:
+            case SYS_symlinkat:
+            case SYS_truncate:
+            case SYS_copy_file_range: return Refuse();
+            default: break;
+        }
+        const auto found = descriptors.find(static_cast<int>(Argument(0)));
+        if (found != descriptors.end()) NoteOfFile(found->second, result);
+    }
+
+    [[noreturn]] void Refuse() const
+    {
+        throw std::runtime_error("system call " + std::to_string(call.number) + " is not known");
+    }
+
+    void NoteOpen(int fd, std::uint64_t flags)
+    {
+        if (!first) return;
+        if (*first == ".") {
+            descriptors[fd] = {Self, 0, false};
+            return;
+        }
+        const auto [name, isNew] = names.emplace(*first, files);
+        if (isNew) {
+            ++files;
+            record.push_back(
+                {Kind::Make, name->second, *first, {}, 0, {}, ReadStored(dir + "/" + *first).mode});
+        } else if ((flags & O_TRUNC) != 0) {
+            record.push_back({Kind::Resize, name->second});
+        }
+        descriptors[fd] = {name->second, 0, (flags & O_APPEND) != 0};
+    }
+
+    void NoteRemove()
+    {
+        if (!first) return;
+        record.push_back({Kind::Remove, names.at(*first), *first});
+        names.erase(*first);
+    }
+
+    void NoteRename()
+    {
+        if (!first != !second) throw std::runtime_error("a file is moved in or out");
+        if (!first) return;
+        record.push_back({Kind::Rename, names.at(*first), *first, *second});
+        names[*second] = names.at(*first);
+        names.erase(*first);
+    }
+
+    // A call whose first argument is an open file.
+    void NoteOfFile(Open& open, std::int64_t result)
+    {
+        switch (call.number) {
+            case SYS_write:
+                if (open.appends) throw std::runtime_error("a file is appended to");
+                NoteWrite(open.file, open.at, result);
+                open.at += static_cast<std::size_t>(result);
+                return;
+            case SYS_pwrite64: return NoteWrite(open.file, ToSize(Argument(3)), result);
+            case SYS_lseek: open.at = static_cast<std::size_t>(result); return;
+            case SYS_ftruncate:
+                record.push_back({Kind::Resize, open.file, {}, {}, ToSize(Argument(1))});
+                return;
+            case SYS_fchmod: {
+                const auto mode = static_cast<mode_t>(Argument(1)) & PermissionBits;
+                record.push_back({Kind::SetMode, open.file, {}, {}, 0, {}, mode});
+                return;
+            }
+            case SYS_fsync:
+            case SYS_fdatasync:
+                record.push_back({open.file == Self ? Kind::SyncDirectory : Kind::Sync, open.file});
+                return;
+            case SYS_close: descriptors.erase(static_cast<int>(Argument(0))); return;
+            case SYS_read: open.at += static_cast<std::size_t>(result); return;
+            case SYS_fcntl:
+            case SYS_fstat:
+            case SYS_newfstatat: return;
+            default: Refuse();
+        }
+    }
+
+    void NoteWrite(int file, std::size_t at, std::int64_t size)
+    {
+        const std::string text = process.Memory(Argument(1), static_cast<std::size_t>(size));
+        record.push_back({Kind::Write, file, {}, {}, at, text});
+    }
+
+    std::string dir;
+    const TracedProcess& process;
+    std::map<std::string, int> names;  // the files that have them now
+    int files = 0;
+    std::map<int, Open> descriptors;
+    Record record;
+
+    SystemCall call{};
+    std::optional<std::string> first;  // the names that it is given
+    std::optional<std::string> second;
+};
+
+// ---------------------------------------------------------------------------------- forgetting
+
+// What a disk can hold of a file that was changed since it was synced.
+std::set<StoredFile> Remains(const StoredFile& synced, const StoredFile& now)
+{
+    if (synced == now) return {now};
+    std::set<std::string> texts{synced.text, now.text};
+    const std::size_t size = now.text.size();
+    for (std::size_t block = 0; block < size; block += BlockSize) {
+        const std::size_t length = std::min(BlockSize, size - block);
+        const std::string begin = now.text.substr(0, block);
+        texts.insert(begin);
+        texts.insert(now.text.substr(0, block + length / 2));
+        texts.insert(begin + std::string(size - block, '\0'));
+        texts.insert(begin + std::string(length, '\0') + now.text.substr(block + length));
+        if (block < synced.text.size()) texts.insert(begin + synced.text.substr(block));
+    }
+    std::set<StoredFile> remains;
+    for (const std::string& text : texts) {
+        remains.insert({text, synced.mode});
+        remains.insert({text, now.mode});
+    }
+    return remains;
+}
+
+// A disk, as it was synced and as the processes see it.
+class Disk {
+  public:
+    explicit Disk(const Directory& before)
+    {
+        for (const auto& [name, file] : before) {
+            names[name] = static_cast<int>(files.size());
+            files.push_back({file, file});
+        }
+    }
+
+    void Do(const Change& change);
+    std::set<Directory> AfterCut() const;
+
+  private:
+    struct File {
+        StoredFile synced;
+        StoredFile now;
+    };
+    struct NewName {
+        std::string name;
+        std::optional<int> file;  // none when it is removed
+    };
+    using Names = std::map<std::string, int>;
+
+    Names NamesAfterCut(std::size_t reached) const;
+    void AddStates(const Names& found, std::set<Directory>& states) const;
+
+    std::vector<File> files;
+    Names names;                    // those that are synced
+    std::vector<NewName> unsynced;  // in order
+};
+
+void Disk::Do(const Change& change)
+{
+    if (change.kind == Kind::Make) files.push_back({{{}, change.mode}, {{}, change.mode}});
+    File* const file = change.file < 0 ? nullptr : &files.at(static_cast<std::size_t>(change.file));
+    switch (change.kind) {
+        case Kind::Make: unsynced.push_back({change.name, change.file}); break;
+        case Kind::Resize: file->now.text.resize(change.at, '\0'); break;
+        case Kind::Write: {
+            std::string& text = file->now.text;
+            if (text.size() < change.at) text.resize(change.at, '\0');
+            text.replace(change.at, change.text.size(), change.text);
+            break;
+        }
+        case Kind::SetMode: file->now.mode = change.mode; break;
+        case Kind::Sync: file->synced = file->now; break;
+        case Kind::Rename:
+            unsynced.push_back({change.newName, change.file});
+            unsynced.push_back({change.name, std::nullopt});
+            break;
+        case Kind::Remove: unsynced.push_back({change.name, std::nullopt}); break;
+        case Kind::SyncDirectory:
+            names = NamesAfterCut(~std::size_t{0});
+            unsynced.clear();
+            break;
+    }
+}
+
+// The names when of those that are not synced some have reached the disk, one for each bit.
+Disk::Names Disk::NamesAfterCut(std::size_t reached) const
+{
+    Names found = names;
+    for (const NewName& change : unsynced) {
+        const bool hasReached = (reached & 1U) != 0;
+        reached >>= 1U;
+        if (!hasReached) continue;
+        if (change.file) {
+            found[change.name] = *change.file;
+        } else {
+            found.erase(change.name);
+        }
+    }
+    return found;
+}
+
+// Adds what can stand under these names: of each file each of its remains, beside all of the others.
+void Disk::AddStates(const Names& found, std::set<Directory>& states) const
+{
+    std::set<Directory> all{{}};
+    for (const auto& [name, number] : found) {
+        const File& file = files.at(static_cast<std::size_t>(number));
+        std::set<Directory> more;
+        for (const StoredFile& remain : Remains(file.synced, file.now)) {
+            for (Directory directory : all) {
+                directory[name] = remain;
+                more.insert(std::move(directory));
+            }
+        }
+        all = std::move(more);
+    }
+    states.merge(all);
+}
+
+std::set<Directory> Disk::AfterCut() const
+{
+    std::set<Directory> states;
+    const std::size_t ways = std::size_t{1} << unsynced.size();
+    for (std::size_t reached = 0; reached < ways; ++reached) {
+        AddStates(NamesAfterCut(reached), states);
+    }
+    return states;
+}
+
+}  // namespace
+
+bool operator<(const StoredFile& one, const StoredFile& other)
+{
+    return std::tie(one.text, one.mode) < std::tie(other.text, other.mode);
+}
+
+bool operator==(const StoredFile& one, const StoredFile& other)
+{
+    return one.text == other.text && one.mode == other.mode;
+}
+
+Directory ReadDirectory(const std::string& path)
+{
+    Directory directory;
+    for (const auto& entry : std::filesystem::directory_iterator(path)) {
+        directory[entry.path().filename()] = ReadStored(entry.path());
+    }
+    return directory;
+}
+
+void WriteDirectory(const std::string& path, const Directory& directory)
+{
+    for (const auto& entry : std::filesystem::directory_iterator(path)) {
+        std::filesystem::remove_all(entry.path());
+    }
+    for (const auto& [name, file] : directory) {
+        const auto place = std::filesystem::path(path) / name;
+        std::ofstream(place, std::ios::binary) << file.text;
+        std::filesystem::permissions(place, static_cast<std::filesystem::perms>(file.mode));
+    }
+}
+
+Record RecordChanges(const std::string& path, const std::function<void()>& body)
+{
+    TracedProcess process(body);
+    Recorder recorder(path, process);
+    while (process.Step()) {
+        const SystemCall call = process.Call();
+        if (call.hasEnded) {
+            recorder.End(call.result);
+        } else {
+            recorder.Begin(call);
+        }
+    }
+    if (process.ExitCode() != 0) throw std::runtime_error("the recorded process has failed");
+    return recorder.Take();
+}
+
+std::set<Directory> StatesAfterCut(const Directory& before, const Record& record)
+{
+    Disk disk(before);
+    for (const Change& change : record) disk.Do(change);
+    return disk.AfterCut();
+}
+
+std::set<Directory> StatesAfterAnyCut(const Directory& before, const Record& record)
+{
+    Disk disk(before);
+    std::set<Directory> states = disk.AfterCut();
+    for (const Change& change : record) {
+        disk.Do(change);
+        states.merge(disk.AfterCut());
+    }
+    return states;
+}
