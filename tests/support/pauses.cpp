@@ -10,6 +10,7 @@ namespace {
 constexpr unsigned int ShortestOwnPause = 100'001;
 
 Pauses* current = nullptr;
+Slept slept{};
 
 }  // namespace
 
@@ -19,6 +20,8 @@ extern "C" int usleep(useconds_t microseconds)
         current->Note(microseconds);
         return 0;
     }
+    slept.microseconds += microseconds;
+    if (microseconds >= ShortestOwnPause) ++slept.pauses;
     const timespec time{microseconds / 1'000'000,
                         static_cast<long>(microseconds % 1'000'000) * 1000};
     return ::nanosleep(&time, nullptr);
@@ -40,4 +43,9 @@ void Pauses::Note(unsigned int microseconds)
     if (microseconds < ShortestOwnPause) return;
     taken.push_back(microseconds);
     if (onPause) onPause(taken.size());
+}
+
+Slept CountSlept()
+{
+    return slept;
 }

@@ -28,4 +28,12 @@ class Pauses {
     std::function<void(std::size_t)> onPause;
 };
 
+// What this process has really slept by usleep, while no such object lived; what its parent had slept
+// before the fork counts, too.
+struct Slept {
+    int pauses;              // of the library's own
+    long long microseconds;  // as asked for, in pauses and in SQLite's steps
+};
+Slept CountSlept();
+
 #endif

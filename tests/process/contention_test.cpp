@@ -1,0 +1,311 @@
+// Processes that all write to one database at the same time. Each has records of its own, of which
+// it knows what it was answered, and all of them meet at the file's lock.
+#include <gtest/gtest.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <atomic>
+#include <chrono>
+#include <functional>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include <orvadrcore/sqlite_command.h>
+#include <orvadrcore/sqlite_condition.h>
+#include <orvadrcore/sqlite_db.h>
+
+#include "support/child_process.h"
+#include "support/crowd.h"
+#include "support/pauses.h"
+#include "support/process_test.h"
+#include "support/scale.h"
+#include "support/shared_memory.h"
+
+namespace {
+
+using OrvaDRCore::InsertCommand;
+using OrvaDRCore::SelectCommand;
+using OrvaDRCore::SqliteDB;
+using OrvaDRCore::SqliteEqual;
+using OrvaDRCore::SqliteTableHandler;
+using OrvaDRCore::SqliteValueList;
+using OrvaDRCore::UpdateCommand;
+using std::chrono::milliseconds;
+using Clock = std::chrono::steady_clock;
+
+// The longest that so many statements may wait for others. Each is tried once more often than the
+// limit says, with a pause between tries, and in each try SQLite waits up to its time-out. Where it
+// has to read the schema before that, at first or again, it may wait for that, too.
+milliseconds LongestWait(int statements, int retryLimit)
+{
+    constexpr milliseconds BusyTimeout(1000);
+    constexpr milliseconds LongestPause(1000);
+    const milliseconds tries = (retryLimit + 1) * BusyTimeout + retryLimit * LongestPause;
+    return statements * tries + 2 * BusyTimeout;
+}
+
+// An operation looks for its table, makes it where looking has failed, and runs its statement.
+constexpr int MostStatements = 3;
+
+// How long the file is locked at a time, which no single try outlasts, and how long it is free then.
+constexpr std::chrono::seconds Held(2);
+constexpr std::chrono::seconds Free(3);
+
+constexpr int UsualLimit = 5;
+constexpr int MaxWriters = 16;
+constexpr int MaxRecords = 20'000;  // of one writer
+
+const SqliteTableHandler& Jobs()
+{
+    static const SqliteTableHandler table("jobs", "id INTEGER PRIMARY KEY, state INTEGER");
+    return table;
+}
+
+// What a record's writer was told: the state, or that it is not there.
+constexpr int Absent = 0;
+constexpr int Made = 1;
+constexpr int Changed = 2;
+
+struct Writer {
+    std::array<std::atomic<unsigned char>, MaxRecords> states;
+    std::atomic<int> records;  // that it has tried to make
+    std::atomic<int> done;     // operations that were answered true
+    std::atomic<int> failed;   // operations that were answered false
+    std::atomic<int> wrong;    // selects that gave something else than what had been answered
+    std::atomic<int> pauses;   // tries that were repeated
+
+    // In milliseconds: the longest waits, of an operation and of one that is a statement alone, and
+    // the longest operation. What is not waiting in that is work.
+    std::atomic<int> wait;
+    std::atomic<int> statementWait;
+    std::atomic<int> longest;
+};
+
+// One process at work.
+class Work {
+  public:
+    Work(SqliteDB&& connection, int number, Writer& notes)
+        : db(std::move(connection)), firstId(number * MaxRecords), writer(notes)
+    {
+    }
+
+    // Makes a record, changes it, looks at it, and removes every other one.
+    void DoNext()
+    {
+        const int record = writer.records++;
+        const int id = firstId + record;
+        std::atomic<unsigned char>& state = writer.states.at(static_cast<std::size_t>(record));
+        if (Take([&] { return Insert(id); })) state = Made;
+        // True also when there is nothing to change.
+        if (Take([&] { return Change(id); }, &Writer::statementWait) && state == Made)
+            state = Changed;
+        Check(id, state);
+        if (record % 2 == 0 && Take([&] { return Delete(id); })) state = Absent;
+    }
+
+  private:
+    // Measures an operation.
+    template <class Operation>
+    bool Take(Operation operation, std::atomic<int> Writer::*wait = &Writer::wait)
+    {
+        const auto begin = Clock::now();
+        const Slept before = CountSlept();
+        const bool done = operation();
+        const Slept after = CountSlept();
+        KeepLonger(writer.longest, Clock::now() - begin);
+        KeepLonger(writer.*wait,
+                   std::chrono::microseconds(after.microseconds - before.microseconds));
+        writer.pauses += after.pauses - before.pauses;
+        ++(done ? writer.done : writer.failed);
+        return done;
+    }
+
+    static void KeepLonger(std::atomic<int>& longest, std::chrono::nanoseconds time)
+    {
+        const auto count = std::chrono::duration_cast<milliseconds>(time).count();
+        longest = std::max<int>(longest, static_cast<int>(count));
+    }
+
+    bool Insert(int id)
+    {
+        InsertCommand insert;
+        insert.SetTable(Jobs());
+        insert.AddFieldValue("id", id);
+        insert.AddFieldValue("state", Made);
+        return db.InsertRecord(insert);
+    }
+
+    // Without a schema no table is looked for.
+    bool Change(int id)
+    {
+        UpdateCommand update;
+        update.SetTable(SqliteTableHandler(Jobs().GetName(), ""));
+        update.AddFieldValue("state", Changed);
+        update.SetCondition(SqliteEqual("id", id));
+        return db.UpdateRecord(update);
+    }
+
+    bool Delete(int id) { return db.DeleteRecord(SqliteEqual("id", id).GetCondition(), Jobs()); }
+
+    void Check(int id, int expected)
+    {
+        SelectCommand select;
+        select.SetTable(Jobs());
+        select.AddField("state");
+        select.SetCondition(SqliteEqual("id", id));
+        std::vector<SqliteValueList> rows;
+        if (!Take([&] { return db.SelectRecords(select, rows); })) return;
+        int state = Absent;
+        // A try that failed in the middle leaves its rows, too.
+        if (!rows.empty() && !rows.back().GetValue("state", state)) state = -1;
+        if (state != expected) ++writer.wrong;
+    }
+
+    SqliteDB db;
+    int firstId;
+    Writer& writer;
+};
+
+class ContentionTest : public ProcessTest {
+  protected:
+    using Writers = std::array<Writer, MaxWriters>;
+
+    std::string Path() const { return dir.File("jobs.db"); }
+
+    // Lets processes work at once for a time, and checks that what they were answered is so.
+    void Run(int retryLimit, std::chrono::seconds time, const std::function<void()>& onStart);
+
+    // The same while a process keeps all others out now and then.
+    void RunBesideHolder(int retryLimit, std::chrono::seconds time);
+
+    // A process that tells when it has locked everybody out of the database. When it is told to, it
+    // lets them in after a while, and out again now and then for a time.
+    ChildProcess StartHolder(std::chrono::seconds time);
+
+    // What is in the file is what was answered, record by record.
+    void ExpectWhatWasAnswered() const;
+
+    int Sum(std::atomic<int> Writer::*number) const
+    {
+        int sum = 0;
+        for (const Writer& writer : *writers) sum += writer.*number;
+        return sum;
+    }
+
+    int Most(std::atomic<int> Writer::*number) const
+    {
+        int most = 0;
+        for (const Writer& writer : *writers) most = std::max<int>(most, writer.*number);
+        return most;
+    }
+
+    SharedMemory<Writers> writers;
+    SharedMemory<std::atomic<int>> holds;
+};
+
+void ContentionTest::Run(int retryLimit, std::chrono::seconds time,
+                         const std::function<void()>& onStart)
+{
+    const int count = std::min(Scaled(8, MaxWriters), MaxWriters);
+    const Crowd crowd(count, [&](int number) {
+        const Clock::time_point end = Clock::now() + time;
+        Writer& writer = writers->at(static_cast<std::size_t>(number));
+        Work work(SqliteDB(Path(), static_cast<unsigned int>(retryLimit)), number, writer);
+        while (Clock::now() < end && writer.records < MaxRecords) work.DoNext();
+    });
+    ASSERT_TRUE(crowd.Start());
+    onStart();
+    EXPECT_TRUE(crowd.Join());
+
+    ExpectWhatWasAnswered();
+    EXPECT_LE(Most(&Writer::statementWait), LongestWait(1, retryLimit).count());
+    EXPECT_LE(Most(&Writer::wait), LongestWait(MostStatements, retryLimit).count());
+    EXPECT_GT(Sum(&Writer::done), 0);
+    ReportCount("writers", count);
+    ReportCount("operations", Sum(&Writer::done));
+    ReportCount("operations_per_second", Sum(&Writer::done) / static_cast<int>(time.count()));
+    ReportCount("operations_given_up", Sum(&Writer::failed));
+    ReportCount("repeated_tries", Sum(&Writer::pauses));
+    ReportCount("longest_statement_wait_msec", Most(&Writer::statementWait));
+    ReportCount("longest_wait_msec", Most(&Writer::wait));
+    ReportCount("longest_operation_msec", Most(&Writer::longest));
+}
+
+void ContentionTest::RunBesideHolder(int retryLimit, std::chrono::seconds time)
+{
+    ChildProcess holder = StartHolder(time);
+    ASSERT_TRUE(holder.Await());
+    Run(retryLimit, time, [&holder] { holder.Tell(); });
+    EXPECT_EQ(holder.Join(), 0);
+    EXPECT_GT(*holds, 0);
+    ReportCount("holds", *holds);
+}
+
+ChildProcess ContentionTest::StartHolder(std::chrono::seconds time)
+{
+    constexpr unsigned int DeadlineSeconds = 600;
+    return ChildProcess([this, time](ChildProcess::Link& link) {
+        ::alarm(DeadlineSeconds);
+        SqliteDB db(Path(), UsualLimit);
+        if (!db.Open() || !db.Exec("BEGIN EXCLUSIVE")) return;
+        link.Tell();
+        link.Await();
+        const Clock::time_point end = Clock::now() + time;
+        do {
+            std::this_thread::sleep_for(Held);
+            if (db.Exec("COMMIT")) ++*holds;
+            std::this_thread::sleep_for(Free);
+            while (Clock::now() < end && !db.Exec("BEGIN EXCLUSIVE")) {
+            }
+        } while (Clock::now() < end);
+    });
+}
+
+void ContentionTest::ExpectWhatWasAnswered() const
+{
+    EXPECT_EQ(Sum(&Writer::wrong), 0);
+    SqliteDB db(Path(), 0);
+    ASSERT_TRUE(db.Open());
+    SqliteValueList verdict;
+    EXPECT_TRUE(db.SelectByCommand("PRAGMA integrity_check", verdict));
+    EXPECT_EQ(verdict.ToStr(), "integrity_check:'ok'");
+    std::vector<SqliteValueList> rows;
+    ASSERT_TRUE(db.SelectByCommand("SELECT id, state FROM jobs", rows));
+
+    int expected = 0;
+    for (const Writer& writer : *writers) {
+        expected += static_cast<int>(std::count_if(writer.states.begin(), writer.states.end(),
+                                                   [](int state) { return state != Absent; }));
+    }
+    EXPECT_EQ(static_cast<int>(rows.size()), expected);
+    for (const SqliteValueList& row : rows) {
+        int id = 0;
+        int state = Absent;
+        ASSERT_TRUE(row.GetValue("id", id) && row.GetValue("state", state));
+        const Writer& writer = writers->at(static_cast<std::size_t>(id / MaxRecords));
+        ASSERT_EQ(state, writer.states.at(static_cast<std::size_t>(id % MaxRecords)))
+            << "record " << id;
+    }
+}
+
+TEST_F(ContentionTest, WhatIsAnsweredHappensAndNothingElse)
+{
+    Run(UsualLimit, std::chrono::seconds(Scaled(3, 60)), [] {});
+}
+
+TEST_F(ContentionTest, AProcessThatHoldsTheLockForLongIsWaitedFor)
+{
+    RunBesideHolder(UsualLimit, std::chrono::seconds(Scaled(4, 60)));
+    EXPECT_GT(Sum(&Writer::pauses), 0);
+}
+
+TEST_F(ContentionTest, WhatIsGivenUpDoesNotHappen)
+{
+    RunBesideHolder(0, std::chrono::seconds(Scaled(4, 60)));
+    EXPECT_EQ(Sum(&Writer::pauses), 0);
+    EXPECT_GT(Sum(&Writer::failed), 0);
+}
+
+}  // namespace
