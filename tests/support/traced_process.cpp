@@ -116,6 +116,7 @@ TracedProcess::TracedProcess(const std::function<void()>& body)
     if (pid < 0) std::abort();
     if (pid == 0) {
         Trace(PTRACE_TRACEME, 0, 0);
+        ::setenv("ORVADR_TRACED", "1", 1);  // NOLINT(concurrency-mt-unsafe): for coverage_exit.cpp
         ::alarm(DeadlineSeconds);
         (void)::raise(SIGSTOP);
         try {
