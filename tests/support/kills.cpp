@@ -5,6 +5,7 @@
 
 #include <string>
 
+#include "pauses.h"
 #include "scale.h"
 #include "traced_process.h"
 
@@ -20,7 +21,9 @@ int KillMember(const Scene& scene, int member)
         TracedProcess process(scene.body);
         const bool killed = process.KillBefore(member, call);
         EXPECT_EQ(process.ExitCode(), killed && member == 0 ? 128 + SIGKILL : 0);
+        const long long slept = CountSlept().microseconds;
         scene.inspect();
+        EXPECT_EQ(CountSlept().microseconds, slept) << "the dead are waited for";
         if (!killed || ::testing::Test::HasFailure()) return call - 1;
     }
 }

@@ -13,8 +13,8 @@ struct Scene {
 
 // Plays the scene again and again and kills the process before one of its system calls each time,
 // the first, the second and so on, until it gets to its end; likewise each process that it forks,
-// or that those fork, while the others go on. Ends at the first check that fails. Reports the number
-// of kills.
+// or that those fork, while the others go on. Whoever comes next must not have to wait. Ends at the
+// first check that fails. Reports the number of kills.
 void KillEverywhere(const Scene& scene);
 
 #endif
