@@ -87,7 +87,7 @@ class ORVADRCORE_API SqliteDB {
     ///           record holds the failed tries
     /// \warning The look for the table, its creation and the statement are retried one after the
     ///          other: on a file that stays locked the call takes twice as long as one
-    ///          statement.
+    ///          statement, under a lock that comes and goes up to three times.
     bool InsertRecord(const InsertCommand& command);
 
     /// Inserts records, all of them or none, in one transaction and hundreds of times faster than

@@ -370,6 +370,7 @@ TEST_F(CacheUpdateTest, AWriteThatFailsIsNotTheFileThatIsKnown)
     EXPECT_FALSE(cache.UpdateWithData("data", 100, 109));
     faults.rename = nullptr;
     EXPECT_TRUE(cache.UpdateWithData("data"));
+    ExpectLines({WroteNothing()});
     EXPECT_EQ(Document()["max_updated_time"], 5);
 }
 
