@@ -1,0 +1,49 @@
+// A document that is accepted is printed and read back as it was; one that is not leaves the value
+// alone.
+#include <algorithm>
+#include <cmath>
+
+#include "json_helpers.h"
+#include "support/fuzz.h"
+
+namespace {
+
+// The same kinds, names and bits. Walks both itself, so that the fuzzer sees what is in a document.
+bool IsSame(const Json::Value& one, const Json::Value& other)
+{
+    if (one.type() != other.type() || one.size() != other.size()) return false;
+    if (one.isArray()) return std::equal(one.begin(), one.end(), other.begin(), IsSame);
+    if (one.type() == Json::realValue) {
+        const bool isSameSign = std::signbit(one.asDouble()) == std::signbit(other.asDouble());
+        return isSameSign && one.asDouble() == other.asDouble();
+    }
+    if (!one.isObject()) return one == other;
+    const Json::Value::Members names = one.getMemberNames();
+    return names == other.getMemberNames() &&
+           std::all_of(names.begin(), names.end(),
+                       [&](const std::string& name) { return IsSame(one[name], other[name]); });
+}
+
+bool IsControl(char character)
+{
+    return static_cast<unsigned char>(character) < ' ';
+}
+
+}  // namespace
+
+void Fuzz(const std::string& input)
+{
+    const Json::Value before("as it was");
+    Json::Value value(before);
+    if (!OrvaDRCore::fromString(value, input)) {
+        Expect(value == before, "a text that does not parse leaves the value alone");
+        return;
+    }
+    const std::string text = OrvaDRCore::toString(value);
+    Expect(std::none_of(text.begin(), text.end(), IsControl), "a document is one line");
+
+    Json::Value back;
+    Expect(OrvaDRCore::fromString(back, text), "what was printed is read");
+    Expect(IsSame(back, value), "a document comes back as it was");
+    Expect(OrvaDRCore::toString(back) == text, "a document is printed alike each time");
+}
