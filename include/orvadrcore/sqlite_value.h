@@ -125,7 +125,7 @@ ORVADRCORE_API bool SqliteValue::GetValue<bool>(bool& out) const;
 class ORVADRCORE_API SqliteValueList {
   public:
     SqliteValueList() = default;
-    SqliteValueList(const SqliteValueList&) = default;      ///< A copy of all fields.
+    SqliteValueList(const SqliteValueList&) = default;  ///< A copy of all fields.
     SqliteValueList(SqliteValueList&& other) noexcept;  ///< Takes all fields of the other.
     virtual ~SqliteValueList();
 

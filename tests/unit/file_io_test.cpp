@@ -736,14 +736,14 @@ TEST_F(ReplaceFileTest, ANameOfFullLengthServesAsManyWritersAsAnyOther)
 TEST_F(ReplaceFileTest, ANameWithRoomForTheTemporarysSuffixIsNotCut)
 {
     const std::size_t room = std::string(".orvadr-tmp63").size();
-    const std::string file = dir.File(std::string(NAME_MAX - room, 'n'));
+    const std::string longest = dir.File(std::string(NAME_MAX - room, 'n'));
     std::string used;
     faults.rename = [&](const char* from, const char* to) {
         used = from;
         return RealRename(from, to);
     };
-    EXPECT_TRUE(ReplaceFile(file, "text"));
-    EXPECT_EQ(used, file + ".orvadr-tmp0");
+    EXPECT_TRUE(ReplaceFile(longest, "text"));
+    EXPECT_EQ(used, longest + ".orvadr-tmp0");
 }
 
 TEST_F(ReplaceFileTest, AFailureMakesNoFileWhereNoneWas)
