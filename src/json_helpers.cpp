@@ -3,6 +3,7 @@
 #include <atomic>
 #include <cstring>
 #include <memory>
+#include <sstream>
 
 #include <json/reader.h>
 #include <json/writer.h>
@@ -69,7 +70,12 @@ bool fromString(Json::Value& value, const std::string& text)
 
 std::string toString(const Json::Value& value)
 {
-    return Json::writeString(Kept<Json::StreamWriterBuilder>(), value);
+    const auto& builder = Kept<Json::StreamWriterBuilder>();
+    const std::unique_ptr<Json::StreamWriter> writer(builder.newStreamWriter());
+    std::ostringstream text;
+    text.exceptions(std::ios::badbit);  // or a text for which memory is short comes out cut off
+    writer->write(value, &text);
+    return text.str();
 }
 
 bool fromFile(Json::Value& value, const std::string& path)

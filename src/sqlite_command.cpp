@@ -59,7 +59,8 @@ bool SqliteCommand::SetTable(const SqliteTableHandler& handler)
 std::string SqliteCommand::ToStr() const
 {
     std::stringstream out;
-    out << table.GetName() << "]";  // has no opening bracket, on purpose
+    out.exceptions(std::ios::badbit);  // or a text for which memory is short comes out cut off
+    out << table.GetName() << "]";     // has no opening bracket, on purpose
     DumpParam(out);
     return out.str();
 }
