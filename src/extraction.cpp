@@ -83,7 +83,10 @@ std::string_view Extraction::SkipBlanks(std::string_view text) const
 template <class Number>
 void Extraction::ReadByStream(std::string_view text, Number& number)
 {
-    if (!stream) stream.emplace().imbue(locale);
+    if (!stream) {
+        stream.emplace().imbue(locale);
+        stream->exceptions(std::ios::badbit);  // or memory that is short reads as no number
+    }
     stream->clear();
     stream->str(std::string(text));
     *stream >> number;

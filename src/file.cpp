@@ -7,6 +7,7 @@
 #include <array>
 #include <cstdio>
 #include <iterator>
+#include <memory>
 #include <string_view>
 #include <utility>
 
@@ -57,6 +58,11 @@ bool parseLineKeyValue(std::string_view line, Extraction& extraction, K& key, V&
     return true;
 }
 
+struct CloseStream {
+    void operator()(FILE* stream) const { (void)std::fclose(stream); }
+};
+using Stream = std::unique_ptr<FILE, CloseStream>;
+
 }  // namespace
 
 bool File::Read(const std::string& path, Json::Value& value)
@@ -77,17 +83,16 @@ bool File::Read(const std::string& path, Json::Value& value)
 
 bool File::Read(int fd, Json::Value& value)
 {
-    FILE* stream = ::fdopen(fd, "r");
+    const Stream stream(::fdopen(fd, "r"));
     if (stream == nullptr) {
         DR_LOG(Err, "Failed to open file descriptor [%d]", fd);
         return false;
     }
     std::string text;
     std::array<char, ChunkSize> chunk{};
-    while (std::fgets(chunk.data(), static_cast<int>(chunk.size()), stream) != nullptr) {
+    while (std::fgets(chunk.data(), static_cast<int>(chunk.size()), stream.get()) != nullptr) {
         text += chunk.data();
     }
-    (void)std::fclose(stream);
     return fromString(value, text);
 }
 
@@ -113,17 +118,16 @@ bool File::Write(const std::string& path, const Json::Value& value)
 
 bool File::Write(int fd, const Json::Value& value)
 {
-    FILE* stream = ::fdopen(fd, "w");
+    const Stream stream(::fdopen(fd, "w"));
     if (stream == nullptr) {
         DR_LOG(Err, "Failed to open file descriptor [%d]", fd);
         return false;
     }
     // Without a buffer it is fprintf itself that meets a full disk, not the close behind it.
-    (void)std::setvbuf(stream, nullptr, _IONBF, 0);
+    (void)std::setvbuf(stream.get(), nullptr, _IONBF, 0);
     const std::string text = toString(value);
-    const bool written = std::fprintf(stream, "%s", text.c_str()) >= 0;
+    const bool written = std::fprintf(stream.get(), "%s", text.c_str()) >= 0;
     if (!written) DR_LOG(Err, "Failed to write [%s] to fd[%d]", text.c_str(), fd);
-    (void)std::fclose(stream);
     return written;
 }
 

@@ -140,12 +140,21 @@ template <class In, class Out>
 bool File::toType(const In& in, Out& out, const Out& fallback)
 {
     std::stringstream stream;
-    stream << in;
+    stream.exceptions(std::ios::badbit);  // or memory that is short counts as the end of the text
+    try {
+        stream << in;
+    } catch (const std::ios::failure&) {
+        // What a stream refuses to write counts as empty, on purpose.
+    }
     if (stream.str().empty()) {
         out = fallback;
         return false;
     }
-    stream >> out;  // its success is not looked at, on purpose
+    try {
+        stream >> out;
+    } catch (const std::ios::failure&) {
+        // Its success is not looked at, on purpose.
+    }
     return true;
 }
 /// \endcond
