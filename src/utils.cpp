@@ -7,6 +7,7 @@
 #include <cmath>
 #include <cstdio>
 #include <cstdlib>
+#include <memory>
 #include <string_view>
 
 #include "log.h"
@@ -17,6 +18,15 @@ namespace {
 
 constexpr const char* UuidProgram = "/usr/bin/uuidgen";
 constexpr std::string_view VolumePrefix = "/volume";
+
+struct CloseProgram {
+    void operator()(FILE* output) const { CoreLibPclose(output); }
+};
+using Output = std::unique_ptr<FILE, CloseProgram>;
+
+struct Free {
+    void operator()(char* text) const { std::free(text); }
+};
 
 void Append(std::string& text, const std::string& element)
 {
@@ -45,19 +55,16 @@ void Append(std::string& text, double element)
 std::string GenerateUUID()
 {
     std::string uuid;
-    FILE* output = CoreLibPopen(UuidProgram, "r", nullptr);
+    const Output output(CoreLibPopen(UuidProgram, "r", nullptr));
     if (output == nullptr) {
         DR_LOG(Err, "Failed to exec the command [%s].", UuidProgram);
         return uuid;
     }
-    char* line = nullptr;
+    char* text = nullptr;
     std::size_t size = 0;
-    if (::getline(&line, &size, output) >= 0) {
-        CoreLibStrTrim(line, nullptr, nullptr);
-        uuid = line;
-    }
-    CoreLibPclose(output);
-    std::free(line);
+    const ssize_t length = ::getline(&text, &size, output.get());
+    const std::unique_ptr<char, Free> line(text);
+    if (length >= 0) uuid = CoreLibStrTrim(line.get(), nullptr, nullptr);
     return uuid;
 }
 
