@@ -27,6 +27,10 @@ constexpr int BusyTimeoutMSec = 1000;
 constexpr unsigned int MinPauseMSec = 500;
 constexpr unsigned int MaxPauseMSec = 1000;
 
+struct FreeText {
+    void operator()(char* text) const { sqlite3_free(text); }
+};
+
 // Whether SQLite can store a record: a field at least, and values that are there. A list holds no
 // others, unless somebody has written into it through a reference that promised not to be.
 bool IsStorable(const SqliteValueList& record)
@@ -371,10 +375,10 @@ void SqliteDB::SetDBErr(const std::string& command, int sqliteCode, const char* 
 
 bool SqliteDB::DoExecSqliteCommand(const std::string& command)
 {
-    char* message = nullptr;  // SQLite leaves it alone when the handle is null
-    const int code = sqlite3_exec(handle, command.c_str(), nullptr, nullptr, &message);
-    if (code != SQLITE_OK) SetDBErr(command, code, message);
-    sqlite3_free(message);
+    char* text = nullptr;  // SQLite leaves it alone when the handle is null
+    const int code = sqlite3_exec(handle, command.c_str(), nullptr, nullptr, &text);
+    const std::unique_ptr<char, FreeText> message(text);
+    if (code != SQLITE_OK) SetDBErr(command, code, message.get());
     return code == SQLITE_OK;
 }
 
@@ -490,12 +494,20 @@ bool SqliteDB::DoWhole(bool isNested, Work work)
         return false;
     }
     if (!DoExecSqliteCommand(bracket.begin)) return false;
-    if (work() && DoExecSqliteCommand(bracket.end)) return true;
     // The error record stays that of the failure. What cannot be undone ends with the connection.
-    if (IsInTransaction() &&
-        sqlite3_exec(handle, bracket.undo, nullptr, nullptr, nullptr) != SQLITE_OK) {
-        Close();
+    const auto undo = [&] {
+        if (IsInTransaction() &&
+            sqlite3_exec(handle, bracket.undo, nullptr, nullptr, nullptr) != SQLITE_OK) {
+            Close();
+        }
+    };
+    try {
+        if (work() && DoExecSqliteCommand(bracket.end)) return true;
+    } catch (...) {  // memory is short
+        undo();
+        throw;
     }
+    undo();
     return false;
 }
 
