@@ -16,7 +16,11 @@ SqliteTransaction::~SqliteTransaction()
     const int errCode = db.errCode;
     Json::Value errRecord;
     errRecord.swap(db.errRecord);
-    Rollback();
+    try {
+        Rollback();
+    } catch (...) {
+        // Memory is short. The connection is closed, and with it the transaction.
+    }
     db.errCode = errCode;
     db.errRecord.swap(errRecord);
 }
@@ -34,7 +38,7 @@ bool SqliteTransaction::Begin()
         DR_LOG(Err, "Failed to open db [%s]", db.path.c_str());
         return false;
     }
-    if (!db.Exec("BEGIN IMMEDIATE")) {
+    if (!Exec("BEGIN IMMEDIATE")) {
         DR_LOG(Err, "Failed to begin transaction in db[%s]", db.path.c_str());
         return false;
     }
@@ -55,7 +59,7 @@ bool SqliteTransaction::Commit()
         DR_LOG(Err, "transaction in db[%s] was rolled back", db.path.c_str());
         return false;
     }
-    if (!db.Exec("COMMIT")) {
+    if (!Exec("COMMIT")) {
         SetBegun(db.IsInTransaction());
         DR_LOG(Err, "Failed to commit transaction in db[%s]", db.path.c_str());
         return false;
@@ -68,12 +72,30 @@ bool SqliteTransaction::Rollback()
     const bool isOpen = begun && db.IsInTransaction();
     SetBegun(false);
     db.SetErr(0);
-    if (isOpen && !db.DoExecSqliteCommand("ROLLBACK")) {
+    bool isDone = true;
+    try {
+        isDone = !isOpen || db.DoExecSqliteCommand("ROLLBACK");
+    } catch (...) {  // memory is short
+        db.Close();
+        throw;
+    }
+    if (!isDone) {
         db.Close();
         DR_LOG(Err, "Failed to roll back transaction in db[%s]", db.path.c_str());
         return false;
     }
     return true;
+}
+
+// Where memory runs out, too, what has been begun and not ended is this object's to roll back.
+bool SqliteTransaction::Exec(const char* statement)
+{
+    try {
+        return db.Exec(statement);
+    } catch (...) {
+        SetBegun(db.IsInTransaction());
+        throw;
+    }
 }
 
 // The connection's own limit holds for BEGIN and COMMIT, and for nothing between.

@@ -75,6 +75,7 @@ class ORVADRCORE_API SqliteTransaction {
     bool Rollback();
 
   private:
+    ORVADRCORE_LOCAL bool Exec(const char* statement);
     ORVADRCORE_LOCAL void SetBegun(bool isBegun);
 
     SqliteDB& db;
