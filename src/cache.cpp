@@ -379,16 +379,25 @@ void Cache::WaitForUpdater() const
 // The refresh of a caller that waits, and of the child.
 bool Cache::Refresh() const
 {
+    const std::string mark = PidPath();
     if (IsUpdating() || !SetUpdating()) return false;
+    // The mark of a living process would make all others wait: it goes also when memory is short.
+    const auto unset = [&] {
+        try {
+            UnsetUpdating();
+        } catch (...) {
+            ::unlink(mark.c_str());
+            throw;
+        }
+    };
     bool updated = false;
     try {
         updated = DoUpdate();
-    } catch (...) {
-        // A subclass's. The mark of a living process would make all others wait.
-        UnsetUpdating();
+    } catch (...) {  // a subclass's, too
+        unset();
         throw;
     }
-    UnsetUpdating();
+    unset();
     return updated;
 }
 
