@@ -2,8 +2,12 @@
 
 #include <fcntl.h>
 #include <sys/file.h>
+#include <sys/random.h>
+#include <sys/syscall.h>
+#include <sys/wait.h>
 #include <unistd.h>
 
+#include <array>
 #include <cstdarg>
 #include <cstdio>
 #include <cstdlib>
@@ -68,6 +72,11 @@ int RealFsync(int fd)
     return RealFunction<decltype(::fsync)>("fsync")(fd);
 }
 
+int RealFdatasync(int fd)
+{
+    return RealFunction<decltype(::fdatasync)>("fdatasync")(fd);
+}
+
 int RealFlock(int fd, int operation)
 {
     return RealFunction<decltype(::flock)>("flock")(fd, operation);
@@ -86,6 +95,66 @@ int RealRename(const char* from, const char* to)
 int RealStat(const char* path, struct stat* status)
 {
     return RealFunction<decltype(::stat)>("stat")(path, status);
+}
+
+int RealStat64(const char* path, struct stat64* status)
+{
+    return RealFunction<decltype(::stat64)>("stat64")(path, status);
+}
+
+int RealLstat(const char* path, struct stat* status)
+{
+    return RealFunction<decltype(::lstat)>("lstat")(path, status);
+}
+
+int RealFstat(int fd, struct stat* status)
+{
+    return RealFunction<decltype(::fstat)>("fstat")(fd, status);
+}
+
+int RealClose(int fd)
+{
+    return RealFunction<decltype(::close)>("close")(fd);
+}
+
+int RealUnlink(const char* path)
+{
+    return RealFunction<decltype(::unlink)>("unlink")(path);
+}
+
+int RealPipe2(int* ends, int flags)
+{
+    return RealFunction<decltype(::pipe2)>("pipe2")(ends, flags);
+}
+
+int RealDup2(int from, int to)
+{
+    return RealFunction<decltype(::dup2)>("dup2")(from, to);
+}
+
+int RealCloseRange(unsigned int first, unsigned int last, int flags)
+{
+    return RealFunction<decltype(::close_range)>("close_range")(first, last, flags);
+}
+
+pid_t RealWaitpid(pid_t pid, int* status, int options)
+{
+    return RealFunction<decltype(::waitpid)>("waitpid")(pid, status, options);
+}
+
+ssize_t RealGetrandom(void* buffer, std::size_t size, unsigned int flags)
+{
+    return RealFunction<decltype(::getrandom)>("getrandom")(buffer, size, flags);
+}
+
+FILE* RealFdopen(int fd, const char* mode)
+{
+    return RealFunction<decltype(::fdopen)>("fdopen")(fd, mode);
+}
+
+long RealClone(long flags)
+{
+    return RealFunction<decltype(::syscall)>("syscall")(SYS_clone, flags, 0L, 0L, 0L, 0L);
 }
 
 unsigned int RealSleep(unsigned int seconds)
@@ -136,6 +205,11 @@ extern "C" int fsync(int fd)
     return Answer(&SyscallAnswers::fsync, RealFsync, fd);
 }
 
+extern "C" int fdatasync(int fd)
+{
+    return Answer(&SyscallAnswers::fdatasync, RealFdatasync, fd);
+}
+
 extern "C" int flock(int fd, int operation) noexcept
 {
     return Answer(&SyscallAnswers::flock, RealFlock, fd, operation);
@@ -158,6 +232,74 @@ extern "C" int rename(const char* from, const char* to) noexcept
 extern "C" int stat(const char* path, struct stat* status) noexcept
 {
     return Answer(&SyscallAnswers::stat, RealStat, path, status);
+}
+
+extern "C" int stat64(const char* path, struct stat64* status) noexcept
+{
+    return Answer(&SyscallAnswers::stat64, RealStat64, path, status);
+}
+
+extern "C" int lstat(const char* path, struct stat* status) noexcept
+{
+    return Answer(&SyscallAnswers::lstat, RealLstat, path, status);
+}
+
+extern "C" int fstat(int fd, struct stat* status) noexcept
+{
+    return Answer(&SyscallAnswers::fstat, RealFstat, fd, status);
+}
+
+extern "C" int close(int fd)
+{
+    return Answer(&SyscallAnswers::close, RealClose, fd);
+}
+
+extern "C" int unlink(const char* path) noexcept
+{
+    return Answer(&SyscallAnswers::unlink, RealUnlink, path);
+}
+
+extern "C" int pipe2(int* ends, int flags) noexcept
+{
+    return Answer(&SyscallAnswers::pipe2, RealPipe2, ends, flags);
+}
+
+extern "C" int dup2(int from, int to) noexcept
+{
+    return Answer(&SyscallAnswers::dup2, RealDup2, from, to);
+}
+
+extern "C" int close_range(unsigned int first, unsigned int last, int flags) noexcept
+{
+    return Answer(&SyscallAnswers::closeRange, RealCloseRange, first, last, flags);
+}
+
+extern "C" pid_t waitpid(pid_t pid, int* status, int options)
+{
+    return Answer(&SyscallAnswers::waitpid, RealWaitpid, pid, status, options);
+}
+
+extern "C" ssize_t getrandom(void* buffer, std::size_t size, unsigned int flags)
+{
+    return Answer(&SyscallAnswers::getrandom, RealGetrandom, buffer, size, flags);
+}
+
+extern "C" FILE* fdopen(int fd, const char* mode) noexcept
+{
+    return Answer(&SyscallAnswers::fdopen, RealFdopen, fd, mode);
+}
+
+// The six arguments that every system call may have.
+extern "C" long syscall(long number, ...) noexcept
+{
+    va_list rest;
+    va_start(rest, number);
+    std::array<long, 6> arguments{};
+    for (long& argument : arguments) argument = va_arg(rest, long);
+    va_end(rest);
+    const auto [a, b, c, d, e, f] = arguments;
+    if (number == SYS_clone) return Answer(&SyscallAnswers::clone, RealClone, a);
+    return RealFunction<decltype(::syscall)>("syscall")(number, a, b, c, d, e, f);
 }
 
 extern "C" unsigned int sleep(unsigned int seconds)

@@ -11,6 +11,7 @@
 #include <sys/types.h>
 
 #include <cerrno>
+#include <cstdio>
 #include <functional>
 
 struct SyscallAnswers {
@@ -19,11 +20,26 @@ struct SyscallAnswers {
     std::function<ssize_t(int, const void*, std::size_t)> write;
     std::function<int(int, mode_t)> fchmod;
     std::function<int(int)> fsync;
+    std::function<int(int)> fdatasync;
     std::function<int(int, int)> flock;
     std::function<int(int, int, void*)> fcntl;
     std::function<int(const char*, const char*)> rename;
     std::function<int(const char*, struct stat*)> stat;
+    std::function<int(const char*, struct stat64*)> stat64;
+    std::function<int(const char*, struct stat*)> lstat;
+    std::function<int(int, struct stat*)> fstat;
+    std::function<int(int)> close;
+    std::function<int(const char*)> unlink;
+    std::function<int(int*, int)> pipe2;
+    std::function<int(int, int)> dup2;
+    std::function<int(unsigned int, unsigned int, int)> closeRange;
+    std::function<pid_t(pid_t, int*, int)> waitpid;
+    std::function<ssize_t(void*, std::size_t, unsigned int)> getrandom;
+    std::function<FILE*(int, const char*)> fdopen;
     std::function<unsigned int(unsigned int)> sleep;
+
+    // Of the clone that the platform layer calls by number; all other numbers are the system's.
+    std::function<long(long)> clone;
 
     // Runs in the process that is to become the program: what it notes the test sees in shared
     // memory only, as ProgramNotes has it.
@@ -55,11 +71,24 @@ ssize_t RealRead(int fd, void* buffer, std::size_t size);
 ssize_t RealWrite(int fd, const void* buffer, std::size_t size);
 int RealFchmod(int fd, mode_t mode);
 int RealFsync(int fd);
+int RealFdatasync(int fd);
 int RealFlock(int fd, int operation);
 int RealFcntl(int fd, int command, void* argument);
 int RealRename(const char* from, const char* to);
 int RealStat(const char* path, struct stat* status);
+int RealStat64(const char* path, struct stat64* status);
+int RealLstat(const char* path, struct stat* status);
+int RealFstat(int fd, struct stat* status);
+int RealClose(int fd);
+int RealUnlink(const char* path);
+int RealPipe2(int* ends, int flags);
+int RealDup2(int from, int to);
+int RealCloseRange(unsigned int first, unsigned int last, int flags);
+pid_t RealWaitpid(pid_t pid, int* status, int options);
+ssize_t RealGetrandom(void* buffer, std::size_t size, unsigned int flags);
+FILE* RealFdopen(int fd, const char* mode);
 unsigned int RealSleep(unsigned int seconds);
+long RealClone(long flags);
 int RealExecve(const char* path, char* const* arguments, char* const* environment);
 
 #endif

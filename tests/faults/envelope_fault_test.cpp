@@ -1,0 +1,152 @@
+// Values, statements, requests and replies: they ask nothing of the system but memory.
+#include <orvadrcore/request.h>
+#include <orvadrcore/response.h>
+#include <orvadrcore/sqlite_command.h>
+#include <orvadrcore/sqlite_condition.h>
+
+#include "fault.h"
+#include "json_helpers.h"
+
+using namespace OrvaDRCore;
+
+namespace {
+
+const char* const Reply =
+    R"({"data":{"finish":true,"task_id":"a task with a long name"},"success":true})";
+const char* const Refusal =
+    R"({"error":{"code":507,"errors":["no node has a name that long"]},"success":false})";
+
+// Makes a text twice: with a fault, which gives this text or none, and without.
+void ExpectText(const std::string& expected, const std::function<std::string()>& make)
+{
+    std::string text;
+    const Outcome outcome = WithFault([&] {
+        text = make();
+        return true;
+    });
+    EXPECT_EQ(text, outcome.succeeded ? expected : "");
+    EXPECT_EQ(make(), expected);
+}
+
+InsertCommand MakeInsert()
+{
+    InsertCommand insert;
+    insert.SetTable(SqliteTableHandler("a_table_with_a_name", "id INT, name TEXT"));
+    insert.AddFieldValue("a_column_with_a_name", "a value that is long enough");
+    insert.AddFieldValue("id", 7);
+    return insert;
+}
+
+}  // namespace
+
+TEST(EnvelopeFaults, Insert)
+{
+    EveryCallFails("InsertCommand", [] {
+        ExpectText(
+            "INSERT INTO a_table_with_a_name (a_column_with_a_name,id) "
+            "VALUES ('a value that is long enough',7);",
+            [] { return MakeInsert().GetCommand(); });
+    });
+}
+
+TEST(EnvelopeFaults, InsertForAReader)
+{
+    EveryCallFails("InsertCommand::ToStr", [] {
+        const InsertCommand insert = MakeInsert();
+        ExpectText(insert.ToStr(), [&] { return insert.ToStr(); });
+    });
+}
+
+TEST(EnvelopeFaults, UpdateWithConditions)
+{
+    EveryCallFails("UpdateCommand", [] {
+        ExpectText(
+            "UPDATE a_table_with_a_name SET name='a value that is long enough' "
+            "WHERE (id='7') AND (name IN ( 'one that is long enough','two' ))",
+            [] {
+                UpdateCommand update;
+                update.SetTable(SqliteTableHandler("a_table_with_a_name", "id INT, name TEXT"));
+                update.AddFieldValue("name", std::string("a value that is long enough"));
+                const SqliteEqual equal("id", SqliteValue("7"));
+                const std::vector<SqliteValue> names{"one that is long enough", "two"};
+                const SqliteIn in("name", names);
+                update.SetCondition(SqliteAnd(equal.GetCondition(), in.GetCondition()));
+                return update.GetCommand();
+            });
+    });
+}
+
+TEST(EnvelopeFaults, Select)
+{
+    EveryCallFails("SelectCommand", [] {
+        ExpectText("SELECT a_column_with_a_name,id FROM a_table_with_a_name WHERE id!=7", [] {
+            SelectCommand select;
+            select.SetTable(SqliteTableHandler("a_table_with_a_name", ""));
+            select.AddField("a_column_with_a_name");
+            select.AddField("id");
+            select.SetCondition(SqliteNotEqual("id", 7));
+            return select.GetCommand();
+        });
+    });
+}
+
+TEST(EnvelopeFaults, Records)
+{
+    EveryCallFails("SqliteValueList", [] {
+        ExpectText("another:7, name:'a value that''s long enough'", [] {
+            SqliteValueList record;
+            record.AddValue("name", SqliteValue::EscapeText("a value that's long enough"));
+            SqliteValueList other;
+            other.AddValue("another", 7);
+            record += other;
+            return record.ToStr();
+        });
+    });
+}
+
+TEST(EnvelopeFaults, RequestToJson)
+{
+    EveryCallFails("Request", [] {
+        ExpectText(
+            R"({"api":"an API with a long name","method":"get","n":"a long, long value","version":1})",
+            [] {
+                Request request("an API with a long name", 1, "get", Json::Value());
+                if (!request.addParam("n", "a long, long value")) return std::string();
+                return toString(Request(request.toJson()).toJson());
+            });
+    });
+}
+
+TEST(EnvelopeFaults, ReplyThatIsParsed)
+{
+    EveryCallFails("Response::setResp", [] {
+        const std::string text = Reply;
+        Response response(Refusal);
+        const Outcome outcome = WithFault([&] { return response.setResp(text); });
+        // One that did not parse is none, and the one before it is past.
+        EXPECT_EQ(toString(response.getResp()), outcome.succeeded ? Reply : "null");
+        EXPECT_TRUE(response.setResp(Reply));
+        EXPECT_EQ(toString(response.getResp()), Reply);
+    });
+}
+
+TEST(EnvelopeFaults, ReplyThatIsCopied)
+{
+    EveryCallFails("Response's copy", [] {
+        const Response reply(Reply);
+        ExpectText(Reply, [&] { return toString(Response(reply).getResp()); });
+    });
+}
+
+TEST(EnvelopeFaults, AnswersOfAReply)
+{
+    EveryCallFails("Response's answers", [] {
+        const Response reply(Reply);
+        const Response refusal(Refusal);
+        ExpectText("a task with a long name", [&] { return reply.getTaskId(); });
+        ExpectText(R"(["no node has a name that long"])",
+                   [&] { return toString(refusal.getErrMsg()); });
+        EXPECT_TRUE(reply.isPollFinish());
+        EXPECT_EQ(refusal.getErrCode(), 507);
+    });
+}

@@ -1,0 +1,464 @@
+#include "fault.h"
+
+#include <json/value.h>
+#include <sqlite3.h>
+#include <sys/prctl.h>
+#include <syslog.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <atomic>
+#include <climits>
+#include <cstdarg>
+#include <cstdio>
+#include <cstring>
+#include <filesystem>
+#include <memory>
+#include <new>
+#include <optional>
+#include <vector>
+
+#include "support/allocation_faults.h"
+#include "support/child_checks.h"
+#include "support/pauses.h"
+#include "support/process_faults.h"
+#include "support/scale.h"
+#include "support/shared_memory.h"
+#include "support/syscall_faults.h"
+#include "support/temp_dir.h"
+#include "support/test_files.h"
+
+// In builds with the address sanitizer: whether what is in use can still be reached.
+extern "C" __attribute__((weak)) int __lsan_do_recoverable_leak_check();  // NOLINT
+
+namespace {
+
+constexpr unsigned int DeadlineSeconds = 60;  // of one trial: ends what hangs
+constexpr const char* LockDir = "/tmp/.orvadr_lock";
+
+struct Kind {
+    const char* name;
+    std::vector<int> errors;
+};
+
+// The errors that the manual has for each call, of those that are looked at.
+const std::array<Kind, static_cast<std::size_t>(Call::None)>& Kinds()
+{
+    static const std::array<Kind, static_cast<std::size_t>(Call::None)> kinds{{
+        {"open", {EACCES, EMFILE, EINTR, ENOENT, ENOMEM, ENOSPC}},
+        {"read", {EIO, EINTR, EAGAIN}},
+        {"write", {ENOSPC, EINTR, EIO, EAGAIN}},
+        {"fchmod", {EIO, EACCES, ENOMEM}},
+        {"fsync", {EIO, ENOSPC, EINTR}},
+        {"rename", {ENOSPC, EACCES, ENOENT, ENOMEM}},
+        {"unlink", {EACCES, EIO, ENOENT, ENOMEM}},
+        {"close", {EIO, EINTR, ENOSPC}},
+        {"stat", {ENOENT, EACCES, ENOMEM}},
+        {"fstat", {ENOMEM, EIO}},
+        {"flock", {EINTR, EAGAIN, ENOMEM}},
+        {"fcntl", {EAGAIN, EACCES, EINTR, EMFILE}},
+        {"fork", {EAGAIN, ENOMEM}},
+        {"clone", {EAGAIN, ENOMEM}},
+        {"pipe2", {EMFILE}},
+        {"dup2", {EMFILE, EINTR}},
+        {"close_range", {ENOMEM, EMFILE}},
+        {"waitpid", {EINTR}},
+        {"execve", {ENOENT, EACCES, ENOMEM, EIO, EMFILE, EAGAIN}},
+        {"getrandom", {EINTR}},
+        {"fdopen", {ENOMEM, EMFILE}},
+        {"memory", {ENOMEM}},
+        {"all memory", {ENOMEM}},
+        // Those that SQLite's own way to files may answer, and no others.
+        {"db open", {SQLITE_CANTOPEN, SQLITE_IOERR, SQLITE_NOMEM}},
+        {"db access", {SQLITE_IOERR_ACCESS}},
+        {"db delete", {SQLITE_IOERR_DELETE}},
+        {"db read", {SQLITE_IOERR_READ, SQLITE_IOERR_CORRUPTFS}},
+        {"db write", {SQLITE_FULL, SQLITE_IOERR_WRITE}},
+        {"db sync", {SQLITE_IOERR_FSYNC}},
+        {"db truncate", {SQLITE_IOERR_TRUNCATE}},
+        {"db file size", {SQLITE_IOERR_FSTAT}},
+        {"db lock", {SQLITE_BUSY, SQLITE_IOERR_LOCK}},
+        {"db look at lock", {SQLITE_IOERR_CHECKRESERVEDLOCK}},
+        {"db shared memory", {SQLITE_IOERR_SHMMAP, SQLITE_CANTOPEN, SQLITE_NOMEM}},
+        {"db shared lock", {SQLITE_BUSY, SQLITE_IOERR_SHMLOCK}},
+    }};
+    return kinds;
+}
+
+// The sums of all operations, printed at the end of the program.
+struct Sums : ::testing::Environment {
+    int operations = 0;
+    int calls = 0;
+    int faults = 0;
+
+    void TearDown() override
+    {
+        std::printf("[  FAULTS  ] %d operations, %d calls, %d faults\n", operations, calls, faults);
+    }
+};
+Sums& sums = static_cast<Sums&>(*::testing::AddGlobalTestEnvironment(new Sums));
+
+// What the trials and all processes that they fork have in common.
+struct Plan {
+    Call call;  // of these calls
+    int at;     // the one of this number, from 1,
+    int error;  // fails with this
+    pid_t caller;
+    bool isRunning;
+    bool hasEscaped;
+    int faults;
+    std::atomic<bool> isArmed;
+    std::atomic<bool> hasStruck;
+    std::atomic<int> lines;
+    std::array<std::atomic<int>, static_cast<std::size_t>(Call::None)> seen;
+};
+
+Plan& ThePlan()
+{
+    static const SharedMemory<Plan> plan;
+    return *plan;
+}
+
+const TempDir* lockPlace = nullptr;
+
+bool AllocationFails()
+{
+    return Strike(Call::Memory) != 0 || Strike(Call::AllMemory) != 0;
+}
+
+// The path as it is, or that of the file that is kept elsewhere. Takes no memory.
+struct Placed {
+    explicit Placed(const char* given) : path(given)
+    {
+        const std::size_t length = std::strlen(LockDir);
+        if (given == nullptr || std::strncmp(given, LockDir, length) != 0) return;
+        (void)std::snprintf(text.data(), text.size(), "%s%s", lockPlace->Path().c_str(),
+                            given + length);
+        path = text.data();
+    }
+    Placed(const Placed&) = delete;
+    Placed& operator=(const Placed&) = delete;
+
+    std::array<char, PATH_MAX> text{};
+    const char* path;
+};
+
+int OpenPlaced(const char* path, int flags, mode_t mode)
+{
+    return RealOpen(Placed(path).path, flags, mode);
+}
+
+int StatPlaced(const char* path, struct stat* status)
+{
+    return RealStat(Placed(path).path, status);
+}
+
+int ExecvePlaced(const char* path, char* const* arguments, char* const* environment)
+{
+    const Placed first(arguments[1]);
+    const Placed second(arguments[1] != nullptr ? arguments[2] : nullptr);
+    std::array<char*, 8> placed{};
+    for (std::size_t i = 0; arguments[i] != nullptr && i + 1 < placed.size(); ++i) {
+        placed[i] = arguments[i];
+    }
+    if (placed[1] != nullptr) placed[1] = const_cast<char*>(first.path);
+    if (placed[2] != nullptr) placed[2] = const_cast<char*>(second.path);
+    return RealExecve(path, placed.data(), environment);
+}
+
+// No trial is about power cuts, and disks are slow.
+int NoSync(int /*fd*/)
+{
+    return 0;
+}
+
+// The descriptor is gone whatever close answers.
+int CloseAnyway(int fd)
+{
+    const int result = RealClose(fd);
+    const int error = Strike(Call::Close);
+    if (error == 0) return result;
+    errno = error;
+    return -1;
+}
+
+// All that fails by system calls; pauses and sleeps are passed over.
+class System {
+  public:
+    System()
+    {
+        lockPlace = &locks;
+        Let(faults.open, OpenPlaced, Call::Open);
+        Let(faults.read, RealRead, Call::Read);
+        Let(faults.write, RealWrite, Call::Write);
+        Let(faults.fchmod, RealFchmod, Call::Fchmod);
+        Let(faults.fsync, NoSync, Call::Fsync);
+        Let(faults.fdatasync, NoSync, Call::Fsync);
+        Let(faults.rename, RealRename, Call::Rename);
+        Let(faults.unlink, RealUnlink, Call::Unlink);
+        Let(faults.stat, StatPlaced, Call::Stat);
+        Let(faults.stat64, RealStat64, Call::Stat);
+        Let(faults.lstat, RealLstat, Call::Stat);
+        Let(faults.fstat, RealFstat, Call::Fstat);
+        Let(faults.flock, RealFlock, Call::Flock);
+        Let(faults.fcntl, RealFcntl, Call::Fcntl);
+        Let(faults.clone, RealClone, Call::Clone);
+        Let(faults.pipe2, RealPipe2, Call::Pipe);
+        Let(faults.dup2, RealDup2, Call::Dup);
+        Let(faults.closeRange, RealCloseRange, Call::CloseRange);
+        Let(faults.waitpid, RealWaitpid, Call::Waitpid);
+        Let(faults.execve, ExecvePlaced, Call::Execve);
+        Let(faults.getrandom, RealGetrandom, Call::Getrandom);
+        Let(faults.fdopen, RealFdopen, Call::Fdopen);
+        Let(processes.fork, RealFork, Call::Fork);
+        faults.close = CloseAnyway;
+        // What the C library keeps for the texts of errors is there before anything is counted.
+        for (const Kind& kind : Kinds()) {
+            for (const int error : kind.errors) {
+                std::array<char, 128> text{};
+                static_cast<void>(::strerror_r(error, text.data(), text.size()));
+            }
+        }
+        faults.sleep = [](unsigned int /*seconds*/) { return 0U; };
+        AskBeforeAllocating(AllocationFails);
+    }
+    System(const System&) = delete;
+    System& operator=(const System&) = delete;
+    ~System()
+    {
+        AskBeforeAllocating(nullptr);
+        lockPlace = nullptr;
+    }
+
+  private:
+    template <class Result, class... Arguments>
+    static void Let(std::function<Result(Arguments...)>& answer, Result (*real)(Arguments...),
+                    Call call)
+    {
+        answer = [real, call](Arguments... arguments) -> Result {
+            const int error = Strike(call);
+            if (error == 0) return real(arguments...);
+            errno = error;
+            if constexpr (std::is_pointer_v<Result>) {
+                return nullptr;
+            } else {
+                return -1;
+            }
+        };
+    }
+
+    TempDir locks;
+    SyscallFaults faults;
+    ProcessFaults processes;
+};
+
+void AwaitChildren()
+{
+    int status = 0;
+    pid_t child = 0;
+    while ((child = RealWaitpid(-1, &status, __WALL)) > 0 || errno == EINTR) {
+        // One that is between a caller and its program ends as that did: by this signal.
+        EXPECT_TRUE(child < 0 || !WIFSIGNALED(status) || WTERMSIG(status) == SIGKILL)
+            << "a child was ended by signal " << WTERMSIG(status);
+    }
+}
+
+// Runs the trial with what is planned. What it leaves behind is a failure.
+void RunTrial(const std::function<void()>& trial)
+{
+    Plan& plan = ThePlan();
+    plan.isRunning = true;
+    plan.hasStruck = false;
+    plan.caller = ::getpid();
+    ::alarm(DeadlineSeconds);
+    EXPECT_EQ(::prctl(PR_SET_CHILD_SUBREAPER, 1), 0);
+    const std::size_t descriptors = CountDescriptors();
+    const long allocations = CountLiveAllocations();
+    {
+        const Pauses pauses;
+        trial();
+    }
+    if (!::testing::Test::HasFailure()) {
+        EXPECT_EQ(CountLiveAllocations(), allocations) << "memory is left behind";
+        EXPECT_EQ(CountDescriptors(), descriptors) << "descriptors are left behind";
+        EXPECT_FALSE(plan.hasEscaped) << "a child went on with its parent's work";
+    }
+    ::alarm(0);
+    plan.isRunning = false;
+}
+
+// The next call to fail: with memory, of which there is much, some are left out unless the test is
+// a long one.
+int Next(Call call, int at)
+{
+    constexpr int ThatMany = 30;
+    const bool isMuch = call == Call::Memory || call == Call::AllMemory;
+    return isMuch && at > ThatMany ? at + Scaled(7, 1) : at + 1;
+}
+
+std::string Describe(const std::string& operation)
+{
+    const Plan& plan = ThePlan();
+    return operation + " with " + Kinds()[static_cast<std::size_t>(plan.call)].name + " number " +
+           std::to_string(plan.at) + " failing with error " + std::to_string(plan.error);
+}
+
+// Lets each call of a kind fail with each of some errors. Runs in a process of its own.
+void Sweep(const std::string& operation, Call call, const std::vector<int>& errors,
+           const std::function<void()>& trial)
+{
+    Plan& plan = ThePlan();
+    plan.call = call;
+    for (const int error : errors) {
+        plan.error = error;
+        for (plan.at = 1;; plan.at = Next(call, plan.at)) {
+            RunTrial(trial);
+            if (::testing::Test::HasFailure()) {
+                ADD_FAILURE() << Describe(operation);
+                return;
+            }
+            if (!plan.hasStruck) break;
+            ++plan.faults;
+        }
+    }
+    if (&__lsan_do_recoverable_leak_check != nullptr) {
+        EXPECT_EQ(__lsan_do_recoverable_leak_check(), 0) << Describe(operation);
+    }
+}
+
+// The errors that are tried: two of them, unless the test is a long one.
+std::vector<int> ErrorsOf(Call call)
+{
+    std::vector<int> errors = Kinds()[static_cast<std::size_t>(call)].errors;
+    const auto count = static_cast<std::size_t>(Scaled(2, INT_MAX));
+    errors.resize(std::min(errors.size(), count));
+    return errors;
+}
+
+void EveryCallFails(const std::string& operation, Call first, Call end,
+                    const std::function<void()>& trial)
+{
+    const System system;
+    Plan& plan = ThePlan();
+    plan.call = Call::None;
+    plan.faults = 0;
+    RunTrial(trial);
+    // Once more: what is made once in a process is there by now.
+    RunTrial(trial);
+    if (::testing::Test::HasFailure()) return;
+
+    int calls = 0;
+    std::string list;
+    std::vector<int> seen(plan.seen.begin(), plan.seen.end());
+    for (auto kind = static_cast<std::size_t>(first); kind < static_cast<std::size_t>(end);
+         ++kind) {
+        if (seen[kind] == 0) continue;
+        const Call call = static_cast<Call>(kind);
+        const int before = plan.faults;
+        CheckInChild([&] { Sweep(operation, call, ErrorsOf(call), trial); });
+        if (plan.isRunning) ADD_FAILURE() << Describe(operation) << ": the process has ended";
+        list += std::string(", ") + Kinds()[kind].name + " " + std::to_string(seen[kind]) + "/" +
+                std::to_string(plan.faults - before);
+        calls += seen[kind];
+        if (::testing::Test::HasFailure()) break;
+    }
+    std::printf("[  FAULTS  ] %s: %d calls, %d faults (%s)\n", operation.c_str(), calls,
+                plan.faults, list.empty() ? "" : list.c_str() + 2);
+    ++sums.operations;
+    sums.calls += calls;
+    sums.faults += plan.faults;
+    ::testing::Test::RecordProperty("calls", calls);
+    ::testing::Test::RecordProperty("faults", plan.faults);
+}
+
+void NoteLine(const char* format, va_list arguments)
+{
+    static std::array<char, 4096> line;
+    (void)std::vsnprintf(line.data(), line.size(), format, arguments);
+    ++ThePlan().lines;
+}
+
+}  // namespace
+
+// What the library calls: the first in plain builds, the second in optimised ones.
+extern "C" void syslog(int /*priority*/, const char* format, ...)
+{
+    va_list arguments;
+    va_start(arguments, format);
+    NoteLine(format, arguments);
+    va_end(arguments);
+}
+
+// NOLINTNEXTLINE(bugprone-reserved-identifier)
+extern "C" void __syslog_chk(int priority, int flag, const char* format, ...);
+// NOLINTNEXTLINE(bugprone-reserved-identifier)
+extern "C" void __syslog_chk(int /*priority*/, int /*flag*/, const char* format, ...)
+{
+    va_list arguments;
+    va_start(arguments, format);
+    NoteLine(format, arguments);
+    va_end(arguments);
+}
+
+int Strike(Call call)
+{
+    Plan& plan = ThePlan();
+    if (!plan.isArmed) return 0;
+    const int number = ++plan.seen[static_cast<std::size_t>(call)];
+    if (call != plan.call) return 0;
+    if (call == Call::AllMemory ? number < plan.at : number != plan.at) return 0;
+    plan.hasStruck = true;
+    return plan.error;
+}
+
+bool IsFailing(Call call)
+{
+    return ThePlan().call == call;
+}
+
+Outcome WithFault(const std::function<bool()>& operation)
+{
+    Plan& plan = ThePlan();
+    for (auto& count : plan.seen) count = 0;
+    plan.lines = 0;
+    Outcome outcome{};
+    bool isOurs = true;
+    plan.isArmed = true;
+    try {
+        outcome.succeeded = operation();
+    } catch (const std::bad_alloc&) {
+        outcome.threw = true;
+    } catch (const Json::RuntimeError&) {
+        outcome.threw = true;  // what jsoncpp says when it finds no memory for a text
+    } catch (...) {
+        isOurs = false;
+    }
+    if (::getpid() != plan.caller) {
+        plan.hasEscaped = true;
+        ::_exit(1);
+    }
+    AwaitChildren();
+    plan.isArmed = false;
+    outcome.lines = plan.lines;
+    const bool isOfMemory = plan.call == Call::Memory || plan.call == Call::AllMemory;
+    EXPECT_TRUE(isOurs && (isOfMemory || !outcome.threw)) << "an exception got out";
+    return outcome;
+}
+
+std::string PlaceOfLock(const std::string& path)
+{
+    const std::string place = Placed(path.c_str()).path;
+    std::filesystem::create_directories(std::filesystem::path(place).parent_path());
+    return place;
+}
+
+void EveryCallFails(const std::string& operation, const std::function<void()>& trial)
+{
+    EveryCallFails(operation, Call::Open, Call::DbOpen, trial);
+}
+
+void EveryDatabaseCallFails(const std::string& operation, const std::function<void()>& trial)
+{
+    EveryCallFails(operation, Call::DbOpen, Call::None, trial);
+}

@@ -1,0 +1,206 @@
+// Files, with every call failing once.
+#include <fcntl.h>
+#include <orvadrcore/file.h>
+#include <unistd.h>
+
+#include <filesystem>
+
+#include "fault.h"
+#include "file_io.h"
+#include "json_helpers.h"
+#include "support/temp_dir.h"
+#include "support/test_files.h"
+
+using namespace OrvaDRCore;
+
+namespace {
+
+// Large enough to be kept outside of a std::string.
+const char* const Old = R"({"name":"the document that was there before"})";
+const char* const New = R"({"name":"the document that takes its place"})";
+
+Json::Value Document(const std::string& text)
+{
+    Json::Value value;
+    EXPECT_TRUE(fromString(value, text));
+    return value;
+}
+
+// A directory with a file in it.
+struct Place {
+    explicit Place(const std::string& content) { WriteFile(path, content); }
+
+    TempDir dir;
+    std::string path = dir.File("document.json");
+};
+
+}  // namespace
+
+TEST(FileFaults, ToFile)
+{
+    EveryCallFails("toFile", [] {
+        const Place place(Old);
+        const Json::Value value = Document(New);
+        const Outcome outcome = WithFault([&] { return toFile(value, place.path); });
+        EXPECT_EQ(ReadFile(place.path), outcome.succeeded ? New : Old);
+        EXPECT_TRUE(toFile(value, place.path));
+        EXPECT_EQ(ReadFile(place.path), New);
+        EXPECT_EQ(NamesIn(place.dir.Path()).size(), 1U) << "a temporary file is left";
+    });
+}
+
+TEST(FileFaults, ToFileBesideALeftOver)
+{
+    EveryCallFails("toFile beside a left-over", [] {
+        const Place place(Old);
+        WriteFile(place.path + ".orvadr-tmp0", "");
+        WriteFile(place.path + ".orvadr-tmp1", "");
+        const Json::Value value = Document(New);
+        const Outcome outcome = WithFault([&] { return toFile(value, place.path); });
+        EXPECT_EQ(ReadFile(place.path), outcome.succeeded ? New : Old);
+        EXPECT_TRUE(toFile(value, place.path));
+        EXPECT_EQ(ReadFile(place.path), New);
+        EXPECT_EQ(NamesIn(place.dir.Path()).size(), 1U) << "a temporary file is left";
+    });
+}
+
+TEST(FileFaults, FromFile)
+{
+    EveryCallFails("fromFile", [] {
+        const Place place(New);
+        const Json::Value old = Document(Old);
+        Json::Value value = old;
+        const Outcome outcome = WithFault([&] { return fromFile(value, place.path); });
+        EXPECT_EQ(toString(value), outcome.succeeded ? New : Old);
+        EXPECT_TRUE(fromFile(value, place.path));
+        EXPECT_EQ(toString(value), New);
+    });
+}
+
+TEST(FileFaults, ReadByPath)
+{
+    EveryCallFails("File::Read(path)", [] {
+        const Place place(New);
+        Json::Value value = Document(Old);
+        const Outcome outcome = WithFault([&] { return File::Read(place.path, value); });
+        // A file that cannot be found counts as missing, which is a success that reads nothing.
+        EXPECT_TRUE(toString(value) == Old || (outcome.succeeded && toString(value) == New));
+        EXPECT_TRUE(File::Read(place.path, value));
+        EXPECT_EQ(toString(value), New);
+    });
+}
+
+TEST(FileFaults, ReadByDescriptor)
+{
+    EveryCallFails("File::Read(fd)", [] {
+        const Place place(New);
+        Json::Value value = Document(Old);
+        const int fd = OpenFile(place.path, O_RDONLY);
+        const Outcome outcome = WithFault([&] { return File::Read(fd, value); });
+        EXPECT_EQ(toString(value), outcome.succeeded ? New : Old);
+        // The descriptor stays open where no stream could be made of it.
+        if (IsDescriptorOpen(fd)) {
+            outcome.ExpectSpoken();
+            ::close(fd);
+        }
+        EXPECT_TRUE(File::Read(OpenFile(place.path, O_RDONLY), value));
+        EXPECT_EQ(toString(value), New);
+    });
+}
+
+TEST(FileFaults, WriteByPath)
+{
+    EveryCallFails("File::Write(path)", [] {
+        const Place place(Old);
+        const Json::Value value = Document(New);
+        const Outcome outcome = WithFault([&] { return File::Write(place.path, value); });
+        outcome.ExpectSpoken();
+        if (outcome.succeeded) {
+            EXPECT_EQ(ReadFile(place.path), New + std::string("\n"));
+        }
+        EXPECT_TRUE(File::Write(place.path, value));
+        EXPECT_EQ(ReadFile(place.path), New + std::string("\n"));
+    });
+}
+
+TEST(FileFaults, WriteByDescriptor)
+{
+    EveryCallFails("File::Write(fd)", [] {
+        const Place place("");
+        const Json::Value value = Document(New);
+        const int fd = OpenFile(place.path, O_WRONLY);
+        const Outcome outcome = WithFault([&] { return File::Write(fd, value); });
+        outcome.ExpectSpoken();
+        if (outcome.succeeded) {
+            EXPECT_EQ(ReadFile(place.path), New);
+        }
+        if (IsDescriptorOpen(fd)) {
+            EXPECT_FALSE(outcome.succeeded);
+            ::close(fd);
+        }
+        EXPECT_TRUE(File::Write(OpenFile(place.path, O_WRONLY), value));
+        EXPECT_EQ(ReadFile(place.path), New);
+    });
+}
+
+TEST(FileFaults, ReadPairs)
+{
+    EveryCallFails("File::Read(map)", [] {
+        const Place place("port=5001\na name that is long enough=1\nnone\n");
+        using Pairs = std::map<std::string, int>;
+        const Pairs old{{"old", 1}};
+        const Pairs all{{"a", 1}, {"port", 5001}};
+        Pairs pairs = old;
+        int count = 0;
+        const Outcome outcome = WithFault([&] {
+            count = File::Read(place.path, pairs);
+            return count >= 0;
+        });
+        outcome.ExpectSpoken();
+        if (outcome.succeeded) {
+            // Reading that fails counts as the end, and a file that cannot be found as missing.
+            EXPECT_TRUE(pairs == all || (count == 0 && (pairs.empty() || pairs == old)));
+        } else if (!outcome.threw) {
+            EXPECT_EQ(pairs, old);
+        }
+        EXPECT_EQ(File::Read(place.path, pairs), 2);
+        EXPECT_EQ(pairs, all);
+    });
+}
+
+TEST(FileFaults, CreateDir)
+{
+    EveryCallFails("File::CreateDir", [] {
+        const TempDir dir;
+        const std::string path = dir.File("a directory with a long name/in another one");
+        const Outcome outcome = WithFault([&] { return File::CreateDir(path, 0700); });
+        outcome.ExpectSpoken();
+        if (outcome.succeeded) {
+            EXPECT_EQ(ModeOf(path), 0700U);
+        }
+        EXPECT_TRUE(File::CreateDir(path, 0700));
+        EXPECT_EQ(ModeOf(path), 0700U);
+    });
+}
+
+TEST(FileFaults, CreateDirThatIsThere)
+{
+    EveryCallFails("File::CreateDir of one that is there", [] {
+        const TempDir dir;
+        const Outcome outcome = WithFault([&] { return File::CreateDir(dir.Path(), 0755); });
+        EXPECT_TRUE(outcome.succeeded);
+        EXPECT_EQ(ModeOf(dir.Path()), 0700U);
+    });
+}
+
+TEST(FileFaults, RemoveDir)
+{
+    EveryCallFails("File::RemoveDir", [] {
+        const Place place(Old);
+        const std::string& path = place.dir.Path();
+        // One that cannot be found counts as removed.
+        WithFault([&] { return File::RemoveDir(path); });
+        EXPECT_TRUE(File::RemoveDir(path));
+        EXPECT_FALSE(std::filesystem::exists(path));
+    });
+}

@@ -1,0 +1,218 @@
+// Every operation of a connection, with every call failing once that it makes: system calls,
+// allocations, and SQLite's own way to its files in both journal modes.
+#include <json/writer.h>  // for the words of failed checks
+#include <orvadrcore/sqlite_condition.h>
+#include <orvadrcore/sqlite_db.h>
+#include <orvadrcore/sqlite_transaction.h>
+
+#include <filesystem>
+
+#include "fault.h"
+#include "faulty_vfs.h"
+#include "support/plain_db.h"
+#include "support/temp_dir.h"
+
+using namespace OrvaDRCore;
+
+namespace {
+
+const SqliteTableHandler Nodes("nodes", "id INTEGER PRIMARY KEY, name TEXT");
+const SqliteTableHandler Others("others", "id INTEGER");
+
+// For transactions: the look for a table is a statement, too, at which SQLite may end them.
+const SqliteTableHandler NodesThatAreThere("nodes", "");
+
+// Texts that fill more than a page of the file.
+std::string Long(char letter)
+{
+    return std::string(5000, letter);
+}
+
+SqliteValueList Record(int id, char letter)
+{
+    SqliteValueList record;
+    record.AddValue("id", id);
+    record.AddValue("name", Long(letter));
+    return record;
+}
+
+InsertCommand InsertOf(int id, char letter)
+{
+    InsertCommand insert;
+    insert.SetTable(Nodes);
+    insert.SetFieldValues(Record(id, letter));
+    return insert;
+}
+
+UpdateCommand UpdateOfAll(char letter, const SqliteTableHandler& table)
+{
+    UpdateCommand update;
+    update.SetTable(table);
+    update.AddFieldValue("name", Long(letter));
+    update.SetCondition("id > 0");
+    return update;
+}
+
+// What is in the file before each operation: the ids, and the letters of the texts.
+const char* const Before = "1a,2b,3c";
+
+struct Operation {
+    const char* name;
+    std::function<bool(SqliteDB&)> run;
+    std::string after;   // what is in the file then
+    bool opens = false;  // by hand: a failure of Open() alone leaves the error code as it is
+};
+
+bool Work(SqliteDB& db)
+{
+    SqliteTransaction transaction(db);
+    return transaction.Begin() && db.UpdateRecord(UpdateOfAll('x', NodesThatAreThere)) &&
+           db.InsertRecords(NodesThatAreThere, {Record(4, 'x'), Record(5, 'x')}) &&
+           db.DeleteRecord("id=1", NodesThatAreThere) && transaction.Commit();
+}
+
+bool WorkThatIsRolledBack(SqliteDB& db)
+{
+    SqliteTransaction transaction(db);
+    return transaction.Begin() && db.UpdateRecord(UpdateOfAll('x', NodesThatAreThere)) &&
+           transaction.Rollback();
+}
+
+bool WorkThatIsLeft(SqliteDB& db)
+{
+    SqliteTransaction transaction(db);
+    return transaction.Begin() && db.UpdateRecord(UpdateOfAll('x', NodesThatAreThere));
+}
+
+bool Select(SqliteDB& db)
+{
+    SelectCommand select;
+    select.SetTable(Nodes);
+    select.SelectAll();
+    std::vector<SqliteValueList> records;
+    if (!db.SelectRecords(select, records)) return false;
+    EXPECT_GE(records.size(), 3U);
+    SqliteValueList record;
+    record.AddValue("old", 1);
+    const bool isRead = db.SelectRecord(select, record);
+    EXPECT_EQ(record.HasField("old"), !isRead);
+    return isRead;
+}
+
+const std::vector<Operation>& Operations()
+{
+    static const std::vector<Operation> operations{
+        {"Open", [](SqliteDB& db) { return db.Open(); }, Before, true},
+        {"InsertRecord", [](SqliteDB& db) { return db.InsertRecord(InsertOf(4, 'd')); },
+         "1a,2b,3c,4d"},
+        {"InsertRecords",
+         [](SqliteDB& db) {
+             return db.InsertRecords(Nodes, {Record(4, 'd'), Record(5, 'e'), Record(6, 'f')});
+         },
+         "1a,2b,3c,4d,5e,6f"},
+        {"UpdateRecord", [](SqliteDB& db) { return db.UpdateRecord(UpdateOfAll('x', Nodes)); },
+         "1x,2x,3x"},
+        {"SelectRecords and SelectRecord", Select, Before},
+        {"DeleteRecord", [](SqliteDB& db) { return db.DeleteRecord("id=2", Nodes); }, "1a,3c"},
+        {"DeleteAllRecords", [](SqliteDB& db) { return db.DeleteAllRecords(Nodes); }, ""},
+        {"Exec", [](SqliteDB& db) { return db.Open() && db.Exec("DELETE FROM nodes WHERE id=3"); },
+         "1a,2b", true},
+        {"CreateTable", [](SqliteDB& db) { return db.Open() && db.CreateTable(Others); }, Before,
+         true},
+        {"a transaction that is committed", Work, "2x,3x,4x,5x"},
+        {"a transaction that is rolled back", WorkThatIsRolledBack, Before},
+        {"a transaction that is left", WorkThatIsLeft, Before},
+    };
+    return operations;
+}
+
+// Files to begin with, one for each journal mode.
+class Originals {
+  public:
+    Originals()
+    {
+        for (const char* mode : {"delete", "wal"}) {
+            PlainDb db(Of(mode));
+            db.Run(
+                "PRAGMA synchronous = OFF; CREATE TABLE nodes (id INTEGER PRIMARY KEY, name TEXT)");
+            db.Run("PRAGMA journal_mode = " + std::string(mode));
+            for (const char letter : {'a', 'b', 'c'}) {
+                db.Run("INSERT INTO nodes (name) VALUES ('" + Long(letter) + "')");
+            }
+        }
+    }
+    std::string Of(const std::string& mode) const { return dir.File(mode + ".db"); }
+
+  private:
+    TempDir dir;
+};
+
+std::string Content(const std::string& path)
+{
+    PlainDb db(path);
+    EXPECT_EQ(db.Run("PRAGMA integrity_check"), "ok");
+    const std::string rows = db.Run(
+        "SELECT group_concat(id || substr(name,1,1)) FROM (SELECT * FROM nodes ORDER BY id)"
+        " WHERE length(name) = 5000");
+    return rows == "NULL" ? "" : rows;
+}
+
+// The file holds what was there before or all of the change; where the operation says that it has
+// been done, the change.
+void TryOnce(const Operation& operation, const std::string& original, unsigned int retries)
+{
+    const TempDir dir;
+    const std::string path = dir.File("test.db");
+    std::filesystem::copy_file(original, path);
+    SqliteDB db(path, retries);
+    const Outcome outcome = WithFault([&] { return operation.run(db); });
+    outcome.ExpectSpoken();
+    EXPECT_TRUE(outcome.succeeded || outcome.threw || db.GetErrCode() != 0 || operation.opens);
+
+    const std::string content = Content(path);
+    EXPECT_TRUE(content == Before || content == operation.after) << content;
+    if (outcome.succeeded) {
+        EXPECT_EQ(content, operation.after);
+    }
+
+    // A file that SQLite could not open for writing it has opened for reading alone, until it is
+    // closed.
+    if (IsFailing(Call::Open)) db.Close();
+    if (content == Before) {
+        EXPECT_TRUE(operation.run(db)) << db.GetErr()[0U]["err_msg"]["sqlite_errmsg"];
+        EXPECT_EQ(Content(path), operation.after);
+    }
+    EXPECT_TRUE(db.Open() && db.Exec("DELETE FROM nodes"))
+        << "the connection is of no use any more";
+    EXPECT_EQ(Content(path), "");
+}
+
+}  // namespace
+
+// One test for each operation: they run side by side.
+class DatabaseFaults : public ::testing::TestWithParam<std::size_t> {
+  protected:
+    const Operation& operation = Operations()[GetParam()];
+    const Originals originals;
+};
+
+TEST_P(DatabaseFaults, OfTheSystem)
+{
+    EveryCallFails(std::string("SqliteDB: ") + operation.name,
+                   [&] { TryOnce(operation, originals.Of("delete"), 0); });
+}
+
+TEST_P(DatabaseFaults, OfTheFile)
+{
+    const FaultyVfs vfs;
+    for (const char* mode : {"delete", "wal"}) {
+        for (const unsigned int retries : {0U, 2U}) {
+            const std::string words = std::string(", journal ") + mode + ", retries ";
+            EveryDatabaseCallFails(operation.name + words + std::to_string(retries),
+                                   [&] { TryOnce(operation, originals.Of(mode), retries); });
+        }
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(Operations, DatabaseFaults,
+                         ::testing::Range(std::size_t{0}, Operations().size()));
