@@ -34,7 +34,8 @@
 /// behind the removal of the pid file.
 ///
 /// An object is used by one thread at a time and holds no file and no lock between calls. Nothing
-/// throws by itself. Log lines are at DEBUG unless said otherwise and name the file `cache.cpp`.
+/// throws by itself unless memory runs out. Log lines are at DEBUG unless said otherwise and name
+/// the file `cache.cpp`.
 ///
 /// \warning The lock of a cache is a FileLock. Where it cannot be opened at all (no rights, no
 ///          descriptors left, a name too long) every process seems to find another one updating: a

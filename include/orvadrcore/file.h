@@ -9,8 +9,8 @@
 /// \endcode
 ///
 /// All operations are static and keep no state; any thread may call them. Nothing is locked:
-/// whoever needs to be alone holds a FileLock around the call. Nothing throws; log lines name the
-/// file `file.cpp`.
+/// whoever needs to be alone holds a FileLock around the call. Nothing throws unless memory runs
+/// out; log lines name the file `file.cpp`.
 #ifndef ORVADRCORE_FILE_H
 #define ORVADRCORE_FILE_H
 

@@ -11,7 +11,8 @@
 /// A lock is a `flock` on the file of its name in /tmp/.orvadr_lock. Two objects exclude each
 /// other, also within one process, and so does `flock(1)` on the same file; a process that ends,
 /// however it ends, leaves none of its locks behind. The file itself stays. Failures are logged at
-/// ERR (file `file_lock.cpp`), nothing throws, and an object is used by one thread at a time.
+/// ERR (file `file_lock.cpp`), nothing throws unless memory runs out, and an object is used by one
+/// thread at a time.
 ///
 /// \warning Named locks are for processes running as root. The lock directory belongs to whoever
 ///          made it first. A lock file gets the permission bits 01204 less the umask: an ordinary

@@ -10,7 +10,8 @@
 ///
 /// A request only holds and checks its parts; it sends nothing. In JSON the three reserved keys
 /// "api", "method" and "version" stand beside the parameters. Requests are plain values, each used
-/// by one thread at a time. Nothing is logged and nothing throws, whatever the JSON looks like.
+/// by one thread at a time. Nothing is logged and nothing throws, whatever the JSON looks like,
+/// unless memory runs out.
 #ifndef ORVADRCORE_REQUEST_H
 #define ORVADRCORE_REQUEST_H
 

@@ -14,8 +14,9 @@
 /// \endcode
 ///
 /// Replies come from remote nodes and may be broken in every way: whatever the text or JSON looks
-/// like, each question gets an answer, nothing throws and nothing is logged. A response is a plain
-/// value, used by one thread at a time. References that it gives out are good until it changes.
+/// like, each question gets an answer, nothing throws unless memory runs out, and nothing is
+/// logged. A response is a plain value, used by one thread at a time. References that it gives out
+/// are good until it changes.
 #ifndef ORVADRCORE_RESPONSE_H
 #define ORVADRCORE_RESPONSE_H
 

@@ -11,8 +11,8 @@
 /// \endcode
 ///
 /// Builders own copies of all that they are given and keep no pointers; each is used by one thread
-/// at a time. Nothing throws; what is refused is logged (file `sqlite_command.cpp`), answered by
-/// false or an empty text, and changes nothing.
+/// at a time. Nothing throws unless memory runs out; what is refused is logged (file
+/// `sqlite_command.cpp`), answered by false or an empty text, and changes nothing.
 ///
 /// \warning Table names, field names, schemas and condition texts are written into the statement as
 ///          they stand, and text values are quoted but not escaped: see

@@ -10,8 +10,9 @@
 ///
 /// A condition is a plain value: copied, passed by reference, used by one thread at a time. It
 /// holds a text that is made when it is set and never parsed. A constructor with operands does what
-/// `SetValue` does and drops its answer: ask IsValid() or look at the text. Nothing throws; what is
-/// refused is logged at ERR (file `sqlite_condition.cpp`, function `SetValue`).
+/// `SetValue` does and drops its answer: ask IsValid() or look at the text. Nothing throws unless
+/// memory runs out; what is refused is logged at ERR (file `sqlite_condition.cpp`, function
+/// `SetValue`).
 ///
 /// \warning Column names and operand texts are taken as they stand, and a text value is quoted but
 ///          not escaped: see SqliteValue::ToFormatedValue().

@@ -15,7 +15,7 @@
 ///
 /// **Errors.** Operations answer true or false. GetErrCode() and GetErr() describe the last one: 0
 /// and null after a success, otherwise an ERR::Code and, for what SQLite refused, the failed
-/// tries. Nothing throws. Log lines name the file `sqlite_db.cpp`.
+/// tries. Nothing throws unless memory runs out. Log lines name the file `sqlite_db.cpp`.
 ///
 /// **Threads and forks.** An object is used by one thread at a time. A connection must not be used,
 /// closed or destroyed in a child made by fork: open a new object there. That one is refused for
@@ -63,6 +63,7 @@ class ORVADRCORE_API SqliteDB {
     /// Takes the connection over, with error code and record; `other` is closed then and still
     /// names its file.
     /// \param other  the connection to take
+    /// \note Copies the file's name: without memory for that the program ends.
     SqliteDB(SqliteDB&& other) noexcept;
 
     /// Closes this connection and takes the other over, as the constructor does.
@@ -236,7 +237,9 @@ class ORVADRCORE_API SqliteDB {
 
     // --------------------------------------------------------------------------------- connection
 
-    /// Opens the file, unless it is open. The error code and record stay as they are.
+    /// Opens the file, unless it is open. The error code and record stay as they are. A file that
+    /// cannot be opened for writing, for want of rights or of descriptors, SQLite opens for reading:
+    /// statements that write then fail until the connection is closed.
     /// \return false, with WARN `Failed to open db[%s]`, the connection closed; or with WARN
     ///         `Failed to set busy timeout with error`, the connection open: the next call answers
     ///         true

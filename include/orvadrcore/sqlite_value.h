@@ -11,8 +11,8 @@
 /// \endcode
 ///
 /// Values and records are plain: they own all that they hold, and each is used by one thread at a
-/// time. Nothing here throws; what is refused is logged (file `sqlite_value.cpp`) and answered by
-/// false or by an invalid value.
+/// time. Nothing here throws unless memory runs out; what is refused is logged (file
+/// `sqlite_value.cpp`) and answered by false or by an invalid value.
 #ifndef ORVADRCORE_SQLITE_VALUE_H
 #define ORVADRCORE_SQLITE_VALUE_H
 

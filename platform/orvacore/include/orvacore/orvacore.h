@@ -1,7 +1,7 @@
 /// \file
 /// Stand-in for the appliance's core library on Linux systems that lack it: the calls that the DR
 /// library needs. Every call may be made from any thread unless it says otherwise; none throws,
-/// none logs.
+/// unless memory runs out, none logs.
 ///
 /// Programs are started without a shell and inherit descriptors 0, 1 and 2, and no others. They are
 /// no children of the caller, who gets no SIGCHLD for them: a handler that reaps all children does
