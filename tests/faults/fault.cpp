@@ -19,6 +19,7 @@
 #include <optional>
 #include <vector>
 
+#include "json_helpers.h"
 #include "support/allocation_faults.h"
 #include "support/child_checks.h"
 #include "support/pauses.h"
@@ -220,6 +221,9 @@ class System {
                 static_cast<void>(::strerror_r(error, text.data(), text.size()));
             }
         }
+        // And so is what the library makes for JSON once in a process.
+        Json::Value document;
+        EXPECT_TRUE(OrvaDRCore::fromString(document, OrvaDRCore::toString(document)));
         faults.sleep = [](unsigned int /*seconds*/) { return 0U; };
         AskBeforeAllocating(AllocationFails);
     }
