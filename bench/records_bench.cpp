@@ -93,21 +93,12 @@ class LoopEngine {
         while (sqlite3_step(select.get()) == SQLITE_ROW) AppendRow(fields);
         sqlite3_reset(select.get());
     }
-    std::string Selected() const
-    {
-        std::vector<Node> nodes;
-        for (const auto& row : rows) {
-            nodes.push_back({row.at("id").asInt(), row.at("name").asString(),
-                             row.at("address").asString(), row.at("port").asInt(),
-                             row.at("state").asInt()});
-        }
-        return ToText(nodes);
-    }
+    std::string Selected() const { return ToText(rows); }
 
   private:
     void AppendRow(const std::vector<std::string>& fields)
     {
-        std::map<std::string, Json::Value>& row = rows.emplace_back();
+        auto& row = rows.emplace_back();
         int column = 0;
         for (const std::string& field : fields) {
             if (sqlite3_column_type(select.get(), column) == SQLITE_INTEGER) {
@@ -124,7 +115,7 @@ class LoopEngine {
 
     Database handle;
     Statement select;
-    std::vector<std::map<std::string, Json::Value>> rows;
+    NamedRows rows;
 };
 
 template <class Engine>
@@ -181,8 +172,14 @@ void AddRecords()
     Aim({Contract}, OfTransaction);
     AddAll<SelectAll>({}, "select 10,000 rows of 5 columns");
     Add<SelectAll<LoopEngine>>("select 10,000 rows of 5 columns", "C loop");
+#if BENCH_HAS_SQLITECPP
+    Add<SelectAll<SqliteCppByName>>("select 10,000 rows of 5 columns", "SQLiteCpp by name");
+#endif
+#if BENCH_HAS_SOCI
+    Add<SelectAll<SociByName>>("select 10,000 rows of 5 columns", "SOCI by name");
+#endif
     Aim({"C loop"}, OfLoop);
-    Aim({"SQLiteCpp", "SOCI"}, 1);
+    Aim({"SQLiteCpp by name", "SOCI by name"}, 1);
     AddAll<Update>({}, "update, autocommit, memory", Mode::Autocommit);
     AddAll<Update>({}, "update, transaction", Mode::Transaction);
     Aim({Contract}, OfTransaction);

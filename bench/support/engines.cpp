@@ -102,6 +102,17 @@ std::string ToText(const std::vector<Node>& nodes)
     return text;
 }
 
+std::string ToText(const NamedRows& rows)
+{
+    std::vector<Node> nodes;
+    for (const auto& row : rows) {
+        nodes.push_back({row.at("id").asInt(), row.at("name").asString(),
+                         row.at("address").asString(), row.at("port").asInt(),
+                         row.at("state").asInt()});
+    }
+    return ToText(nodes);
+}
+
 void FillNodes(const std::string& path, int rows, int tables)
 {
     const int before = tables / 2;

@@ -9,6 +9,7 @@
 #include <string>
 #include <vector>
 
+#include <json/value.h>
 #include <orvadrcore/sqlite_db.h>
 
 #include "support/by_hand.h"
@@ -30,6 +31,10 @@ struct Node {
 Node MakeNode(int id);
 std::string ToText(const Node& node);
 std::string ToText(const std::vector<Node>& nodes);
+
+// Rows as those want them who do not know the columns: values of any type by column name.
+using NamedRows = std::vector<std::map<std::string, Json::Value>>;
+std::string ToText(const NamedRows& rows);
 
 // A new database with nodes 1 to `rows`, and `tables` - 1 other tables, half of them older than nodes.
 void FillNodes(const std::string& path, int rows, int tables = 1);
@@ -120,6 +125,23 @@ class SqliteCppEngine {
     std::unique_ptr<State> state;
     std::vector<Node> rows;
 };
+
+// The same library, its rows by column name.
+class SqliteCppByName {
+  public:
+    explicit SqliteCppByName(const std::string& path);
+    ~SqliteCppByName();
+    SqliteCppByName(const SqliteCppByName&) = delete;
+    SqliteCppByName& operator=(const SqliteCppByName&) = delete;
+    void Exec(const char* statement);
+    void SelectAll();
+    std::string Selected() const { return ToText(rows); }
+
+  private:
+    struct State;
+    std::unique_ptr<State> state;
+    NamedRows rows;
+};
 #endif
 
 #if BENCH_HAS_SOCI
@@ -141,6 +163,23 @@ class SociEngine {
     struct State;
     std::unique_ptr<State> state;
     std::vector<Node> rows;
+};
+
+// The same library, its rows by column name.
+class SociByName {
+  public:
+    explicit SociByName(const std::string& path);
+    ~SociByName();
+    SociByName(const SociByName&) = delete;
+    SociByName& operator=(const SociByName&) = delete;
+    void Exec(const char* statement);
+    void SelectAll();
+    std::string Selected() const { return ToText(rows); }
+
+  private:
+    struct State;
+    std::unique_ptr<State> state;
+    NamedRows rows;
 };
 #endif
 

@@ -82,6 +82,38 @@ void SociEngine::Delete(int id)
     state->remove.execute(true);
 }
 
+struct SociByName::State {
+    explicit State(const std::string& path) : session(soci::sqlite3, "db=" + path + " timeout=1") {}
+
+    soci::session session;
+};
+
+SociByName::SociByName(const std::string& path) : state(std::make_unique<State>(path)) {}
+
+SociByName::~SociByName() = default;
+
+void SociByName::Exec(const char* statement)
+{
+    state->session << statement;
+}
+
+void SociByName::SelectAll()
+{
+    rows.clear();
+    const soci::rowset<soci::row> all = (state->session.prepare << "SELECT * FROM nodes");
+    for (const soci::row& given : all) {
+        auto& row = rows.emplace_back();
+        for (std::size_t column = 0; column < given.size(); ++column) {
+            const soci::column_properties& properties = given.get_properties(column);
+            if (properties.get_data_type() == soci::dt_integer) {
+                row.emplace(properties.get_name(), given.get<int>(column));
+            } else {
+                row.emplace(properties.get_name(), given.get<std::string>(column));
+            }
+        }
+    }
+}
+
 }  // namespace Bench
 
 #endif

@@ -86,6 +86,40 @@ void SqliteCppEngine::Delete(int id)
     state->remove.reset();
 }
 
+struct SqliteCppByName::State {
+    explicit State(const std::string& path) : db(path, SQLite::OPEN_READWRITE, BusyTimeoutMSec) {}
+
+    SQLite::Database db;
+    SQLite::Statement selectAll{db, "SELECT * FROM nodes"};
+};
+
+SqliteCppByName::SqliteCppByName(const std::string& path) : state(std::make_unique<State>(path)) {}
+
+SqliteCppByName::~SqliteCppByName() = default;
+
+void SqliteCppByName::Exec(const char* statement)
+{
+    state->db.exec(statement);
+}
+
+void SqliteCppByName::SelectAll()
+{
+    rows.clear();
+    SQLite::Statement& select = state->selectAll;
+    while (select.executeStep()) {
+        auto& row = rows.emplace_back();
+        for (int column = 0; column < select.getColumnCount(); ++column) {
+            const SQLite::Column value = select.getColumn(column);
+            if (value.isInteger()) {
+                row.emplace(value.getName(), value.getInt());
+            } else {
+                row.emplace(value.getName(), value.getText());
+            }
+        }
+    }
+    select.reset();
+}
+
 }  // namespace Bench
 
 #endif

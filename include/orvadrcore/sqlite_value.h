@@ -126,7 +126,11 @@ class ORVADRCORE_API SqliteValueList {
   public:
     SqliteValueList() = default;
     SqliteValueList(const SqliteValueList&) = default;  ///< A copy of all fields.
-    SqliteValueList(SqliteValueList&& other) noexcept;  ///< Takes all fields of the other.
+
+    /// Takes all fields of another record.
+    /// \param other  the record to take from, which is empty then
+    SqliteValueList(SqliteValueList&& other) noexcept;
+
     virtual ~SqliteValueList();
 
     /// Replaces all fields by copies of the other's.
