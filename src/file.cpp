@@ -76,8 +76,7 @@ bool File::Read(const std::string& path, Json::Value& value)
     std::string text;
     ReadAll(file.Get(), text);  // what a failure has cut off does not parse
     // The lines are joined with nothing between them.
-    const std::size_t first = std::min(text.find('\n'), text.size());
-    text.erase(std::remove(&text[first], text.data() + text.size(), '\n') - text.data());
+    text.erase(std::remove(text.begin(), text.end(), '\n'), text.end());
     return fromString(value, text);
 }
 
