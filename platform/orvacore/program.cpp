@@ -124,7 +124,7 @@ int StartProgram(const Start& start, pid_t& program)
     // The child makes system calls only, and this process stands still until it is the program.
     program = ::vfork();  // NOLINT(clang-analyzer-security.insecureAPI.vfork)
     if (program < 0) return errno;
-    if (program == 0) BecomeProgram(start, pipe[1]);
+    if (program == 0) BecomeProgram(start, pipe[1]);  // does not come back
     ::close(pipe[1]);
     return ReceiveError(pipe[0], 0);
 }
@@ -135,7 +135,7 @@ int StartProgram(const Start& start, pid_t& program)
     ResetSignals();
     pid_t program = -1;
     const bool arranged = ArrangeDescriptors(start.output, report);
-    const int error = arranged ? StartProgram(start, program) : errno;
+    const int error = arranged ? StartProgram(start, program) : errno;  // NOLINT(*-unix.Vfork)
     SendError(report, error);
     ::close_range(0, UINT_MAX, 0);  // who reads the program's output waits for the program alone
     const int code = error == 0 ? WaitFor(program) : ExitCannotStart;

@@ -13,7 +13,9 @@
 #include "support/temp_dir.h"
 #include "support/test_files.h"
 
-using namespace OrvaDRCore;
+using OrvaDRCore::Cache;
+using OrvaDRCore::FileLock;
+using OrvaDRCore::fromFile;
 
 namespace {
 

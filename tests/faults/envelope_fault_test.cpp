@@ -7,7 +7,19 @@
 #include "fault.h"
 #include "json_helpers.h"
 
-using namespace OrvaDRCore;
+using OrvaDRCore::InsertCommand;
+using OrvaDRCore::Request;
+using OrvaDRCore::Response;
+using OrvaDRCore::SelectCommand;
+using OrvaDRCore::SqliteAnd;
+using OrvaDRCore::SqliteEqual;
+using OrvaDRCore::SqliteIn;
+using OrvaDRCore::SqliteNotEqual;
+using OrvaDRCore::SqliteTableHandler;
+using OrvaDRCore::SqliteValue;
+using OrvaDRCore::SqliteValueList;
+using OrvaDRCore::toString;
+using OrvaDRCore::UpdateCommand;
 
 namespace {
 

@@ -452,7 +452,7 @@ Outcome WithFault(const std::function<bool()>& operation)
 
 std::string PlaceOfLock(const std::string& path)
 {
-    const std::string place = Placed(path.c_str()).path;
+    std::string place = Placed(path.c_str()).path;
     std::filesystem::create_directories(std::filesystem::path(place).parent_path());
     return place;
 }

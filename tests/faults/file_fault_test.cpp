@@ -11,7 +11,11 @@
 #include "support/temp_dir.h"
 #include "support/test_files.h"
 
-using namespace OrvaDRCore;
+using OrvaDRCore::File;
+using OrvaDRCore::fromFile;
+using OrvaDRCore::fromString;
+using OrvaDRCore::toFile;
+using OrvaDRCore::toString;
 
 namespace {
 

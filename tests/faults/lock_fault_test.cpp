@@ -5,7 +5,7 @@
 #include "support/temp_dir.h"
 #include "support/test_files.h"
 
-using namespace OrvaDRCore;
+using OrvaDRCore::FileLock;
 
 namespace {
 

@@ -14,7 +14,9 @@
 #include "support/temp_dir.h"
 #include "support/test_files.h"
 
-using namespace OrvaDRCore;
+using OrvaDRCore::Container;
+using OrvaDRCore::GenerateUUID;
+using OrvaDRCore::RandomSleepInMSec;
 
 TEST(PlatformFaults, PidFileCreate)
 {

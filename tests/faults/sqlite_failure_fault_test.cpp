@@ -8,7 +8,10 @@
 #include "support/sqlite_faults.h"
 #include "support/temp_dir.h"
 
-using namespace OrvaDRCore;
+using OrvaDRCore::SqliteDB;
+using OrvaDRCore::SqliteTableHandler;
+using OrvaDRCore::SqliteTransaction;
+using OrvaDRCore::SqliteValueList;
 
 namespace {
 

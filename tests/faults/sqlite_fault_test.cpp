@@ -12,7 +12,13 @@
 #include "support/plain_db.h"
 #include "support/temp_dir.h"
 
-using namespace OrvaDRCore;
+using OrvaDRCore::InsertCommand;
+using OrvaDRCore::SelectCommand;
+using OrvaDRCore::SqliteDB;
+using OrvaDRCore::SqliteTableHandler;
+using OrvaDRCore::SqliteTransaction;
+using OrvaDRCore::SqliteValueList;
+using OrvaDRCore::UpdateCommand;
 
 namespace {
 
