@@ -122,9 +122,10 @@ int StartProgram(const Start& start, pid_t& program)
     std::array<int, 2> pipe{};  // closed by the start of the program
     if (::pipe2(pipe.data(), O_CLOEXEC) < 0) return errno;
     // The child makes system calls only, and this process stands still until it is the program.
-    program = ::vfork();  // NOLINT(clang-analyzer-security.insecureAPI.vfork)
-    if (program < 0) return errno;
-    if (program == 0) BecomeProgram(start, pipe[1]);  // does not come back
+    const pid_t child = ::vfork();  // NOLINT(clang-analyzer-security.insecureAPI.vfork)
+    if (child < 0) return errno;
+    if (child == 0) BecomeProgram(start, pipe[1]);  // NOLINT(clang-analyzer-unix.Vfork)
+    program = child;
     ::close(pipe[1]);
     return ReceiveError(pipe[0], 0);
 }
@@ -135,7 +136,7 @@ int StartProgram(const Start& start, pid_t& program)
     ResetSignals();
     pid_t program = -1;
     const bool arranged = ArrangeDescriptors(start.output, report);
-    const int error = arranged ? StartProgram(start, program) : errno;  // NOLINT(*-unix.Vfork)
+    const int error = arranged ? StartProgram(start, program) : errno;
     SendError(report, error);
     ::close_range(0, UINT_MAX, 0);  // who reads the program's output waits for the program alone
     const int code = error == 0 ? WaitFor(program) : ExitCannotStart;

@@ -50,7 +50,7 @@ template <class Value>
 bool Same(const Value& left, const Value& right)
 {
     if constexpr (std::is_same_v<Value, double>) {
-        return std::memcmp(&left, &right, sizeof left) == 0;
+        return left == right && std::signbit(left) == std::signbit(right);
     } else {
         return left == right;
     }
