@@ -31,17 +31,27 @@ struct InsertText {
     std::string text;
 };
 
+OrvaDRCore::InsertCommand MakeCommand(const InsertText& given,
+                                      const OrvaDRCore::SqliteTableHandler& handler)
+{
+    OrvaDRCore::InsertCommand command;
+    command.SetTable(handler);
+    command.AddFieldValue("id", given.row.id);
+    command.AddFieldValue("name", given.row.name);
+    command.AddFieldValue("address", given.row.address);
+    command.AddFieldValue("enabled", given.row.enabled);
+    return command;
+}
+
 struct OurInsert : InsertText {
-    void Run()
-    {
-        OrvaDRCore::InsertCommand command;
-        command.SetTable(handler);
-        command.AddFieldValue("id", row.id);
-        command.AddFieldValue("name", row.name);
-        command.AddFieldValue("address", row.address);
-        command.AddFieldValue("enabled", row.enabled);
-        text = command.GetCommand();
-    }
+    void Run() { text = command.GetCommand(); }
+
+    OrvaDRCore::SqliteTableHandler handler{table, "id INTEGER PRIMARY KEY"};
+    OrvaDRCore::InsertCommand command = MakeCommand(*this, handler);
+};
+
+struct OurMadeInsert : InsertText {
+    void Run() { text = MakeCommand(*this, handler).GetCommand(); }
 
     OrvaDRCore::SqliteTableHandler handler{table, "id INTEGER PRIMARY KEY"};
 };
@@ -59,30 +69,47 @@ struct BareInsert : InsertText {
     }
 };
 
-// The columns are named one by one and stand in the order of their names; the builder owns copies.
+// The columns stand in the order of their names.
+std::string WriteInsert(const std::string& table, const std::map<std::string, Value>& fields)
+{
+    std::string made = "INSERT INTO " + table + " (";
+    std::string literals;
+    for (const auto& [field, value] : fields) {
+        if (!literals.empty()) {
+            made += ',';
+            literals += ',';
+        }
+        made += field;
+        AppendLiteral(literals, value);
+    }
+    made += ") VALUES (";
+    made += literals;
+    made += ");";
+    return made;
+}
+
+std::map<std::string, Value> MakeFields(const Row& row)
+{
+    std::map<std::string, Value> fields;
+    fields.insert_or_assign("id", row.id);
+    fields.insert_or_assign("name", row.name);
+    fields.insert_or_assign("address", row.address);
+    fields.insert_or_assign("enabled", row.enabled);
+    return fields;
+}
+
 struct ContractInsert : InsertText {
+    void Run() { text = WriteInsert(table, fields); }
+
+    std::map<std::string, Value> fields = MakeFields(row);
+};
+
+// The columns are named one by one; the builder owns copies.
+struct ContractMadeInsert : InsertText {
     void Run()
     {
         const std::string tableCopy = table;
-        std::map<std::string, Value> fields;
-        fields.insert_or_assign("id", row.id);
-        fields.insert_or_assign("name", row.name);
-        fields.insert_or_assign("address", row.address);
-        fields.insert_or_assign("enabled", row.enabled);
-        std::string made = "INSERT INTO " + tableCopy + " (";
-        std::string literals;
-        for (const auto& [field, value] : fields) {
-            if (!literals.empty()) {
-                made += ',';
-                literals += ',';
-            }
-            made += field;
-            AppendLiteral(literals, value);
-        }
-        made += ") VALUES (";
-        made += literals;
-        made += ");";
-        text = std::move(made);
+        text = WriteInsert(tableCopy, MakeFields(row));
     }
 };
 
@@ -136,12 +163,10 @@ struct InText {
 };
 
 struct OurIn : InText {
-    using InText::InText;
-    void Run()
-    {
-        const std::vector<SqliteValue> values(ids.begin(), ids.end());
-        text = OrvaDRCore::SqliteIn("id", values).GetCondition();
-    }
+    explicit OurIn(int count) : InText(count), values(ids.begin(), ids.end()) {}
+    void Run() { text = OrvaDRCore::SqliteIn("id", values).GetCondition(); }
+
+    std::vector<SqliteValue> values;
 };
 
 struct BareIn : InText {
@@ -161,10 +186,9 @@ struct BareIn : InText {
 
 // The list is one of typed values.
 struct ContractIn : InText {
-    using InText::InText;
+    explicit ContractIn(int count) : InText(count), values(ids.begin(), ids.end()) {}
     void Run()
     {
-        const std::vector<Value> values(ids.begin(), ids.end());
         std::string made = "id IN ( ";
         for (const Value& value : values) {
             AppendLiteral(made, value);
@@ -174,6 +198,8 @@ struct ContractIn : InText {
         made += " )";
         text = std::move(made);
     }
+
+    std::vector<Value> values;
 };
 
 struct StreamIn : InText {
@@ -205,6 +231,9 @@ void AddTexts()
     Add<SqliteInsert>("text of an insert of 4 values", "sqlite3_mprintf");
     Add<StreamInsert>("text of an insert of 4 values", "ostringstream");
     Aim({"ostringstream"}, InsertOfStream);
+    Add<OurMadeInsert>("insert of 4 values, built and written", Ours);
+    Add<BareInsert>("insert of 4 values, built and written", Bare);
+    Add<ContractMadeInsert>("insert of 4 values, built and written", Contract);
     Add<OurIn>("text of an IN list of 1,000", Ours, 1000);
     Add<BareIn>("text of an IN list of 1,000", Bare, 1000);
     Add<ContractIn>("text of an IN list of 1,000", Contract, 1000);

@@ -1,6 +1,6 @@
 #include <orvadrcore/sqlite_command.h>
 
-#include <utility>
+#include <type_traits>
 
 #include <orvadrcore/utils.h>
 
@@ -11,13 +11,21 @@ namespace OrvaDRCore {
 
 namespace {
 
-bool AddFieldValue(SqliteValueList& record, const std::string& field, SqliteValue&& value)
+// Room for a statement from the beginning, so that it need not move as it grows.
+constexpr std::size_t UsualLength = 240;
+
+template <class T>
+bool AddFieldValue(SqliteValueList& record, const std::string& field, const T& value)
 {
-    if (field.empty() || !value.IsValid()) {
-        DR_LOG(Err, "Bad Field [%s] /value[%s]", field.c_str(), value.ToFormatedValue().c_str());
+    bool isThere = !field.empty();
+    if constexpr (std::is_pointer_v<T>) isThere = isThere && value != nullptr;
+    if (!isThere) {
+        DR_LOG(Err, "Bad Field [%s] /value[%s]", field.c_str(),
+               SqliteValue(value).ToFormatedValue().c_str());
         return false;
     }
-    return record.AddValue(field, std::move(value));
+    SqliteInternals::Add(record, field, value);
+    return true;
 }
 
 // The text of a condition object, for the caller's setter of texts; null when it is not valid.
@@ -28,6 +36,21 @@ const std::string* TextOf(const SqliteCondition& condition)
         return nullptr;
     }
     return &condition.GetCondition();
+}
+
+// The names of the fields and their literals, each list in brackets.
+void AppendInsertValues(std::string& text, const SqliteValueList& record)
+{
+    text += '(';
+    for (const auto& [field, value] : record.GetValues()) (text += field) += ',';
+    if (text.back() == ',') text.pop_back();
+    text += ") VALUES (";
+    for (const auto& [field, value] : record.GetValues()) {
+        AppendLiteral(text, value);
+        text += ',';
+    }
+    if (text.back() == ',') text.pop_back();
+    text += ')';
 }
 
 std::string PairsForLog(const SqliteValueList& record)
@@ -80,12 +103,12 @@ void InsertCommand::SetReplacable(bool allowed)
 template <class T>
 bool InsertCommand::AddFieldValue(const std::string& field, const T& value)
 {
-    return OrvaDRCore::AddFieldValue(fieldValues, field, SqliteValue(value));
+    return OrvaDRCore::AddFieldValue(fieldValues, field, value);
 }
 
 bool InsertCommand::AddFieldValue(const std::string& field, const char* text)
 {
-    return OrvaDRCore::AddFieldValue(fieldValues, field, SqliteValue(text));
+    return OrvaDRCore::AddFieldValue(fieldValues, field, text);
 }
 
 bool InsertCommand::IsValid() const
@@ -95,17 +118,9 @@ bool InsertCommand::IsValid() const
 
 std::string InsertCommand::ToFormatedInsertValues() const
 {
-    std::string names;
-    std::string literals;
-    for (const auto& [field, value] : fieldValues.GetValues()) {
-        if (!names.empty()) {
-            names += ',';
-            literals += ',';
-        }
-        names += field;
-        AppendLiteral(literals, value);
-    }
-    return "(" + names + ") VALUES (" + literals + ")";
+    std::string text;
+    AppendInsertValues(text, fieldValues);
+    return text;
 }
 
 std::string InsertCommand::GetCommand() const
@@ -114,8 +129,14 @@ std::string InsertCommand::GetCommand() const
         DR_LOG(Err, "Bad insert parameter");
         return {};
     }
-    const char* verb = replacable ? "INSERT OR REPLACE INTO " : "INSERT INTO ";
-    return verb + GetTable().GetName() + " " + ToFormatedInsertValues() + ";";
+    std::string text;
+    text.reserve(UsualLength);
+    text += replacable ? "INSERT OR REPLACE INTO " : "INSERT INTO ";
+    text += GetTable().GetName();
+    text += ' ';
+    AppendInsertValues(text, fieldValues);
+    text += ';';
+    return text;
 }
 
 void InsertCommand::DumpParam(std::stringstream& out) const
@@ -133,12 +154,12 @@ void UpdateCommand::SetFieldValues(const SqliteValueList& values)
 template <class T>
 bool UpdateCommand::AddFieldValue(const std::string& field, const T& value)
 {
-    return OrvaDRCore::AddFieldValue(fieldValues, field, SqliteValue(value));
+    return OrvaDRCore::AddFieldValue(fieldValues, field, value);
 }
 
 bool UpdateCommand::AddFieldValue(const std::string& field, const char* text)
 {
-    return OrvaDRCore::AddFieldValue(fieldValues, field, SqliteValue(text));
+    return OrvaDRCore::AddFieldValue(fieldValues, field, text);
 }
 
 // An empty text is refused without a line, on purpose; SelectCommand has one.

@@ -111,6 +111,15 @@ SqliteValueList ParseRecord(sqlite3_stmt* statement, const std::vector<std::stri
     return record;
 }
 
+// What takes all rows.
+auto AppendTo(std::vector<SqliteValueList>& records)
+{
+    return [&records](sqlite3_stmt* statement, const std::vector<std::string>& names) {
+        records.push_back(ParseRecord(statement, names));
+        return true;
+    };
+}
+
 }  // namespace
 
 // How a statement with retries went.
@@ -241,11 +250,11 @@ bool SqliteDB::DoDelete(const SqliteTableHandler& table, const std::string& cond
 
 bool SqliteDB::IsTableExisted(const std::string& table)
 {
-    std::vector<SqliteValueList> records;
-    SelectByCommand("SELECT 1 FROM sqlite_master WHERE type='table' AND name='" + table + "';",
-                    records);
     // The rows alone decide: a failed query counts as a missing table.
-    return !records.empty();
+    bool isFound = false;
+    SelectRows("SELECT 1 FROM sqlite_master WHERE type='table' AND name='" + table + "';",
+               [&](sqlite3_stmt*, const std::vector<std::string>&) { return isFound = true; });
+    return isFound;
 }
 
 bool SqliteDB::CreateTable(const SqliteTableHandler& table)
@@ -328,13 +337,23 @@ bool SqliteDB::SelectByCommand(const std::string& command, std::vector<SqliteVal
         DR_LOG(Err, "Empty command to select records");
         return false;
     }
-    const Tries tries = TryRepeatedly([&] { return DoSelectSqliteRecords(command, records); });
+    return SelectRows(command, AppendTo(records));
+}
+
+// The many-rows form, which gives each row to `takeRow`.
+template <class TakeRow>
+bool SqliteDB::SelectRows(const std::string& command, TakeRow takeRow)
+{
+    constexpr const char* Function = "SelectByCommand";
+    const Tries tries = TryRepeatedly([&] { return DoSelect(command, takeRow); });
     if (!tries.succeeded) {
-        DR_LOG(Warn, "Reach retry limit [%u], failed to exec command [%s] with errors [%s]",
-               tries.failures, command.c_str(), tries.errors.c_str());
+        DR_LOG_AS(Function, Warn,
+                  "Reach retry limit [%u], failed to exec command [%s] with errors [%s]",
+                  tries.failures, command.c_str(), tries.errors.c_str());
     } else if (tries.failures > 0) {
-        DR_LOG(Info, "After retry [%u] times, success to select command, previous errs [%s]",
-               tries.failures, tries.errors.c_str());
+        DR_LOG_AS(Function, Info,
+                  "After retry [%u] times, success to select command, previous errs [%s]",
+                  tries.failures, tries.errors.c_str());
     }
     return tries.succeeded;
 }
@@ -384,8 +403,8 @@ bool SqliteDB::DoExecSqliteCommand(const std::string& command)
 
 bool SqliteDB::DoSelectSqliteRecord(const std::string& command, SqliteValueList& record)
 {
-    return DoSelect(command, [&record](SqliteValueList&& row) {
-        record = std::move(row);
+    return DoSelect(command, [&](sqlite3_stmt* statement, const auto& names) {
+        record = ParseRecord(statement, names);
         return false;
     });
 }
@@ -393,16 +412,13 @@ bool SqliteDB::DoSelectSqliteRecord(const std::string& command, SqliteValueList&
 bool SqliteDB::DoSelectSqliteRecords(const std::string& command,
                                      std::vector<SqliteValueList>& records)
 {
-    return DoSelect(command, [&records](SqliteValueList&& row) {
-        records.push_back(std::move(row));
-        return true;
-    });
+    return DoSelect(command, AppendTo(records));
 }
 
 void SqliteDB::SetErr(int code) const
 {
     errCode = code;
-    errRecord = Json::Value();
+    if (!errRecord.isNull()) errRecord = Json::Value();
 }
 
 // The retry discipline of Exec and both selects: only their single tries and their words differ.
@@ -432,7 +448,8 @@ SqliteDB::Tries SqliteDB::TryRepeatedly(Attempt attempt)
     return tries;
 }
 
-// One try of a select: gives each row to `takeRow`, which answers whether it wants another.
+// One try of a select: gives the statement at each row, and the names of its columns, to `takeRow`,
+// which answers whether it wants another.
 template <class TakeRow>
 bool SqliteDB::DoSelect(const std::string& command, TakeRow takeRow)
 {
@@ -443,7 +460,7 @@ bool SqliteDB::DoSelect(const std::string& command, TakeRow takeRow)
     if (code == SQLITE_OK) code = sqlite3_step(statement.get());
     // Asked behind the first step, in which a kept statement meets columns that are new.
     const auto names = ColumnNames(statement.get());
-    while (code == SQLITE_ROW && takeRow(ParseRecord(statement.get(), names))) {
+    while (code == SQLITE_ROW && takeRow(statement.get(), names)) {
         code = sqlite3_step(statement.get());
     }
     if (code != SQLITE_ROW && code != SQLITE_DONE) {

@@ -78,8 +78,9 @@ int KeptSelects::Take(sqlite3* handle, const std::string& command, Statement& st
     const auto kept = std::find_if(selects.begin(), selects.end(),
                                    [&](const Select& select) { return select.command == command; });
     if (kept == selects.end()) return PrepareStatement(handle, command, statement);
-    statement = std::move(kept->statement);
-    selects.erase(kept);
+    std::rotate(kept, kept + 1, selects.end());
+    statement = std::move(selects.back().statement);
+    if (statement == nullptr) return PrepareStatement(handle, command, statement);
     return SQLITE_OK;
 }
 
@@ -87,8 +88,11 @@ void KeptSelects::Keep(const std::string& command, Statement statement)
 {
     if (!IsWorthKeeping(command, statement.get())) return;
     sqlite3_reset(statement.get());
-    if (selects.size() == MaxKept) selects.erase(selects.begin());
-    selects.push_back({command, std::move(statement)});
+    if (selects.empty() || selects.back().command != command) {
+        if (selects.size() == MaxKept) selects.erase(selects.begin());
+        selects.push_back({command, nullptr});
+    }
+    selects.back().statement = std::move(statement);
 }
 
 }  // namespace OrvaDRCore

@@ -33,11 +33,12 @@ int InsertRow(sqlite3_stmt* statement, const SqliteValueList& record);
 // them again by itself when the tables have changed. All go before the connection does.
 class KeptSelects {
   public:
-    // Fills `statement` with a kept one, which is not kept then, or with a new one. Answers SQLite's
-    // code.
+    // Fills `statement` with a kept one, whose place stays empty until it is back, or with a new
+    // one. Answers SQLite's code.
     int Take(sqlite3* handle, const std::string& command, Statement& statement);
 
-    // Keeps a statement for the next time, if it only reads and is not of unusual length.
+    // Keeps the statement that was taken last for the next time, if it only reads and is not of
+    // unusual length.
     void Keep(const std::string& command, Statement statement);
 
   private:

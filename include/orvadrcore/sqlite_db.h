@@ -294,6 +294,8 @@ class ORVADRCORE_API SqliteDB {
     template <class Attempt>
     Tries TryRepeatedly(Attempt attempt);
     template <class TakeRow>
+    bool SelectRows(const std::string& command, TakeRow takeRow);
+    template <class TakeRow>
     bool DoSelect(const std::string& command, TakeRow takeRow);
 
     ORVADRCORE_LOCAL bool IsInTransaction() const;
