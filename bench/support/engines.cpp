@@ -262,7 +262,7 @@ void ContractEngine::LookForTable()
 {
     BindText(look.get(), 1, name);
     Require(sqlite3_step(look.get()) == SQLITE_ROW, "no table");
-    sqlite3_reset(look.get());
+    Finish(look.get());  // a failure behind the row would be one, too
 }
 
 void ContractEngine::Insert(const Node& node)
