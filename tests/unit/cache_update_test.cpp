@@ -731,6 +731,29 @@ TEST_F(CacheUpdateTest, APidFileThatIsByNowAnotherLivingProcessesStays)
     EXPECT_EQ(Document()["cached_data"], "new");
 }
 
+TEST_F(CacheUpdateTest, TheFirstProcessOfAllIsAnUpdaterLikeAnyOther)
+{
+    WriteStale();  // with data that is there nobody waits
+    WriteFile(pidPath, "1");
+    EXPECT_TRUE(cache.Update());
+    EXPECT_EQ(cache.CountCalls("GetUpdatedData"), 0U);
+    EXPECT_TRUE(IsMarked());
+    ExpectLines({});
+}
+
+TEST_F(CacheUpdateTest, AFileThatADefaultValueBringsAlongIsAsYoungAsItIs)
+{
+    cache.defaultValue = [&] {
+        WriteCache("written meanwhile");
+        return Json::Value("default");
+    };
+    EXPECT_EQ(cache.Read(), "default");
+    EXPECT_EQ(cache.CountCalls("GetUpdatedData"), 0U);
+    ExpectLines(
+        {Debug("Load", "no data is cached in [" + path + "]"),
+         Debug("GetCachedData", "Failed to load cache [" + path + "], use default cache data")});
+}
+
 TEST_F(CacheUpdateTest, APidFileThatIsByNowNobodysIsRemoved)
 {
     const ChildProcess somebody([](ChildProcess::Link& link) { link.Await(); });

@@ -239,6 +239,17 @@ TEST_F(WriteAllTest, AnEmptyTextNeedsNoWrite)
     EXPECT_TRUE(WriteAll(-1, ""));
 }
 
+TEST_F(WriteAllTest, AWriteThatTakesNothingIsNotRepeated)
+{
+    int calls = 0;
+    faults.write = [&](int /*fd*/, const void* /*buffer*/, std::size_t /*size*/) -> ssize_t {
+        errno = EINTR;  // of an earlier call
+        return ++calls == 1 ? 0 : 4;
+    };
+    EXPECT_FALSE(WriteAll(-1, "text"));
+    EXPECT_EQ(calls, 1);
+}
+
 TEST_F(WriteAllTest, FailsWithTheErrnoOfTheWrite)
 {
     const FileDescriptor owner("/dev/full", O_WRONLY);

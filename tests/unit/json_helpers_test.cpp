@@ -159,6 +159,12 @@ TEST(FromStringTest, ACommentBehindTheDocumentIsTextBehindIt)
     ExpectRefused("[1]/**/\n");
 }
 
+TEST(FromStringTest, ACommaBehindTheLastMemberIsRefused)
+{
+    ExpectRefused("[1,]");
+    ExpectRefused(R"({"a":1,})");
+}
+
 TEST(FromStringTest, AZeroByteIsRefusedWhereverItStands)
 {
     const std::string document = Document;
