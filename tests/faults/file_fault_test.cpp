@@ -38,18 +38,24 @@ struct Place {
     std::string path = dir.File("document.json");
 };
 
+// Replaces the file with a fault and again without: it is old or new, and alone, afterwards.
+void ExpectReplacement(const Place& place)
+{
+    const Json::Value value = Document(New);
+    const Outcome outcome = WithFault([&] { return toFile(value, place.path); });
+    EXPECT_EQ(ReadFile(place.path), outcome.succeeded ? New : Old);
+    EXPECT_TRUE(toFile(value, place.path));
+    EXPECT_EQ(ReadFile(place.path), New);
+    EXPECT_EQ(NamesIn(place.dir.Path()).size(), 1U) << "a temporary file is left";
+}
+
 }  // namespace
 
 TEST(FileFaults, ToFile)
 {
     EveryCallFails("toFile", [] {
         const Place place(Old);
-        const Json::Value value = Document(New);
-        const Outcome outcome = WithFault([&] { return toFile(value, place.path); });
-        EXPECT_EQ(ReadFile(place.path), outcome.succeeded ? New : Old);
-        EXPECT_TRUE(toFile(value, place.path));
-        EXPECT_EQ(ReadFile(place.path), New);
-        EXPECT_EQ(NamesIn(place.dir.Path()).size(), 1U) << "a temporary file is left";
+        ExpectReplacement(place);
     });
 }
 
@@ -59,12 +65,7 @@ TEST(FileFaults, ToFileBesideALeftOver)
         const Place place(Old);
         WriteFile(place.path + ".orvadr-tmp0", "");
         WriteFile(place.path + ".orvadr-tmp1", "");
-        const Json::Value value = Document(New);
-        const Outcome outcome = WithFault([&] { return toFile(value, place.path); });
-        EXPECT_EQ(ReadFile(place.path), outcome.succeeded ? New : Old);
-        EXPECT_TRUE(toFile(value, place.path));
-        EXPECT_EQ(ReadFile(place.path), New);
-        EXPECT_EQ(NamesIn(place.dir.Path()).size(), 1U) << "a temporary file is left";
+        ExpectReplacement(place);
     });
 }
 
