@@ -69,10 +69,10 @@ void AddPlace(const std::string& item, Place place)
     Add<OurMany>(item, Ours, place);
     Add<InTransaction<BareEngine>>(item, Bare, place);
 #if BENCH_HAS_SQLITECPP
-    Add<InTransaction<SqliteCppEngine>>(item, "SQLiteCpp", place);
+    Add<InTransaction<Peer<SqliteCpp>>>(item, "SQLiteCpp", place);
 #endif
 #if BENCH_HAS_SOCI
-    Add<InTransaction<SociEngine>>(item, "SOCI", place);
+    Add<InTransaction<Peer<Soci>>>(item, "SOCI", place);
 #endif
 }
 

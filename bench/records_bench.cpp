@@ -149,10 +149,10 @@ void AddAll(const Bounds& bounds, const std::string& item, Arguments... argument
     AddBounded<Task<BareEngine>>(bounds, item, Bare, arguments...);
     AddBounded<Task<ContractEngine>>(bounds, item, Contract, arguments...);
 #if BENCH_HAS_SQLITECPP
-    AddBounded<Task<SqliteCppEngine>>(bounds, item, "SQLiteCpp", arguments...);
+    AddBounded<Task<Peer<SqliteCpp>>>(bounds, item, "SQLiteCpp", arguments...);
 #endif
 #if BENCH_HAS_SOCI
-    AddBounded<Task<SociEngine>>(bounds, item, "SOCI", arguments...);
+    AddBounded<Task<Peer<Soci>>>(bounds, item, "SOCI", arguments...);
 #endif
 }
 
@@ -173,10 +173,10 @@ void AddRecords()
     AddAll<SelectAll>({}, "select 10,000 rows of 5 columns");
     Add<SelectAll<LoopEngine>>("select 10,000 rows of 5 columns", "C loop");
 #if BENCH_HAS_SQLITECPP
-    Add<SelectAll<SqliteCppByName>>("select 10,000 rows of 5 columns", "SQLiteCpp by name");
+    Add<SelectAll<Peer<SqliteCppByName>>>("select 10,000 rows of 5 columns", "SQLiteCpp by name");
 #endif
 #if BENCH_HAS_SOCI
-    Add<SelectAll<SociByName>>("select 10,000 rows of 5 columns", "SOCI by name");
+    Add<SelectAll<Peer<SociByName>>>("select 10,000 rows of 5 columns", "SOCI by name");
 #endif
     Aim({"C loop"}, OfLoop);
     Aim({"SQLiteCpp by name", "SOCI by name"}, 1);

@@ -105,83 +105,86 @@ class ContractEngine {
     std::vector<std::map<std::string, Value>> rows;
 };
 
-#if BENCH_HAS_SQLITECPP
-class SqliteCppEngine {
+// Another library's way. What it is made of stands in the library's own source: the headers of two
+// of them cannot be included together.
+template <class Library>
+class Peer {
   public:
-    explicit SqliteCppEngine(const std::string& path);
-    ~SqliteCppEngine();
-    SqliteCppEngine(const SqliteCppEngine&) = delete;
-    SqliteCppEngine& operator=(const SqliteCppEngine&) = delete;
+    explicit Peer(const std::string& path);
+    ~Peer();
+    Peer(const Peer&) = delete;
+    Peer& operator=(const Peer&) = delete;
     void Exec(const char* statement);
     void Insert(const Node& node);
     void Select(int id);
     void SelectAll();
     void Update(int id, int state);
     void Delete(int id);
-    std::string Selected() const { return ToText(rows); }
+    std::string Selected() const;
 
   private:
-    struct State;
-    std::unique_ptr<State> state;
-    std::vector<Node> rows;
+    std::unique_ptr<Library> library;
 };
 
-// The same library, its rows by column name.
-class SqliteCppByName {
-  public:
-    explicit SqliteCppByName(const std::string& path);
-    ~SqliteCppByName();
-    SqliteCppByName(const SqliteCppByName&) = delete;
-    SqliteCppByName& operator=(const SqliteCppByName&) = delete;
-    void Exec(const char* statement);
-    void SelectAll();
-    std::string Selected() const { return ToText(rows); }
+template <class Library>
+Peer<Library>::Peer(const std::string& path) : library(std::make_unique<Library>(path))
+{
+}
 
-  private:
-    struct State;
-    std::unique_ptr<State> state;
-    NamedRows rows;
-};
-#endif
+template <class Library>
+Peer<Library>::~Peer() = default;
 
-#if BENCH_HAS_SOCI
-class SociEngine {
-  public:
-    explicit SociEngine(const std::string& path);
-    ~SociEngine();
-    SociEngine(const SociEngine&) = delete;
-    SociEngine& operator=(const SociEngine&) = delete;
-    void Exec(const char* statement);
-    void Insert(const Node& node);
-    void Select(int id);
-    void SelectAll();
-    void Update(int id, int state);
-    void Delete(int id);
-    std::string Selected() const { return ToText(rows); }
+template <class Library>
+void Peer<Library>::Exec(const char* statement)
+{
+    library->Exec(statement);
+}
 
-  private:
-    struct State;
-    std::unique_ptr<State> state;
-    std::vector<Node> rows;
-};
+template <class Library>
+void Peer<Library>::Insert(const Node& node)
+{
+    library->Insert(node);
+}
 
-// The same library, its rows by column name.
-class SociByName {
-  public:
-    explicit SociByName(const std::string& path);
-    ~SociByName();
-    SociByName(const SociByName&) = delete;
-    SociByName& operator=(const SociByName&) = delete;
-    void Exec(const char* statement);
-    void SelectAll();
-    std::string Selected() const { return ToText(rows); }
+template <class Library>
+void Peer<Library>::Select(int id)
+{
+    library->Select(id);
+}
 
-  private:
-    struct State;
-    std::unique_ptr<State> state;
-    NamedRows rows;
-};
-#endif
+template <class Library>
+void Peer<Library>::SelectAll()
+{
+    library->SelectAll();
+}
+
+template <class Library>
+void Peer<Library>::Update(int id, int state)
+{
+    library->Update(id, state);
+}
+
+template <class Library>
+void Peer<Library>::Delete(int id)
+{
+    library->Delete(id);
+}
+
+template <class Library>
+std::string Peer<Library>::Selected() const
+{
+    return ToText(library->rows);
+}
+
+// Each library by its structs, and by rows with values by column name.
+struct SqliteCpp;
+struct SqliteCppByName;
+struct Soci;
+struct SociByName;
+extern template class Peer<SqliteCpp>;
+extern template class Peer<SqliteCppByName>;
+extern template class Peer<Soci>;
+extern template class Peer<SociByName>;
 
 }  // namespace Bench
 

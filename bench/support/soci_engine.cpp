@@ -9,8 +9,8 @@
 namespace Bench {
 
 // As its documents advise: statements are prepared once, with variables bound to them.
-struct SociEngine::State {
-    explicit State(const std::string& path)
+struct Soci {
+    explicit Soci(const std::string& path)
         : session(soci::sqlite3, "db=" + path + " timeout=1"), created(Create())
     {
     }
@@ -21,86 +21,83 @@ struct SociEngine::State {
         return true;
     }
 
+    void Exec(const char* statement);
+    void Insert(const Node& node);
+    void Select(int id);
+    void SelectAll();
+    void Update(int id, int newState);
+    void Delete(int id);
+
     soci::session session;
     bool created;  // before the statements, which need the table
-    Node node;
+    Node bound;
     int key = 0;
     soci::statement insert =
         (session.prepare << "INSERT INTO nodes VALUES (:id,:name,:address,:port,:state)",
-         soci::use(node.id), soci::use(node.name), soci::use(node.address), soci::use(node.port),
-         soci::use(node.state));
-    soci::statement select = (session.prepare << "SELECT * FROM nodes WHERE id=:id", soci::use(key),
-                              soci::into(node.id), soci::into(node.name), soci::into(node.address),
-                              soci::into(node.port), soci::into(node.state));
+         soci::use(bound.id), soci::use(bound.name), soci::use(bound.address),
+         soci::use(bound.port), soci::use(bound.state));
+    soci::statement select =
+        (session.prepare << "SELECT * FROM nodes WHERE id=:id", soci::use(key),
+         soci::into(bound.id), soci::into(bound.name), soci::into(bound.address),
+         soci::into(bound.port), soci::into(bound.state));
     soci::statement selectAll =
-        (session.prepare << "SELECT * FROM nodes", soci::into(node.id), soci::into(node.name),
-         soci::into(node.address), soci::into(node.port), soci::into(node.state));
+        (session.prepare << "SELECT * FROM nodes", soci::into(bound.id), soci::into(bound.name),
+         soci::into(bound.address), soci::into(bound.port), soci::into(bound.state));
     soci::statement update = (session.prepare << "UPDATE nodes SET state=:state WHERE id=:id",
-                              soci::use(node.state), soci::use(key));
+                              soci::use(bound.state), soci::use(key));
     soci::statement remove = (session.prepare << "DELETE FROM nodes WHERE id=:id", soci::use(key));
+    std::vector<Node> rows;
 };
 
-SociEngine::SociEngine(const std::string& path) : state(std::make_unique<State>(path)) {}
-
-SociEngine::~SociEngine() = default;
-
-void SociEngine::Exec(const char* statement)
+void Soci::Exec(const char* statement)
 {
-    state->session << statement;
+    session << statement;
 }
 
-void SociEngine::Insert(const Node& node)
+void Soci::Insert(const Node& node)
 {
-    state->node = node;
-    state->insert.execute(true);
+    bound = node;
+    insert.execute(true);
 }
 
-void SociEngine::Select(int id)
+void Soci::Select(int id)
 {
     rows.clear();
-    state->key = id;
-    if (state->select.execute(true)) rows.push_back(state->node);
+    key = id;
+    if (select.execute(true)) rows.push_back(bound);
 }
 
-void SociEngine::SelectAll()
+void Soci::SelectAll()
 {
     rows.clear();
-    state->selectAll.execute();
-    while (state->selectAll.fetch()) rows.push_back(state->node);
+    selectAll.execute();
+    while (selectAll.fetch()) rows.push_back(bound);
 }
 
-void SociEngine::Update(int id, int newState)
+void Soci::Update(int id, int newState)
 {
-    state->key = id;
-    state->node.state = newState;
-    state->update.execute(true);
+    key = id;
+    bound.state = newState;
+    update.execute(true);
 }
 
-void SociEngine::Delete(int id)
+void Soci::Delete(int id)
 {
-    state->key = id;
-    state->remove.execute(true);
+    key = id;
+    remove.execute(true);
 }
 
-struct SociByName::State {
-    explicit State(const std::string& path) : session(soci::sqlite3, "db=" + path + " timeout=1") {}
+struct SociByName : Soci {
+    using Soci::Soci;
+    void SelectAll();
 
-    soci::session session;
+    NamedRows rows;
 };
-
-SociByName::SociByName(const std::string& path) : state(std::make_unique<State>(path)) {}
-
-SociByName::~SociByName() = default;
-
-void SociByName::Exec(const char* statement)
-{
-    state->session << statement;
-}
 
 void SociByName::SelectAll()
 {
     rows.clear();
-    const soci::rowset<soci::row> all = (state->session.prepare << "SELECT * FROM nodes");
+    const soci::rowset<soci::row> all = (session.prepare << "SELECT * FROM nodes");
     for (const soci::row& given : all) {
         auto& row = rows.emplace_back();
         for (std::size_t column = 0; column < given.size(); ++column) {
@@ -113,6 +110,9 @@ void SociByName::SelectAll()
         }
     }
 }
+
+template class Peer<Soci>;
+template class Peer<SociByName>;
 
 }  // namespace Bench
 

@@ -19,12 +19,19 @@ Node NodeOfRow(SQLite::Statement& statement)
 }  // namespace
 
 // As its documents advise: statements are prepared once and reset.
-struct SqliteCppEngine::State {
-    explicit State(const std::string& path)
+struct SqliteCpp {
+    explicit SqliteCpp(const std::string& path)
         : db(path, SQLite::OPEN_READWRITE | SQLite::OPEN_CREATE, BusyTimeoutMSec),
           created(db.exec(std::string("CREATE TABLE IF NOT EXISTS nodes (") + NodesSchema + ")"))
     {
     }
+
+    void Exec(const char* statement);
+    void Insert(const Node& node);
+    void Select(int id);
+    void SelectAll();
+    void Update(int id, int newState);
+    void Delete(int id);
 
     SQLite::Database db;
     int created;  // before the statements, which need the table
@@ -33,20 +40,16 @@ struct SqliteCppEngine::State {
     SQLite::Statement selectAll{db, "SELECT * FROM nodes"};
     SQLite::Statement update{db, "UPDATE nodes SET state=? WHERE id=?"};
     SQLite::Statement remove{db, "DELETE FROM nodes WHERE id=?"};
+    std::vector<Node> rows;
 };
 
-SqliteCppEngine::SqliteCppEngine(const std::string& path) : state(std::make_unique<State>(path)) {}
-
-SqliteCppEngine::~SqliteCppEngine() = default;
-
-void SqliteCppEngine::Exec(const char* statement)
+void SqliteCpp::Exec(const char* statement)
 {
-    state->db.exec(statement);
+    db.exec(statement);
 }
 
-void SqliteCppEngine::Insert(const Node& node)
+void SqliteCpp::Insert(const Node& node)
 {
-    SQLite::Statement& insert = state->insert;
     insert.bind(1, node.id);
     insert.bindNoCopy(2, node.name);
     insert.bindNoCopy(3, node.address);
@@ -56,60 +59,50 @@ void SqliteCppEngine::Insert(const Node& node)
     insert.reset();
 }
 
-void SqliteCppEngine::Select(int id)
+void SqliteCpp::Select(int id)
 {
     rows.clear();
-    state->select.bind(1, id);
-    if (state->select.executeStep()) rows.push_back(NodeOfRow(state->select));
-    state->select.reset();
+    select.bind(1, id);
+    if (select.executeStep()) rows.push_back(NodeOfRow(select));
+    select.reset();
 }
 
-void SqliteCppEngine::SelectAll()
+void SqliteCpp::SelectAll()
 {
     rows.clear();
-    while (state->selectAll.executeStep()) rows.push_back(NodeOfRow(state->selectAll));
-    state->selectAll.reset();
+    while (selectAll.executeStep()) rows.push_back(NodeOfRow(selectAll));
+    selectAll.reset();
 }
 
-void SqliteCppEngine::Update(int id, int newState)
+void SqliteCpp::Update(int id, int newState)
 {
-    state->update.bind(1, newState);
-    state->update.bind(2, id);
-    state->update.exec();
-    state->update.reset();
+    update.bind(1, newState);
+    update.bind(2, id);
+    update.exec();
+    update.reset();
 }
 
-void SqliteCppEngine::Delete(int id)
+void SqliteCpp::Delete(int id)
 {
-    state->remove.bind(1, id);
-    state->remove.exec();
-    state->remove.reset();
+    remove.bind(1, id);
+    remove.exec();
+    remove.reset();
 }
 
-struct SqliteCppByName::State {
-    explicit State(const std::string& path) : db(path, SQLite::OPEN_READWRITE, BusyTimeoutMSec) {}
+struct SqliteCppByName : SqliteCpp {
+    using SqliteCpp::SqliteCpp;
+    void SelectAll();
 
-    SQLite::Database db;
-    SQLite::Statement selectAll{db, "SELECT * FROM nodes"};
+    NamedRows rows;
 };
-
-SqliteCppByName::SqliteCppByName(const std::string& path) : state(std::make_unique<State>(path)) {}
-
-SqliteCppByName::~SqliteCppByName() = default;
-
-void SqliteCppByName::Exec(const char* statement)
-{
-    state->db.exec(statement);
-}
 
 void SqliteCppByName::SelectAll()
 {
     rows.clear();
-    SQLite::Statement& select = state->selectAll;
-    while (select.executeStep()) {
+    while (selectAll.executeStep()) {
         auto& row = rows.emplace_back();
-        for (int column = 0; column < select.getColumnCount(); ++column) {
-            const SQLite::Column value = select.getColumn(column);
+        for (int column = 0; column < selectAll.getColumnCount(); ++column) {
+            const SQLite::Column value = selectAll.getColumn(column);
             if (value.isInteger()) {
                 row.emplace(value.getName(), value.getInt());
             } else {
@@ -117,8 +110,11 @@ void SqliteCppByName::SelectAll()
             }
         }
     }
-    select.reset();
+    selectAll.reset();
 }
+
+template class Peer<SqliteCpp>;
+template class Peer<SqliteCppByName>;
 
 }  // namespace Bench
 
