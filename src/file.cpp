@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <array>
+#include <cerrno>
 #include <cstdio>
 #include <iterator>
 #include <memory>
@@ -56,6 +57,22 @@ bool parseLineKeyValue(std::string_view line, Extraction& extraction, K& key, V&
     extraction.Read(left, key);
     extraction.Read(right, value);
     return true;
+}
+
+// Runs a program. Where its result is lost because another thread has waited for all children,
+// `isDone` tells instead whether it has done its work.
+template <class IsDone>
+bool RunProgram(const char* path, const char* argument1, const char* argument2,
+                const char* argument3, const char* argument4, IsDone isDone)
+{
+    errno = 0;
+    const int result = CoreLibExec(path, argument1, argument2, argument3, argument4);
+    return result == 0 || (result < 0 && errno == ECHILD && isDone());
+}
+
+bool IsDirectory(const std::string& path)
+{
+    return CoreLibFileCheckDir(path.c_str()) == 1;
 }
 
 struct CloseStream {
@@ -133,7 +150,7 @@ bool File::Write(int fd, const Json::Value& value)
 bool File::CreateDir(const std::string& path, int mode)
 {
     if (path.empty()) return false;
-    if (CoreLibFileCheckDir(path.c_str()) == 1) return true;
+    if (IsDirectory(path)) return true;
 
     const auto bits = static_cast<unsigned int>(mode);
     if (mode > MaxDirMode) {
@@ -145,7 +162,8 @@ bool File::CreateDir(const std::string& path, int mode)
         DR_LOG(Err, "snprintf error with mode [%o]", bits);
         return false;
     }
-    if (CoreLibExec("/bin/mkdir", "-p", path.c_str(), "-m", octal.data()) != 0) {
+    const auto isMade = [&path] { return IsDirectory(path); };
+    if (!RunProgram("/bin/mkdir", "-p", path.c_str(), "-m", octal.data(), isMade)) {
         DR_LOG(Err, "Failed to create dir [%s] with mode [%o]", path.c_str(), bits);
         return false;
     }
@@ -154,8 +172,8 @@ bool File::CreateDir(const std::string& path, int mode)
 
 bool File::RemoveDir(const std::string& path)
 {
-    return CoreLibFileCheckDir(path.c_str()) == 0 ||
-           CoreLibExec("/bin/rm", "-rf", path.c_str(), nullptr, nullptr) == 0;
+    const auto isGone = [&path] { return !IsDirectory(path); };
+    return isGone() || RunProgram("/bin/rm", "-rf", path.c_str(), nullptr, nullptr, isGone);
 }
 
 std::string File::GetParentDir(const std::string& path)

@@ -1,27 +1,27 @@
-// A program is started through a process between it and the caller, which waits for the program and
-// then ends as the program did. The one between is a child that sends no signal: the kernel throws
-// the results of SIGCHLD children away when the caller ignores that signal, and a handler of the
-// caller's may fetch them before we do; of a child without a signal neither holds. The program
-// cannot be such a child itself: execve() makes SIGCHLD the signal of whoever calls it.
+// Programs are started by posix_spawn(), which costs the same however much memory the caller has.
 //
-// The one between is forked, which takes the longer the more memory the caller has. It cannot live
-// in the caller's memory as long as the program runs: it would share the C library's state with the
-// thread that it came from. Its own child does live in its memory until it is the program.
+// Usually a program is a child of the caller. Where the caller's handling of SIGCHLD would lose its
+// result, a companion is the parent: a process that waits for the program and then ends as the
+// program did. The companion is a child that sends no signal. Of such a child the kernel keeps the
+// result even if SIGCHLD is ignored, and a handler's waitpid(-1) does not fetch it. The program
+// itself cannot be such a child: execve() makes SIGCHLD the signal of whoever calls it.
 #include <orvacore/orvacore.h>
 
 #include <fcntl.h>
 #include <signal.h>
+#include <spawn.h>
 #include <sys/syscall.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
 #include <array>
 #include <cerrno>
-#include <climits>
 #include <cstdarg>
 #include <cstring>
 #include <memory>
 #include <new>
+
+#include "child_report.h"
 
 namespace {
 
@@ -32,139 +32,129 @@ constexpr int ExitCannotStart = 127;
 // A program's arguments, its path first, null last.
 using Arguments = std::array<char*, MaxArguments + 1>;
 
-// What the new processes need to know.
-struct Start {
-    char* const* arguments;
-    int output;        // becomes descriptor 1; -1 leaves that as it is
-    sigset_t signals;  // the caller's signal mask
+// How a program is started: with the caller's signal mask, descriptors 0 to 2 and no others.
+class Start {
+  public:
+    // `output` becomes descriptor 1; -1 leaves that as it is.
+    Start(const Arguments& programArguments, int output);
+    Start(const Start&) = delete;
+    Start& operator=(const Start&) = delete;
+    ~Start();
+
+    // Starts the program as a child of this process. Answers 0, or why that failed.
+    int Run(pid_t& program) const;
+
+  private:
+    const Arguments& arguments;
+    posix_spawn_file_actions_t files{};
+    posix_spawnattr_t attributes{};
+    int error = 0;
 };
 
-// Forks a child that sends no signal. The C library knows nothing of it, and other threads may have
-// held locks: the child makes system calls only.
-pid_t ForkSilently()
+Start::Start(const Arguments& programArguments, int output) : arguments(programArguments)
 {
-    return static_cast<pid_t>(::syscall(SYS_clone, 0L, 0L, 0L, 0L, 0L));
+    ::posix_spawn_file_actions_init(&files);
+    if (output >= 0) error = ::posix_spawn_file_actions_adddup2(&files, output, STDOUT_FILENO);
+    if (error == 0) error = ::posix_spawn_file_actions_addclosefrom_np(&files, FirstOther);
+
+    // Programs wait for children of their own.
+    sigset_t defaults;
+    ::sigemptyset(&defaults);
+    ::sigaddset(&defaults, SIGCHLD);
+    sigset_t mask;
+    ::pthread_sigmask(SIG_SETMASK, nullptr, &mask);
+    ::posix_spawnattr_init(&attributes);
+    ::posix_spawnattr_setsigdefault(&attributes, &defaults);
+    ::posix_spawnattr_setsigmask(&attributes, &mask);
+    ::posix_spawnattr_setflags(&attributes, POSIX_SPAWN_SETSIGDEF | POSIX_SPAWN_SETSIGMASK);
 }
 
-// The exit code of a child; -1 when a signal ended it.
+Start::~Start()
+{
+    ::posix_spawnattr_destroy(&attributes);
+    ::posix_spawn_file_actions_destroy(&files);
+}
+
+int Start::Run(pid_t& program) const
+{
+    if (error != 0) return error;
+    return ::posix_spawn(&program, arguments[0], &files, &attributes, arguments.data(), environ);
+}
+
+// The exit code of a child; -1 when a signal ended it (errno EINTR) or when its result has been
+// fetched by somebody else (errno ECHILD).
 int WaitFor(pid_t pid)
 {
     int status = 0;
     while (::waitpid(pid, &status, __WALL) < 0) {
         if (errno != EINTR) return -1;
     }
-    return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+    if (WIFEXITED(status)) return WEXITSTATUS(status);
+    errno = EINTR;
+    return -1;
 }
 
-// Says into a pipe why a program could not be started; 0 when it was.
-void SendError(int fd, int error)
+// Whether the kernel keeps a child's result until somebody waits for this child. A handler may wait
+// for all children.
+bool KeepsResults()
 {
-    while (::write(fd, &error, sizeof error) < 0 && errno == EINTR) {
-    }
+    struct sigaction action {};
+    return ::sigaction(SIGCHLD, nullptr, &action) == 0 && action.sa_handler == SIG_DFL &&
+           (action.sa_flags & SA_NOCLDWAIT) == 0;
 }
 
-// What was said; `silence` when the pipe was closed without a word.
-int ReceiveError(int fd, int silence)
+// Forks a child that sends no signal. The C library knows nothing of it, and other threads may have
+// held locks: the child calls nothing that takes one.
+pid_t ForkSilently()
 {
-    int error = silence;
-    while (::read(fd, &error, sizeof error) < 0 && errno == EINTR) {
-    }
-    return error;
+    return static_cast<pid_t>(::syscall(SYS_clone, 0L, 0L, 0L, 0L, 0L));
 }
 
-// The caller's handlers are not for the new processes, and SIGCHLD must not be ignored there: they
-// wait for children of their own.
-void ResetSignals()
-{
-    for (int signal = 1; signal < NSIG; ++signal) {
-        struct sigaction action {};
-        if (::sigaction(signal, nullptr, &action) < 0 ||
-            (action.sa_handler == SIG_IGN && signal != SIGCHLD)) {
-            continue;
-        }
-        action.sa_flags = 0;
-        action.sa_handler = SIG_DFL;
-        ::sigaction(signal, &action, nullptr);
-    }
-}
-
-// Descriptor 1 stays open across the start of the program also when it was `output` already.
-bool RedirectOutput(int output)
-{
-    if (output < 0) return true;
-    if (output == STDOUT_FILENO) return ::fcntl(output, F_SETFD, 0) == 0;
-    return ::dup2(output, STDOUT_FILENO) >= 0;
-}
-
-// Leaves the standard descriptors open, and `report`, which is moved behind them when the caller
-// had closed some.
-bool ArrangeDescriptors(int output, int& report)
-{
-    const int moved = ::fcntl(report, F_DUPFD_CLOEXEC, FirstOther);
-    if (moved < 0 || !RedirectOutput(output)) return false;
-    report = moved;
-    const auto kept = static_cast<unsigned int>(moved);
-    return (kept == FirstOther || ::close_range(FirstOther, kept - 1, 0) == 0) &&
-           ::close_range(kept + 1, UINT_MAX, 0) == 0;
-}
-
-[[noreturn]] void BecomeProgram(const Start& start, int report)
-{
-    ::pthread_sigmask(SIG_SETMASK, &start.signals, nullptr);
-    ::execve(start.arguments[0], start.arguments, environ);
-    SendError(report, errno);
-    ::_exit(ExitCannotStart);
-}
-
-// Starts the program as a child. Answers 0, or why that failed.
-int StartProgram(const Start& start, pid_t& program)
-{
-    std::array<int, 2> pipe{};  // closed by the start of the program
-    if (::pipe2(pipe.data(), O_CLOEXEC) < 0) return errno;
-    // The child makes system calls only, and this process stands still until it is the program.
-    const pid_t child = ::vfork();  // NOLINT(clang-analyzer-security.insecureAPI.vfork)
-    if (child < 0) return errno;
-    if (child == 0) BecomeProgram(start, pipe[1]);  // NOLINT(clang-analyzer-unix.Vfork)
-    program = child;
-    ::close(pipe[1]);
-    return ReceiveError(pipe[0], 0);
-}
-
-// The process between. Signals stay blocked in it: it is to outlive the program.
+// The companion. Signals stay blocked in it: it is to outlive the program.
 [[noreturn]] void Accompany(const Start& start, int report)
 {
-    ResetSignals();
+    struct sigaction byDefault {};
+    ::sigaction(SIGCHLD, &byDefault, nullptr);
     pid_t program = -1;
-    const bool arranged = ArrangeDescriptors(start.output, report);
-    const int error = arranged ? StartProgram(start, program) : errno;
-    SendError(report, error);
-    ::close_range(0, UINT_MAX, 0);  // who reads the program's output waits for the program alone
-    const int code = error == 0 ? WaitFor(program) : ExitCannotStart;
+    const int error = start.Run(program);
+    SendReport(report, &error, sizeof error);
+    if (error != 0) ::_exit(ExitCannotStart);
+    ::closefrom(0);  // whoever reads the program's output waits for the program alone
+    const int code = WaitFor(program);
     if (code < 0) ::kill(::getpid(), SIGKILL);
     ::_exit(code);
+}
+
+// Starts a program through a companion, which is the process to wait for.
+int RunAccompanied(const Start& start, pid_t& companion)
+{
+    std::array<int, 2> pipe{};
+    if (::pipe2(pipe.data(), O_CLOEXEC) < 0) return errno;
+    sigset_t all;
+    ::sigfillset(&all);
+    sigset_t mask;
+    ::pthread_sigmask(SIG_BLOCK, &all, &mask);
+    companion = ForkSilently();
+    if (companion == 0) Accompany(start, pipe[1]);
+    int error = errno;
+    ::pthread_sigmask(SIG_SETMASK, &mask, nullptr);
+    ::close(pipe[1]);
+    if (companion > 0) {
+        if (!ReceiveReport(pipe[0], companion, &error, sizeof error)) error = ECHILD;
+        if (error != 0) WaitFor(companion);
+    }
+    ::close(pipe[0]);
+    return error;
 }
 
 // Starts a program. Answers the id of the process to wait for, which ends as the program does; -1
 // with errno set when the program cannot be started.
 pid_t Spawn(const Arguments& arguments, int output)
 {
-    std::array<int, 2> pipe{};
-    if (::pipe2(pipe.data(), O_CLOEXEC) < 0) return -1;
-    Start start{arguments.data(), output, {}};
-    sigset_t all;
-    ::sigfillset(&all);
-    ::pthread_sigmask(SIG_BLOCK, &all, &start.signals);
-    const pid_t between = ForkSilently();
-    if (between == 0) Accompany(start, pipe[1]);
-    int error = errno;
-    ::pthread_sigmask(SIG_SETMASK, &start.signals, nullptr);
-    ::close(pipe[1]);
-    // Other threads' children may hold the pipe open: its end is not what tells of the start.
-    if (between > 0) error = ReceiveError(pipe[0], ECHILD);
-    ::close(pipe[0]);
-    if (between > 0 && error == 0) return between;
-
-    if (between > 0) WaitFor(between);
+    const Start start(arguments, output);
+    pid_t pid = -1;
+    const int error = KeepsResults() ? start.Run(pid) : RunAccompanied(start, pid);
+    if (error == 0) return pid;
     errno = error;
     return -1;
 }

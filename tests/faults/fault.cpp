@@ -63,9 +63,8 @@ const std::array<Kind, static_cast<std::size_t>(Call::None)>& Kinds()
         {"clone", {EAGAIN, ENOMEM}},
         {"pipe2", {EMFILE}},
         {"dup2", {EMFILE, EINTR}},
-        {"close_range", {ENOMEM, EMFILE}},
         {"waitpid", {EINTR}},
-        {"execve", {ENOENT, EACCES, ENOMEM, EIO, EMFILE, EAGAIN}},
+        {"posix_spawn", {ENOENT, EACCES, ENOMEM, EIO, EMFILE, EAGAIN}},
         {"getrandom", {EINTR}},
         {"fdopen", {ENOMEM, EMFILE}},
         {"memory", {ENOMEM}},
@@ -155,17 +154,20 @@ int StatPlaced(const char* path, struct stat* status)
     return RealStat(Placed(path).path, status);
 }
 
-int ExecvePlaced(const char* path, char* const* arguments, char* const* environment)
+int SpawnPlaced(SpawnCall call)
 {
-    const Placed first(arguments[1]);
-    const Placed second(arguments[1] != nullptr ? arguments[2] : nullptr);
+    const int error = Strike(Call::Spawn);
+    if (error != 0) return error;
+    const Placed first(call.arguments[1]);
+    const Placed second(call.arguments[1] != nullptr ? call.arguments[2] : nullptr);
     std::array<char*, 8> placed{};
-    for (std::size_t i = 0; arguments[i] != nullptr && i + 1 < placed.size(); ++i) {
-        placed[i] = arguments[i];
+    for (std::size_t i = 0; call.arguments[i] != nullptr && i + 1 < placed.size(); ++i) {
+        placed[i] = call.arguments[i];
     }
     if (placed[1] != nullptr) placed[1] = const_cast<char*>(first.path);
     if (placed[2] != nullptr) placed[2] = const_cast<char*>(second.path);
-    return RealExecve(path, placed.data(), environment);
+    call.arguments = placed.data();
+    return RealSpawn(call);
 }
 
 // No trial is about power cuts, and disks are slow.
@@ -207,13 +209,12 @@ class System {
         Let(faults.clone, RealClone, Call::Clone);
         Let(faults.pipe2, RealPipe2, Call::Pipe);
         Let(faults.dup2, RealDup2, Call::Dup);
-        Let(faults.closeRange, RealCloseRange, Call::CloseRange);
         Let(faults.waitpid, RealWaitpid, Call::Waitpid);
-        Let(faults.execve, ExecvePlaced, Call::Execve);
         Let(faults.getrandom, RealGetrandom, Call::Getrandom);
         Let(faults.fdopen, RealFdopen, Call::Fdopen);
         Let(processes.fork, RealFork, Call::Fork);
         faults.close = CloseAnyway;
+        faults.spawn = SpawnPlaced;
         // What the C library keeps for the texts of errors is there before anything is counted.
         for (const Kind& kind : Kinds()) {
             for (const int error : kind.errors) {
@@ -262,7 +263,7 @@ void AwaitChildren()
     int status = 0;
     pid_t child = 0;
     while ((child = RealWaitpid(-1, &status, __WALL)) > 0 || errno == EINTR) {
-        // One that is between a caller and its program ends as that did: by this signal.
+        // A companion ends as its program did: by this signal.
         EXPECT_TRUE(child < 0 || !WIFSIGNALED(status) || WTERMSIG(status) == SIGKILL)
             << "a child was ended by signal " << WTERMSIG(status);
     }

@@ -40,9 +40,8 @@ enum class Call {
     Clone,
     Pipe,
     Dup,
-    CloseRange,
     Waitpid,
-    Execve,
+    Spawn,
     Getrandom,
     Fdopen,
     Memory,     // one allocation

@@ -184,8 +184,9 @@ inline std::string SignalSettings()
     for (int signal = 1; signal <= SIGRTMAX; ++signal) {
         struct sigaction action {};
         if (::sigaction(signal, nullptr, &action) < 0) continue;
+        constexpr int Restorer = 0x04000000;  // the C library's own; set with any action
         text << signal << ' ' << reinterpret_cast<void*>(action.sa_handler) << ' '
-             << action.sa_flags << ' ';
+             << (action.sa_flags & ~Restorer) << ' ';
         print(action.sa_mask);
     }
     return text.str();

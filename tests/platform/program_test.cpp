@@ -1,8 +1,10 @@
 // Programs that are run to their end: CoreLibExec().
 #include <orvacore/orvacore.h>
 
+#include <dlfcn.h>
 #include <malloc.h>
 #include <pthread.h>
+#include <spawn.h>
 #include <sys/file.h>
 #include <sys/prctl.h>
 
@@ -13,6 +15,37 @@
 #include "support/temp_dir.h"
 
 namespace {
+
+// What happens in place of the start of a program, in the process that would start it.
+void (*insteadOfStarting)() = nullptr;
+
+}  // namespace
+
+// Takes the C library's place in the test program.
+extern "C" int posix_spawn(pid_t* pid, const char* path, const posix_spawn_file_actions_t* files,
+                           const posix_spawnattr_t* attributes, char* const* arguments,
+                           char* const* environment)
+{
+    if (insteadOfStarting != nullptr) insteadOfStarting();
+    static const auto real =
+        reinterpret_cast<decltype(::posix_spawn)*>(::dlsym(RTLD_NEXT, "posix_spawn"));
+    return real(pid, path, files, attributes, arguments, environment);
+}
+
+namespace {
+
+// Runs `body` in a caller whose programs are its children, and in one whose programs have a
+// companion, because it ignores the signal of its children.
+void InBothKinds(const std::function<void()>& body)
+{
+    for (void (*handler)(int) : {SIG_DFL, SIG_IGN}) {
+        SCOPED_TRACE(handler == SIG_DFL ? "children" : "companions");
+        InProcess([&] {
+            SetSignal(SIGCHLD, handler);
+            body();
+        });
+    }
+}
 
 int Exec(const std::string& path, const char* argument1 = nullptr, const char* argument2 = nullptr,
          const char* argument3 = nullptr, const char* argument4 = nullptr)
@@ -78,12 +111,14 @@ TEST_F(ProgramTest, TheResultIsTheExitCode)
 
 TEST_F(ProgramTest, AProgramThatASignalEndsHasFailed)
 {
-    InProcess([] {
+    InBothKinds([] {
         for (const int signal : {SIGHUP, SIGINT, SIGTERM, SIGSEGV, SIGRTMIN}) {
             SetSignal(signal, SIG_DFL);  // whoever runs the tests may have it ignored
             EXPECT_EQ(Shell("ulimit -c 0; kill -$0 $$", std::to_string(signal)), -1) << signal;
         }
+        errno = 0;
         EXPECT_EQ(Shell("kill -KILL $$"), -1);
+        EXPECT_EQ(errno, EINTR);
     });
 }
 
@@ -137,7 +172,7 @@ TEST_F(ProgramTest, ArgumentsArriveAsTheyStand)
 
 TEST_F(ProgramTest, EnvironmentAndDirectoryAreTheCallers)
 {
-    InProcess([&] {
+    InBothKinds([&] {
         EXPECT_EQ(::chdir(dir.Path().c_str()), 0);
         // NOLINTNEXTLINE(concurrency-mt-unsafe): there is no other thread
         EXPECT_EQ(::setenv("ORVADR_TEST", "some value", 1), 0);
@@ -149,7 +184,7 @@ TEST_F(ProgramTest, EnvironmentAndDirectoryAreTheCallers)
 
 TEST_F(ProgramTest, OnlyTheStandardDescriptorsAreInherited)
 {
-    InProcess([&] {
+    InBothKinds([&] {
         const int file = ::open(dir.File("out").c_str(), O_RDWR | O_CREAT, 0600);
         for (const int fd : {0, 1, 2, 3, 4, 5, 63, 64, 200}) ::dup2(file, fd);
         EXPECT_EQ(Exec("/bin/ls", "/proc/self/fd"), 0);
@@ -160,7 +195,7 @@ TEST_F(ProgramTest, OnlyTheStandardDescriptorsAreInherited)
 TEST_F(ProgramTest, StandardDescriptorsThatAreClosedStayClosed)
 {
     for (const std::string open : {"", "0", "1", "2", "01", "02", "12", "012"}) {
-        InProcess([&] {
+        InBothKinds([&] {
             for (const int fd : {0, 1, 2}) {
                 if (open.find(std::to_string(fd)) == std::string::npos) ::close(fd);
             }
@@ -179,7 +214,7 @@ TEST_F(ProgramTest, ALockIsFreeWhenItsHolderEndsAlthoughAProgramItStartedLivesOn
 {
     const std::string lock = dir.File("lock");
     const std::string background = dir.File("background");
-    InProcess([&] {
+    InBothKinds([&] {
         HoldLock(lock);
         EXPECT_EQ(Shell("sleep 60 >/dev/null 2>&1 & echo $! >\"$0\"", background), 0);
         EXPECT_FALSE(CanLock(lock));
@@ -218,30 +253,80 @@ TEST_F(ProgramTest, ResultsAreTrueWhateverTheCallerDoesWithItsChildrensSignal)
     }
 }
 
-TEST_F(ProgramTest, ResultsAreTrueWhileAnotherThreadReapsAllChildren)
+// A thread that waits for every child there is, as long as this object lives.
+class Reaper {
+  public:
+    Reaper()
+        : thread([this] {
+              while (!done) {
+                  ReapAll(0);
+                  ::sched_yield();
+              }
+          })
+    {
+    }
+    Reaper(const Reaper&) = delete;
+    Reaper& operator=(const Reaper&) = delete;
+    ~Reaper()
+    {
+        done = true;
+        thread.join();
+    }
+
+  private:
+    std::atomic<bool> done{false};
+    std::thread thread;
+};
+
+TEST_F(ProgramTest, ACompanionKeepsTheResultFromAThreadThatReapsAllChildren)
 {
     InProcess([] {
-        std::atomic<bool> done{false};
-        std::thread reaper([&] {
-            while (!done) {
-                ReapAll(0);
-                ::sched_yield();
-            }
-        });
+        SetSignal(SIGCHLD, ReapAll, SA_RESTART);
+        const Reaper reaper;
         for (int i = 0; i < 10; ++i) ExpectTrueResults();
-        done = true;
-        reaper.join();
     });
 }
 
-TEST_F(ProgramTest, NoSignalIsSentToTheCaller)
+TEST_F(ProgramTest, AResultThatAnotherThreadHasFetchedIsNotKnown)
 {
     InProcess([] {
+        SetSignal(SIGCHLD, SIG_DFL);
+        const Reaper reaper;
+        for (int i = 0; i < 10; ++i) {
+            errno = 0;
+            const int result = Shell("exit 3");
+            EXPECT_TRUE(result == 3 || (result == -1 && errno == ECHILD)) << result << ' ' << errno;
+        }
+    });
+}
+
+TEST_F(ProgramTest, ACompanionSendsNoSignalToTheCaller)
+{
+    InProcess([] {
+        SetSignal(SIGCHLD, ReapAll);
         BlockSignal(SIGCHLD);
         ExpectTrueResults();
         sigset_t pending;
         EXPECT_EQ(::sigpending(&pending), 0);
         EXPECT_EQ(::sigismember(&pending, SIGCHLD), 0);
+    });
+}
+
+// That the companion has ended does not show in the pipe, whose other end somebody else holds.
+TEST_F(ProgramTest, ACompanionThatIsKilledIsAFailure)
+{
+    InProcess([] {
+        SetSignal(SIGCHLD, SIG_IGN);
+        static Pipe life;  // of the caller: closed when that ends
+        insteadOfStarting = [] {
+            if (::fork() == 0) {
+                life.ReadToEnd();
+                ::_exit(0);
+            }
+            ::kill(::getpid(), SIGKILL);
+        };
+        ExpectNotStarted("/bin/true", ECHILD);
+        EXPECT_FALSE(HasChildren());
     });
 }
 
@@ -282,24 +367,26 @@ unsigned long long SignalsIn(const std::string& status, const std::string& line)
 TEST_F(ProgramTest, TheProgramHasTheCallersMaskAndIgnoredSignalsButNoHandlers)
 {
     const auto bit = [](int signal) { return 1ULL << (signal - 1); };
-    InProcess([&] {
-        SetSignal(SIGUSR1, ReapAll);
-        SetSignal(SIGTERM, ReapAll);
-        SetSignal(SIGUSR2, SIG_IGN);
-        SetSignal(SIGCHLD, SIG_IGN);
-        BlockSignal(SIGUSR1);
-        BlockSignal(SIGINT);
-        const int file = ::open(dir.File("status").c_str(), O_WRONLY | O_CREAT, 0600);
-        ::dup2(file, STDOUT_FILENO);
-        EXPECT_EQ(Exec("/bin/cat", "/proc/self/status"), 0);
-    });
-    const std::string status = Content(dir.File("status"));
-    EXPECT_EQ(SignalsIn(status, "SigBlk"), bit(SIGUSR1) | bit(SIGINT));
-    EXPECT_EQ(SignalsIn(status, "SigCgt"), 0U);
-    const unsigned long long ignored = SignalsIn(status, "SigIgn");
-    EXPECT_NE(ignored & bit(SIGUSR2), 0U);
-    EXPECT_EQ(ignored & bit(SIGCHLD), 0U);  // on purpose: programs wait for children of their own
-    EXPECT_EQ(ignored & (bit(SIGUSR1) | bit(SIGTERM)), 0U);
+    for (void (*handler)(int) : {SIG_DFL, SIG_IGN, ReapAll}) {
+        InProcess([&] {
+            SetSignal(SIGUSR1, ReapAll);
+            SetSignal(SIGTERM, ReapAll);
+            SetSignal(SIGUSR2, SIG_IGN);
+            SetSignal(SIGCHLD, handler);
+            BlockSignal(SIGUSR1);
+            BlockSignal(SIGINT);
+            const int file = ::open(dir.File("status").c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0600);
+            ::dup2(file, STDOUT_FILENO);
+            EXPECT_EQ(Exec("/bin/cat", "/proc/self/status"), 0);
+        });
+        const std::string status = Content(dir.File("status"));
+        EXPECT_EQ(SignalsIn(status, "SigBlk"), bit(SIGUSR1) | bit(SIGINT));
+        EXPECT_EQ(SignalsIn(status, "SigCgt"), 0U);
+        const unsigned long long ignored = SignalsIn(status, "SigIgn");
+        EXPECT_NE(ignored & bit(SIGUSR2), 0U);
+        EXPECT_EQ(ignored & bit(SIGCHLD), 0U) << "programs wait for children of their own";
+        EXPECT_EQ(ignored & (bit(SIGUSR1) | bit(SIGTERM)), 0U);
+    }
 }
 
 volatile sig_atomic_t signalsSeen = 0;
@@ -311,7 +398,7 @@ void CountSignal(int)
 
 TEST_F(ProgramTest, TheCallersHandlersRunWhileItWaits)
 {
-    InProcess([] {
+    InBothKinds([] {
         SetSignal(SIGUSR1, CountSignal);  // no SA_RESTART: the wait is interrupted
         for (int run = 1; run <= 10; ++run) {
             EXPECT_EQ(Shell("kill -USR1 $0; exit 7", std::to_string(::getpid())), 7);
@@ -322,7 +409,7 @@ TEST_F(ProgramTest, TheCallersHandlersRunWhileItWaits)
 
 TEST_F(ProgramTest, ASignalForTheWholeGroupDoesNotLoseTheResult)
 {
-    InProcess([] {
+    InBothKinds([] {
         EXPECT_EQ(::setpgid(0, 0), 0);
         SetSignal(SIGTERM, CountSignal);
         EXPECT_EQ(Shell("trap '' TERM; kill -TERM 0; exit 7"), 7);
@@ -332,7 +419,7 @@ TEST_F(ProgramTest, ASignalForTheWholeGroupDoesNotLoseTheResult)
 
 TEST_F(ProgramTest, WhoReadsTheOutputWaitsForTheProgramAlone)
 {
-    InProcess([] {
+    InBothKinds([] {
         Pipe input;
         ::dup2(input.Reading(), STDIN_FILENO);
         FILE* stream = CoreLibPopen("/bin/sh", "r", "-c", "echo said; exec >/dev/null; read x",
@@ -382,10 +469,20 @@ TEST_F(ProgramTest, AThreadWithASmallStackRunsPrograms)
     ::pthread_attr_destroy(&attributes);
 }
 
-TEST_F(ProgramTest, WithoutDescriptorsNoProgramIsStarted)
+TEST_F(ProgramTest, AChildNeedsNoFreeDescriptors)
 {
-    for (int spare = 0; spare < 3; ++spare) {
+    InProcess([] {
+        SetSignal(SIGCHLD, SIG_DFL);
+        LeaveDescriptors(0);
+        EXPECT_EQ(Exec("/bin/true"), 0);
+    });
+}
+
+TEST_F(ProgramTest, WithoutDescriptorsForACompanionNoProgramIsStarted)
+{
+    for (int spare = 0; spare < 2; ++spare) {
         InProcess([spare] {
+            SetSignal(SIGCHLD, SIG_IGN);
             LeaveDescriptors(spare);
             ExpectNotStarted("/bin/true", EMFILE);
             EXPECT_FALSE(HasChildren());
@@ -395,7 +492,7 @@ TEST_F(ProgramTest, WithoutDescriptorsNoProgramIsStarted)
 
 TEST_F(ProgramTest, WithoutRoomForAProcessNoProgramIsStarted)
 {
-    InProcess([] {
+    InBothKinds([] {
         BecomeOrdinary();
         const std::set<int> before = Descriptors();
         const rlimit none{0, 0};
@@ -407,7 +504,7 @@ TEST_F(ProgramTest, WithoutRoomForAProcessNoProgramIsStarted)
 
 TEST_F(ProgramTest, RunsLeaveNothingBehind)
 {
-    InProcess([] {
+    InBothKinds([] {
         const auto pages = [] { return Number(Content("/proc/self/statm")); };
         const auto run = [](int times) {
             for (int i = 0; i < times; i += 2) {

@@ -132,11 +132,6 @@ int RealDup2(int from, int to)
     return RealFunction<decltype(::dup2)>("dup2")(from, to);
 }
 
-int RealCloseRange(unsigned int first, unsigned int last, int flags)
-{
-    return RealFunction<decltype(::close_range)>("close_range")(first, last, flags);
-}
-
 pid_t RealWaitpid(pid_t pid, int* status, int options)
 {
     return RealFunction<decltype(::waitpid)>("waitpid")(pid, status, options);
@@ -162,9 +157,17 @@ unsigned int RealSleep(unsigned int seconds)
     return RealFunction<decltype(::sleep)>("sleep")(seconds);
 }
 
-int RealExecve(const char* path, char* const* arguments, char* const* environment)
+int RealSpawn(const SpawnCall& call)
 {
-    return RealFunction<decltype(::execve)>("execve")(path, arguments, environment);
+    return RealFunction<decltype(::posix_spawn)>("posix_spawn")(
+        call.pid, call.path, call.files, call.attributes, call.arguments, call.environment);
+}
+
+std::vector<std::string> SpawnCall::Arguments() const
+{
+    std::vector<std::string> texts;
+    for (char* const* at = arguments; *at != nullptr; ++at) texts.emplace_back(*at);
+    return texts;
 }
 
 extern "C" int open(const char* path, int flags, ...)
@@ -269,11 +272,6 @@ extern "C" int dup2(int from, int to) noexcept
     return Answer(&SyscallAnswers::dup2, RealDup2, from, to);
 }
 
-extern "C" int close_range(unsigned int first, unsigned int last, int flags) noexcept
-{
-    return Answer(&SyscallAnswers::closeRange, RealCloseRange, first, last, flags);
-}
-
 extern "C" pid_t waitpid(pid_t pid, int* status, int options)
 {
     return Answer(&SyscallAnswers::waitpid, RealWaitpid, pid, status, options);
@@ -307,7 +305,11 @@ extern "C" unsigned int sleep(unsigned int seconds)
     return Answer(&SyscallAnswers::sleep, RealSleep, seconds);
 }
 
-extern "C" int execve(const char* path, char* const* arguments, char* const* environment) noexcept
+extern "C" int posix_spawn(pid_t* pid, const char* path, const posix_spawn_file_actions_t* files,
+                           const posix_spawnattr_t* attributes, char* const* arguments,
+                           char* const* environment)
 {
-    return Answer(&SyscallAnswers::execve, RealExecve, path, arguments, environment);
+    const SpawnCall call{pid, path, files, attributes, arguments, environment};
+    const bool isSet = current != nullptr && current->spawn;
+    return isSet ? current->spawn(call) : RealSpawn(call);
 }

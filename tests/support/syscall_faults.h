@@ -7,12 +7,27 @@
 #ifndef ORVADRCORE_TESTS_SYSCALL_FAULTS_H
 #define ORVADRCORE_TESTS_SYSCALL_FAULTS_H
 
+#include <spawn.h>
 #include <sys/stat.h>
 #include <sys/types.h>
 
 #include <cerrno>
 #include <cstdio>
 #include <functional>
+#include <string>
+#include <vector>
+
+// A call of posix_spawn. Whoever hands it on may replace path and arguments.
+struct SpawnCall {
+    pid_t* pid;
+    const char* path;
+    const posix_spawn_file_actions_t* files;
+    const posix_spawnattr_t* attributes;
+    char* const* arguments;
+    char* const* environment;
+
+    std::vector<std::string> Arguments() const;
+};
 
 struct SyscallAnswers {
     std::function<int(const char*, int, mode_t)> open;  // of open64, too
@@ -32,7 +47,6 @@ struct SyscallAnswers {
     std::function<int(const char*)> unlink;
     std::function<int(int*, int)> pipe2;
     std::function<int(int, int)> dup2;
-    std::function<int(unsigned int, unsigned int, int)> closeRange;
     std::function<pid_t(pid_t, int*, int)> waitpid;
     std::function<ssize_t(void*, std::size_t, unsigned int)> getrandom;
     std::function<FILE*(int, const char*)> fdopen;
@@ -41,9 +55,8 @@ struct SyscallAnswers {
     // Of the clone that the platform layer calls by number; all other numbers are the system's.
     std::function<long(long)> clone;
 
-    // Runs in the process that is to become the program: what it notes the test sees in shared
-    // memory only, as ProgramNotes has it.
-    std::function<int(const char*, char* const*, char* const*)> execve;
+    // Of posix_spawn: gets the program's path and arguments. Answers an error, as posix_spawn does.
+    std::function<int(const SpawnCall&)> spawn;
 };
 
 struct SyscallFaults : SyscallAnswers {
@@ -65,6 +78,12 @@ inline auto Failing(int error)
     };
 }
 
+// The same for posix_spawn, which answers the error.
+inline auto FailingToStart(int error)
+{
+    return [error](const SpawnCall& /*call*/) { return error; };
+}
+
 // The real functions, for answers that begin with the system's own.
 int RealOpen(const char* path, int flags, mode_t mode);
 ssize_t RealRead(int fd, void* buffer, std::size_t size);
@@ -83,12 +102,11 @@ int RealClose(int fd);
 int RealUnlink(const char* path);
 int RealPipe2(int* ends, int flags);
 int RealDup2(int from, int to);
-int RealCloseRange(unsigned int first, unsigned int last, int flags);
 pid_t RealWaitpid(pid_t pid, int* status, int options);
 ssize_t RealGetrandom(void* buffer, std::size_t size, unsigned int flags);
 FILE* RealFdopen(int fd, const char* mode);
 unsigned int RealSleep(unsigned int seconds);
 long RealClone(long flags);
-int RealExecve(const char* path, char* const* arguments, char* const* environment);
+int RealSpawn(const SpawnCall& call);
 
 #endif

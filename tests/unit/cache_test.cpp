@@ -98,7 +98,7 @@ TEST_F(CacheTest, WithoutDirectoryOrNameTheDefaultPathIsUsed)
 
 TEST_F(CacheTest, WithADirectoryThatCannotBeMadeTheDefaultPathIsUsed)
 {
-    faults.execve = Failing(EACCES);
+    faults.spawn = FailingToStart(EACCES);
     const TestCache homeless(dir.File("a"), "b", Timeout, false, 0);
     EXPECT_FALSE(homeless.Load());
     ExpectLines({Err("CreateDir", "Failed to create dir [" + dir.File("a") + "] with mode [755]")
@@ -124,7 +124,7 @@ TEST_F(CacheTest, AllCachesWithoutAPathOfTheirOwnShareOneFile)
     WriteFile(Place(lock), "");
     WriteFile(Place("/tmp/default_dr_cache"), R"({"cached_data":"shared"})");
     WriteFile(Place("/tmp/default_dr_cache.pid"), std::to_string(::getpid()));
-    faults.execve = Failing(EACCES);
+    faults.spawn = FailingToStart(EACCES);
     TestCache nameless(dir.Path(), "", Timeout, false, 0);
     TestCache homeless(dir.File("a"), "b", Timeout, false, 0);
     EXPECT_EQ(TakeLines().size(), 3U);

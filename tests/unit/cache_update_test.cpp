@@ -935,7 +935,7 @@ TEST_F(CacheUpdateTest, ALockDirectoryThatCannotBeMadeLooksLikeAnUpdater)
     WriteStale("old");
     FailForks(EAGAIN);
     std::filesystem::remove_all(Place("/tmp/.orvadr_lock"));
-    faults.execve = Failing(EACCES);
+    faults.spawn = FailingToStart(EACCES);
     EXPECT_EQ(cache.Read(), "old");
     const std::string lockDir = "/tmp/.orvadr_lock/" + dir.Path();
     ExpectLines(

@@ -46,13 +46,16 @@ class FileLockTest : public LoggedTest {
         faults.stat = [&](const char* path, struct stat* status) {
             return RealStat(Place(path).c_str(), status);
         };
-        faults.execve = [&](const char* program, char* const* arguments, char* const* environment) {
-            placed.clear();
-            for (char* const* at = arguments; *at != nullptr; ++at) placed.push_back(Place(*at));
-            placedArguments.clear();
-            for (std::string& argument : placed) placedArguments.push_back(argument.data());
-            placedArguments.push_back(nullptr);
-            return RealExecve(program, placedArguments.data(), environment);
+        faults.spawn = [&](SpawnCall call) {
+            std::vector<std::string> texts = call.Arguments();
+            std::vector<char*> arguments;
+            for (std::string& text : texts) {
+                text = Place(text);
+                arguments.push_back(text.data());
+            }
+            arguments.push_back(nullptr);
+            call.arguments = arguments.data();
+            return RealSpawn(call);
         };
         faults.flock = [&](int fd, int operation) {
             attempts.push_back({fd, operation});
@@ -95,8 +98,6 @@ class FileLockTest : public LoggedTest {
     std::vector<unsigned int> sleeps;
 
   private:
-    std::vector<std::string> placed;
-    std::vector<char*> placedArguments;
 };
 
 // Whether another object of this process could take the lock.

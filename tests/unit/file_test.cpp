@@ -17,7 +17,6 @@
 #include "support/child_checks.h"
 #include "support/child_process.h"
 #include "support/log_capture.h"
-#include "support/program_notes.h"
 #include "support/syscall_faults.h"
 #include "support/temp_dir.h"
 #include "support/test_files.h"
@@ -55,9 +54,18 @@ class FileTest : public LoggedTest {
     // Notes the programs that are started, with their arguments.
     void NotePrograms()
     {
-        faults.execve = [&](const char* program, char* const* arguments, char* const* environment) {
-            programs.Note(arguments);
-            return RealExecve(program, arguments, environment);
+        faults.spawn = [&](const SpawnCall& call) {
+            programs.push_back(call.Arguments());
+            return RealSpawn(call);
+        };
+    }
+
+    // From now on another thread fetches the results of all children.
+    void LoseResults()
+    {
+        faults.waitpid = [](pid_t pid, int* status, int options) {
+            RealWaitpid(pid, status, options);
+            return Failing(ECHILD)();
         };
     }
 
@@ -75,7 +83,7 @@ class FileTest : public LoggedTest {
     TempDir dir;
     SyscallFaults faults;
     std::string path = dir.File("doc.json");
-    ProgramNotes programs;
+    std::vector<std::vector<std::string>> programs;
 };
 
 class FileReadPathTest : public FileTest {};
@@ -570,9 +578,8 @@ TEST_F(FileCreateDirTest, RunsMkdirWithTheModeInOctal)
     NotePrograms();
     EXPECT_TRUE(File::CreateDir(dir.File("a"), 0755));
     EXPECT_TRUE(File::CreateDir(dir.File("b"), 0));
-    EXPECT_THAT(programs.Taken(),
-                ElementsAre(ElementsAre("/bin/mkdir", "-p", dir.File("a"), "-m", "755"),
-                            ElementsAre("/bin/mkdir", "-p", dir.File("b"), "-m", "0")));
+    EXPECT_THAT(programs, ElementsAre(ElementsAre("/bin/mkdir", "-p", dir.File("a"), "-m", "755"),
+                                      ElementsAre("/bin/mkdir", "-p", dir.File("b"), "-m", "0")));
     ASSERT_EQ(::rmdir(dir.File("b").c_str()), 0);
 }
 
@@ -597,14 +604,14 @@ TEST_F(FileCreateDirTest, ADirectoryThatIsThereStaysAsItIs)
         EXPECT_TRUE(File::CreateDir(dir.File("link"), mode));
     }
     EXPECT_EQ(ModeOf(there), 0711U);
-    EXPECT_THAT(programs.Taken(), IsEmpty());
+    EXPECT_THAT(programs, IsEmpty());
 }
 
 TEST_F(FileCreateDirTest, AnEmptyPathIsRefusedWithoutALine)
 {
     NotePrograms();
     for (const int mode : {0755, 01000, -1}) EXPECT_FALSE(File::CreateDir("", mode));
-    EXPECT_THAT(programs.Taken(), IsEmpty());
+    EXPECT_THAT(programs, IsEmpty());
 }
 
 TEST_F(FileCreateDirTest, ModesThatAreNoneAreRefused)
@@ -627,7 +634,7 @@ TEST_F(FileCreateDirTest, ModesThatAreNoneAreRefused)
         EXPECT_FALSE(File::CreateDir(dir.File("new"), row.mode));
         ExpectLines({Err("CreateDir", row.line)});
     }
-    EXPECT_THAT(programs.Taken(), IsEmpty());
+    EXPECT_THAT(programs, IsEmpty());
     EXPECT_THAT(NamesIn(dir.Path()), IsEmpty());
 }
 
@@ -643,9 +650,19 @@ TEST_F(FileCreateDirTest, AFileInTheWayIsTold)
 
 TEST_F(FileCreateDirTest, AProgramThatCannotBeStartedIsTold)
 {
-    faults.execve = Failing(ENOENT);
+    faults.spawn = FailingToStart(ENOENT);
     EXPECT_FALSE(File::CreateDir(dir.File("new"), 0));
     ExpectLines({Err("CreateDir", "Failed to create dir [" + dir.File("new") + "] with mode [0]")});
+}
+
+TEST_F(FileCreateDirTest, WhereTheResultIsLostTheDirectoryTellsWhetherItWasMade)
+{
+    LoseResults();
+    EXPECT_TRUE(File::CreateDir(dir.File("new"), 0755));
+    WriteFile(dir.File("file"), "");
+    EXPECT_FALSE(File::CreateDir(dir.File("file"), 0755));
+    ExpectLines(
+        {Err("CreateDir", "Failed to create dir [" + dir.File("file") + "] with mode [755]")});
 }
 
 TEST_F(FileCreateDirTest, APathIsTakenAsItStands)
@@ -667,7 +684,7 @@ TEST_F(FileRemoveDirTest, ATreeIsRemovedWithRm)
     WriteFile(dir.File("other"), "text");
     NotePrograms();
     EXPECT_TRUE(File::RemoveDir(dir.File("tree")));
-    EXPECT_THAT(programs.Taken(), ElementsAre(ElementsAre("/bin/rm", "-rf", dir.File("tree"))));
+    EXPECT_THAT(programs, ElementsAre(ElementsAre("/bin/rm", "-rf", dir.File("tree"))));
     EXPECT_THAT(NamesIn(dir.Path()), ElementsAre("other"));
 }
 
@@ -678,7 +695,7 @@ TEST_F(FileRemoveDirTest, WhatIsNoDirectoryIsASuccessThatRemovesNothing)
     EXPECT_TRUE(File::RemoveDir(dir.File("missing")));
     EXPECT_TRUE(File::RemoveDir(path));
     EXPECT_TRUE(File::RemoveDir(""));
-    EXPECT_THAT(programs.Taken(), IsEmpty());
+    EXPECT_THAT(programs, IsEmpty());
     EXPECT_EQ(ReadFile(path), "text");
 }
 
@@ -692,6 +709,19 @@ TEST_F(FileRemoveDirTest, OfALinkTheLinkIsRemoved)
     EXPECT_EQ(ReadFile(dir.File("target/file")), "text");
 }
 
+TEST_F(FileRemoveDirTest, WhereTheResultIsLostTheDirectoryTellsWhetherItIsGone)
+{
+    LoseResults();
+    std::filesystem::create_directories(dir.File("tree/below"));
+    EXPECT_TRUE(File::RemoveDir(dir.File("tree")));
+    std::filesystem::create_directories(dir.File("tree"));
+    faults.spawn = [](SpawnCall call) {  // another program, which removes nothing
+        call.path = "/bin/true";
+        return RealSpawn(call);
+    };
+    EXPECT_FALSE(File::RemoveDir(dir.File("tree")));
+}
+
 TEST_F(FileRemoveDirTest, AFailureIsToldByTheResultAlone)
 {
     CheckAsOrdinaryUser(dir, [&] {
@@ -702,7 +732,7 @@ TEST_F(FileRemoveDirTest, AFailureIsToldByTheResultAlone)
         ExpectLines({});
     });
     std::filesystem::create_directories(dir.File("tree"));
-    faults.execve = Failing(ENOENT);
+    faults.spawn = FailingToStart(ENOENT);
     EXPECT_FALSE(File::RemoveDir(dir.File("tree")));
 }
 

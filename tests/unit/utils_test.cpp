@@ -14,7 +14,6 @@
 #include "json_helpers.h"
 #include "support/log_capture.h"
 #include "support/pauses.h"
-#include "support/program_notes.h"
 #include "support/syscall_faults.h"
 
 namespace {
@@ -26,32 +25,31 @@ class ProgramStandIn {
     // No program: starting one fails with `error`.
     explicit ProgramStandIn(int error)
     {
-        faults.execve = [this, error](const char* /*path*/, char* const* arguments,
-                                      char* const* /*environment*/) {
-            notes.Note(arguments);
-            errno = error;
-            return -1;
+        faults.spawn = [this, error](const SpawnCall& call) {
+            asked = call.Arguments();
+            return error;
         };
     }
     explicit ProgramStandIn(std::vector<std::string> command)
     {
-        faults.execve = [this, command](const char* /*path*/, char* const* arguments,
-                                        char* const* environment) mutable {
-            notes.Note(arguments);
+        faults.spawn = [this, command](SpawnCall call) mutable {
+            asked = call.Arguments();
             std::vector<char*> texts;
             texts.reserve(command.size() + 1);
             for (std::string& text : command) texts.push_back(text.data());
             texts.push_back(nullptr);
-            return RealExecve(texts[0], texts.data(), environment);
+            call.path = texts[0];
+            call.arguments = texts.data();
+            return RealSpawn(call);
         };
     }
 
     // The program that was asked for, followed by its arguments.
-    std::vector<std::string> Asked() const { return notes.Taken().back(); }
+    const std::vector<std::string>& Asked() const { return asked; }
 
   private:
     SyscallFaults faults;
-    ProgramNotes notes;
+    std::vector<std::string> asked;
 };
 
 using OrvaDRCore::Container;

@@ -3,10 +3,12 @@
 /// library needs. Every call may be made from any thread unless it says otherwise; none throws,
 /// unless memory runs out, none logs.
 ///
-/// Programs are started without a shell and inherit descriptors 0, 1 and 2, and no others. They are
-/// no children of the caller, who gets no SIGCHLD for them: a handler that reaps all children does
-/// not take their results away, and neither does a caller that ignores the signal. Handled signals
-/// and SIGCHLD have their default action in the program; ignored ones stay ignored.
+/// Programs are started without a shell and inherit descriptors 0, 1 and 2, and no others. Handled
+/// signals and SIGCHLD have their default action in the program; ignored signals stay ignored.
+///
+/// A program is a child of the caller, who gets a SIGCHLD when it ends. Where the caller ignores
+/// SIGCHLD, has a handler for it or has set SA_NOCLDWAIT, the result would be lost. The program is
+/// then started by a process of ours, and the caller gets no SIGCHLD for it.
 #ifndef ORVACORE_ORVACORE_H
 #define ORVACORE_ORVACORE_H
 
@@ -19,8 +21,9 @@
 /// Runs a program and waits for its end.
 /// \param path  the program's file; it is also its first argument
 /// \param argument1,argument2,argument3,argument4  further arguments; the first null one ends them
-/// \return 0 when the program ended with code 0, its code when it ended with another, -1 when it
-///         could not be started (errno set) or was ended by a signal
+/// \return 0 when the program ended with code 0, its code when it ended with another. Otherwise -1
+///         with errno set: EINTR when a signal ended the program, ECHILD when another thread has
+///         fetched its result by waiting for all children, and else why it could not be started
 int CoreLibExec(const char* path, const char* argument1, const char* argument2,
                 const char* argument3, const char* argument4);
 
@@ -33,7 +36,7 @@ int CoreLibExec(const char* path, const char* argument1, const char* argument2,
 FILE* CoreLibPopen(const char* path, const char* mode, ...);
 
 /// Closes a stream of CoreLibPopen() and waits for its program.
-/// \return 0 when the program ended with code 0, otherwise -1
+/// \return 0 when the program ended with code 0, otherwise -1, also where its result is not known
 int CoreLibPclose(FILE* stream);
 
 // ----------------------------------------------------------------------------- texts and files

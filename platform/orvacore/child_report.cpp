@@ -1,0 +1,50 @@
+#include "child_report.h"
+
+#include <poll.h>
+#include <signal.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cerrno>
+
+namespace {
+
+// How often the parent looks whether the child is still there.
+constexpr int LookMSec = 20;
+
+// Does not reap the child. Linux before 4.7 cannot answer: the child seems to live on.
+bool HasEnded(pid_t child)
+{
+    siginfo_t info{};
+    const int flags = WEXITED | WNOHANG | WNOWAIT | __WALL;
+    if (::waitid(P_PID, static_cast<id_t>(child), &info, flags) == 0) return info.si_pid == child;
+    // A caller who ignores SIGCHLD, or its handler, has reaped the child already.
+    return errno == ECHILD;
+}
+
+bool CanRead(int fd, int timeoutMSec)
+{
+    pollfd waiting{fd, POLLIN, 0};
+    return ::poll(&waiting, 1, timeoutMSec) > 0;
+}
+
+}  // namespace
+
+void SendReport(int fd, const void* report, std::size_t size)
+{
+    while (::write(fd, report, size) < 0 && errno == EINTR) {
+    }
+}
+
+bool ReceiveReport(int fd, pid_t child, void* report, std::size_t size)
+{
+    while (!CanRead(fd, LookMSec)) {
+        // A report comes before the end.
+        if (HasEnded(child) && !CanRead(fd, 0)) return false;
+    }
+    ssize_t count = 0;
+    do {
+        count = ::read(fd, report, size);
+    } while (count < 0 && errno == EINTR);
+    return count > 0;
+}
