@@ -25,13 +25,24 @@
 /// Otherwise Read() starts a child that refreshes in the background, or finds one at work, and
 /// gives the old data at once.
 ///
-/// **What runs in the child.** GetUpdatedData(), GetInfo(), IsValidData() and what they call may
-/// run in a forked child, which ends without exit handlers or destructors. They must not use what
-/// the caller had open: not its SqliteDB (SQLite connections do not survive a fork), not its
-/// sockets, not its locks. Open your own; a database in which the caller is inside a transaction is
-/// closed to them. What they compute reaches others through the cache file
-/// alone. An exception out of them ends the child; in a caller that waits it goes on to the caller,
-/// behind the removal of the pid file.
+/// **What runs in the child.** A background refresh forks. GetUpdatedData(), GetInfo(), IsValidData()
+/// and what they call then run in the child, which ends without exit handlers or destructors. What
+/// they compute reaches others through the cache file alone. An exception out of them ends the
+/// child; in a caller that waits, it goes on to the caller after the pid file has been removed.
+/// - Of the caller's threads only one exists in the child. A lock that another thread held at the
+///   fork stays locked there for ever. The library sees to it that memory, streams, locales, times,
+///   error texts and syslog() can be used. Not so a mutex of your own, a library with locks of its
+///   own, a lookup of host names, and SQLite, where another thread uses it at the same time.
+/// - Do not use what the caller has open: not its SqliteDB (SQLite connections do not survive a
+///   fork), not its sockets, not its locks. Open your own. A database in which the caller is inside
+///   a transaction cannot be used in the child at all. What you need from a database that other
+///   threads use, fetch before the fork: IsUpdatedDataRequired() is called in the caller, before
+///   each refresh.
+/// - The child inherits the caller's descriptors, and with them its locks. A FileLock that the
+///   caller holds and then destroys stays held until the child has ended, too; FileLock::unlock()
+///   frees it for both.
+/// - Flush your streams before Read(), or do not write to them in the child: what was not flushed is
+///   there twice, and may be written twice.
 ///
 /// An object is used by one thread at a time and holds no file and no lock between calls. Nothing
 /// throws by itself unless memory runs out. Log lines are at DEBUG unless said otherwise and name
@@ -161,7 +172,9 @@ class ORVADRCORE_API Cache {
     /// \return true after a refresh here, when a child was started, when another process is at
     ///         work, and after waiting for one, whatever came of it. False when the refresh here
     ///         failed, or when another process was faster to begin one; and with WARN
-    ///         `Failed to fork(). errno=[%d/%m]` when no child could be made
+    ///         `Failed to fork(). errno=[%d/%m]` when no child could be made. EDEADLK there means that
+    ///         other threads held a lock of the C library at each of up to 500 forks, or for five
+    ///         seconds
     /// \note A caller that waits looks again after pauses of 300 to 1000 milliseconds. It logs, at
     ///       DEBUG, `start to block wait cache [%s] ` before and
     ///       `finish to block wait cache [%s] ` after, both with a blank at the end.

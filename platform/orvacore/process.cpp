@@ -8,16 +8,34 @@
 
 #include <array>
 #include <cerrno>
+#include <chrono>
 
+#include "child_report.h"
+#include "library_locks.h"
 #include "process_status.h"
 
 namespace {
 
-// What the process between caller and detached child says to the caller.
+// Each attempt ends after a few milliseconds. That many fail only where other threads do nothing
+// but take the locks, or where one keeps its lock for long.
+constexpr int MaxAttempts = 500;
+constexpr std::chrono::seconds MaxTime{5};
+
+// What the intermediate process reports to the caller.
 struct ForkResult {
     pid_t pid;
-    int error;  // of the second fork; 0 when it succeeded
+    int error;  // of the second fork; EDEADLK when a lock could not be had
 };
+
+// Where the intermediate process reports to.
+int reportFd = -1;
+
+[[noreturn]] void ReportStuck()
+{
+    const ForkResult stuck{-1, EDEADLK};
+    SendReport(reportFd, &stuck, sizeof stuck);
+    ::_exit(0);
+}
 
 // Pipes and sockets among the standard descriptors lead to somebody who waits for their end.
 void DetachStandardStreams()
@@ -37,9 +55,12 @@ void DetachStandardStreams()
     }
 }
 
-// In the process between: forks the detached child, tells the caller about it and ends.
+// In the intermediate process: forks the detached child, tells the caller about it and ends. The
+// child is a copy of a process in which no library lock is held.
 void ForkAgain(int reading, int writing)
 {
+    reportFd = writing;
+    TakeLibraryLocksOr(ReportStuck);
     const pid_t pid = ::fork();
     if (pid == 0) {
         ::close(reading);
@@ -48,39 +69,43 @@ void ForkAgain(int reading, int writing)
         return;
     }
     const ForkResult result{pid, pid < 0 ? errno : 0};
-    while (::write(writing, &result, sizeof result) < 0 && errno == EINTR) {
-    }
+    SendReport(writing, &result, sizeof result);
     ::_exit(0);
 }
 
-// In the caller: what the process between says. It is a short one, and is waited for by its id.
-ForkResult AwaitResult(pid_t between, int reading)
+// The child of a child that ends at once belongs to init: the caller never has to wait for it.
+ForkResult TryForkDetached()
 {
-    ForkResult result{-1, ECHILD};
-    ssize_t count = 0;
-    do {
-        count = ::read(reading, &result, sizeof result);
-    } while (count < 0 && errno == EINTR);
-    // ECHILD means that a caller who ignores SIGCHLD, or its handler, has it reaped already.
-    while (::waitpid(between, nullptr, 0) < 0 && errno == EINTR) {
+    std::array<int, 2> pipe{};
+    if (::pipe2(pipe.data(), O_CLOEXEC) < 0) return {-1, errno};
+    const pid_t intermediate = ::fork();
+    if (intermediate == 0) {
+        ForkAgain(pipe[0], pipe[1]);
+        return {0, 0};
     }
+    ForkResult result{intermediate, errno};
+    ::close(pipe[1]);
+    if (intermediate > 0) {
+        if (!ReceiveReport(pipe[0], intermediate, &result, sizeof result)) result = {-1, ECHILD};
+        // ECHILD means that a caller who ignores SIGCHLD, or its handler, has reaped it already.
+        while (::waitpid(intermediate, nullptr, 0) < 0 && errno == EINTR) {
+        }
+    }
+    ::close(pipe[0]);
     return result;
 }
 
-// The child of a child that ends at once belongs to init: the caller never has to wait for it.
+// Forks again where another thread held a library lock at the moment of the fork.
 pid_t ForkDetached()
 {
-    std::array<int, 2> pipe{};
-    if (::pipe2(pipe.data(), O_CLOEXEC) < 0) return -1;
-    const pid_t between = ::fork();
-    if (between == 0) {
-        ForkAgain(pipe[0], pipe[1]);
-        return 0;
+    using Clock = std::chrono::steady_clock;
+    const Clock::time_point end = Clock::now() + MaxTime;
+    ForkResult result = TryForkDetached();
+    for (int attempt = 1; result.error == EDEADLK && attempt < MaxAttempts && Clock::now() < end;
+         ++attempt) {
+        TakeLibraryLocks();  // right after that they are most likely to be free
+        result = TryForkDetached();
     }
-    ForkResult result{between, errno};
-    ::close(pipe[1]);
-    if (between > 0) result = AwaitResult(between, pipe[0]);
-    ::close(pipe[0]);
     if (result.pid < 0) errno = result.error;
     return result.pid;
 }

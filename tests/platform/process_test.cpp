@@ -9,11 +9,14 @@
 #include <sys/socket.h>
 #include <sys/syscall.h>
 
+#include <atomic>
 #include <climits>
+#include <ctime>
 #include <filesystem>
 #include <thread>
 
 #include "caller.h"
+#include "support/shared_memory.h"
 #include "support/temp_dir.h"
 
 namespace {
@@ -26,6 +29,14 @@ struct ForkFault {
 };
 ForkFault forkFault{0, nullptr};
 
+// A lock of the C library that so many intermediate processes wait for, each in this way.
+struct LibraryLock {
+    std::atomic<int> waits;
+    void (*wait)();
+    pid_t caller;
+};
+LibraryLock* libraryLock = nullptr;
+
 }  // namespace
 
 // Takes the C library's place in the test program.
@@ -37,6 +48,17 @@ extern "C" pid_t fork() noexcept
     }
     static const auto real = reinterpret_cast<pid_t (*)()>(::dlsym(RTLD_NEXT, "fork"));
     return real();
+}
+
+// Takes the C library's place, too: it stands for all functions that take such a lock.
+extern "C" int setlogmask(int mask) noexcept
+{
+    if (libraryLock != nullptr && libraryLock->caller != ::getpid() && libraryLock->waits > 0) {
+        --libraryLock->waits;
+        libraryLock->wait();
+    }
+    static const auto real = reinterpret_cast<int (*)(int)>(::dlsym(RTLD_NEXT, "setlogmask"));
+    return real(mask);
 }
 
 namespace {
@@ -169,6 +191,8 @@ TEST(DetachedForkTest, DirectoryUmaskAndSignalsAreKept)
         SetSignal(SIGUSR1, ReapAll, SA_RESTART | SA_NODEFER);
         SetSignal(SIGCHLD, SIG_IGN);
         BlockSignal(SIGUSR2);
+        SetSignal(SIGALRM, ReapAll, SA_RESTART);
+        BlockSignal(SIGALRM);
         Pipe report;
         Detach([&] { report.Write(Settings()); });
         EXPECT_EQ(report.ReadToEnd(), Settings());
@@ -345,11 +369,95 @@ TEST(DetachedForkTest, AFailureOfTheSecondForkIsTold)
     });
 }
 
-TEST(DetachedForkTest, AProcessBetweenThatIsKilledIsAFailure)
+TEST(DetachedForkTest, AnIntermediateProcessThatIsKilledIsAFailure)
 {
     InProcess([] {
         forkFault = {2, [] { ::kill(::getpid(), SIGKILL); }};
         ExpectNotForked(ECHILD);
+    });
+}
+
+// Its end does not show in the pipe then.
+TEST(DetachedForkTest, AnIntermediateProcessThatIsKilledIsNoticedThoughSomebodyHoldsItsPipe)
+{
+    InProcess([] {
+        static Pipe life;  // of the caller: closed when that ends
+        forkFault = {2, [] {
+                         if (::fork() == 0) {
+                             life.ReadToEnd();
+                             ::_exit(0);
+                         }
+                         ::kill(::getpid(), SIGKILL);
+                     }};
+        ExpectNotForked(ECHILD);
+    });
+}
+
+// As a mutex waits, and as a spin lock does.
+[[noreturn]] void WaitForEver()
+{
+    while (true) ::pause();
+}
+
+[[noreturn]] void SpinForEver()
+{
+    while (true) ::sched_yield();
+}
+
+void WorkForAWhile()
+{
+    const std::clock_t begin = std::clock();
+    while (std::clock() - begin < CLOCKS_PER_SEC / 50) {
+    }
+}
+
+class LockedLibraryTest : public ::testing::Test {
+  protected:
+    // Lets so many intermediate processes meet the lock. They have it when `wait` returns.
+    void Lock(int waits, void (*wait)())
+    {
+        lock->waits = waits;
+        lock->wait = wait;
+        lock->caller = ::getpid();
+        libraryLock = &*lock;
+    }
+
+    static void ExpectForked()
+    {
+        Pipe report;
+        const pid_t child = Detach([&] { report.Write(std::to_string(::getpid())); });
+        EXPECT_EQ(report.ReadToEnd(), std::to_string(child));
+        EXPECT_FALSE(HasChildren());
+    }
+
+    SharedMemory<LibraryLock> lock;
+};
+
+TEST_F(LockedLibraryTest, TheCallerForksAgainUntilTheLockIsFree)
+{
+    for (void (*wait)() : {&WaitForEver, &SpinForEver}) {
+        InProcess([&] {
+            Lock(3, wait);
+            ExpectForked();
+            EXPECT_EQ(lock->waits, 0);
+        });
+    }
+}
+
+TEST_F(LockedLibraryTest, AProcessThatIsSlowIsNotTakenForOneThatWaits)
+{
+    InProcess([this] {
+        Lock(INT_MAX, WorkForAWhile);
+        ExpectForked();
+    });
+}
+
+TEST_F(LockedLibraryTest, ALockThatIsNeverFreeIsAFailure)
+{
+    InProcess([this] {
+        Lock(INT_MAX, WaitForEver);
+        ExpectNotForked(EDEADLK);
+        EXPECT_LT(lock->waits, INT_MAX - 10);
     });
 }
 

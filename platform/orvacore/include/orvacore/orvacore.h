@@ -66,8 +66,15 @@ constexpr int CORELIB_FORK_DETACHED = 0x40;
 /// directory, umask and signal handling. Those of its standard input, output and error that are
 /// pipes or sockets become /dev/null, so that whoever reads the caller's output meets its end when
 /// the caller ends.
+///
+/// A fork copies locks as they are: one that another thread holds at that moment stays locked in
+/// the child. In a detached child the locks that syslog(), time zones, error texts and std::locale
+/// take are free: an intermediate process tries them first, and where one is locked the caller
+/// forks again. Usually that takes a millisecond. Where a thread holds such a lock for long, the
+/// caller gives up after 500 attempts or five seconds.
 /// \param flags  CORELIB_FORK_DETACHED, or 0 for a plain fork
-/// \return the child's process id in the caller, 0 in the child, -1 with errno set on failure
+/// \return the child's process id in the caller, 0 in the child, -1 with errno set on failure;
+///         EDEADLK when a lock was never free
 pid_t CoreLibProcForkEx(int flags);
 
 /// \return 1 when a process lives, whoever its user is, otherwise 0; neither a zombie nor a single

@@ -1,0 +1,119 @@
+#include "library_locks.h"
+
+#include <signal.h>
+#include <sys/time.h>
+#include <syslog.h>
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <cstring>
+#include <ctime>
+#include <locale>
+#include <memory>
+#include <vector>
+
+namespace {
+
+// A process that waits for a lock uses no processor time; one that is merely slow does. Two ticks
+// in a row without any tell the two apart, because a process that was kept from running meets the
+// ticks of that time as one.
+constexpr long TickUSec = 500;
+constexpr int IdleTicksWhenStuck = 2;
+
+// Where a lock is waited for actively, as in sanitizers, nothing else tells.
+constexpr int TicksWhenStuck = 400;
+
+// Less processor time than this in a tick is none.
+constexpr long IdleNSec = 50'000;
+
+// What the signal handler knows. Used in a process with a single thread only.
+struct Watch {
+    void (*whenStuck)();
+    std::timespec used;
+    int ticks;
+    int idleTicks;
+};
+Watch watch{};
+
+std::timespec UsedProcessorTime()
+{
+    std::timespec used{};
+    ::clock_gettime(CLOCK_PROCESS_CPUTIME_ID, &used);
+    return used;
+}
+
+long NSecBetween(const std::timespec& begin, const std::timespec& end)
+{
+    constexpr long NSecPerSec = 1'000'000'000;
+    return (end.tv_sec - begin.tv_sec) * NSecPerSec + end.tv_nsec - begin.tv_nsec;
+}
+
+void OnTick(int /*signal*/)
+{
+    const int error = errno;
+    const std::timespec used = UsedProcessorTime();
+    const bool isIdle = NSecBetween(watch.used, used) < IdleNSec;
+    watch.used = used;
+    watch.idleTicks = isIdle ? watch.idleTicks + 1 : 0;
+    if (watch.idleTicks == IdleTicksWhenStuck || ++watch.ticks == TicksWhenStuck) watch.whenStuck();
+    errno = error;
+}
+
+void SetTicks(long microseconds)
+{
+    const itimerval timer{{0, microseconds}, {0, microseconds}};
+    ::setitimer(ITIMER_REAL, &timer, nullptr);
+}
+
+// The address sanitizer's allocator has a lock for each size class of memory, which it takes when a
+// thread has used up what it has cached of that class. Unlike glibc it does not free them in a
+// child.
+void TakeAllocatorLocks()
+{
+#ifdef ORVADR_SANITIZE
+    constexpr std::size_t MostCached = 256;  // of one class
+    constexpr std::size_t MostBytes = 131'072;
+    constexpr std::size_t Step = 16;  // between small classes; larger ones are a quarter apart
+    std::vector<std::unique_ptr<char[]>> taken;
+    for (std::size_t size = 1; size <= MostBytes / 2; size += std::max(Step, size / 4)) {
+        const std::size_t count = std::min(MostCached, MostBytes / size) + 1;
+        for (std::size_t i = 0; i < count; ++i) taken.emplace_back(new char[size]);
+    }
+#endif
+}
+
+}  // namespace
+
+void TakeLibraryLocks()
+{
+    std::array<char, 128> text{};
+    static_cast<void>(::strerror_r(EDEADLK, text.data(), text.size()));  // "%m" translates it
+    const std::time_t time = 0;
+    std::tm parts{};
+    ::localtime_r(&time, &parts);  // as syslog() does for the time in a line
+    const std::locale copy;        // as each stream has one
+    ::setlogmask(0);               // asks for the mask, under the lock of syslog()
+}
+
+void TakeLibraryLocksOr(void (*whenStuck)())
+{
+    watch = {whenStuck, UsedProcessorTime(), 0, 0};
+    struct sigaction onTick {};
+    onTick.sa_handler = OnTick;
+    struct sigaction action {};
+    ::sigaction(SIGALRM, &onTick, &action);
+    sigset_t alarm;
+    ::sigemptyset(&alarm);
+    ::sigaddset(&alarm, SIGALRM);
+    sigset_t mask;
+    ::sigprocmask(SIG_UNBLOCK, &alarm, &mask);
+
+    SetTicks(TickUSec);
+    TakeAllocatorLocks();
+    TakeLibraryLocks();
+    SetTicks(0);
+
+    ::sigprocmask(SIG_SETMASK, &mask, nullptr);
+    ::sigaction(SIGALRM, &action, nullptr);
+}
