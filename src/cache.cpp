@@ -96,6 +96,33 @@ bool IsLiving(pid_t pid)
     return pid > 0 && CoreLibProcAlive(pid) == 1;
 }
 
+// The cache's lock, unlocked before its file is closed. A program that another thread starts at
+// that moment inherits the descriptor: if it were only closed here, the program would hold the lock
+// for as long as it runs.
+class CacheLock {
+  public:
+    explicit CacheLock(const std::string& name) : lock(name) {}
+    CacheLock(const CacheLock&) = delete;
+    CacheLock& operator=(const CacheLock&) = delete;
+    ~CacheLock();
+
+    bool Lock(int operation) { return isHeld = lock.lock(operation, LockRetries); }
+
+  private:
+    FileLock lock;
+    bool isHeld = false;
+};
+
+CacheLock::~CacheLock()
+{
+    if (!isHeld) return;
+    try {
+        (void)lock.lock(LOCK_UN, 0);  // not unlock(), which passes over descriptor 0
+    } catch (...) {
+        // Out of memory: closing the file has to do.
+    }
+}
+
 // The limit of both retry loops: one try more than it says, and a single one when it is negative.
 std::uint64_t RetriesOf(int limit)
 {
@@ -322,8 +349,8 @@ bool Cache::GivesWay(const char* function, const Json::Value& data, std::time_t 
 // Whether a living process is marked as updater. The lock is free again when this returns.
 bool Cache::IsUpdating() const
 {
-    FileLock lock(LockName());
-    return !lock.lock(ProbeLock, LockRetries) || IsLiving(CoreLibReadPidFile(PidPath().c_str()));
+    CacheLock lock(LockName());
+    return !lock.Lock(ProbeLock) || IsLiving(CoreLibReadPidFile(PidPath().c_str()));
 }
 
 // Marks this process as the updater. The refresh itself runs without a lock: the pid file is
@@ -331,8 +358,8 @@ bool Cache::IsUpdating() const
 bool Cache::SetUpdating() const
 {
     const std::string pidPath = PidPath();
-    FileLock lock(LockName());
-    if (!lock.lock(MarkingLock, LockRetries)) {
+    CacheLock lock(LockName());
+    if (!lock.Lock(MarkingLock)) {
         DR_LOG(Debug, "Failed to lock [%s]", FileLock::getLockFilePath(LockName()).c_str());
         return false;
     }
@@ -352,8 +379,8 @@ bool Cache::SetUpdating() const
 void Cache::UnsetUpdating() const
 {
     const std::string pidPath = PidPath();
-    FileLock lock(LockName());
-    if (!lock.lock(ProbeLock, LockRetries)) return;  // the pid file stays, on purpose
+    CacheLock lock(LockName());
+    if (!lock.Lock(ProbeLock)) return;  // the pid file stays: the contract says so
     if (IsUpdating()) {
         const pid_t pid = CoreLibReadPidFile(pidPath.c_str());
         if (pid != ::getpid()) {

@@ -19,8 +19,11 @@
 ///          user cannot open a second time what it has made itself.
 /// \warning A child made by fork shares descriptor and lock: `unlock` in the child frees the
 ///          parent's lock, and the parent's lock ends only when both have closed it.
-/// \warning A program started by exec inherits the descriptor, and holds the lock on. Programs that
-///          this library starts do not.
+/// \warning A program started by exec inherits the descriptor, and destroying the object only closes
+///          the file. A program that another thread starts meanwhile goes on holding the lock for as
+///          long as it runs. Beside threads that start programs, call unlock() before the object
+///          goes: it frees the lock whoever has inherited it. Keep descriptors 0, 1 and 2 open, since
+///          unlock() passes over 0. Programs that this library starts inherit no lock.
 #ifndef ORVADRCORE_FILE_LOCK_H
 #define ORVADRCORE_FILE_LOCK_H
 

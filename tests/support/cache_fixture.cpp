@@ -149,7 +149,7 @@ void CacheFixture::ExpectSleeps(std::size_t count)
 void CacheFixture::NoteLocking()
 {
     faults.flock = [this](int fd, int operation) {
-        if (IsLockFile(fd)) locking.push_back(operation);
+        if (IsLockFile(fd) && operation != LOCK_UN) locking.push_back(operation);
         return RealFlock(fd, operation);
     };
 }

@@ -96,7 +96,7 @@ class CacheFixture : public LoggedTest {
     // The sleeps between tries of a lock since the last call are so many, of a second each.
     void ExpectSleeps(std::size_t count);
 
-    // From now on notes the operations of flock on the lock file.
+    // From now on notes the attempts to lock the lock file.
     void NoteLocking();
     bool IsLockFile(int fd) const;
 

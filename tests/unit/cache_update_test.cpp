@@ -16,6 +16,7 @@
 #include <limits>
 #include <optional>
 #include <regex>
+#include <set>
 #include <sstream>
 #include <stdexcept>
 #include <utility>
@@ -29,6 +30,7 @@
 namespace {
 
 using OrvaDRCore::toString;
+using ::testing::Contains;
 using ::testing::ElementsAre;
 using ::testing::IsEmpty;
 
@@ -69,7 +71,7 @@ class CacheUpdateTest : public CacheFixture {
     void OnLocking(std::size_t number, const std::function<std::optional<int>()>& action)
     {
         faults.flock = [=](int fd, int operation) {
-            if (!IsLockFile(fd)) return RealFlock(fd, operation);
+            if (!IsLockFile(fd) || operation == LOCK_UN) return RealFlock(fd, operation);
             locking.push_back(operation);
             const auto answer = locking.size() >= number ? action() : std::nullopt;
             return answer ? *answer : RealFlock(fd, operation);
@@ -545,6 +547,57 @@ TEST_F(CacheUpdateTest, DuringARefreshTheCacheIsMarkedAndNoLockIsHeld)
     EXPECT_EQ(ReadFile(lockFile), "");
     ExpectLines({Start(), Finish()});
     ExpectSleeps(0);
+}
+
+// A program that another thread starts at that moment inherits the descriptor.
+TEST_F(CacheUpdateTest, EveryLockIsUnlockedBeforeItsFileIsClosed)
+{
+    std::set<int> held;
+    int locks = 0;
+    int closed = 0;
+    faults.flock = [&](int fd, int operation) {
+        const int result = RealFlock(fd, operation);
+        if (result != 0 || !IsLockFile(fd)) return result;
+        if (operation == LOCK_UN) {
+            held.erase(fd);
+        } else {
+            held.insert(fd);
+            ++locks;
+        }
+        return result;
+    };
+    faults.close = [&](int fd) {
+        if (IsLockFile(fd)) {
+            ++closed;
+            EXPECT_EQ(held.count(fd), 0U) << "closed while it is locked";
+        }
+        return RealClose(fd);
+    };
+    EXPECT_TRUE(waiting.Update());
+    EXPECT_EQ(locks, 5);
+    EXPECT_EQ(closed, 5);
+
+    WriteFile(pidPath, "1");  // a living process's
+    WriteStale("old");
+    EXPECT_TRUE(cache.Update());
+    EXPECT_EQ(locks, 6);
+    EXPECT_EQ(closed, 6);
+    ExpectLines({Start(), Finish()});
+}
+
+TEST_F(CacheUpdateTest, ALockOnDescriptorZeroIsUnlockedToo)
+{
+    CheckInChild([this] {
+        ASSERT_EQ(::close(STDIN_FILENO), 0);
+        std::vector<int> unlocked;
+        faults.flock = [&](int fd, int operation) {
+            if (operation == LOCK_UN) unlocked.push_back(fd);
+            return RealFlock(fd, operation);
+        };
+        EXPECT_TRUE(waiting.Update());
+        EXPECT_THAT(unlocked, Contains(STDIN_FILENO));
+        ExpectLines({Start(), Finish()});
+    });
 }
 
 // The shared locks are those of others who look, and shut out nobody who looks.
