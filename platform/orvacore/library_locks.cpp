@@ -88,7 +88,8 @@ void TakeAllocatorLocks()
 void TakeLibraryLocks()
 {
     std::array<char, 128> text{};
-    static_cast<void>(::strerror_r(EDEADLK, text.data(), text.size()));  // "%m" translates it
+    [[maybe_unused]] const char* const translated =  // as "%m" does it
+        ::strerror_r(EDEADLK, text.data(), text.size());
     const std::time_t time = 0;
     std::tm parts{};
     ::localtime_r(&time, &parts);  // as syslog() does for the time in a line

@@ -12,6 +12,7 @@
 #include <thread>
 
 #include "caller.h"
+#include "support/old_kernel.h"
 #include "support/temp_dir.h"
 
 namespace {
@@ -182,14 +183,32 @@ TEST_F(ProgramTest, EnvironmentAndDirectoryAreTheCallers)
     });
 }
 
+// Runs a program that lists the descriptors that it has got, and gives the list.
+std::string InheritedDescriptors(const TempDir& dir)
+{
+    const int file = ::open(dir.File("out").c_str(), O_RDWR | O_CREAT | O_TRUNC, 0600);
+    for (const int fd : {0, 1, 2, 3, 4, 5, 63, 64, 200}) ::dup2(file, fd);
+    EXPECT_EQ(Exec("/bin/ls", "/proc/self/fd"), 0);
+    return Content(dir.File("out"));
+}
+
+constexpr const char* StandardDescriptors = "0\n1\n2\n3\n";  // 3 is the directory that ls reads
+
 TEST_F(ProgramTest, OnlyTheStandardDescriptorsAreInherited)
 {
-    InBothKinds([&] {
-        const int file = ::open(dir.File("out").c_str(), O_RDWR | O_CREAT, 0600);
-        for (const int fd : {0, 1, 2, 3, 4, 5, 63, 64, 200}) ::dup2(file, fd);
-        EXPECT_EQ(Exec("/bin/ls", "/proc/self/fd"), 0);
-    });
-    EXPECT_EQ(Content(dir.File("out")), "0\n1\n2\n3\n");  // 3 is the directory that ls reads
+    InBothKinds([&] { EXPECT_EQ(InheritedDescriptors(dir), StandardDescriptors); });
+}
+
+TEST_F(ProgramTest, OnOldKernelsNoOtherDescriptorsAreInheritedEither)
+{
+    for (const OldKernel& kernel : OldKernels) {
+        SCOPED_TRACE(kernel.name);
+        InBothKinds([&] {
+            ASSERT_TRUE(kernel.pretend());
+            EXPECT_EQ(InheritedDescriptors(dir), StandardDescriptors);
+            ExpectTrueResults();
+        });
+    }
 }
 
 TEST_F(ProgramTest, StandardDescriptorsThatAreClosedStayClosed)

@@ -91,7 +91,7 @@ void CopyLocales()
 void TranslateErrors()
 {
     std::array<char, 128> text{};
-    static_cast<void>(::strerror_r(EAGAIN, text.data(), text.size()));
+    [[maybe_unused]] const char* const translated = ::strerror_r(EAGAIN, text.data(), text.size());
 }
 
 void ChangeLocale()
