@@ -7,11 +7,12 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
+#include <cstdlib>
 #include <cstring>
 #include <ctime>
 #include <locale>
-#include <memory>
-#include <vector>
+#include <new>
+#include <utility>
 
 namespace {
 
@@ -72,14 +73,20 @@ void SetTicks(long microseconds)
 void TakeAllocatorLocks()
 {
 #ifdef ORVADR_SANITIZE
+    struct Block {
+        Block* next;
+    };
     constexpr std::size_t MostCached = 256;  // of one class
     constexpr std::size_t MostBytes = 131'072;
     constexpr std::size_t Step = 16;  // between small classes; larger ones are a quarter apart
-    std::vector<std::unique_ptr<char[]>> taken;
-    for (std::size_t size = 1; size <= MostBytes / 2; size += std::max(Step, size / 4)) {
-        const std::size_t count = std::min(MostCached, MostBytes / size) + 1;
-        for (std::size_t i = 0; i < count; ++i) taken.emplace_back(new char[size]);
+    Block* taken = nullptr;
+    for (std::size_t size = Step; size <= MostBytes / 2; size += std::max(Step, size / 4)) {
+        for (std::size_t count = 0; count <= std::min(MostCached, MostBytes / size); ++count) {
+            void* const memory = std::malloc(size);
+            if (memory != nullptr) taken = new (memory) Block{taken};
+        }
     }
+    while (taken != nullptr) std::free(std::exchange(taken, taken->next));
 #endif
 }
 

@@ -2,6 +2,7 @@
 
 #include <fcntl.h>
 #include <signal.h>
+#include <sys/single_threaded.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -57,10 +58,10 @@ void DetachStandardStreams()
 
 // In the intermediate process: forks the detached child, tells the caller about it and ends. The
 // child is a copy of a process in which no library lock is held.
-void ForkAgain(int reading, int writing)
+void ForkAgain(int reading, int writing, bool hasThreads)
 {
     reportFd = writing;
-    TakeLibraryLocksOr(ReportStuck);
+    if (hasThreads) TakeLibraryLocksOr(ReportStuck);
     const pid_t pid = ::fork();
     if (pid == 0) {
         ::close(reading);
@@ -78,9 +79,10 @@ ForkResult TryForkDetached()
 {
     std::array<int, 2> pipe{};
     if (::pipe2(pipe.data(), O_CLOEXEC) < 0) return {-1, errno};
+    const bool hasThreads = __libc_single_threaded == 0;
     const pid_t intermediate = ::fork();
     if (intermediate == 0) {
-        ForkAgain(pipe[0], pipe[1]);
+        ForkAgain(pipe[0], pipe[1], hasThreads);
         return {0, 0};
     }
     ForkResult result{intermediate, errno};

@@ -6,6 +6,7 @@
 #include <sched.h>
 #include <stdio.h>
 #include <sys/prctl.h>
+#include <sys/single_threaded.h>
 #include <sys/socket.h>
 #include <sys/syscall.h>
 
@@ -413,8 +414,15 @@ void WorkForAWhile()
 
 class LockedLibraryTest : public ::testing::Test {
   protected:
-    // Lets so many intermediate processes meet the lock. They have it when `wait` returns.
+    // Lets so many intermediate processes meet the lock. They have it when `wait` returns. The
+    // caller has a second thread from now on: otherwise nobody could hold a lock.
     void Lock(int waits, void (*wait)())
+    {
+        std::thread([] { ::pause(); }).detach();
+        LockForOneThread(waits, wait);
+    }
+
+    void LockForOneThread(int waits, void (*wait)())
     {
         lock->waits = waits;
         lock->wait = wait;
@@ -449,6 +457,16 @@ TEST_F(LockedLibraryTest, AProcessThatIsSlowIsNotTakenForOneThatWaits)
     InProcess([this] {
         Lock(INT_MAX, WorkForAWhile);
         ExpectForked();
+    });
+}
+
+TEST_F(LockedLibraryTest, WithoutOtherThreadsNoLockIsTried)
+{
+    InProcess([this] {
+        __libc_single_threaded = 1;  // other cases of this program have had threads
+        LockForOneThread(INT_MAX, WaitForEver);
+        ExpectForked();
+        EXPECT_EQ(lock->waits, INT_MAX);
     });
 }
 

@@ -1,5 +1,5 @@
 // The library on the oldest kernel that it supports.
-#include <gtest/gtest.h>
+#include <gmock/gmock.h>
 #include <signal.h>
 #include <sys/prctl.h>
 #include <unistd.h>
@@ -26,6 +26,7 @@ using OrvaDRCore::GenerateUUID;
 using OrvaDRCore::InsertCommand;
 using OrvaDRCore::SqliteDB;
 using OrvaDRCore::SqliteTableHandler;
+using ::testing::AnyOf;
 
 constexpr int Old = 1;
 constexpr int New = 2;
@@ -68,7 +69,8 @@ TEST_F(OldKernelTest, CachesAreRefreshed)
     if (!HasLocks()) return;
     OnEach([this] {
         WriteStale(Old);
-        EXPECT_EQ(NumberOf(MakeCache(Mode::Background, Gives(New)).Read()), Old);
+        // The child may be quicker than its caller.
+        EXPECT_THAT(NumberOf(MakeCache(Mode::Background, Gives(New)).Read()), AnyOf(Old, New));
         EXPECT_TRUE(AwaitUntil([this] { return NumberInFile() == New; }));
         AwaitDescendants();
         EXPECT_TRUE(MakeCache(Mode::Blocking, Gives(Old)).Update());

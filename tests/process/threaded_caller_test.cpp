@@ -113,20 +113,23 @@ void WriteToStdio()
 
 class ThreadedCallerTest : public ProcessTest {
   protected:
-    // Refreshes a cache in the background so many times, one after the other. False when one does
-    // not come to its end.
-    bool Refresh(int times)
+    // Refreshes a cache in the background so many times, one after the other. Says what went wrong.
+    const char* Refresh(int times)
     {
         const TestCache cache = MakeCache(Mode::Background, Gives(New));
         for (int i = 0; i < times; ++i) {
             MakeStale();
-            if (!cache.Update() || !AwaitUntil([&] { return !cache.IsTimeout(); }) ||
-                !AwaitUntil([&] { return ::access(PidFile().c_str(), F_OK) != 0; }) ||
-                !AwaitUntil([&] { return FileLock(LockName()).tryLock(LOCK_EX | LOCK_NB); })) {
-                return false;
+            if (!cache.Update()) return "no child was made";
+            if (!AwaitUntil([&] { return !cache.IsTimeout(); })) return "nothing was written";
+            if (!AwaitUntil([&] { return ::access(PidFile().c_str(), F_OK) != 0; })) {
+                return "the mark was not removed";
+            }
+            FileLock lock(LockName());
+            if (!AwaitUntil([&] { return lock.tryLock(LOCK_EX | LOCK_NB); })) {
+                return "the lock was not freed";
             }
         }
-        return true;
+        return nullptr;
     }
 
     // The same in a process of its own with threads that do this.
@@ -136,10 +139,15 @@ class ThreadedCallerTest : public ProcessTest {
             constexpr unsigned int DeadlineSeconds = 3000;
             ::alarm(DeadlineSeconds);
             const GlobalLocale locale(new std::numpunct<char>);  // no longer the classic one
-            const BusyThreads threads(count, work);
-            if (!Refresh(times)) ::_exit(2);
+            const char* failure = nullptr;
+            {
+                const BusyThreads threads(count, work);
+                failure = Refresh(times);
+            }
+            EXPECT_EQ(failure, nullptr) << failure;
+            if (HasFailure()) ::_exit(2);
         });
-        EXPECT_EQ(process.Join(), 0) << "a refresh has not come to its end";
+        EXPECT_EQ(process.Join(), 0);
         AwaitDescendants();
         EXPECT_EQ(NumberInFile(), New);
         ReportCount("refreshes", times);
@@ -176,7 +184,7 @@ TEST_F(ThreadedCallerTest, NoBackgroundRefreshHangsBesideThreadsThatDoEverything
             each();
         }
     };
-    ExpectRefreshesBeside(8, work, Scaled(100, 10'000));
+    ExpectRefreshesBeside(8, work, Scaled(50, 10'000));
 }
 
 // Programs that inherit whatever is open, and run until they are ended.
