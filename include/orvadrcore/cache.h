@@ -173,8 +173,8 @@ class ORVADRCORE_API Cache {
     ///         work, and after waiting for one, whatever came of it. False when the refresh here
     ///         failed, or when another process was faster to begin one; and with WARN
     ///         `Failed to fork(). errno=[%d/%m]` when no child could be made. EDEADLK there means that
-    ///         other threads held a lock of the C library at each of up to 500 forks, or for five
-    ///         seconds
+    ///         other threads held a lock of the C library at each of 500 forks, or at each of 50 and
+    ///         for five seconds
     /// \note A caller that waits looks again after pauses of 300 to 1000 milliseconds. It logs, at
     ///       DEBUG, `start to block wait cache [%s] ` before and
     ///       `finish to block wait cache [%s] ` after, both with a blank at the end.

@@ -18,8 +18,9 @@
 namespace {
 
 // Each attempt ends after a few milliseconds. That many fail only where other threads do nothing
-// but take the locks, or where one keeps its lock for long.
+// but take the locks, or where one keeps its lock for long. The time counts where forks are slow.
 constexpr int MaxAttempts = 500;
+constexpr int MinAttempts = 50;
 constexpr std::chrono::seconds MaxTime{5};
 
 // What the intermediate process reports to the caller.
@@ -103,8 +104,8 @@ pid_t ForkDetached()
     using Clock = std::chrono::steady_clock;
     const Clock::time_point end = Clock::now() + MaxTime;
     ForkResult result = TryForkDetached();
-    for (int attempt = 1; result.error == EDEADLK && attempt < MaxAttempts && Clock::now() < end;
-         ++attempt) {
+    for (int attempt = 1; result.error == EDEADLK; ++attempt) {
+        if (attempt == MaxAttempts || (attempt >= MinAttempts && Clock::now() > end)) break;
         TakeLibraryLocks();  // right after that they are most likely to be free
         result = TryForkDetached();
     }

@@ -114,7 +114,7 @@ void WriteToStdio()
 class ThreadedCallerTest : public ProcessTest {
   protected:
     // Refreshes a cache in the background so many times, one after the other. Says what went wrong.
-    const char* Refresh(int times)
+    std::string Refresh(int times)
     {
         const TestCache cache = MakeCache(Mode::Background, Gives(New));
         for (int i = 0; i < times; ++i) {
@@ -129,7 +129,7 @@ class ThreadedCallerTest : public ProcessTest {
                 return "the lock was not freed";
             }
         }
-        return nullptr;
+        return "";
     }
 
     // The same in a process of its own with threads that do this.
@@ -139,12 +139,12 @@ class ThreadedCallerTest : public ProcessTest {
             constexpr unsigned int DeadlineSeconds = 3000;
             ::alarm(DeadlineSeconds);
             const GlobalLocale locale(new std::numpunct<char>);  // no longer the classic one
-            const char* failure = nullptr;
+            std::string failure;
             {
                 const BusyThreads threads(count, work);
                 failure = Refresh(times);
             }
-            EXPECT_EQ(failure, nullptr) << failure;
+            EXPECT_EQ(failure, "");
             if (HasFailure()) ::_exit(2);
         });
         EXPECT_EQ(process.Join(), 0);

@@ -71,7 +71,7 @@ constexpr int CORELIB_FORK_DETACHED = 0x40;
 /// the child. In a detached child the locks that syslog(), time zones, error texts and std::locale
 /// take are free: an intermediate process tries them first, and where one is locked the caller
 /// forks again. Usually that takes a millisecond. Where a thread holds such a lock for long, the
-/// caller gives up after 500 attempts or five seconds.
+/// caller gives up after 500 attempts, or after five seconds and 50 attempts.
 /// \param flags  CORELIB_FORK_DETACHED, or 0 for a plain fork
 /// \return the child's process id in the caller, 0 in the child, -1 with errno set on failure;
 ///         EDEADLK when a lock was never free
