@@ -53,7 +53,7 @@ int CoreLibProcPidFileCreate(const char* path)
 {
     const pid_t pid = ::getpid();
     std::string text = std::to_string(pid) + "\n";
-    if (const auto status = ReadProcessStatus(pid)) text += std::to_string(status->start) + "\n";
+    if (const auto status = OrvaDRCore::ReadProcessStatus(pid)) text += std::to_string(status->start) + "\n";
     return OrvaDRCore::ReplaceFile(path, text, ReadableByAll) ? 0 : -1;
 }
 
@@ -64,7 +64,7 @@ pid_t CoreLibReadPidFile(const char* path)
     const auto pid = ParseLine<pid_t>(TakeLine(text, at));
     const auto start = ParseLine<unsigned long long>(TakeLine(text, at));
     if (pid <= 0) return 0;
-    const auto status = ReadProcessStatus(pid);
+    const auto status = OrvaDRCore::ReadProcessStatus(pid);
     const bool reused = start != 0 && status && status->start != start;
     return reused ? 0 : pid;
 }

@@ -122,10 +122,5 @@ pid_t CoreLibProcForkEx(int flags)
 
 int CoreLibProcAlive(pid_t pid)
 {
-    // Unlike kill, tgkill takes neither a group nor another thread for a process. It finds zombies,
-    // too; where /proc hides the processes of others its word has to do.
-    if (::tgkill(pid, pid, 0) < 0 && errno != EPERM) return 0;
-    const auto status = ReadProcessStatus(pid);
-    const bool ended = status && (status->state == 'Z' || status->state == 'X');
-    return ended && status->threads <= 1 ? 0 : 1;
+    return OrvaDRCore::IsProcessAlive(pid) ? 1 : 0;
 }

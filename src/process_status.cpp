@@ -1,15 +1,20 @@
 #include "process_status.h"
 
+#include <signal.h>
+
+#include <cerrno>
 #include <cstdlib>
 #include <string>
 
 #include "file_io.h"
 
+namespace OrvaDRCore {
+
 namespace {
 
-constexpr int FirstField = 3;  // behind id and name
+constexpr int FirstField = 3;  // after id and name
 
-// A field of what stands behind the name; null when there are not so many.
+// A field of the text after the name; null when there are not so many.
 const char* Field(const std::string& text, int number)
 {
     std::size_t at = 0;
@@ -25,9 +30,9 @@ const char* Field(const std::string& text, int number)
 
 std::optional<ProcessStatus> ReadProcessStatus(pid_t pid)
 {
-    const OrvaDRCore::FileDescriptor file("/proc/" + std::to_string(pid) + "/stat", O_RDONLY);
+    const FileDescriptor file("/proc/" + std::to_string(pid) + "/stat", O_RDONLY);
     std::string text;
-    if (!file.IsOpen() || !OrvaDRCore::ReadAll(file.Get(), text)) return std::nullopt;
+    if (!file.IsOpen() || !ReadAll(file.Get(), text)) return std::nullopt;
 
     // "4242 (any name, with ) and blanks) S 1 ..."
     const std::size_t nameEnd = text.rfind(") ");
@@ -39,3 +44,16 @@ std::optional<ProcessStatus> ReadProcessStatus(pid_t pid)
     return ProcessStatus{text[0], std::strtol(threads, nullptr, 10),
                          std::strtoull(start, nullptr, 10)};
 }
+
+bool IsProcessAlive(pid_t pid, unsigned long long start)
+{
+    // Unlike kill, tgkill takes neither a group nor another thread for a process. It finds zombies,
+    // too; where /proc hides the processes of others its word has to do.
+    if (::tgkill(pid, pid, 0) < 0 && errno != EPERM) return false;
+    const auto status = ReadProcessStatus(pid);
+    if (!status) return true;
+    const bool hasEnded = (status->state == 'Z' || status->state == 'X') && status->threads <= 1;
+    return !hasEnded && (start == 0 || status->start == start);
+}
+
+}  // namespace OrvaDRCore
