@@ -9,6 +9,7 @@
 #include <json/writer.h>
 
 #include "file_io.h"
+#include "replace_file.h"
 
 namespace OrvaDRCore {
 

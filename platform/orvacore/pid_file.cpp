@@ -10,6 +10,7 @@
 
 #include "file_io.h"
 #include "process_status.h"
+#include "replace_file.h"
 
 namespace {
 
@@ -53,7 +54,8 @@ int CoreLibProcPidFileCreate(const char* path)
 {
     const pid_t pid = ::getpid();
     std::string text = std::to_string(pid) + "\n";
-    if (const auto status = OrvaDRCore::ReadProcessStatus(pid)) text += std::to_string(status->start) + "\n";
+    if (const auto status = OrvaDRCore::ReadProcessStatus(pid))
+        text += std::to_string(status->start) + "\n";
     return OrvaDRCore::ReplaceFile(path, text, ReadableByAll) ? 0 : -1;
 }
 
