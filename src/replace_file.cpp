@@ -1,14 +1,23 @@
 #include "replace_file.h"
 
+#include <dirent.h>
 #include <fcntl.h>
 #include <sys/stat.h>
+#include <sys/utsname.h>
 #include <unistd.h>
 
+#include <array>
 #include <cerrno>
+#include <charconv>
 #include <climits>
+#include <cstdint>
 #include <cstdio>
+#include <ctime>
+#include <limits>
+#include <memory>
 
 #include "file_io.h"
+#include "process_status.h"
 
 namespace OrvaDRCore {
 
@@ -19,76 +28,127 @@ constexpr mode_t NewFileMode = 0666;  // the kernel takes the umask off
 constexpr mode_t OwnerOnly = 0600;    // until the bits that the file is to have are set
 
 constexpr const char* TemporarySuffix = ".orvadr-tmp";
-constexpr int MaxWriters = 64;             // of one file, at once
-constexpr std::size_t RoomForSuffix = 13;  // the suffix and two digits
+constexpr std::size_t LongestEnding = 56;  // the suffix, and all digits that its numbers can have
+constexpr unsigned int LastNumber = 9999;  // of a process's files beside one path
 
-enum class Lock { Ours, Others, None };  // None: a file system that has no locks
+constexpr double StrangersSeconds = 3600;  // after which a file is a stranger's left-over
+constexpr std::size_t SomeNames = 4000;    // of a directory: looked at within a millisecond or so
+constexpr std::size_t AllNames = std::numeric_limits<std::size_t>::max();
 
-// A lock of the open file, which goes with it. It is none of those that lock files are made of.
-Lock TryLock(const FileDescriptor& file)
+// Who writes a temporary file. It stands in the file's name.
+struct Writer {
+    std::uint32_t domain;  // in which ids tell processes apart; 0 when not known
+    pid_t pid;
+    unsigned long long start;  // in clock ticks since boot; 0 when not known
+};
+
+// The machine's name and the namespace of its process ids, made into a number: on a network file
+// system, or a volume that containers share, another process may have the same id. 0 when they
+// cannot be told.
+std::uint32_t ReadDomain()
 {
-    struct flock whole {};
-    whole.l_type = F_WRLCK;
-    whole.l_whence = SEEK_SET;
-    if (::fcntl(file.Get(), F_OFD_SETLK, &whole) == 0) return Lock::Ours;
-    return errno == EAGAIN || errno == EACCES ? Lock::Others : Lock::None;
+    std::array<char, 64> space{};  // "pid:[4026531836]"
+    utsname machine{};
+    if (::readlink("/proc/self/ns/pid", space.data(), space.size() - 1) < 0) return 0;
+    if (::uname(&machine) < 0) return 0;
+    std::uint32_t hash = 2166136261;  // FNV-1a
+    for (const char byte : std::string(machine.nodename) + "/" + space.data()) {
+        hash = (hash ^ static_cast<unsigned char>(byte)) * 16777619;
+    }
+    return hash;
 }
 
-// Whether `path` still is the name of the open file.
-bool IsNamed(const FileDescriptor& file, const std::string& path)
+Writer ThisProcess()
 {
-    struct stat open {};
-    struct stat named {};
-    return ::fstat(file.Get(), &open) == 0 && ::lstat(path.c_str(), &named) == 0 &&
-           open.st_dev == named.st_dev && open.st_ino == named.st_ino;
+    const pid_t pid = ::getpid();
+    const auto status = ReadProcessStatus(pid);
+    return {ReadDomain(), pid, status ? status->start : 0};
 }
 
-// Removes the temporary file of a writer that is no more, on which nobody holds a lock.
-bool RemoveLeftOver(const std::string& path)
+// What stands after the suffix: "3f9c01a7.4242.1870113.0".
+std::string WriterText(const Writer& writer, unsigned int number)
 {
-    const FileDescriptor file(path, O_WRONLY | O_NOFOLLOW | O_NONBLOCK);
-    return file.IsOpen() && TryLock(file) == Lock::Ours && IsNamed(file, path) &&
-           ::unlink(path.c_str()) == 0;
+    std::array<char, LongestEnding> text{};
+    (void)std::snprintf(text.data(), text.size(), "%08x.%d.%llu.%u", writer.domain, writer.pid,
+                        writer.start, number);
+    return text.data();
 }
 
-// Makes and locks the temporary file of that name, if there is none yet. Never goes through a
-// symbolic link. None, with errno set, on failure: EEXIST when another writer has the name.
-FileDescriptor MakeLocked(const std::string& path, mode_t mode)
+// Takes a number off the beginning of the text, and a dot after it.
+template <class Number>
+bool TakeNumber(std::string_view& text, Number& number, int base = 10)
 {
-    FileDescriptor file(path, O_WRONLY | O_CREAT | O_EXCL, mode);
-    if (!file.IsOpen()) return file;
-    // A file that is not locked yet looks like a left-over: another writer may be removing it.
-    if (TryLock(file) != Lock::Others && IsNamed(file, path)) return file;
-    errno = EEXIST;
-    return {};
+    const char* const begin = text.data();
+    const auto [end, error] = std::from_chars(begin, begin + text.size(), number, base);
+    text.remove_prefix(static_cast<std::size_t>(end - begin));
+    if (!text.empty() && text.front() == '.') text.remove_prefix(1);
+    return error == std::errc();
 }
 
-// A path of which a name of full length leaves room for what goes behind it.
-std::string ShortName(const std::string& path)
+// The writer that a WriterText() tells of. None for a text that is not exactly one.
+std::optional<Writer> ParseWriter(const std::string_view text)
 {
-    const std::size_t name = path.rfind('/') + 1;  // 0 when there is none
-    return path.substr(0, name + NAME_MAX - RoomForSuffix);
+    Writer writer{};
+    unsigned int number = 0;
+    std::string_view rest = text;
+    const bool isParsed = TakeNumber(rest, writer.domain, 16) && TakeNumber(rest, writer.pid) &&
+                          TakeNumber(rest, writer.start) && TakeNumber(rest, number);
+    if (!isParsed || writer.pid <= 0 || WriterText(writer, number) != text) return std::nullopt;
+    return writer;
 }
 
-// Makes and locks a temporary file of the caller's own beside the file `path`, which becomes its
-// name, and removes left-overs under the next names.
-FileDescriptor MakeTemporary(std::string& path, mode_t mode)
+// Whether a temporary file is one that nobody writes any more. Of a writer whose process cannot be
+// looked at from here that is certain never: its file has to be old.
+bool IsLeftOver(const std::string& path, const Writer& writer, const Writer& self)
 {
-    const std::string stem = ShortName(path) + TemporarySuffix;
-    int writer = 0;
-    while (true) {
-        path = stem + std::to_string(writer);
-        FileDescriptor file = MakeLocked(path, mode);
-        if (file.IsOpen()) {
-            while (RemoveLeftOver(stem + std::to_string(++writer))) {
-            }
-            return file;
-        }
-        if (errno != EEXIST) return file;
-        if (!RemoveLeftOver(path) && ++writer == MaxWriters) {
-            errno = EAGAIN;
-            return file;
-        }
+    struct stat status {};
+    if (::lstat(path.c_str(), &status) < 0 || !S_ISREG(status.st_mode)) return false;
+    if (writer.domain != 0 && writer.domain == self.domain) {
+        return !IsProcessAlive(writer.pid, writer.start);
+    }
+    return std::difftime(std::time(nullptr), status.st_mtime) > StrangersSeconds;
+}
+
+struct CloseDirectory {
+    void operator()(DIR* names) const { (void)::closedir(names); }
+};
+
+// Removes the left-overs that begin with `stem`, as far as they are among the first `most` names of
+// the directory. What cannot be listed or removed stays.
+void RemoveLeftOvers(const std::string& stem, const Writer& self, std::size_t most)
+{
+    const std::size_t nameAt = stem.rfind('/') + 1;  // 0 when there is none
+    const std::string directory = stem.substr(0, nameAt);
+    const std::string_view beginning = std::string_view(stem).substr(nameAt);
+    const std::unique_ptr<DIR, CloseDirectory> names(::opendir((directory + ".").c_str()));
+    for (std::size_t count = 0; names != nullptr && count < most; ++count) {
+        const dirent* entry = ::readdir(names.get());  // NOLINT(concurrency-mt-unsafe): our own
+        if (entry == nullptr) return;
+        const std::string_view name = entry->d_name;
+        if (name.substr(0, beginning.size()) != beginning) continue;
+        const auto writer = ParseWriter(name.substr(beginning.size()));
+        const std::string path = directory + entry->d_name;
+        if (writer && IsLeftOver(path, *writer, self)) ::unlink(path.c_str());
+    }
+}
+
+// What the names of all temporary files for `path` begin with: the path, its name shortened so that
+// the longest ending fits NAME_MAX, and the suffix.
+std::string StemOf(const std::string& path)
+{
+    const std::size_t nameAt = path.rfind('/') + 1;  // 0 when there is none
+    return path.substr(0, nameAt + NAME_MAX - LongestEnding) + TemporarySuffix;
+}
+
+// Makes a file that nobody else has, whose path goes into `path`. Never opens what is there
+// already, a symbolic link included. None, with errno set, on failure.
+FileDescriptor MakeTemporary(const std::string& stem, const Writer& self, mode_t mode,
+                             std::string& path)
+{
+    for (unsigned int number = 0;; ++number) {  // other threads have the numbers before
+        path = stem + WriterText(self, number);
+        FileDescriptor file(path, O_WRONLY | O_CREAT | O_EXCL, mode);
+        if (file.IsOpen() || errno != EEXIST || number == LastNumber) return file;
     }
 }
 
@@ -106,10 +166,18 @@ bool ReplaceFile(const std::string& path, std::string_view text, std::optional<m
                  struct stat* made)
 {
     struct stat old {};
-    if (!mode && ::stat(path.c_str(), &old) == 0) mode = old.st_mode & PermissionBits;
+    const bool isThere = ::stat(path.c_str(), &old) == 0;
+    if (!mode && isThere) mode = old.st_mode & PermissionBits;
 
-    std::string temporary = path;
-    const FileDescriptor file = MakeTemporary(temporary, mode ? OwnerOnly : NewFileMode);
+    const std::string stem = StemOf(path);
+    const Writer self = ThisProcess();
+    // A large directory is listed to its end by the first writer in each second.
+    const bool isFirst = old.st_mtime != std::time(nullptr);
+    RemoveLeftOvers(stem, self, isFirst ? AllNames : SomeNames);
+
+    std::string temporary;
+    const FileDescriptor file =
+        MakeTemporary(stem, self, mode ? OwnerOnly : NewFileMode, temporary);
     if (!file.IsOpen()) return false;
     if (Complete(file, text, mode, temporary, path)) {
         // Of the open file: the name may be another's by now.

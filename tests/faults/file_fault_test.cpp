@@ -8,6 +8,7 @@
 #include "fault.h"
 #include "file_io.h"
 #include "json_helpers.h"
+#include "support/child_checks.h"
 #include "support/temp_dir.h"
 #include "support/test_files.h"
 
@@ -63,8 +64,8 @@ TEST(FileFaults, ToFileBesideALeftOver)
 {
     EveryCallFails("toFile beside a left-over", [] {
         const Place place(Old);
-        WriteFile(place.path + ".orvadr-tmp0", "");
-        WriteFile(place.path + ".orvadr-tmp1", "");
+        DieWriting([&] { toFile(Document(Old), place.path); });
+        EXPECT_EQ(NamesIn(place.dir.Path()).size(), 2U);
         ExpectReplacement(place);
     });
 }

@@ -237,12 +237,6 @@ LogLine CacheFixture::FinishWait() const
     return Debug("Update", "finish to block wait cache [" + path + "] ");
 }
 
-void SetModifyTime(const std::string& path, std::time_t seconds, long nanoseconds)
-{
-    const std::array<timespec, 2> times{timespec{0, UTIME_OMIT}, timespec{seconds, nanoseconds}};
-    EXPECT_EQ(::utimensat(AT_FDCWD, path.c_str(), times.data(), 0), 0) << path;
-}
-
 ChildProcess::Link MakeGate()
 {
     std::array<int, 2> ends{};

@@ -146,9 +146,6 @@ class CacheFixture : public LoggedTest {
     ChildProcess::Link refreshGate{-1, -1};
 };
 
-// Sets a file's modification time.
-void SetModifyTime(const std::string& path, std::time_t seconds, long nanoseconds = 0);
-
 // For processes to wait for each other: what one tells, another awaits.
 ChildProcess::Link MakeGate();
 

@@ -2,6 +2,8 @@
 
 #include <grp.h>
 #include <gtest/gtest.h>
+#include <signal.h>
+#include <sys/resource.h>
 #include <unistd.h>
 
 #include <cstdio>
@@ -46,4 +48,15 @@ void CheckAsOrdinaryUser(const TempDir& dir, const std::function<void()>& checks
         if (isRoot) DropRights();
         checks();
     });
+}
+
+void DieWriting(const std::function<void()>& write)
+{
+    ChildProcess writer([&](ChildProcess::Link& /*link*/) {
+        const rlimit none{0, 0};
+        ::setrlimit(RLIMIT_CORE, &none);
+        ::setrlimit(RLIMIT_FSIZE, &none);
+        write();
+    });
+    EXPECT_EQ(writer.Join(), 128 + SIGXFSZ);
 }

@@ -13,4 +13,7 @@ void CheckInChild(const std::function<void()>& checks);
 // In a process without root's rights, whoever runs the tests. `dir` is its user's.
 void CheckAsOrdinaryUser(const TempDir& dir, const std::function<void()>& checks);
 
+// Runs `write` in a process that is killed at the first byte that it writes to a file.
+void DieWriting(const std::function<void()>& write);
+
 #endif

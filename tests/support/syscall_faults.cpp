@@ -122,6 +122,11 @@ int RealUnlink(const char* path)
     return RealFunction<decltype(::unlink)>("unlink")(path);
 }
 
+ssize_t RealReadlink(const char* path, char* buffer, std::size_t size)
+{
+    return RealFunction<decltype(::readlink)>("readlink")(path, buffer, size);
+}
+
 int RealPipe2(int* ends, int flags)
 {
     return RealFunction<decltype(::pipe2)>("pipe2")(ends, flags);
@@ -260,6 +265,11 @@ extern "C" int close(int fd)
 extern "C" int unlink(const char* path) noexcept
 {
     return Answer(&SyscallAnswers::unlink, RealUnlink, path);
+}
+
+extern "C" ssize_t readlink(const char* path, char* buffer, std::size_t size) noexcept
+{
+    return Answer(&SyscallAnswers::readlink, RealReadlink, path, buffer, size);
 }
 
 extern "C" int pipe2(int* ends, int flags) noexcept

@@ -45,6 +45,7 @@ struct SyscallAnswers {
     std::function<int(int, struct stat*)> fstat;
     std::function<int(int)> close;
     std::function<int(const char*)> unlink;
+    std::function<ssize_t(const char*, char*, std::size_t)> readlink;
     std::function<int(int*, int)> pipe2;
     std::function<int(int, int)> dup2;
     std::function<pid_t(pid_t, int*, int)> waitpid;
@@ -100,6 +101,7 @@ int RealLstat(const char* path, struct stat* status);
 int RealFstat(int fd, struct stat* status);
 int RealClose(int fd);
 int RealUnlink(const char* path);
+ssize_t RealReadlink(const char* path, char* buffer, std::size_t size);
 int RealPipe2(int* ends, int flags);
 int RealDup2(int from, int to);
 pid_t RealWaitpid(pid_t pid, int* status, int options);

@@ -6,6 +6,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <array>
 #include <cerrno>
 #include <filesystem>
 #include <fstream>
@@ -47,6 +48,12 @@ mode_t ModeOf(const std::string& path)
 ino_t InodeOf(const std::string& path)
 {
     return StatusOf(path).st_ino;
+}
+
+void SetModifyTime(const std::string& path, std::time_t seconds, long nanoseconds)
+{
+    const std::array<timespec, 2> times{timespec{0, UTIME_OMIT}, timespec{seconds, nanoseconds}};
+    EXPECT_EQ(::utimensat(AT_FDCWD, path.c_str(), times.data(), 0), 0) << path;
 }
 
 std::set<std::string> NamesIn(const std::string& dir)

@@ -5,6 +5,7 @@
 #include <sys/types.h>
 
 #include <cstddef>
+#include <ctime>
 #include <set>
 #include <string>
 
@@ -17,6 +18,9 @@ std::string ReadFile(const std::string& path);
 // The permission bits, and the number, of what a path names; links are followed.
 mode_t ModeOf(const std::string& path);
 ino_t InodeOf(const std::string& path);
+
+// Sets a file's modification time.
+void SetModifyTime(const std::string& path, std::time_t seconds, long nanoseconds = 0);
 
 // The names in a directory.
 std::set<std::string> NamesIn(const std::string& dir);

@@ -6,7 +6,9 @@
 #include <sys/stat.h>
 
 #include <filesystem>
+#include <functional>
 #include <memory>
+#include <ostream>
 #include <stdexcept>
 #include <string>
 #include <vector>
@@ -181,13 +183,38 @@ TEST_F(JsonFileTest, NoDescriptorIsLeftOpen)
     EXPECT_EQ(CountDescriptors(), before);
 }
 
-TEST_F(JsonFileTest, ReadersOfAFileWithManyWritersSeeWholeDocuments)
+// What the locks of a file system may be like.
+struct Locks {
+    const char* name;
+    std::function<int(int, int, void*)> fcntl;
+};
+
+std::ostream& operator<<(std::ostream& out, const Locks& locks)
+{
+    return out << locks.name;
+}
+
+class ManyWritersTest : public JsonFileTest, public ::testing::WithParamInterface<Locks> {};
+
+INSTANTIATE_TEST_SUITE_P(
+    Locks, ManyWritersTest,
+    ::testing::Values(Locks{"Work", nullptr},
+                      Locks{"AreOfEachMachineAlone", [](int, int, void*) { return 0; }},
+                      Locks{"FailSometimes",
+                            [calls = 0](int fd, int command, void* argument) mutable {
+                                return ++calls % 4 == 0 ? Failing(ENOLCK)()
+                                                        : RealFcntl(fd, command, argument);
+                            }}),
+    [](const auto& parameter) { return std::string(parameter.param.name); });
+
+TEST_P(ManyWritersTest, ReadersSeeWholeDocuments)
 {
     constexpr int Writers = 8;
     constexpr int Rounds = 50;
     constexpr int Readers = 4;
     const std::string stop = dir.File("stop");
     ASSERT_TRUE(toFile(Document(0, 0), path));
+    faults.fcntl = GetParam().fcntl;
 
     using Processes = std::vector<std::unique_ptr<ChildProcess>>;
     Processes readers;

@@ -5,46 +5,66 @@
 #include <gmock/gmock.h>
 #include <signal.h>
 #include <sys/stat.h>
+#include <sys/wait.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <array>
 #include <climits>
+#include <cstdio>
+#include <ctime>
 #include <filesystem>
 #include <functional>
 #include <set>
 #include <stdexcept>
 #include <string>
+#include <thread>
 #include <utility>
 #include <vector>
 
-#include "file_io.h"
+#include "process_status.h"
 #include "support/child_checks.h"
 #include "support/child_process.h"
 #include "support/log_capture.h"
+#include "support/process_faults.h"
 #include "support/syscall_faults.h"
 #include "support/temp_dir.h"
 #include "support/test_files.h"
 
 namespace {
 
-using OrvaDRCore::FileDescriptor;
+using OrvaDRCore::ReadProcessStatus;
 using OrvaDRCore::ReplaceFile;
 using ::testing::ElementsAre;
-using ::testing::UnorderedElementsAre;
-
-// How many writers of one file there may be at once.
-constexpr std::size_t MaxWriters = 64;
+using ::testing::MatchesRegex;
 
 constexpr const char* Name = "doc";
-constexpr const char* FirstTemporary = "doc.orvadr-tmp0";
 
-// Takes the lock by which the file of a living writer is known.
-bool TakeLock(int fd)
+// A temporary file of it, whoever writes it.
+constexpr const char* TemporaryName = "doc\\.orvadr-tmp[0-9a-f]{8}\\.[0-9]+\\.[0-9]+\\.[0-9]+";
+
+constexpr pid_t Nobodys = INT_MAX;  // the id of no process
+constexpr std::time_t Hour = 3600;
+
+// Who writes a temporary file, as its name tells.
+struct Writer {
+    unsigned int domain;
+    pid_t pid;
+    unsigned long long start;
+};
+
+std::string TextOf(const Writer& writer, unsigned int number = 0)
 {
-    struct flock whole {};
-    whole.l_type = F_WRLCK;
-    whole.l_whence = SEEK_SET;
-    return ::fcntl(fd, F_OFD_SETLK, &whole) == 0;
+    std::array<char, 100> text{};
+    (void)std::snprintf(text.data(), text.size(), "%08x.%d.%llu.%u", writer.domain, writer.pid,
+                        writer.start, number);
+    return text.data();
+}
+
+unsigned long long StartOf(pid_t pid)
+{
+    const auto status = ReadProcessStatus(pid);
+    return status ? status->start : 0;
 }
 
 // Nothing here logs: the fixture fails on every line.
@@ -52,13 +72,37 @@ class ReplaceFileTest : public LoggedTest {
   protected:
     ReplaceFileTest() : LoggedTest("replace_file.cpp") {}
 
-    std::string Temporary(std::size_t writer) const
+    // Replaces the file. The temporary file that it went through.
+    std::string ReplaceAndTell()
     {
-        return path + ".orvadr-tmp" + std::to_string(writer);
+        std::string used;
+        faults.rename = [&](const char* from, const char* to) {
+            used = from;
+            return RealRename(from, to);
+        };
+        EXPECT_TRUE(ReplaceFile(path, "new"));
+        faults.rename = nullptr;
+        EXPECT_EQ(ReadFile(path), "new");
+        return used;
+    }
+
+    // This process, as its temporary files tell.
+    Writer Self()
+    {
+        const std::string used = ReplaceAndTell();
+        std::filesystem::remove(path);
+        const auto domain = std::stoul(used.substr(path.size() + 11, 8), nullptr, 16);
+        return {static_cast<unsigned int>(domain), ::getpid(), StartOf(::getpid())};
+    }
+
+    std::string Temporary(const Writer& writer, unsigned int number = 0) const
+    {
+        return path + ".orvadr-tmp" + TextOf(writer, number);
     }
 
     TempDir dir;
     SyscallFaults faults;
+    ProcessFaults processes;
     std::string path = dir.File(Name);
 };
 
@@ -196,9 +240,10 @@ TEST_F(ReplaceFileTest, ASecretIsAtNoTimeReadableByOthers)
         EXPECT_EQ(::fstat(fd, &status), 0);
         modes.push_back(status.st_mode & 07777);
     };
-    faults.fcntl = [&](int fd, int command, void* argument) {
-        note(fd);
-        return RealFcntl(fd, command, argument);
+    faults.open = [&](const char* name, int flags, mode_t mode) {
+        const int fd = RealOpen(name, flags, mode);
+        if ((flags & O_CREAT) != 0) note(fd);
+        return fd;
     };
     faults.write = [&](int fd, const void* buffer, std::size_t size) {
         note(fd);
@@ -239,6 +284,17 @@ TEST_F(ReplaceFileTest, ALinkInThePlaceOfTheFileIsReplacedAndNotFollowed)
 
 // -------------------------------------------------------------------- ReplaceFile: temporary files
 
+TEST_F(ReplaceFileTest, ATemporaryFileIsNamedAfterItsWriter)
+{
+    const Writer self = Self();
+    EXPECT_NE(self.domain, 0U);
+    EXPECT_EQ(ReplaceAndTell(), Temporary(self));
+    CheckInChild([&] {
+        const pid_t pid = ::getpid();
+        EXPECT_EQ(ReplaceAndTell(), Temporary({self.domain, pid, StartOf(pid)}));
+    });
+}
+
 struct Planted {
     const char* what;
     std::function<void(const std::string& name)> plant;
@@ -248,6 +304,7 @@ TEST_F(ReplaceFileTest, NothingPlantedUnderTheTemporarysNameIsWrittenThrough)
 {
     const std::string target = dir.File("target");
     const std::vector<Planted> table = {
+        {"a file", [](auto& name) { WriteFile(name, "planted"); }},
         {"a link to a file", [&](auto& name) { std::filesystem::create_symlink(target, name); }},
         {"a link to the file itself",
          [&](auto& name) { std::filesystem::create_symlink(path, name); }},
@@ -256,35 +313,72 @@ TEST_F(ReplaceFileTest, NothingPlantedUnderTheTemporarysNameIsWrittenThrough)
         {"a link to a directory",
          [&](auto& name) { std::filesystem::create_symlink(dir.Path(), name); }},
         {"a directory", [&](auto& name) { std::filesystem::create_directory(name); }},
+        {"a pipe", [](auto& name) { EXPECT_EQ(::mkfifo(name.c_str(), 0600), 0); }},
     };
+    const Writer self = Self();
     WriteFile(target, "the target's");
     for (const Planted& row : table) {
         SCOPED_TRACE(row.what);
         WriteFile(path, "old");
-        row.plant(Temporary(0));
-        std::string used;
-        faults.rename = [&](const char* from, const char* to) {
-            used = from;
-            return RealRename(from, to);
-        };
-        EXPECT_TRUE(ReplaceFile(path, "new"));
-        EXPECT_EQ(used, Temporary(1));
-        EXPECT_EQ(ReadFile(path), "new");
+        row.plant(Temporary(self));
+        EXPECT_EQ(ReplaceAndTell(), Temporary(self, 1));
         EXPECT_FALSE(std::filesystem::is_symlink(path));
         EXPECT_EQ(ReadFile(target), "the target's");
-        EXPECT_THAT(NamesIn(dir.Path()), UnorderedElementsAre(Name, "target", FirstTemporary));
-        std::filesystem::remove(Temporary(0));
+        EXPECT_EQ(NamesIn(dir.Path()).size(), 3U);
+        std::filesystem::remove(Temporary(self));
     }
 }
 
-TEST_F(ReplaceFileTest, APipeUnderTheTemporarysNameIsNotWaitedFor)
+TEST_F(ReplaceFileTest, WhereEveryNameIsTakenNothingIsReplaced)
 {
-    ASSERT_EQ(::mkfifo(Temporary(0).c_str(), 0600), 0);
-    EXPECT_TRUE(ReplaceFile(path, "new"));
-    EXPECT_EQ(ReadFile(path), "new");
+    WriteFile(path, "old");
+    std::size_t tries = 0;
+    faults.open = [&](const char* name, int flags, mode_t mode) {
+        if ((flags & O_CREAT) == 0) return RealOpen(name, flags, mode);
+        ++tries;
+        return Failing(EEXIST)();
+    };
+    errno = 0;
+    EXPECT_FALSE(ReplaceFile(path, "new"));
+    EXPECT_EQ(errno, EEXIST);
+    EXPECT_EQ(tries, 10'000U);
+    EXPECT_EQ(ReadFile(path), "old");
 }
 
-TEST_F(ReplaceFileTest, WhatADeadWriterLeftIsRemovedByTheNext)
+TEST_F(ReplaceFileTest, ThreadsReplaceOneFileAtTheSameTime)
+{
+    constexpr int Rounds = 50;
+    const std::array<std::string, 8> texts = {"a", "bb", "ccc", "d", "ee", "fff", "g", "hh"};
+    std::vector<std::thread> threads;
+    threads.reserve(texts.size());
+    for (const std::string& text : texts) {
+        threads.emplace_back([&, text] {
+            for (int round = 0; round < Rounds; ++round) EXPECT_TRUE(ReplaceFile(path, text));
+        });
+    }
+    for (std::thread& thread : threads) thread.join();
+    EXPECT_THAT(texts, ::testing::Contains(ReadFile(path)));
+    EXPECT_THAT(NamesIn(dir.Path()), ElementsAre(Name));
+}
+
+// Locks fail on some file systems, and on others each machine has its own.
+TEST_F(ReplaceFileTest, NoLockIsTaken)
+{
+    faults.flock = [](int /*fd*/, int /*operation*/) {
+        ADD_FAILURE();
+        return Failing(ENOLCK)();
+    };
+    faults.fcntl = [](int /*fd*/, int /*command*/, void* /*argument*/) {
+        ADD_FAILURE();
+        return Failing(ENOLCK)();
+    };
+    EXPECT_TRUE(ReplaceFile(path, "text"));
+    EXPECT_EQ(ReadFile(path), "text");
+}
+
+// ------------------------------------------------------------------------- ReplaceFile: left-overs
+
+TEST_F(ReplaceFileTest, AWriterThatIsKilledAtAnyStepLeavesAFileThatTheNextOneRemoves)
 {
     struct Step {
         const char* name;
@@ -335,7 +429,7 @@ TEST_F(ReplaceFileTest, WhatADeadWriterLeftIsRemovedByTheNext)
         writer.Kill(SIGKILL);
         EXPECT_EQ(writer.Join(), 128 + SIGKILL);
         EXPECT_EQ(ReadFile(path), "old");
-        EXPECT_THAT(NamesIn(dir.Path()), UnorderedElementsAre(Name, FirstTemporary));
+        EXPECT_THAT(NamesIn(dir.Path()), ElementsAre(Name, MatchesRegex(TemporaryName)));
 
         EXPECT_TRUE(ReplaceFile(path, "of the living"));
         EXPECT_EQ(ReadFile(path), "of the living");
@@ -343,107 +437,231 @@ TEST_F(ReplaceFileTest, WhatADeadWriterLeftIsRemovedByTheNext)
     }
 }
 
-TEST_F(ReplaceFileTest, ALiveWritersTemporaryIsLeftAlone)
+TEST_F(ReplaceFileTest, AWriterThatIsStoppedKeepsItsFileAndCompletesLater)
 {
     ChildProcess first([&](ChildProcess::Link& link) {
         faults.fsync = [&](int fd) {
             link.Tell();
-            if (!link.Await()) return -1;
+            (void)::raise(SIGSTOP);
             return RealFsync(fd);
         };
         if (!ReplaceFile(path, "first")) throw std::runtime_error("not replaced");
     });
+    const std::string temporary = Temporary({Self().domain, first.Pid(), StartOf(first.Pid())});
     ASSERT_TRUE(first.Await());
-    std::string used;
-    faults.rename = [&](const char* from, const char* to) {
-        used = from;
-        return RealRename(from, to);
-    };
-    EXPECT_TRUE(ReplaceFile(path, "second"));
-    EXPECT_EQ(used, Temporary(1));
-    EXPECT_EQ(ReadFile(path), "second");
-    EXPECT_EQ(ReadFile(Temporary(0)), "first");
+    int status = 0;
+    ASSERT_EQ(::waitpid(first.Pid(), &status, WUNTRACED), first.Pid());
+    ASSERT_TRUE(WIFSTOPPED(status));
 
-    first.Tell();
+    EXPECT_TRUE(ReplaceFile(path, "second"));
+    EXPECT_EQ(ReadFile(path), "second");
+    EXPECT_EQ(ReadFile(temporary), "first");
+
+    first.Kill(SIGCONT);
     EXPECT_EQ(first.Join(), 0);
     EXPECT_EQ(ReadFile(path), "first");
     EXPECT_THAT(NamesIn(dir.Path()), ElementsAre(Name));
 }
 
-TEST_F(ReplaceFileTest, TooManyLiveWritersRefuseTheNext)
-{
-    WriteFile(path, "old");
-    std::vector<FileDescriptor> live;
-    for (std::size_t writer = 0; writer < MaxWriters; ++writer) {
-        live.emplace_back(Temporary(writer), O_WRONLY | O_CREAT, 0600);
-        ASSERT_TRUE(TakeLock(live.back().Get()));
+class LeftOverTest : public ReplaceFileTest {
+  protected:
+    // Whether a file of that name goes when its path is replaced.
+    bool Goes(const std::string& name, std::time_t age = 0)
+    {
+        WriteFile(name, "left over");
+        SetModifyTime(name, std::time(nullptr) - age);
+        EXPECT_TRUE(ReplaceFile(path, "new"));
+        EXPECT_EQ(ReadFile(path), "new");
+        const bool isThere = std::filesystem::remove(name);
+        EXPECT_THAT(NamesIn(dir.Path()), ElementsAre(Name));
+        return !isThere;
     }
-    errno = 0;
-    EXPECT_FALSE(ReplaceFile(path, "new"));
-    EXPECT_EQ(errno, EAGAIN);
-    EXPECT_EQ(ReadFile(path), "old");
-    EXPECT_EQ(NamesIn(dir.Path()).size(), MaxWriters + 1);
+    bool GoesOf(const Writer& writer, std::time_t age = 0) { return Goes(Temporary(writer), age); }
 
-    live.pop_back();  // dead now, its file still there
-    EXPECT_TRUE(ReplaceFile(path, "new"));
-    EXPECT_EQ(ReadFile(path), "new");
-    EXPECT_EQ(NamesIn(dir.Path()).size(), MaxWriters);
+    const unsigned int domain = Self().domain;
+    const unsigned int otherDomain = domain ^ 1;
+};
+
+TEST_F(LeftOverTest, AFileOfAProcessThatIsGoneGoesAndThatOfALivingOneStays)
+{
+    const ChildProcess living([](ChildProcess::Link& link) { link.Await(); });
+    ChildProcess zombie([](ChildProcess::Link& /*link*/) {});
+    siginfo_t ended{};
+    ASSERT_EQ(::waitid(P_PID, static_cast<id_t>(zombie.Pid()), &ended, WEXITED | WNOWAIT), 0);
+    const unsigned long long start = StartOf(living.Pid());
+
+    EXPECT_TRUE(GoesOf({domain, Nobodys, 1}));
+    EXPECT_TRUE(GoesOf({domain, Nobodys, 0}));
+    EXPECT_TRUE(GoesOf({domain, zombie.Pid(), StartOf(zombie.Pid())}));
+    EXPECT_TRUE(GoesOf({domain, living.Pid(), start + 1}));  // of an earlier process with the id
+    for (const std::time_t age : {0L, 100 * Hour}) {
+        EXPECT_FALSE(GoesOf({domain, living.Pid(), start}, age));
+        EXPECT_FALSE(GoesOf({domain, living.Pid(), 0}, age));
+        EXPECT_FALSE(GoesOf({domain, ::getpid(), StartOf(::getpid())}, age));
+    }
 }
 
-// The temporary file is made first and locked then. In between it looks like a left-over.
-TEST_F(ReplaceFileTest, AWriterWhoseTemporaryIsTakenForALeftOverTakesAnother)
+// On a network file system, or a volume that containers share, ids say nothing of each other.
+TEST_F(LeftOverTest, AFileOfAnotherMachineOrContainerGoesAfterAnHour)
 {
-    bool raced = false;
-    faults.fcntl = [&](int fd, int command, void* argument) {
-        if (!std::exchange(raced, true)) {
-            EXPECT_EQ(::unlink(Temporary(0).c_str()), 0);
+    for (const pid_t pid : {Nobodys, ::getpid()}) {
+        for (const unsigned int other : {otherDomain, 0U}) {
+            const Writer writer{other, pid, StartOf(::getpid())};
+            EXPECT_FALSE(GoesOf(writer));
+            EXPECT_FALSE(GoesOf(writer, Hour - 10));
+            EXPECT_TRUE(GoesOf(writer, Hour + 10));
+            EXPECT_FALSE(GoesOf(writer, -Hour - 10));  // from the future
         }
-        return RealFcntl(fd, command, argument);
+    }
+}
+
+TEST_F(LeftOverTest, WhereProcShowsNobodyAnIdThatIsInUseIsAlive)
+{
+    faults.open = [](const char* name, int flags, mode_t mode) {
+        const bool isHidden = std::string(name).rfind("/proc/", 0) == 0;
+        return isHidden ? Failing(ENOENT)() : RealOpen(name, flags, mode);
     };
-    EXPECT_TRUE(ReplaceFile(path, "text"));
-    EXPECT_TRUE(raced);
-    EXPECT_EQ(ReadFile(path), "text");
+    EXPECT_EQ(ReplaceAndTell(), Temporary({domain, ::getpid(), 0}));
+    EXPECT_TRUE(GoesOf({domain, Nobodys, 1}));
+    EXPECT_FALSE(GoesOf({domain, ::getppid(), 1}));
+}
+
+TEST_F(LeftOverTest, WhereTheDomainCannotBeToldOnlyTheHourCounts)
+{
+    faults.readlink = Failing(ENOENT);
+    const Writer self{0, ::getpid(), StartOf(::getpid())};
+    EXPECT_EQ(ReplaceAndTell(), Temporary(self));
+    for (const unsigned int each : {0U, domain}) {
+        EXPECT_FALSE(GoesOf({each, Nobodys, 1}));
+        EXPECT_TRUE(GoesOf({each, Nobodys, 1}, Hour + 10));
+    }
+}
+
+TEST_F(LeftOverTest, AFileThatIsNotNamedAsOursStays)
+{
+    const std::string dead = TextOf({domain, Nobodys, 1});
+    const std::string hex = dead.substr(0, 9);
+    const std::vector<std::string> table = {
+        "orvadr-tmp" + dead,
+        ".orvadr-tmp",
+        ".orvadr-tmp0",
+        ".orvadr-tmp" + hex,
+        ".orvadr-tmp" + hex + "2147483647",
+        ".orvadr-tmp" + hex + "2147483647.1",
+        ".orvadr-tmp" + hex + "2147483647.1.",
+        ".orvadr-tmp" + dead + ".",
+        ".orvadr-tmp" + dead + ".0",
+        ".orvadr-tmp" + dead + "x",
+        ".orvadr-tmp." + dead,
+        ".orvadr-tmp0" + dead,
+        ".orvadr-tmpABCDEF01.2147483647.1.0",
+        ".orvadr-tmp1234567.2147483647.1.0",
+        ".orvadr-tmp" + hex + "0.1.0",
+        ".orvadr-tmp" + hex + "-1.1.0",
+        ".orvadr-tmp" + hex + "+2147483647.1.0",
+        ".orvadr-tmp" + hex + "02147483647.1.0",
+        ".orvadr-tmp" + hex + "2147483648.1.0",
+        ".orvadr-tmp" + hex + "2147483647.18446744073709551616.0",
+        ".orvadr-tmp" + hex + "2147483647.1.4294967296",
+        ".orvadr-tmp" + hex + "2147483647..0",
+        ".orvadr-tmp" + hex + " 2147483647.1.0",
+    };
+    for (const std::string& ending : table) {
+        EXPECT_FALSE(Goes(path + ending, 100 * Hour)) << ending;
+    }
+    EXPECT_TRUE(Goes(path + ".orvadr-tmp" + hex + "2147483647.18446744073709551615.4294967295"));
+}
+
+TEST_F(LeftOverTest, AFileBesideAnotherPathStays)
+{
+    const std::string ending = ".orvadr-tmp" + TextOf({domain, Nobodys, 1});
+    for (const char* other : {"do", "docs", "doc.pid", "a doc", ""}) {
+        EXPECT_FALSE(Goes(dir.File(other + ending))) << other;
+    }
+    EXPECT_TRUE(Goes(dir.File(Name + ending)));
+}
+
+TEST_F(LeftOverTest, WhatIsNoRegularFileStays)
+{
+    const std::string target = dir.File("target");
+    const std::string name = Temporary({domain, Nobodys, 1});
+    const std::vector<Planted> table = {
+        {"a link", [&](auto& place) { std::filesystem::create_symlink(target, place); }},
+        {"a directory", [](auto& place) { std::filesystem::create_directory(place); }},
+        {"a pipe", [](auto& place) { EXPECT_EQ(::mkfifo(place.c_str(), 0600), 0); }},
+    };
+    for (const Planted& row : table) {
+        SCOPED_TRACE(row.what);
+        WriteFile(target, "the target's");
+        row.plant(name);
+        EXPECT_TRUE(ReplaceFile(path, "new"));
+        EXPECT_EQ(ReadFile(path), "new");
+        EXPECT_EQ(ReadFile(target), "the target's");
+        EXPECT_TRUE(std::filesystem::remove(name));
+    }
+}
+
+TEST_F(LeftOverTest, InTheWorkingDirectoryTheyGoToo)
+{
+    CheckInChild([&] {
+        ASSERT_EQ(::chdir(dir.Path().c_str()), 0);
+        WriteFile(Temporary({domain, Nobodys, 1}), "left over");
+        EXPECT_TRUE(ReplaceFile(Name, "new"));
+        EXPECT_THAT(NamesIn("."), ElementsAre(Name));
+    });
+}
+
+TEST_F(LeftOverTest, WhereTheDirectoryCannotBeListedTheyStayAndTheFileIsReplaced)
+{
+    const std::string name = Temporary({domain, Nobodys, 1});
+    WriteFile(name, "left over");
+    CheckAsOrdinaryUser(dir, [&] {
+        ASSERT_EQ(::chmod(dir.Path().c_str(), 0300), 0);
+        EXPECT_TRUE(ReplaceFile(path, "new"));
+        ASSERT_EQ(::chmod(dir.Path().c_str(), 0700), 0);
+        EXPECT_EQ(ReadFile(path), "new");
+        EXPECT_EQ(ReadFile(name), "left over");
+    });
+}
+
+TEST_F(LeftOverTest, ALargeDirectoryIsListedToItsEndOnceASecond)
+{
+    constexpr unsigned int Looked = 4000;
+    constexpr unsigned int More = 100;
+    EXPECT_TRUE(ReplaceFile(path, "old"));
+    for (unsigned int number = 0; number < Looked + More; ++number) {
+        WriteFile(Temporary({domain, Nobodys, 1}, number), "");
+    }
+    // The names of the directory itself, of its parent and of the file may be among the first.
+    const auto left = [this] { return NamesIn(dir.Path()).size() - 1; };
+    SetModifyTime(path, std::time(nullptr));
+    processes.time = [now = std::time(nullptr)] { return now; };
+    EXPECT_TRUE(ReplaceFile(path, "new"));
+    EXPECT_GE(left(), More);
+    EXPECT_LE(left(), More + 3);
+    processes.time = [later = std::time(nullptr) + 10] { return later; };
+    EXPECT_TRUE(ReplaceFile(path, "newer"));
+    EXPECT_EQ(left(), 0U);
+}
+
+// It may be taken for a left-over on another machine when it has written for more than an hour.
+TEST_F(LeftOverTest, AWriterWhoseFileWasRemovedPublishesNothingAndTells)
+{
+    WriteFile(path, "old");
+    faults.fsync = [&](int fd) {
+        for (const std::string& name : NamesIn(dir.Path())) {
+            if (name != Name) std::filesystem::remove(dir.File(name));
+        }
+        return RealFsync(fd);
+    };
+    errno = 0;
+    EXPECT_FALSE(ReplaceFile(path, "new"));
+    EXPECT_EQ(errno, ENOENT);
+    EXPECT_EQ(ReadFile(path), "old");
     EXPECT_THAT(NamesIn(dir.Path()), ElementsAre(Name));
 }
 
-TEST_F(ReplaceFileTest, AWriterWhoseTemporaryIsBeingRemovedTakesAnother)
-{
-    int remover = -1;
-    std::string used;
-    faults.fcntl = [&](int fd, int command, void* argument) {
-        if (remover < 0) {
-            remover = OpenFile(Temporary(0), O_WRONLY);
-            EXPECT_TRUE(TakeLock(remover));
-        }
-        return RealFcntl(fd, command, argument);
-    };
-    faults.rename = [&](const char* from, const char* to) {
-        used = from;
-        return RealRename(from, to);
-    };
-    EXPECT_TRUE(ReplaceFile(path, "text"));
-    EXPECT_EQ(used, Temporary(1));
-    EXPECT_EQ(ReadFile(path), "text");
-    EXPECT_EQ(ReadFile(Temporary(0)), "");  // the remover's to remove
-    ::close(remover);
-}
-
-TEST_F(ReplaceFileTest, ALeftOverWhoseNameALiveWriterHasTakenMeanwhileIsNotRemoved)
-{
-    WriteFile(Temporary(0), "left over");
-    WriteFile(dir.File("live"), "live");
-    bool raced = false;
-    faults.fcntl = [&](int fd, int command, void* argument) {
-        if (!std::exchange(raced, true)) {
-            EXPECT_EQ(::rename(dir.File("live").c_str(), Temporary(0).c_str()), 0);
-        }
-        return RealFcntl(fd, command, argument);
-    };
-    EXPECT_TRUE(ReplaceFile(path, "text"));
-    EXPECT_TRUE(raced);
-    EXPECT_EQ(ReadFile(Temporary(0)), "live");
-    EXPECT_EQ(ReadFile(path), "text");
-}
+// ----------------------------------------------------------------------- ReplaceFile: the new file
 
 TEST_F(ReplaceFileTest, WhatIsToldOfTheNewFileIsTrueOfItAlsoWhenItsNameIsAnothersByNow)
 {
@@ -514,66 +732,42 @@ TEST_F(ReplaceFileTest, AFailureLeavesTheOldFileAndNoTemporary)
     EXPECT_EQ(ReadFile(path), "the new text");
 }
 
-// Left-overs cannot be told from the files of living writers then, and stay.
-TEST_F(ReplaceFileTest, AFileSystemWithoutLocksServesAllTheSame)
+TEST_F(LeftOverTest, ANameOfFullLengthIsReplacedAndItsLeftOversGo)
 {
-    WriteFile(path, "old");
-    WriteFile(Temporary(0), "of somebody, dead or alive");
-    faults.fcntl = Failing(ENOLCK);
+    path = dir.File(std::string(NAME_MAX, 'n'));
+    const std::string beginning = dir.File(std::string(NAME_MAX - 56, 'n'));
+    EXPECT_EQ(ReplaceAndTell(),
+              beginning + ".orvadr-tmp" + TextOf({domain, ::getpid(), StartOf(::getpid())}));
+    const std::string longest = "ffffffff.2147483647.18446744073709551615.9999";
+    WriteFile(beginning + ".orvadr-tmp" + longest, "left over");
+    WriteFile(beginning + ".orvadr-tmp" + TextOf({domain, Nobodys, 1}), "left over");
+    SetModifyTime(beginning + ".orvadr-tmp" + longest, 1);
     EXPECT_TRUE(ReplaceFile(path, "new"));
-    EXPECT_EQ(ReadFile(path), "new");
-    EXPECT_EQ(ReadFile(Temporary(0)), "of somebody, dead or alive");
-    EXPECT_EQ(NamesIn(dir.Path()).size(), 2U);
-}
-
-// The locks of lock files are others: who counts or refuses those does not meet these.
-TEST_F(ReplaceFileTest, NoFlockIsTaken)
-{
-    faults.flock = [](int /*fd*/, int /*operation*/) {
-        ADD_FAILURE();
-        return Failing(ENOLCK)();
-    };
-    EXPECT_TRUE(ReplaceFile(path, "text"));
-    EXPECT_EQ(ReadFile(path), "text");
-}
-
-TEST_F(ReplaceFileTest, ANameOfFullLengthIsReplaced)
-{
-    const std::string longest = dir.File(std::string(NAME_MAX, 'n'));
-    EXPECT_TRUE(ReplaceFile(longest, "old"));
-    EXPECT_TRUE(ReplaceFile(longest, "new"));
-    EXPECT_EQ(ReadFile(longest), "new");
     EXPECT_EQ(NamesIn(dir.Path()).size(), 1U);
 }
 
-// Each writer begins while the one before it writes.
-TEST_F(ReplaceFileTest, ANameOfFullLengthServesAsManyWritersAsAnyOther)
+// Each begins while the one before it writes.
+TEST_F(ReplaceFileTest, ANameOfFullLengthServesManyWritersAtOnce)
 {
+    constexpr std::size_t Writers = 100;
     const std::string longest = dir.File(std::string(NAME_MAX, 'n'));
     std::size_t writers = 0;
     faults.write = [&](int fd, const void* buffer, std::size_t size) {
-        if (++writers < MaxWriters) {
+        if (++writers < Writers) {
             EXPECT_TRUE(ReplaceFile(longest, "text"));
         }
         return RealWrite(fd, buffer, size);
     };
     EXPECT_TRUE(ReplaceFile(longest, "text"));
-    EXPECT_EQ(writers, MaxWriters);
+    EXPECT_EQ(writers, Writers);
     EXPECT_EQ(ReadFile(longest), "text");
     EXPECT_EQ(NamesIn(dir.Path()).size(), 1U);
 }
 
-TEST_F(ReplaceFileTest, ANameWithRoomForTheTemporarysSuffixIsNotCut)
+TEST_F(ReplaceFileTest, ANameWithRoomForTheLongestEndingIsNotShortened)
 {
-    const std::size_t room = std::string(".orvadr-tmp63").size();
-    const std::string longest = dir.File(std::string(NAME_MAX - room, 'n'));
-    std::string used;
-    faults.rename = [&](const char* from, const char* to) {
-        used = from;
-        return RealRename(from, to);
-    };
-    EXPECT_TRUE(ReplaceFile(longest, "text"));
-    EXPECT_EQ(used, longest + ".orvadr-tmp0");
+    path = dir.File(std::string(199, 'n'));
+    EXPECT_EQ(ReplaceAndTell().substr(0, path.size() + 11), path + ".orvadr-tmp");
 }
 
 TEST_F(ReplaceFileTest, AFailureMakesNoFileWhereNoneWas)
