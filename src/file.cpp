@@ -37,6 +37,20 @@ std::string_view TakeLine(std::string_view& text)
     return line;
 }
 
+// A line that a failed read has cut off is no line: those before it count.
+void DropTornLine(std::string& text)
+{
+    text.erase(text.rfind('\n') + 1);  // all of it when there is no newline
+}
+
+// The lines that can be read.
+std::string ReadLines(const FileDescriptor& file)
+{
+    std::string text;
+    if (!ReadAll(file.Get(), text)) DropTornLine(text);
+    return text;
+}
+
 // Reads key and value out of a line, each as File::toType does.
 template <class K, class V>
 bool parseLineKeyValue(std::string_view line, Extraction& extraction, K& key, V& value)
@@ -90,8 +104,7 @@ bool File::Read(const std::string& path, Json::Value& value)
         DR_LOG(Err, "File[%s] is not opened.", path.c_str());
         return false;
     }
-    std::string text;
-    ReadAll(file.Get(), text);  // what a failure has cut off does not parse
+    std::string text = ReadLines(file);
     // The lines are joined with nothing between them.
     text.erase(std::remove(text.begin(), text.end(), '\n'), text.end());
     return fromString(value, text);
@@ -109,6 +122,7 @@ bool File::Read(int fd, Json::Value& value)
     while (std::fgets(chunk.data(), static_cast<int>(chunk.size()), stream.get()) != nullptr) {
         text += chunk.data();
     }
+    if (std::feof(stream.get()) == 0) DropTornLine(text);
     return fromString(value, text);
 }
 
@@ -196,8 +210,7 @@ int File::Read(const std::string& path, std::map<K, V>& out)
         DR_LOG(Warn, "File[%s] is not opened.", path.c_str());
         return -1;
     }
-    std::string text;
-    ReadAll(file.Get(), text);  // a failure counts as the end
+    const std::string text = ReadLines(file);
 
     out.clear();
     Extraction extraction;

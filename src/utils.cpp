@@ -64,7 +64,9 @@ std::string GenerateUUID()
     std::size_t size = 0;
     const ssize_t length = ::getline(&text, &size, output.get());
     const std::unique_ptr<char, Free> line(text);
-    if (length >= 0) uuid = CoreLibStrTrim(line.get(), nullptr, nullptr);
+    // What a failed read has cut off is no line.
+    const bool isLine = length >= 0 && std::ferror(output.get()) == 0;
+    if (isLine) uuid = CoreLibStrTrim(line.get(), nullptr, nullptr);
     return uuid;
 }
 

@@ -23,10 +23,9 @@ bool LineReader::Read(std::string& ret_line)
 {
     if (stream == nullptr) return false;
     const ssize_t length = ::getline(&buffer, &size, stream);
-    if (length < 0) {
-        if (std::feof(stream) == 0) error = errno;
-        return false;
-    }
+    // Also where getline gives the beginning of a line that a failed read has cut off.
+    if (std::ferror(stream) != 0) error = errno;
+    if (length < 0 || error != 0) return false;
     ret_line.assign(buffer, static_cast<std::size_t>(length));
     if (ret_line.back() == '\n') ret_line.pop_back();
     return true;

@@ -32,14 +32,16 @@ class ORVADRCORE_API File {
     // ------------------------------------------------------------------------------ JSON documents
 
     /// Reads a file that holds one JSON document. A missing file is a success that reads nothing,
-    /// and so is one in a directory that the process may not search.
+    /// and so is one in a directory that the process may not search. When reading fails, the lines
+    /// before the failure count; a line that it has cut off does not.
     /// \param path        the file
     /// \param[out] value  the document; untouched when the file is missing, and on failure
     /// \return false for a file that does not parse or is a directory, without a line, and for one
     ///         that cannot be opened, with ERR `File[%s] is not opened.`
     static bool Read(const std::string& path, Json::Value& value);
 
-    /// Reads a JSON document from a descriptor, from where it stands to its end.
+    /// Reads a JSON document from a descriptor, from where it stands to its end. When reading
+    /// fails, the lines before the failure count; a line that it has cut off does not.
     /// \param fd          a descriptor open for reading; **closed** by the call (and with it a lock
     ///                    held through it ends), unless the stream cannot be made
     /// \param[out] value  the document; untouched on failure
@@ -97,7 +99,9 @@ class ORVADRCORE_API File {
 
     // --------------------------------------------------------------------------- "key=value" files
 
-    /// Reads a file of "key=value" lines into a map that is emptied first.
+    /// Reads a file of "key=value" lines into a map that is emptied first. When reading fails, the
+    /// lines before the failure count; a line that it has cut off is passed over without a line in
+    /// the log.
     ///
     /// Of key and value the first word counts; blanks around them do not. Numbers are what the
     /// standard streams read from the beginning of the text: "12abc" is 12, "abc" is 0, a number

@@ -23,8 +23,9 @@
 namespace OrvaDRCore {
 
 /// A new UUID: the first line that `/usr/bin/uuidgen` prints, without blanks around it.
-/// \return the text; empty when the program printed nothing, without a log line, or when it could
-///         not be started, with ERR `Failed to exec the command [%s].`
+/// \return the text; empty when the program printed nothing, or when reading failed before the end
+///         of the line, both without a log line; and empty when the program could not be started,
+///         with ERR `Failed to exec the command [%s].`
 /// \note Starts a process; the process inherits no descriptor but 0, 1 and 2.
 ORVADRCORE_API std::string GenerateUUID();
 

@@ -3,8 +3,10 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <sys/socket.h>
 #include <unistd.h>
 
+#include <array>
 #include <memory>
 #include <string>
 #include <vector>
@@ -669,6 +671,23 @@ TEST_F(NodeRegistryTest, AnInputThatCannotBeReadIsAFailure)
     const ProgramResult redirected = RunInShell(R"(exec "$0" --db "$1" < /)");
     EXPECT_EQ(redirected.code, 1);
     EXPECT_EQ(redirected.err, "node_registry: -: Is a directory\n");
+}
+
+// The peer of a socket that goes without reading what was sent to it resets the connection.
+TEST_F(NodeRegistryTest, ALineThatAFailedReadCutsOffIsNotAnswered)
+{
+    std::array<int, 2> sockets{};  // inherited by the program
+    ASSERT_EQ(::socketpair(AF_UNIX, SOCK_STREAM, 0, sockets.data()), 0);
+    const std::string lines = CreateCall("a") + "\n" + CreateCall("b");
+    ASSERT_EQ(::write(sockets[0], "unread", 6), 6);
+    ASSERT_EQ(::write(sockets[1], lines.data(), lines.size()), static_cast<ssize_t>(lines.size()));
+    ::close(sockets[1]);
+    const ProgramResult result =
+        RunInShell(R"(exec "$0" --db "$1" <&)" + std::to_string(sockets[0]));
+    ::close(sockets[0]);
+    EXPECT_EQ(result.code, 1);
+    EXPECT_EQ(result.err, "node_registry: -: Connection reset by peer\n");
+    EXPECT_THAT(List(), ElementsAre("a"));
 }
 
 TEST_F(NodeRegistryTest, OutputThatCannotBeWrittenIsAFailure)

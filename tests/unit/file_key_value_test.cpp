@@ -10,6 +10,7 @@
 #include <random>
 #include <sstream>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "support/child_checks.h"
@@ -336,16 +337,24 @@ TEST_F(FileKeyValueTest, AFileThatCannotBeOpenedKeepsTheMap)
     ExpectLines({line, line, line});
 }
 
-TEST_F(FileKeyValueTest, AReadFailureCountsAsTheEnd)
+TEST_F(FileKeyValueTest, ALineThatAFailedReadCutsOffIsNoLine)
 {
-    WriteFile(path, "a=1\nb=2\n");
-    int calls = 0;
-    faults.read = [&](int fd, void* buffer, std::size_t /*size*/) -> ssize_t {
-        return ++calls == 1 ? RealRead(fd, buffer, 4) : Failing(EIO)();
-    };
-    Pairs<int> pairs;
-    EXPECT_EQ(File::Read(path, pairs), 1);
-    EXPECT_THAT(pairs, ElementsAre(Pair("a", 1)));
+    const std::string text = "port=5001\ntimeout=30000\nlast=1\n";
+    const std::size_t second = text.find('\n') + 1;
+    const std::size_t third = text.find('\n', second) + 1;
+    for (std::size_t readable = 0; readable < text.size(); ++readable) {
+        SCOPED_TRACE(readable);
+        bool failed = false;
+        faults.read = [&](int fd, void* buffer, std::size_t /*size*/) -> ssize_t {
+            if (std::exchange(failed, true)) return Failing(EIO)();
+            return readable > 0 ? RealRead(fd, buffer, readable) : Failing(EIO)();
+        };
+        Pairs<int> expected;
+        if (readable >= second) expected["port"] = 5001;
+        if (readable >= third) expected["timeout"] = 30000;
+        EXPECT_EQ(Read<int>(text), expected);
+        faults.read = nullptr;
+    }
 }
 
 TEST_F(FileKeyValueTest, NoDescriptorIsLeftOpen)

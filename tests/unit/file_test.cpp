@@ -3,6 +3,7 @@
 #include <fcntl.h>
 #include <gmock/gmock.h>
 #include <sys/file.h>
+#include <sys/mman.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -204,16 +205,44 @@ TEST_F(FileReadPathTest, APipeIsReadToItsEnd)
     EXPECT_EQ(writer.Join(), 0);
 }
 
-TEST_F(FileReadPathTest, AReadFailureCountsAsTheEnd)
+// A text, what of it can be read before reading fails, and the document that the lines make.
+struct Torn {
+    std::string readable;
+    std::string rest;
+    const char* document;
+};
+
+std::vector<Torn> TornTexts()
 {
-    WriteFile(path, "[1]\n]]]");
-    int calls = 0;
-    faults.read = [&](int fd, void* buffer, std::size_t /*size*/) -> ssize_t {
-        return ++calls == 1 ? RealRead(fd, buffer, 4) : Failing(EIO)();
+    const std::string blanks(2000, ' ');
+    return {
+        {"12345", "678", nullptr},
+        {"12345", "\n", nullptr},  // it is not known whether more follows
+        {"[1]\n", "]]]", "[1]"},
+        {"[1]\n2", "3", "[1]"},
+        {"[1]\n\n", "2", "[1]"},
+        {"{\"a\":1}\n12345", "678\n", R"({"a":1})"},
+        {"[1]" + blanks, ",2]", nullptr},  // more than a piece of a line
+        {"[1]\n" + blanks + "2", "3", "[1]"},
+        {"[\n1,\n2]", "\n", nullptr},
+        {"\n", "1", nullptr},
+        {"", "1", nullptr},
     };
-    Json::Value value;
-    EXPECT_TRUE(File::Read(path, value));
-    EXPECT_EQ(toString(value), "[1]");
+}
+
+TEST_F(FileReadPathTest, ALineThatAFailedReadCutsOffIsNoLine)
+{
+    for (const Torn& row : TornTexts()) {
+        bool failed = false;
+        faults.read = [&](int fd, void* buffer, std::size_t size) -> ssize_t {
+            if (std::exchange(failed, true)) return Failing(EIO)();
+            EXPECT_GE(size, row.readable.size());
+            return RealRead(fd, buffer, row.readable.size());
+        };
+        ExpectParsed({row.readable + row.rest, row.document},
+                     [&](Json::Value& value) { return File::Read(path, value); });
+        EXPECT_TRUE(failed);
+    }
 }
 
 TEST_F(FileReadPathTest, NoDescriptorIsLeftOpen)
@@ -304,6 +333,49 @@ TEST_F(FileReadDescriptorTest, APipeIsReadToItsEnd)
     EXPECT_TRUE(File::Read(pipe[0], value));
     EXPECT_EQ(toString(value), R"({"a":1})");
     EXPECT_FALSE(IsDescriptorOpen(pipe[0]));
+}
+
+// Memory is a file, too: reading it fails where nothing is mapped.
+TEST_F(FileReadDescriptorTest, ALineThatAFailedReadCutsOffIsNoLine)
+{
+    constexpr std::size_t PageSize = 4096;
+    void* const pages =
+        ::mmap(nullptr, 2 * PageSize, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
+    ASSERT_NE(pages, MAP_FAILED);
+    char* const end = static_cast<char*>(pages) + PageSize;
+    ASSERT_EQ(::munmap(end, PageSize), 0);
+    for (const Torn& row : TornTexts()) {
+        SCOPED_TRACE(row.readable.substr(0, 60));
+        char* const begin = end - row.readable.size();
+        row.readable.copy(begin, row.readable.size());
+        const int fd = OpenFile("/proc/self/mem", O_RDONLY);
+        const auto offset = reinterpret_cast<off_t>(begin);
+        ASSERT_EQ(::lseek(fd, offset, SEEK_SET), offset);
+        Json::Value value("old");
+        EXPECT_EQ(File::Read(fd, value), row.document != nullptr);
+        EXPECT_EQ(toString(value), row.document != nullptr ? row.document : "\"old\"");
+    }
+    ::munmap(pages, PageSize);
+}
+
+// Nothing is lost where reading only had to be tried again.
+TEST_F(FileReadDescriptorTest, APipeThatWasEmptyForAMomentIsReadToItsEnd)
+{
+    std::array<int, 2> pipe{};
+    ASSERT_EQ(::pipe2(pipe.data(), O_CLOEXEC | O_NONBLOCK), 0);
+    ASSERT_EQ(::write(pipe[1], "[1,", 3), 3);
+    faults.fdopen = [&](int fd, const char* mode) {
+        FILE* const stream = RealFdopen(fd, mode);
+        std::array<char, 8> text{};
+        EXPECT_STREQ(std::fgets(text.data(), text.size(), stream), "[1,");
+        EXPECT_NE(std::ferror(stream), 0);
+        EXPECT_EQ(::write(pipe[1], "[2]", 3), 3);
+        ::close(pipe[1]);
+        return stream;
+    };
+    Json::Value value;
+    EXPECT_TRUE(File::Read(pipe[0], value));
+    EXPECT_EQ(toString(value), "[2]");
 }
 
 TEST_F(FileReadDescriptorTest, ADirectoryIsNoDocumentAndNoLine)

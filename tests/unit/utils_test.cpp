@@ -127,6 +127,22 @@ TEST_F(UtilsTest, TheUuidIsTheFirstLineWithoutBlanksAroundIt)
     }
 }
 
+TEST_F(UtilsTest, ALineThatAFailedReadCutsOffIsNoUuid)
+{
+    for (const std::size_t readable : {0U, 1U, 10U, 36U}) {
+        SyscallFaults faults;
+        bool failed = false;
+        faults.read = [&](int fd, void* buffer, std::size_t size) -> ssize_t {
+            // What the program prints is read in large pieces, and nothing else.
+            if (size < 100) return RealRead(fd, buffer, size);
+            if (failed || readable == 0) return Failing(EIO)();
+            failed = true;
+            return RealRead(fd, buffer, readable);
+        };
+        EXPECT_EQ(GenerateUUID(), "") << readable;
+    }
+}
+
 TEST_F(UtilsTest, TheUuidProgramIsWaitedFor)
 {
     GenerateUUID();
