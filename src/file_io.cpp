@@ -1,8 +1,10 @@
 #include "file_io.h"
 
 #include <fcntl.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <utility>
@@ -29,15 +31,27 @@ FileDescriptor::~FileDescriptor()
     errno = error;
 }
 
-bool ReadAll(int fd, std::string& text)
+bool ReadAll(int fd, std::string& text, std::size_t most)
 {
     std::array<char, ReadSize> chunk;  // NOLINT(cppcoreguidelines-pro-type-member-init)
-    ssize_t count = 0;
-    do {
-        if (count > 0) text.append(chunk.data(), static_cast<std::size_t>(count));
-        count = ::read(fd, chunk.data(), chunk.size());
-    } while (count > 0 || (count < 0 && errno == EINTR));
-    return count == 0;
+    while (most > 0) {
+        const ssize_t count = ::read(fd, chunk.data(), std::min(most, chunk.size()));
+        if (count < 0 && errno == EINTR) continue;
+        if (count <= 0) return count == 0;
+        text.append(chunk.data(), static_cast<std::size_t>(count));
+        most -= static_cast<std::size_t>(count);
+    }
+    return true;
+}
+
+bool ReadRegularFile(const std::string& path, std::string& text, std::size_t most)
+{
+    // Opening neither waits for the writer of a pipe nor makes a terminal this process's own.
+    const FileDescriptor file(path, O_RDONLY | O_NONBLOCK | O_NOCTTY);
+    struct stat status {};
+    if (!file.IsOpen() || ::fstat(file.Get(), &status) < 0) return false;
+    errno = EINVAL;
+    return S_ISREG(status.st_mode) && ReadAll(file.Get(), text, most);
 }
 
 bool WriteAll(int fd, std::string_view text)

@@ -30,9 +30,14 @@ class FileDescriptor {
     int fd = -1;
 };
 
-// Appends all that can be read to `text`. False when reading fails before the end; what was read
-// until then stays in `text`.
-bool ReadAll(int fd, std::string& text);
+// Appends all that can be read to `text`, or the first `most` bytes of it. False when reading fails
+// before that; what was read until then stays in `text`.
+bool ReadAll(int fd, std::string& text, std::size_t most = std::string::npos);
+
+// Appends what a regular file holds, as ReadAll() does. Nothing else is read from, or waited for:
+// for a pipe, a device or a socket the answer is false.
+bool ReadRegularFile(const std::string& path, std::string& text,
+                     std::size_t most = std::string::npos);
 
 // Writes the whole text.
 bool WriteAll(int fd, std::string_view text);

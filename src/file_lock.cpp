@@ -1,7 +1,10 @@
 #include <orvadrcore/file_lock.h>
 
 #include <fcntl.h>
+#include <sys/stat.h>
 #include <unistd.h>
+
+#include <cerrno>
 
 #include <orvadrcore/file.h>
 
@@ -15,6 +18,13 @@ constexpr const char* LockDir = "/tmp/.orvadr_lock";
 constexpr int LockDirMode = 0755;
 constexpr mode_t LockFileMode = 644;  // decimal, on purpose: the bits 01204
 constexpr unsigned int RetrySeconds = 1;
+
+// Whether opening would wait until somebody writes.
+bool IsNamedPipe(const std::string& path)
+{
+    struct stat status {};
+    return ::stat(path.c_str(), &status) == 0 && S_ISFIFO(status.st_mode);
+}
 
 }  // namespace
 
@@ -74,8 +84,13 @@ bool FileLock::openLockedFile()
     }
     if (File::IsRegularFile(fd)) return true;
     if (fd >= 0) ::close(fd);
-    // flock needs no write access.
-    fd = ::open64(path.c_str(), O_RDONLY | O_CREAT, LockFileMode);
+    fd = -1;
+    if (IsNamedPipe(path)) {
+        errno = EINVAL;
+    } else {
+        // flock needs no write access.
+        fd = ::open64(path.c_str(), O_RDONLY | O_CREAT, LockFileMode);
+    }
     if (fd < 0) {
         DR_LOG(Err, "Failed to open lock file[%s], errno=%m", path.c_str());
         return false;

@@ -81,9 +81,8 @@ std::string toString(const Json::Value& value)
 
 bool fromFile(Json::Value& value, const std::string& path)
 {
-    const FileDescriptor file(path, O_RDONLY);
     std::string text;
-    return file.IsOpen() && ReadAll(file.Get(), text) && fromString(value, text);
+    return ReadRegularFile(path, text) && fromString(value, text);
 }
 
 bool toFile(const Json::Value& value, const std::string& path, struct stat* made)

@@ -20,7 +20,8 @@ bool fromString(Json::Value& value, const std::string& text);
 // so that every byte string survives the way through toString and fromString.
 std::string toString(const Json::Value& value);
 
-// Parses a whole file. False when it cannot be read or does not parse; `value` is as it was then.
+// Parses a whole regular file. False when it cannot be read to its end, does not parse or is no
+// regular file: a pipe, a device or a socket is not waited for. `value` is as it was then.
 bool fromFile(Json::Value& value, const std::string& path);
 
 // Replaces a file by the document, whole: see ReplaceFile. False with errno set; the old file is as

@@ -166,8 +166,8 @@ bool ReplaceFile(const std::string& path, std::string_view text, std::optional<m
                  struct stat* made)
 {
     struct stat old {};
-    const bool isThere = ::stat(path.c_str(), &old) == 0;
-    if (!mode && isThere) mode = old.st_mode & PermissionBits;
+    const bool isFile = ::stat(path.c_str(), &old) == 0 && S_ISREG(old.st_mode);
+    if (!mode && isFile) mode = old.st_mode & PermissionBits;
 
     const std::string stem = StemOf(path);
     const Writer self = ThisProcess();

@@ -13,10 +13,10 @@ namespace OrvaDRCore {
 // Replaces the file `path` by one that holds `text`: a temporary file beside it is written, flushed
 // to disk and renamed. Whoever opens `path` sees the old file or the new one, never a part, also
 // after a power cut; which of the two it is then is not certain. The new file has the permission
-// bits `mode`, if given, otherwise those of the old file, or 0666 less the umask. Any number of
-// processes and threads may replace one file at the same time; the last one's stays. No locks are
-// taken: file systems without them serve as well. On failure, told by false and errno, the old file
-// is as it was and the temporary file gone.
+// bits `mode`, if given, otherwise those of the old file, if that is a regular one, otherwise 0666
+// less the umask. Any number of processes and threads may replace one file at the same time; the
+// last one's stays. No locks are taken: file systems without them serve as well. On failure, told
+// by false and errno, the old file is as it was and the temporary file gone.
 //
 // Temporary files are called `path` + ".orvadr-tmp" + "DOMAIN.PID.START.NUMBER". The domain is made
 // of the machine's name and the process-id namespace; the numbers are the writing process's id, its

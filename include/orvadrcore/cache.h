@@ -149,8 +149,9 @@ class ORVADRCORE_API Cache {
     /// Reads the file into memory. A document without "cached_data" counts as loaded and leaves the
     /// data in memory as it was.
     /// \return false with DEBUG `no data is cached in [%s]` (no file) or
-    ///         `Failed to read data from cache [%s]` (no JSON document); the data in memory is as
-    ///         it was then
+    ///         `Failed to read data from cache [%s]` (no JSON document, one that cannot be read to
+    ///         its end, or no regular file: a pipe is not waited for); the data in memory is as it
+    ///         was then
     bool Load() const;
 
     /// Whether the file is older than the time-out. A missing file counts as one from before 1970.

@@ -38,6 +38,9 @@ class ORVADRCORE_API File {
     /// \param[out] value  the document; untouched when the file is missing, and on failure
     /// \return false for a file that does not parse or is a directory, without a line, and for one
     ///         that cannot be opened, with ERR `File[%s] is not opened.`
+    /// \warning Whatever is at the path is opened and read to its end: a named pipe is waited for,
+    ///          and some devices never end. Where others can put such a thing, open the file
+    ///          yourself and read it by its descriptor.
     static bool Read(const std::string& path, Json::Value& value);
 
     /// Reads a JSON document from a descriptor, from where it stands to its end. When reading
@@ -57,6 +60,7 @@ class ORVADRCORE_API File {
     ///         `Failed to write [%s] to [%s].` (the document, the path)
     /// \warning The file is written in place: a reader may see a part of it, and a write that fails
     ///          leaves a part behind. A Cache replaces its file whole.
+    /// \warning Whatever is at the path is opened: a named pipe is waited for until somebody reads.
     static bool Write(const std::string& path, const Json::Value& value);
 
     /// Writes a JSON document, without a newline, at the place where a descriptor stands.
@@ -114,6 +118,8 @@ class ORVADRCORE_API File {
     /// \param[out] out  the pairs; untouched when the file is missing or cannot be opened
     /// \return the number of pairs; 0 when the file is missing; -1 when it cannot be opened, with
     ///         WARN `File[%s] is not opened.`
+    /// \warning Whatever is at the path is opened and read to its end, as by the reading of a JSON
+    ///          document: a named pipe is waited for.
     /// \note A line that is no pair is passed over, with NOTICE
     ///       `Failed to parse line[%s] from file [%s]`; before it stands WARN `Bad Parameter.` for
     ///       an empty line and NOTICE `Cannot find separator[%s] in line[%s]` for one without "="

@@ -73,7 +73,8 @@ class ORVADRCORE_API FileLock {
     /// Opens the lock file, unless it is open, and makes it when it is missing.
     /// \return false with ERR: `Bad Lock File` (no name),
     ///         `Failed to check lock dir of lock file [%s].` behind the lines of checkLockDir(), or
-    ///         `Failed to open lock file[%s], errno=%m`
+    ///         `Failed to open lock file[%s], errno=%m`. A named pipe in the file's place is not
+    ///         waited for: it cannot be opened, with errno EINVAL
     bool openLockedFile();
 
     /// Takes the lock, opening the file first. A lock of the other kind that the object holds is

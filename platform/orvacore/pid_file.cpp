@@ -3,8 +3,6 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <array>
-#include <cerrno>
 #include <charconv>
 #include <string>
 
@@ -17,18 +15,6 @@ namespace {
 constexpr mode_t ReadableByAll = 0644;
 constexpr std::size_t ReadSize = 64;  // two numbers are shorter
 
-// The beginning of a file, empty when it cannot be read. A named pipe is not waited for.
-std::string ReadBeginning(const char* path)
-{
-    const OrvaDRCore::FileDescriptor file(path, O_RDONLY | O_NONBLOCK);
-    std::array<char, ReadSize> text{};
-    ssize_t count = 0;
-    do {
-        count = ::read(file.Get(), text.data(), text.size());
-    } while (count < 0 && errno == EINTR);
-    return {text.data(), static_cast<std::size_t>(std::max<ssize_t>(count, 0))};
-}
-
 // The number that a line consists of, and nothing else; 0 for any other line.
 template <class Number>
 Number ParseLine(const std::string& line)
@@ -39,7 +25,7 @@ Number ParseLine(const std::string& line)
     return error == std::errc() && stop == end ? number : 0;
 }
 
-// The line at `at`, which is moved behind it.
+// The line at `at`, which is moved to the next.
 std::string TakeLine(const std::string& text, std::size_t& at)
 {
     const std::size_t end = std::min(text.find('\n', at), text.size());
@@ -61,7 +47,8 @@ int CoreLibProcPidFileCreate(const char* path)
 
 pid_t CoreLibReadPidFile(const char* path)
 {
-    const std::string text = ReadBeginning(path);
+    std::string text;
+    if (!OrvaDRCore::ReadRegularFile(path, text, ReadSize)) return 0;
     std::size_t at = 0;
     const auto pid = ParseLine<pid_t>(TakeLine(text, at));
     const auto start = ParseLine<unsigned long long>(TakeLine(text, at));

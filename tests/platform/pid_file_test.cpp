@@ -316,6 +316,11 @@ TEST_F(PidFileTest, APipeHoldsNoIdAndIsNotWaitedFor)
 {
     EXPECT_EQ(::mkfifo(path.c_str(), 0600), 0);
     InProcess([this] { EXPECT_EQ(Read(), 0); });
+    const int writer = ::open(path.c_str(), O_RDWR | O_CLOEXEC);
+    const std::string text = std::to_string(::getpid()) + "\n";
+    EXPECT_EQ(::write(writer, text.data(), text.size()), static_cast<ssize_t>(text.size()));
+    InProcess([this] { EXPECT_EQ(Read(), 0); });
+    ::close(writer);
 }
 
 TEST_F(PidFileTest, NoMoreIsReadThanAPidFileHolds)

@@ -11,7 +11,9 @@
 #include <type_traits>
 
 #include "support/cache_fixture.h"
+#include "support/child_checks.h"
 #include "support/json_kinds.h"
+#include "support/special_file.h"
 #include "support/test_files.h"
 
 namespace {
@@ -256,6 +258,22 @@ TEST_F(CacheTest, WhatCannotBeReadCannotBeLoaded)
     faults.read = Failing(EIO);
     EXPECT_FALSE(cache.Load());
     ExpectLines({Unreadable()});
+}
+
+// The default path lies in /tmp, where anybody can put one.
+TEST_F(CacheTest, WhatIsNoRegularFileCannotBeLoadedAndIsNotWaitedFor)
+{
+    for (const SpecialFile::Kind kind : SpecialFile::Kinds()) {
+        const SpecialFile special(kind, path, R"({"cached_data":1,"max_updated_time":7})");
+        CheckInChild([&] {
+            SCOPED_TRACE(kind);
+            EXPECT_FALSE(cache.Load());
+            ExpectLines({Unreadable()});
+            EXPECT_EQ(cache.GetCachedData(), Json::Value());
+            ExpectLines({Unreadable(), UsesDefault()});
+            EXPECT_EQ(cache.GetMaxUpdateTime(), 0);
+        });
+    }
 }
 
 TEST_F(CacheTest, DataOfEveryKindIsLoaded)

@@ -25,6 +25,7 @@
 #include "support/cache_fixture.h"
 #include "support/child_checks.h"
 #include "support/json_kinds.h"
+#include "support/special_file.h"
 #include "support/test_files.h"
 
 namespace {
@@ -462,6 +463,23 @@ TEST_F(CacheUpdateTest, ADirectoryInPlaceOfTheFileCannotBeReplaced)
     ExpectPauses(1, ShortestWritePause);
     ExpectLines({WroteNothing()});
     EXPECT_THAT(NamesIn(dir.Path()), ElementsAre("status.cached"));
+}
+
+TEST_F(CacheUpdateTest, WhatIsNoRegularFileIsReplacedByOneThatIs)
+{
+    const Umask umask(0022);
+    for (const SpecialFile::Kind kind : SpecialFile::Kinds()) {
+        if (kind == SpecialFile::Kind::Directory) continue;
+        const SpecialFile special(kind, path, R"({"cached_data":1,"max_updated_time":7})");
+        CheckInChild([&] {
+            SCOPED_TRACE(kind);
+            EXPECT_EQ(cache.Read(), "new");
+            EXPECT_EQ(TakeLines().size(), 6U);
+            EXPECT_EQ(Document()["cached_data"], "new");
+            EXPECT_EQ(Document()["max_updated_time"], 0);
+            EXPECT_EQ(ModeOf(path), 0644U);
+        });
+    }
 }
 
 // ----------------------------------------------------------------------------------- three pauses
@@ -914,6 +932,51 @@ TEST_F(CacheUpdateTest, APidFileOfNoLivingProcessCountsAsNone)
         ExpectLines({Start(), Finish()});
         EXPECT_FALSE(IsMarked());
     }
+}
+
+TEST_F(CacheUpdateTest, APidFileThatIsNoRegularFileCountsAsNone)
+{
+    for (const SpecialFile::Kind kind : SpecialFile::Kinds()) {
+        if (kind == SpecialFile::Kind::Directory) continue;  // which none of its own can replace
+        WriteStale("old");
+        const SpecialFile special(kind, pidPath, std::to_string(::getppid()) + "\n");
+        CheckInChild([&] {
+            SCOPED_TRACE(kind);
+            EXPECT_EQ(waiting.Read(), "new");
+            ExpectLines({Start(), Finish()});
+        });
+    }
+}
+
+TEST_F(CacheUpdateTest, APidFileThatCannotBeReadToItsEndCountsAsNone)
+{
+    WriteStale("old");
+    ChildProcess updater = Updater();
+    ASSERT_TRUE(updater.Await());
+    const std::size_t size = ReadFile(pidPath).size();
+    for (const std::size_t readable : {std::size_t{0}, std::size_t{1}, size}) {
+        bool failed = false;
+        faults.read = [&](int fd, void* buffer, std::size_t most) -> ssize_t {
+            if (most > 64) return RealRead(fd, buffer, most);  // not of a pid file
+            if (std::exchange(failed, true) || readable == 0) return Failing(EIO)();
+            return RealRead(fd, buffer, readable);
+        };
+        EXPECT_EQ(CoreLibReadPidFile(pidPath.c_str()), 0) << readable;
+    }
+}
+
+TEST_F(CacheUpdateTest, APidFileThatIsReadByteByByteIsReadWhole)
+{
+    WriteStale("old");
+    ChildProcess updater = Updater();
+    ASSERT_TRUE(updater.Await());
+    const std::string marked = ReadFile(pidPath);
+    faults.read = [](int fd, void* buffer, std::size_t size) {
+        return RealRead(fd, buffer, std::min<std::size_t>(size, 1));
+    };
+    FailForks(EAGAIN);
+    EXPECT_EQ(cache.Read(), "old");  // somebody is at it
+    EXPECT_EQ(ReadFile(pidPath), marked);
 }
 
 TEST_F(CacheUpdateTest, AZombieUpdatesNothing)

@@ -1,15 +1,21 @@
-// FileDescriptor, ReadAll and WriteAll.
+// FileDescriptor, ReadAll, ReadRegularFile and WriteAll.
 #include "file_io.h"
 
 #include <fcntl.h>
 #include <gmock/gmock.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <array>
+#include <cstdlib>
+#include <filesystem>
 #include <string>
 #include <utility>
 
+#include "support/child_checks.h"
 #include "support/log_capture.h"
+#include "support/special_file.h"
 #include "support/syscall_faults.h"
 #include "support/temp_dir.h"
 #include "support/test_files.h"
@@ -18,6 +24,7 @@ namespace {
 
 using OrvaDRCore::FileDescriptor;
 using OrvaDRCore::ReadAll;
+using OrvaDRCore::ReadRegularFile;
 using OrvaDRCore::WriteAll;
 
 // Nothing here logs: the fixture fails on every line.
@@ -32,6 +39,7 @@ class FileIoTest : public LoggedTest {
 
 class FileDescriptorTest : public FileIoTest {};
 class ReadAllTest : public FileIoTest {};
+class ReadRegularFileTest : public FileIoTest {};
 class WriteAllTest : public FileIoTest {};
 
 // Writes three bytes at a time.
@@ -171,6 +179,86 @@ TEST_F(ReadAllTest, RefusesADirectory)
     EXPECT_FALSE(ReadAll(owner.Get(), text));
     EXPECT_EQ(errno, EISDIR);
     EXPECT_EQ(text, "");
+}
+
+TEST_F(ReadAllTest, ReadsNoMoreThanItIsToldTo)
+{
+    WriteFile(path, "0123456789");
+    for (const std::size_t most : {0U, 1U, 7U, 10U, 11U}) {
+        for (const std::size_t piece : {3U, 100U}) {
+            faults.read = [&](int fd, void* buffer, std::size_t size) {
+                return RealRead(fd, buffer, std::min(size, piece));
+            };
+            const FileDescriptor owner(path, O_RDONLY);
+            std::string text = "before ";
+            EXPECT_TRUE(ReadAll(owner.Get(), text, most));
+            EXPECT_EQ(text, "before " + std::string("0123456789").substr(0, most));
+            EXPECT_EQ(::lseek(owner.Get(), 0, SEEK_CUR),
+                      std::min<off_t>(static_cast<off_t>(most), 10));
+        }
+    }
+}
+
+// -------------------------------------------------------------------------------- ReadRegularFile
+
+TEST_F(ReadRegularFileTest, AppendsTheFileOrItsBeginning)
+{
+    WriteFile(path, Bytes("a\0b\n"));
+    std::string text = "before ";
+    EXPECT_TRUE(ReadRegularFile(path, text));
+    EXPECT_EQ(text, Bytes("before a\0b\n"));
+    text.clear();
+    EXPECT_TRUE(ReadRegularFile(path, text, 2));
+    EXPECT_EQ(text, Bytes("a\0"));
+    std::filesystem::create_symlink(path, dir.File("link"));
+    EXPECT_TRUE(ReadRegularFile(dir.File("link"), text));
+}
+
+TEST_F(ReadRegularFileTest, FailsWithTheErrnoOfWhatFails)
+{
+    std::string text;
+    errno = 0;
+    EXPECT_FALSE(ReadRegularFile(dir.File("missing"), text));
+    EXPECT_EQ(errno, ENOENT);
+    WriteFile(path, "0123456789");
+    faults.fstat = Failing(EIO);
+    EXPECT_FALSE(ReadRegularFile(path, text));
+    EXPECT_EQ(errno, EIO);
+    faults.fstat = nullptr;
+    faults.read = Failing(EISDIR);
+    EXPECT_FALSE(ReadRegularFile(path, text));
+    EXPECT_EQ(errno, EISDIR);
+    EXPECT_EQ(text, "");
+}
+
+TEST_F(ReadRegularFileTest, WhatIsNoRegularFileIsNeitherReadNorWaitedFor)
+{
+    faults.read = [](int /*fd*/, void* /*buffer*/, std::size_t /*size*/) -> ssize_t {
+        ADD_FAILURE() << "it is read from";
+        return 0;
+    };
+    for (const SpecialFile::Kind kind : SpecialFile::Kinds()) {
+        const SpecialFile special(kind, path, "text");
+        CheckInChild([&] {
+            std::string text;
+            EXPECT_FALSE(ReadRegularFile(path, text)) << kind;
+        });
+    }
+}
+
+TEST_F(ReadRegularFileTest, NoTerminalBecomesTheProcesssOwn)
+{
+    const int master = ::posix_openpt(O_RDWR | O_NOCTTY | O_CLOEXEC);
+    std::array<char, 100> terminal{};
+    ASSERT_TRUE(::grantpt(master) == 0 && ::unlockpt(master) == 0);
+    ASSERT_EQ(::ptsname_r(master, terminal.data(), terminal.size()), 0);
+    CheckInChild([&] {
+        ASSERT_GT(::setsid(), 0);  // a session that has none yet
+        std::string text;
+        EXPECT_FALSE(ReadRegularFile(terminal.data(), text));
+        EXPECT_EQ(::open("/dev/tty", O_RDWR | O_CLOEXEC), -1);
+    });
+    ::close(master);
 }
 
 // --------------------------------------------------------------------------------------- WriteAll

@@ -264,6 +264,31 @@ TEST_F(FileLockTest, AFileThatCannotBeOpenedIsTold)
     EXPECT_THAT(sleeps, IsEmpty());
 }
 
+TEST_F(FileLockTest, APipeInPlaceOfTheFileIsToldAndNotWaitedFor)
+{
+    ASSERT_EQ(::mkfifo(dir.File("pipe").c_str(), 0600), 0);
+    std::filesystem::create_symlink("pipe", dir.File("link"));
+    for (const std::string name : {"pipe", "link"}) {
+        CheckInChild([&] {
+            FileLock lock(name);
+            errno = 0;
+            EXPECT_FALSE(lock.lock(Exclusive, 3));
+            ExpectLines({Err("openLockedFile", "Failed to open lock file[/tmp/.orvadr_lock/" +
+                                                   name + "], errno=Invalid argument"),
+                         Err("lock", "Bad fd [-1] to lock [/tmp/.orvadr_lock/" + name + "]")});
+            EXPECT_THAT(opened, IsEmpty());
+            EXPECT_THAT(sleeps, IsEmpty());
+
+            // The object is of use once the pipe is gone.
+            std::filesystem::remove(dir.File("pipe"));
+            MakeLockFile("pipe");
+            EXPECT_TRUE(lock.lock(Exclusive, 0));
+            std::filesystem::remove(dir.File("pipe"));
+            ASSERT_EQ(::mkfifo(dir.File("pipe").c_str(), 0600), 0);
+        });
+    }
+}
+
 TEST_F(FileLockTest, ADirectoryThatCannotBeMadeIsTold)
 {
     WriteFile(dir.File("a"), "in the way");

@@ -13,8 +13,10 @@
 #include <string>
 #include <vector>
 
+#include "support/child_checks.h"
 #include "support/child_process.h"
 #include "support/log_capture.h"
+#include "support/special_file.h"
 #include "support/syscall_faults.h"
 #include "support/temp_dir.h"
 #include "support/test_files.h"
@@ -169,6 +171,18 @@ TEST_F(JsonFileTest, WhatCannotBeReadLeavesTheValue)
     EXPECT_FALSE(fromFile(value, path));
     EXPECT_EQ(calls, 2);
     EXPECT_EQ(value, "old");
+}
+
+TEST_F(JsonFileTest, WhatIsNoRegularFileHoldsNoDocumentAndIsNotWaitedFor)
+{
+    for (const SpecialFile::Kind kind : SpecialFile::Kinds()) {
+        const SpecialFile special(kind, path, "1");
+        CheckInChild([&] {
+            Json::Value value("old");
+            EXPECT_FALSE(fromFile(value, path)) << kind;
+            EXPECT_EQ(value, "old");
+        });
+    }
 }
 
 TEST_F(JsonFileTest, NoDescriptorIsLeftOpen)

@@ -27,6 +27,7 @@
 #include "support/child_process.h"
 #include "support/log_capture.h"
 #include "support/process_faults.h"
+#include "support/special_file.h"
 #include "support/syscall_faults.h"
 #include "support/temp_dir.h"
 #include "support/test_files.h"
@@ -212,6 +213,18 @@ TEST_F(ReplaceFileTest, TheBitsOfTheOldFileStayWhateverTheUmask)
     check();
     for (const std::string& name : NamesIn(dir.Path())) std::filesystem::remove(dir.File(name));
     CheckAsOrdinaryUser(dir, check);
+}
+
+TEST_F(ReplaceFileTest, OnlyARegularFileHandsItsBitsDown)
+{
+    const Umask umask(0022);
+    for (const SpecialFile::Kind kind : SpecialFile::Kinds()) {
+        if (kind == SpecialFile::Kind::Directory) continue;  // which no file can replace
+        const SpecialFile special(kind, path, "text");
+        EXPECT_TRUE(ReplaceFile(path, "new")) << kind;
+        EXPECT_EQ(ReadFile(path), "new");
+        EXPECT_EQ(ModeOf(path), 0644U) << kind;
+    }
 }
 
 TEST_F(ReplaceFileTest, AModeThatIsGivenIsExactAndGoesBeforeTheOldOne)

@@ -88,7 +88,8 @@ int CoreLibProcAlive(pid_t pid);
 int CoreLibProcPidFileCreate(const char* path);
 
 /// \return the process id in a file, also in one that holds nothing but the id; 0 when there is no
-///         file, no id in it, or when the id now belongs to a process that was started later
+///         file, no id in it, or when the id now belongs to a process that was started later; 0
+///         also when it cannot be read to its end, or is no regular file, which is not waited for
 pid_t CoreLibReadPidFile(const char* path);
 
 #endif
