@@ -83,6 +83,13 @@ int GetLongestRefresh(const Json::Value& document)
     return known ? longest->asInt() : 0;
 }
 
+// The text form of a value, for a line in the log. Of one that nests so deep that its making could
+// overflow the stack there is none.
+std::string TextForLine(const Json::Value& value)
+{
+    return NestsAtMost(value, 5 * MaxLevels) ? toString(value) : "(nested too deep)";
+}
+
 // A Cache's own words for a file; the type is private to it.
 template <class KnownFile>
 KnownFile Describe(const struct stat& status, int longestRefresh)
@@ -258,16 +265,19 @@ bool Cache::DoUpdate() const
 
 bool Cache::UpdateWithData(const Json::Value& data, long begin, long finish) const
 {
-    if (!IsValidData(data)) {
-        DR_LOG(Debug, "[%s] is not valid to update for cache [%s]", toString(data).c_str(),
-               toString(GetInfo()).c_str());
+    const bool isValid = IsValidData(data);
+    Json::Value info = GetInfo();
+    // In the document both stand one level down.
+    if (!isValid || !IsReadable(data, 1) || !IsReadable(info, 1)) {
+        DR_LOG(Debug, "[%s] is not valid to update for cache [%s]", TextForLine(data).c_str(),
+               TextForLine(info).c_str());
         return false;
     }
     if (begin < 1 || finish < 1) begin = finish = 0;
     const double took = std::difftime(finish, begin);
     Json::Value document(Json::objectValue);
     document["timeout"] = Json::Int64{timeout};
-    document["info"] = GetInfo();
+    document["info"].swap(info);
     document["cached_data"] = data;
     document["begin_time_to_update"] = Json::Int64{begin};
     document["finish_time_to_update"] = Json::Int64{finish};

@@ -1,6 +1,7 @@
 #include "json_helpers.h"
 
 #include <atomic>
+#include <cmath>
 #include <cstring>
 #include <memory>
 #include <sstream>
@@ -20,6 +21,7 @@ void Configure(Json::CharReaderBuilder& builder)
     builder["allowComments"] = false;
     builder["allowTrailingCommas"] = false;
     builder["failIfExtra"] = true;
+    builder["stackLimit"] = MaxLevels;
 }
 
 void Configure(Json::StreamWriterBuilder& builder)
@@ -45,6 +47,24 @@ const Builder& Kept()
         }
     }
     return *builder;
+}
+
+enum class Reals { Any, Finite };
+
+// Whether a value has so many levels at most, and none but such real numbers.
+bool Holds(const Json::Value& value, int levels, Reals reals)
+{
+    if (levels <= 0) return false;
+    switch (value.type()) {
+        case Json::realValue: return reals == Reals::Any || !std::isinf(value.asDouble());
+        case Json::arrayValue:
+        case Json::objectValue:
+            for (const Json::Value& member : value) {
+                if (!Holds(member, levels - 1, reals)) return false;
+            }
+            return true;
+        default: return true;
+    }
 }
 
 }  // namespace
@@ -77,6 +97,16 @@ std::string toString(const Json::Value& value)
     text.exceptions(std::ios::badbit);  // or a text for which memory is short comes out cut off
     writer->write(value, &text);
     return text.str();
+}
+
+bool NestsAtMost(const Json::Value& value, int levels)
+{
+    return Holds(value, levels, Reals::Any);
+}
+
+bool IsReadable(const Json::Value& value, int levelsAbove)
+{
+    return Holds(value, MaxLevels - levelsAbove, Reals::Finite);
 }
 
 bool fromFile(Json::Value& value, const std::string& path)

@@ -11,14 +11,25 @@
 
 namespace OrvaDRCore {
 
+// How deep a document may nest to be read. A scalar and an empty array have one level.
+constexpr int MaxLevels = 1000;
+
 // Parses `text`, which must be one whole JSON document of any type, into `value`. A text that does
-// not parse, that goes on after its document or that nests deeper than the reader's limit (1000)
-// gives false and leaves `value` as it was.
+// not parse, that goes on after its document or that nests deeper than MaxLevels gives false and
+// leaves `value` as it was.
 bool fromString(Json::Value& value, const std::string& text);
 
 // The document on one line, without blanks or a final newline. Bytes above 0x7f stand as they are,
 // so that every byte string survives the way through toString and fromString.
 std::string toString(const Json::Value& value);
+
+// Whether a value has so many levels or fewer. It is followed no deeper than that.
+bool NestsAtMost(const Json::Value& value, int levels);
+
+// Whether fromString() reads what toString() writes of a value that stands below `levelsAbove`
+// others: it may not nest too deep, nor hold an infinity, which is written as 1e+9999. Not a number
+// is written as null, and so can be read.
+bool IsReadable(const Json::Value& value, int levelsAbove = 0);
 
 // Parses a whole regular file. False when it cannot be read to its end, does not parse or is no
 // regular file: a pipe, a device or a socket is not waited for. `value` is as it was then.

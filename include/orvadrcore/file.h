@@ -61,6 +61,8 @@ class ORVADRCORE_API File {
     /// \warning The file is written in place: a reader may see a part of it, and a write that fails
     ///          leaves a part behind. A Cache replaces its file whole.
     /// \warning Whatever is at the path is opened: a named pipe is waited for until somebody reads.
+    /// \warning Every document is written, also one that Read() refuses: infinities (written as
+    ///          1e+9999), and more than 1000 levels of nesting. Not a number is written as null.
     static bool Write(const std::string& path, const Json::Value& value);
 
     /// Writes a JSON document, without a newline, at the place where a descriptor stands.
@@ -69,6 +71,7 @@ class ORVADRCORE_API File {
     /// \param value  the document
     /// \return false with ERR `Failed to open file descriptor [%d]` or
     ///         `Failed to write [%s] to fd[%d]` (the document, the descriptor)
+    /// \warning Every document is written, also one that Read() refuses: see above.
     static bool Write(int fd, const Json::Value& value);
 
     // --------------------------------------------------------------------------------- directories

@@ -33,6 +33,21 @@ inline ::testing::AssertionResult Same(const Json::Value& actual, const Json::Va
            << "is " << actual.toStyledString() << "expected is " << expected.toStyledString();
 }
 
+// A value of so many levels: arrays and objects in turn, and the innermost value.
+inline Json::Value Nested(int levels, Json::Value innermost = Json::Value(Json::arrayValue))
+{
+    for (int level = 1; level < levels; ++level) {
+        Json::Value outer;
+        if (level % 2 == 0) {
+            outer.append(Json::Value()).swap(innermost);
+        } else {
+            outer["member"].swap(innermost);
+        }
+        innermost.swap(outer);
+    }
+    return innermost;
+}
+
 // A value, and what the JSON library's conversions make of it.
 struct JsonKind {
     std::string text;          // the value as JSON

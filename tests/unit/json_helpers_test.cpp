@@ -20,6 +20,9 @@ using OrvaDRCore::AsString;
 using OrvaDRCore::Clear;
 using OrvaDRCore::FindMember;
 using OrvaDRCore::fromString;
+using OrvaDRCore::IsReadable;
+using OrvaDRCore::MaxLevels;
+using OrvaDRCore::NestsAtMost;
 using OrvaDRCore::toString;
 
 using namespace std::string_literals;
@@ -358,6 +361,97 @@ TEST(JsonRoundTripTest, RealNumbersComeBackToTheLastBit)
 }
 
 // ---------------------------------------------------------------------------- members, conversion
+
+// Whether the value is read back, found out by doing it.
+bool ComesBack(const Json::Value& value)
+{
+    Json::Value back;
+    return fromString(back, toString(value));
+}
+
+TEST(IsReadableTest, WhatNestsTooDeepIsNot)
+{
+    for (const Json::Value& innermost :
+         {Json::Value(Json::arrayValue), Json::Value(Json::objectValue), Json::Value(1)}) {
+        for (int levels = 990; levels <= 1010; ++levels) {
+            const Json::Value value = Nested(levels, innermost);
+            EXPECT_EQ(IsReadable(value), ComesBack(value)) << levels;
+            EXPECT_EQ(IsReadable(value), levels <= MaxLevels) << levels;
+            Json::Value document;
+            document["member"].append(value);
+            EXPECT_EQ(IsReadable(value, 2), ComesBack(document)) << levels;
+            EXPECT_EQ(IsReadable(value, 2), IsReadable(document)) << levels;
+        }
+    }
+}
+
+TEST(IsReadableTest, ADeepMemberCountsWhereverItStands)
+{
+    for (const int levels : {MaxLevels - 1, MaxLevels}) {
+        Json::Value list;
+        Json::Value object;
+        for (int number = 0; number < 3; ++number) {
+            list.append(number);
+            object[std::to_string(number)] = number;
+        }
+        list[1] = Nested(levels);
+        object["1"] = Nested(levels);
+        EXPECT_EQ(IsReadable(list), levels < MaxLevels);
+        EXPECT_EQ(IsReadable(list), ComesBack(list));
+        EXPECT_EQ(IsReadable(object), levels < MaxLevels);
+        EXPECT_EQ(IsReadable(object), ComesBack(object));
+    }
+}
+
+TEST(IsReadableTest, AnInfinityIsNotAndEveryOtherNumberIs)
+{
+    using Limits = std::numeric_limits<double>;
+    const std::vector<double> numbers = {0.0,
+                                         -0.0,
+                                         1.5,
+                                         Limits::max(),
+                                         Limits::lowest(),
+                                         Limits::min(),
+                                         Limits::denorm_min(),
+                                         Limits::quiet_NaN(),
+                                         Limits::infinity(),
+                                         -Limits::infinity()};
+    for (const double number : numbers) {
+        Json::Value list;
+        list.append(1);
+        list.append(number);
+        Json::Value object;
+        object["a"]["b"] = number;
+        for (const Json::Value& value : {Json::Value(number), list, object}) {
+            EXPECT_EQ(IsReadable(value), !std::isinf(number)) << number;
+            EXPECT_EQ(IsReadable(value), ComesBack(value)) << number;
+        }
+    }
+    EXPECT_EQ(toString(Limits::quiet_NaN()), "null");
+}
+
+TEST(IsReadableTest, EveryOtherKindIs)
+{
+    for (const JsonKind& kind : JsonKinds()) EXPECT_TRUE(IsReadable(kind.value)) << kind.text;
+    EXPECT_TRUE(IsReadable("Infinity"));
+    EXPECT_TRUE(IsReadable("1e+9999"));
+}
+
+TEST(NestsAtMostTest, CountsTheLevelsOfTheDeepestMember)
+{
+    for (const JsonKind& kind : JsonKinds()) {
+        EXPECT_FALSE(NestsAtMost(kind.value, 0)) << kind.text;
+        const bool hasMembers = kind.value.begin() != kind.value.end();
+        EXPECT_EQ(NestsAtMost(kind.value, 1), !hasMembers) << kind.text;
+    }
+    EXPECT_TRUE(NestsAtMost(std::numeric_limits<double>::infinity(), 1));
+    for (const int levels : {1, 2, 3, 5000}) {
+        Json::Value value = Nested(levels);
+        EXPECT_TRUE(NestsAtMost(value, levels));
+        EXPECT_FALSE(NestsAtMost(value, levels - 1));
+        EXPECT_FALSE(NestsAtMost(value, -1));
+    }
+}
 
 TEST(FindMemberTest, ValuesThatAreNoObjectsHaveNoMembers)
 {
