@@ -8,14 +8,19 @@
 #include <algorithm>
 #include <cerrno>
 #include <ctime>
+#include <functional>
 #include <limits>
+#include <optional>
+#include <string>
 
 #include <orvadrcore/file.h>
 #include <orvadrcore/file_lock.h>
 #include <orvadrcore/utils.h>
 
+#include "file_io.h"
 #include "json_helpers.h"
 #include "log.h"
+#include "replace_file.h"
 #include "retry.h"
 
 namespace OrvaDRCore {
@@ -60,20 +65,6 @@ std::time_t GetModifyTime(const std::string& path)
     return ::stat(path.c_str(), &status) == 0 ? status.st_mtime : -1;
 }
 
-bool IsSame(const std::timespec& left, const std::timespec& right)
-{
-    return left.tv_sec == right.tv_sec && left.tv_nsec == right.tv_nsec;
-}
-
-// Whether whatever is done to a file from now on gives it another time: some kernels' clocks go on
-// in steps of 10 milliseconds.
-bool IsSettled(const struct stat& status)
-{
-    std::timespec now{};
-    ::clock_gettime(CLOCK_REALTIME, &now);
-    return std::difftime(now.tv_sec, status.st_ctim.tv_sec) > 1;
-}
-
 // The longest refresh that a document speaks of; 0 when it does not say, or not as an integer.
 int GetLongestRefresh(const Json::Value& document)
 {
@@ -90,12 +81,9 @@ std::string TextForLine(const Json::Value& value)
     return NestsAtMost(value, 5 * MaxLevels) ? toString(value) : "(nested too deep)";
 }
 
-// A Cache's own words for a file; the type is private to it.
-template <class KnownFile>
-KnownFile Describe(const struct stat& status, int longestRefresh)
+std::size_t HashOf(const std::string& text)
 {
-    return {status.st_dev,  status.st_ino,  status.st_size,
-            status.st_mtim, status.st_ctim, longestRefresh};
+    return std::hash<std::string>()(text);
 }
 
 bool IsLiving(pid_t pid)
@@ -200,13 +188,13 @@ bool Cache::Load() const
         DR_LOG(Debug, "no data is cached in [%s]", cachedPath.c_str());
         return false;
     }
+    std::string text;
     Json::Value document;
-    if (!fromFile(document, cachedPath)) {
+    if (!ReadRegularFile(cachedPath, text) || !fromString(document, text)) {
         DR_LOG(Debug, "Failed to read data from cache [%s]", cachedPath.c_str());
         return false;
     }
-    knownFile = KnownFile();
-    if (IsSettled(status)) knownFile = Describe<KnownFile>(status, GetLongestRefresh(document));
+    knownText = {text.size(), HashOf(text), GetLongestRefresh(document)};
     // Without "cached_data" the file counts as loaded and the old data stays, on purpose.
     if (FindMember(document, "cached_data") != nullptr) cachedData.swap(document["cached_data"]);
     loadedModifyTime = status.st_mtime;
@@ -220,8 +208,15 @@ bool Cache::IsTimeout() const
 
 int Cache::GetMaxUpdateTime() const
 {
+    std::string text;
+    if (!ReadRegularFile(cachedPath, text)) return 0;
+    // What this object has loaded or written itself is not parsed again. The text tells, because
+    // times do not: after two changes within one step of the clock they are the same.
+    if (text.size() == knownText.size && HashOf(text) == knownText.hash) {
+        return knownText.longestRefresh;
+    }
     Json::Value document;
-    return fromFile(document, cachedPath) ? GetLongestRefresh(document) : 0;
+    return fromString(document, text) ? GetLongestRefresh(document) : 0;
 }
 
 int Cache::Remove()
@@ -282,11 +277,12 @@ bool Cache::UpdateWithData(const Json::Value& data, long begin, long finish) con
     document["begin_time_to_update"] = Json::Int64{begin};
     document["finish_time_to_update"] = Json::Int64{finish};
     document["updated_time"] = took;
-    const int longest = std::max(LongestRefresh(), ToWholeSeconds(took));
+    const int longest = std::max(GetMaxUpdateTime(), ToWholeSeconds(took));
     document["max_updated_time"] = longest;
 
+    const std::string text = toString(document);
     struct stat written {};
-    const auto write = [&] { return toFile(document, cachedPath, &written); };
+    const auto write = [&] { return ReplaceFile(cachedPath, text, std::nullopt, &written); };
     if (!Retry(RetriesOf(retryLimit), write, WritePause).succeeded) {
         DR_LOG(Debug, "Failed to write cache to file [%s] and reach retry limit[%d]",
                cachedPath.c_str(), retryLimit);
@@ -294,7 +290,7 @@ bool Cache::UpdateWithData(const Json::Value& data, long begin, long finish) con
     }
     cachedData.swap(document["cached_data"]);
     loadedModifyTime = written.st_mtime;
-    knownFile = Describe<KnownFile>(written, longest);
+    knownText = {text.size(), HashOf(text), longest};
     return true;
 }
 
@@ -332,18 +328,6 @@ bool Cache::IsTooOld(std::time_t modifyTime) const
 {
     const std::time_t now = std::time(nullptr);
     return now == -1 || std::difftime(now, modifyTime) > static_cast<double>(timeout);
-}
-
-// What GetMaxUpdateTime() says. A file that is known is not read for it.
-int Cache::LongestRefresh() const
-{
-    const KnownFile& file = knownFile;
-    struct stat status {};
-    const bool known = ::stat(cachedPath.c_str(), &status) == 0 && file.device == status.st_dev &&
-                       file.inode == status.st_ino && file.size == status.st_size &&
-                       IsSame(file.modified, status.st_mtim) &&
-                       IsSame(file.changed, status.st_ctim);
-    return known ? file.longestRefresh : GetMaxUpdateTime();
 }
 
 // Whether stale data gives way to what a refresh has left, or is in the making.

@@ -115,9 +115,9 @@ bool fromFile(Json::Value& value, const std::string& path)
     return ReadRegularFile(path, text) && fromString(value, text);
 }
 
-bool toFile(const Json::Value& value, const std::string& path, struct stat* made)
+bool toFile(const Json::Value& value, const std::string& path)
 {
-    return ReplaceFile(path, toString(value), std::nullopt, made);
+    return ReplaceFile(path, toString(value));
 }
 
 const Json::Value* FindMember(const Json::Value& object, const char* key)

@@ -3,8 +3,6 @@
 #ifndef ORVADRCORE_SRC_JSON_HELPERS_H
 #define ORVADRCORE_SRC_JSON_HELPERS_H
 
-#include <sys/stat.h>
-
 #include <string>
 
 #include <json/value.h>
@@ -36,8 +34,8 @@ bool IsReadable(const Json::Value& value, int levelsAbove = 0);
 bool fromFile(Json::Value& value, const std::string& path);
 
 // Replaces a file by the document, whole: see ReplaceFile. False with errno set; the old file is as
-// it was then. What the file system says of the new file goes into `made`, if given.
-bool toFile(const Json::Value& value, const std::string& path, struct stat* made = nullptr);
+// it was then.
+bool toFile(const Json::Value& value, const std::string& path);
 
 // The member `key` of an object; null when it is absent, when `object` is no object and when `key`
 // is null. The pointer is good until `object` changes.

@@ -58,6 +58,7 @@
 #ifndef ORVADRCORE_CACHE_H
 #define ORVADRCORE_CACHE_H
 
+#include <cstddef>
 #include <ctime>
 #include <string>
 
@@ -221,7 +222,6 @@ class ORVADRCORE_API Cache {
     ORVADRCORE_LOCAL bool GivesWay(const char* function, const Json::Value& data,
                                    std::time_t modifyTime) const;
     ORVADRCORE_LOCAL bool IsTooOld(std::time_t modifyTime) const;
-    ORVADRCORE_LOCAL int LongestRefresh() const;
     bool IsUpdating() const;
     bool SetUpdating() const;
     void UnsetUpdating() const;
@@ -236,17 +236,13 @@ class ORVADRCORE_API Cache {
     mutable Json::Value cachedData;
     mutable std::time_t loadedModifyTime = -1;
 
-    // The file that was loaded or written last, as the file system tells files apart, and the
-    // longest refresh that it speaks of. No file has a size below 0.
-    struct KnownFile {
-        unsigned long device = 0;
-        unsigned long inode = 0;
-        long size = -1;
-        std::timespec modified{};
-        std::timespec changed{};
+    // The text that was loaded or written last, and the longest refresh that it speaks of.
+    struct KnownText {
+        std::size_t size = 0;
+        std::size_t hash = 0;
         int longestRefresh = 0;
     };
-    mutable KnownFile knownFile;
+    mutable KnownText knownText;
 };
 
 }  // namespace OrvaDRCore

@@ -18,6 +18,7 @@
 #include <filesystem>
 #include <fstream>
 #include <functional>
+#include <stdexcept>
 #include <string>
 #include <thread>
 #include <vector>
@@ -429,6 +430,35 @@ TEST_F(CacheProcessTest, BackgroundRefreshesCostALongLivedProcessNothing)
     EXPECT_EQ(states->at(1).descriptors, states->at(0).descriptors);
     EXPECT_LT(states->at(1).heap, states->at(0).heap + SmallChange);
     ReportCount("refreshes", refreshes);
+}
+
+// ------------------------------------------------------------------------------- edits in place
+
+class EditTest : public ProcessTest {};
+
+// Where the kernel does not allow to mount one, the times are finer and show the edits.
+TEST_F(EditTest, AnEditRightAfterAWriteIsSeenOnAFileSystemOfCoarseTimes)
+{
+    const int rounds = Scaled(200, 5000);
+    ChildProcess editor([&](ChildProcess::Link& /*link*/) {
+        (void)(BecomeRoot() && MountCoarseDisk(dir.Path()));
+        int seen = 0;
+        for (int round = 0; round < rounds; ++round) {
+            const TestCache cache = MakeCache(Mode::Background, nullptr);
+            if (!cache.UpdateWithData(DocumentOf(New), 1, 6)) break;
+            std::string text;
+            std::getline(std::ifstream(CacheFile()), text);
+            const std::string written = R"("max_updated_time":5)";
+            text.replace(text.find(written), written.size(), R"("max_updated_time":9)");
+            std::fstream(CacheFile()) << text;
+            if (!cache.UpdateWithData(DocumentOf(Old))) break;
+            seen += MakeCache(Mode::Background, nullptr).GetMaxUpdateTime() == 9 ? 1 : 0;
+            std::filesystem::remove(CacheFile());
+        }
+        if (seen < rounds) throw std::runtime_error("an edit is lost");
+    });
+    EXPECT_EQ(editor.Join(), 0);
+    ReportCount("edits", rounds);
 }
 
 // ------------------------------------------------------------------------------------ failures

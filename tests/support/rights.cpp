@@ -66,3 +66,9 @@ bool MountSmallDisk(const std::string& directory, int bytes)
     return ::unshare(CLONE_NEWNS) == 0 && KeepMounts() &&
            ::mount("tmpfs", directory.c_str(), "tmpfs", 0, options.c_str()) == 0;
 }
+
+bool MountCoarseDisk(const std::string& directory)
+{
+    return ::unshare(CLONE_NEWNS) == 0 && KeepMounts() &&
+           ::mount("ramfs", directory.c_str(), "ramfs", 0, nullptr) == 0;
+}

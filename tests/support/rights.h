@@ -16,4 +16,8 @@ bool LoseRights();
 // sees.
 bool MountSmallDisk(const std::string& directory, int bytes);
 
+// Whether this process could mount a file system in memory on a directory, which nobody else sees,
+// and whose times go on in the kernel's clock ticks.
+bool MountCoarseDisk(const std::string& directory);
+
 #endif

@@ -171,7 +171,7 @@ TEST(MemberTest, LocksAndCachesKeepTheirOrder)
     ExpectInOrder(BehindTable, {offsetof(Cache, cachedPath), offsetof(Cache, timeout),
                                 offsetof(Cache, updatedDataRequired), offsetof(Cache, retryLimit),
                                 offsetof(Cache, cachedData), offsetof(Cache, loadedModifyTime),
-                                offsetof(Cache, knownFile)});
+                                offsetof(Cache, knownText)});
 }
 
 TEST(MemberTest, RequestsAndResponsesKeepTheirOrder)
