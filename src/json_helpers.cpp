@@ -1,8 +1,11 @@
 #include "json_helpers.h"
 
+#include <algorithm>
 #include <atomic>
+#include <charconv>
 #include <cmath>
 #include <cstring>
+#include <locale>
 #include <memory>
 #include <sstream>
 
@@ -49,6 +52,77 @@ const Builder& Kept()
     return *builder;
 }
 
+// Whether the program's locale, which the streams of jsoncpp's reader have, writes real numbers as
+// JSON does.
+bool LocaleHasPoint()
+{
+    return std::use_facet<std::numpunct<char>>(std::locale()).decimal_point() == '.';
+}
+
+// Whether a number may go on with a point after this: jsoncpp reads ".5" after a sign, too.
+bool MayStandBeforePoint(char byte)
+{
+    return (byte >= '0' && byte <= '9') || byte == '-' || byte == '+';
+}
+
+// Appends what follows the point of a number, with an exponent that makes up for the point. Answers
+// where that ends in `text`.
+std::size_t AppendFraction(const std::string& text, std::size_t begin, std::string& result)
+{
+    const std::size_t end = std::min(text.find_first_not_of("0123456789", begin), text.size());
+    result.append(text, begin, end - begin);
+    const char* at = &text[end];
+    int exponent = 0;
+    if (*at == 'e' || *at == 'E') {
+        ++at;
+        if (*at == '+' && at[1] != '-') ++at;
+        const auto [stop, error] = std::from_chars(at, text.data() + text.size(), exponent);
+        // Without the point alone a number is still none, or still too large or small for any.
+        if (error != std::errc()) return end;
+        at = stop;
+    }
+    result += "e" + std::to_string(exponent - static_cast<long>(end - begin));
+    return static_cast<std::size_t>(at - text.data());
+}
+
+// The document with its real numbers written without a point, which every locale reads alike: 314e8
+// for 3.14e10. What is no document stays none.
+std::string WithoutPoints(const std::string& text)
+{
+    std::string result;
+    result.reserve(text.size() + text.size() / 4);
+    bool inString = false;
+    for (std::size_t at = 0; at < text.size();) {
+        const char byte = text[at++];
+        if (byte == '"') inString = !inString;
+        const char before = at > 1 ? text[at - 2] : '\0';
+        if (byte == '.' && !inString && MayStandBeforePoint(before)) {
+            at = AppendFraction(text, at, result);
+            continue;
+        }
+        result += byte;
+        if (byte == '\\' && inString && at < text.size()) result += text[at++];
+    }
+    return result;
+}
+
+// Reads a whole document. False, and `value` as it was, when the reader does not take it.
+bool Parse(Json::Value& value, const std::string& text)
+{
+    const std::unique_ptr<Json::CharReader> reader(Kept<Json::CharReaderBuilder>().newCharReader());
+
+    // A document that breaks off leaves its first members behind in the reader's output.
+    Json::Value document;
+    try {
+        if (!reader->parse(text.data(), text.data() + text.size(), &document, nullptr))
+            return false;
+    } catch (const Json::Exception&) {
+        return false;
+    }
+    value.swap(document);
+    return true;
+}
+
 enum class Reals { Any, Finite };
 
 // Whether a value has so many levels at most, and none but such real numbers.
@@ -74,19 +148,7 @@ bool fromString(Json::Value& value, const std::string& text)
     // The reader takes a zero byte for the end of the text and would pass over what follows it. No
     // JSON document holds one: in strings it is written \u0000.
     if (text.find('\0') != std::string::npos) return false;
-
-    const std::unique_ptr<Json::CharReader> reader(Kept<Json::CharReaderBuilder>().newCharReader());
-
-    // A document that breaks off leaves its first members behind in the reader's output.
-    Json::Value document;
-    try {
-        if (!reader->parse(text.data(), text.data() + text.size(), &document, nullptr))
-            return false;
-    } catch (const Json::Exception&) {
-        return false;
-    }
-    value.swap(document);
-    return true;
+    return LocaleHasPoint() ? Parse(value, text) : Parse(value, WithoutPoints(text));
 }
 
 std::string toString(const Json::Value& value)

@@ -12,6 +12,7 @@
 
 #include "support/cache_fixture.h"
 #include "support/child_checks.h"
+#include "support/global_locale.h"
 #include "support/json_kinds.h"
 #include "support/special_file.h"
 #include "support/test_files.h"
@@ -274,6 +275,17 @@ TEST_F(CacheTest, WhatIsNoRegularFileCannotBeLoadedAndIsNotWaitedFor)
             EXPECT_EQ(cache.GetMaxUpdateTime(), 0);
         });
     }
+}
+
+// The document holds a real number in any case: how long the refresh took.
+TEST_F(CacheTest, WhatWasWrittenIsLoadedWhereTheDecimalPointIsAComma)
+{
+    const GlobalLocale locale(new CommaDecimals);
+    EXPECT_TRUE(cache.UpdateWithData(1.234, 100, 103));
+    const TestCache another = Another(false);
+    EXPECT_TRUE(another.Load());
+    EXPECT_EQ(another.GetCachedData(), 1.234);
+    EXPECT_EQ(another.GetMaxUpdateTime(), 3);
 }
 
 TEST_F(CacheTest, DataOfEveryKindIsLoaded)

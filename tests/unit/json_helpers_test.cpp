@@ -11,6 +11,7 @@
 #include <string>
 #include <vector>
 
+#include "support/global_locale.h"
 #include "support/json_kinds.h"
 
 namespace {
@@ -322,7 +323,8 @@ TEST(JsonRoundTripTest, IntegersComeBackAtTheirLimits)
     }
 }
 
-TEST(JsonRoundTripTest, RealNumbersComeBackToTheLastBit)
+// Numbers of every size, the same on every run.
+std::vector<double> RealNumbers()
 {
     using Limits = std::numeric_limits<double>;
     std::vector<double> numbers{0.0,
@@ -349,6 +351,12 @@ TEST(JsonRoundTripTest, RealNumbersComeBackToTheLastBit)
         std::memcpy(&number, &pattern, sizeof number);
         if (std::isfinite(number)) numbers.push_back(number);
     }
+    return numbers;
+}
+
+void ExpectRealNumbersBack()
+{
+    const std::vector<double> numbers = RealNumbers();
     Json::Value value(Json::arrayValue);
     for (const double number : numbers) value.append(number);
 
@@ -357,6 +365,94 @@ TEST(JsonRoundTripTest, RealNumbersComeBackToTheLastBit)
     for (Json::ArrayIndex i = 0; i < back.size(); ++i) {
         EXPECT_EQ(back[i].type(), Json::realValue) << numbers[i];
         EXPECT_EQ(Bits(back[i].asDouble()), Bits(numbers[i])) << numbers[i];
+    }
+}
+
+TEST(JsonRoundTripTest, RealNumbersComeBackToTheLastBit)
+{
+    ExpectRealNumbersBack();
+}
+
+TEST(JsonRoundTripTest, RealNumbersComeBackWhereTheDecimalPointIsAComma)
+{
+    const GlobalLocale locale(new CommaDecimals);
+    ExpectRealNumbersBack();
+}
+
+// A locale changes nothing of what is a document, and nothing of what it holds.
+TEST(FromStringTest, ALocaleMakesNoDifference)
+{
+    std::vector<std::string> texts = {
+        "1.5",
+        "-1.5",
+        "0.1",
+        "1.234",
+        "1.234.567",
+        "1,5",
+        "1.",
+        "1.e5",
+        "-.5",
+        "+.5",
+        "+1.5",
+        "+-.5",
+        "--.5",
+        ".5",
+        "-.",
+        ".",
+        "1..5",
+        "1.5.",
+        "1.5e",
+        "1.5e+",
+        "1.5e+-3",
+        "1.5e--3",
+        "1.5e++3",
+        "1.5e 5",
+        "1.5e5",
+        "1.5E5",
+        "1.5e+5",
+        "1.5e-5",
+        "1.5e5.5",
+        "1.5e5e5",
+        "00.5",
+        "1.50",
+        "-0.0",
+        "1.5x",
+        "1.5 ",
+        " 1.5",
+        "1.5e400",
+        "1.5e-400",
+        "1.5e99999999999999999999",
+        "1.5e-99999999999999999999",
+        "0.0e99999999999999999999",
+        "1.7976931348623157e308",
+        "1.7976931348623159e308",
+        "5.0e-324",
+        "[1.5,2.5]",
+        "[1.5.5]",
+        "[.5]",
+        "[1.5",
+        R"({"a":1.5})",
+        R"("1.5")",
+        R"("a\"1.5")",
+        R"("\\",1.5)",
+        R"(["\\",1.5])",
+        R"(["\"",1.5])",
+        R"({"1.5":1})",
+        R"("1.5)",
+        R"("1.5\)",
+        R"(["1.5\",1.5])",
+        "1.5\"",
+        Document,
+    };
+    for (const std::string& text : NoJsonTexts()) texts.push_back(text);
+    for (const JsonKind& kind : JsonKinds()) texts.push_back(kind.text);
+    for (const std::string& text : texts) {
+        Json::Value expected("earlier");
+        const bool isDocument = fromString(expected, text);
+        const GlobalLocale locale(new CommaDecimals);
+        Json::Value value("earlier");
+        EXPECT_EQ(fromString(value, text), isDocument) << text;
+        EXPECT_TRUE(Same(value, expected)) << text;
     }
 }
 
