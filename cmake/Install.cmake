@@ -11,6 +11,11 @@ install(TARGETS orvadrcore EXPORT OrvaDRCoreTargets
         COMPONENT Runtime
         NAMELINK_COMPONENT Development
     INCLUDES DESTINATION ${CMAKE_INSTALL_INCLUDEDIR})
+# Has the lock directory made at boot. systemd-tmpfiles looks below /usr and /usr/local.
+install(FILES cmake/orvadrcore.tmpfiles.conf
+    DESTINATION lib/tmpfiles.d
+    RENAME orvadrcore.conf
+    COMPONENT Runtime)
 install(DIRECTORY include/orvadrcore
     DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}
     COMPONENT Development)

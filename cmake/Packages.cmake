@@ -44,8 +44,11 @@ set(CPACK_DEBIAN_RUNTIME_PACKAGE_DEPENDS uuid-runtime)
 set(CPACK_DEBIAN_RUNTIME_PACKAGE_SHLIBDEPS ON)
 set(CPACK_DEBIAN_PACKAGE_GENERATE_SHLIBS ON)
 set(CPACK_DEBIAN_PACKAGE_GENERATE_SHLIBS_POLICY ">=")
-# CPack has ldconfig called by scripts, for which lintian warns; policy wants the trigger.
-set(CPACK_DEBIAN_RUNTIME_PACKAGE_CONTROL_EXTRA ${PROJECT_SOURCE_DIR}/cmake/debian/triggers)
+# CPack has ldconfig called by scripts, for which lintian warns; policy wants the trigger. The postinst
+# makes the lock directory.
+set(CPACK_DEBIAN_RUNTIME_PACKAGE_CONTROL_EXTRA
+    ${PROJECT_SOURCE_DIR}/cmake/debian/triggers
+    ${PROJECT_SOURCE_DIR}/cmake/debian/postinst)
 set(CPACK_DEBIAN_DEVELOPMENT_PACKAGE_DEPENDS
     "liborvadrcore${PROJECT_VERSION_MAJOR} (= ${PROJECT_VERSION}), libjsoncpp-dev")
 set(CPACK_DEBIAN_EXAMPLES_PACKAGE_ARCHITECTURE all)

@@ -33,6 +33,17 @@ if within test -e /usr/include/sqlite3.h; then
     exit 1
 fi
 
+# The installation went well without systemd-tmpfiles; with it the lock directory is made at once.
+step "the lock directory"
+within test ! -e /tmp/.orvadr_lock
+quietly within sh -c 'DEBIAN_FRONTEND=noninteractive apt-get install -y --no-install-recommends \
+    systemd-standalone-tmpfiles'
+quietly within sh -c 'dpkg --install /packages/liborvadrcore1_*.deb'
+[[ $(within stat -c '%F %a %U:%G' /tmp/.orvadr_lock) == "directory 755 root:root" ]]
+quietly within rmdir /tmp/.orvadr_lock
+quietly within systemd-tmpfiles --create --boot # as at boot
+[[ $(within stat -c '%F %a %U:%G' /tmp/.orvadr_lock) == "directory 755 root:root" ]]
+
 cp -r "$source_dir/tests/install" "$tree/callers"
 step "find_package"
 quietly within cmake -S /callers/find_package -B /build

@@ -58,6 +58,10 @@ quietly cmake -S "$prefix/share/doc/liborvadrcore-examples/examples" -B "$work/e
 quietly cmake --build "$work/examples" -j "$(nproc)"
 (cd "$work" && examples/quick_start >/dev/null)
 
+step "the lock directory at boot"
+grep '^d /tmp/.orvadr_lock ' "$prefix/lib/tmpfiles.d/orvadrcore.conf" |
+    grep -qxFf - "$source_dir/docs/locks.md"
+
 step "each header alone"
 flags=$(pkg-config --cflags orvadrcore)
 for header in "$prefix"/include/orvadrcore/*.h; do
