@@ -145,7 +145,7 @@ SqliteDB::SqliteDB(SqliteDB&& other) noexcept
       // A copy: for an empty path SQLite would open a temporary file.
       path(other.path),  // NOLINT(performance-move-constructor-init)
       retryLimit(other.retryLimit),
-      selects(std::move(other.selects))
+      cache(std::move(other.cache))
 {
 }
 
@@ -158,7 +158,7 @@ SqliteDB& SqliteDB::operator=(SqliteDB&& other) noexcept
         handle = std::exchange(other.handle, nullptr);
         path = other.path;
         retryLimit = other.retryLimit;
-        selects = std::move(other.selects);
+        cache = std::move(other.cache);
     }
     return *this;
 }
@@ -376,7 +376,7 @@ bool SqliteDB::Open()
 
 void SqliteDB::Close()
 {
-    selects.reset();  // the connection would outlive its close with them
+    cache.reset();  // SQLite keeps a connection alive as long as it has statements
     if (handle == nullptr) return;
     sqlite3_close(handle);
     handle = nullptr;
@@ -454,11 +454,11 @@ template <class TakeRow>
 bool SqliteDB::DoSelect(const std::string& command, TakeRow takeRow)
 {
     SetErr(ERR::ERR_DATABASE_OPERATION);
-    if (selects == nullptr) selects = std::make_unique<KeptSelects>();
+    if (cache == nullptr) cache = std::make_unique<StatementCache>();
     Statement statement;
-    int code = selects->Take(handle, command, statement);
+    int code = cache->Take(handle, command, statement);
     if (code == SQLITE_OK) code = sqlite3_step(statement.get());
-    // Asked behind the first step, in which a kept statement meets columns that are new.
+    // Read after the first step, which prepares a cached statement again if the schema changed.
     const auto names = ColumnNames(statement.get());
     while (code == SQLITE_ROW && takeRow(statement.get(), names)) {
         code = sqlite3_step(statement.get());
@@ -467,7 +467,7 @@ bool SqliteDB::DoSelect(const std::string& command, TakeRow takeRow)
         SetDBErr(command, code, nullptr);
         return false;
     }
-    selects->Keep(command, std::move(statement));
+    cache->Keep(command, std::move(statement));
     SetErr(0);
     return true;
 }

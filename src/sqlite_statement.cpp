@@ -9,17 +9,28 @@ namespace OrvaDRCore {
 
 namespace {
 
-// The look for the table and the selects that a program has in its loops.
-constexpr std::size_t MaxKept = 8;
+// The table lookup and the selects that a program has in its loops.
+constexpr std::size_t MaxCached = 8;
 
 // A list of thousands of values is not likely to come twice, and its statement is large.
-constexpr std::size_t MaxKeptLength = 1024;
+constexpr std::size_t MaxCachedLength = 1024;
+
+// Whether the connection has main and temp alone. Before SQLite 3.39 there is no way to ask.
+bool HasNothingAttached([[maybe_unused]] sqlite3* handle)
+{
+#if SQLITE_VERSION_NUMBER >= 3039000
+    return handle != nullptr && sqlite3_db_name(handle, 2) == nullptr;
+#else
+    return false;
+#endif
+}
 
 // A PRAGMA may do its work when it is prepared: selects alone can run again as they are.
-bool IsWorthKeeping(const std::string& command, sqlite3_stmt* statement)
+bool IsWorthCaching(const std::string& command, sqlite3_stmt* statement)
 {
-    return command.size() <= MaxKeptLength && command.compare(0, 7, "SELECT ") == 0 &&
-           sqlite3_stmt_readonly(statement) != 0;
+    return command.size() <= MaxCachedLength && command.compare(0, 7, "SELECT ") == 0 &&
+           sqlite3_stmt_readonly(statement) != 0 &&
+           HasNothingAttached(sqlite3_db_handle(statement));
 }
 
 // Texts are not copied: the record outlives the statement's run. Answers SQLite's code.
@@ -73,23 +84,25 @@ int InsertRow(sqlite3_stmt* statement, const SqliteValueList& record)
     return code == SQLITE_DONE ? SQLITE_OK : code;
 }
 
-int KeptSelects::Take(sqlite3* handle, const std::string& command, Statement& statement)
+int StatementCache::Take(sqlite3* handle, const std::string& command, Statement& statement)
 {
-    const auto kept = std::find_if(selects.begin(), selects.end(),
-                                   [&](const Select& select) { return select.command == command; });
-    if (kept == selects.end()) return PrepareStatement(handle, command, statement);
-    std::rotate(kept, kept + 1, selects.end());
+    if (!HasNothingAttached(handle)) selects.clear();
+    const auto cached = std::find_if(selects.begin(), selects.end(), [&](const Select& select) {
+        return select.command == command;
+    });
+    if (cached == selects.end()) return PrepareStatement(handle, command, statement);
+    std::rotate(cached, cached + 1, selects.end());
     statement = std::move(selects.back().statement);
     if (statement == nullptr) return PrepareStatement(handle, command, statement);
     return SQLITE_OK;
 }
 
-void KeptSelects::Keep(const std::string& command, Statement statement)
+void StatementCache::Keep(const std::string& command, Statement statement)
 {
-    if (!IsWorthKeeping(command, statement.get())) return;
+    if (!IsWorthCaching(command, statement.get())) return;
     sqlite3_reset(statement.get());
     if (selects.empty() || selects.back().command != command) {
-        if (selects.size() == MaxKept) selects.erase(selects.begin());
+        if (selects.size() == MaxCached) selects.erase(selects.begin());
         selects.push_back({command, nullptr});
     }
     selects.back().statement = std::move(statement);

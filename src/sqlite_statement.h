@@ -1,4 +1,4 @@
-// Prepared statements: their owner, what they are filled with, and the few that a connection keeps.
+// Prepared statements: their owner, what they are filled with, and the few that a connection caches.
 #ifndef ORVADRCORE_SRC_SQLITE_STATEMENT_H
 #define ORVADRCORE_SRC_SQLITE_STATEMENT_H
 
@@ -29,16 +29,20 @@ std::string InsertStatement(const std::string& table, const SqliteValueList& rec
 // SQLITE_OK when the row is there.
 int InsertRow(sqlite3_stmt* statement, const SqliteValueList& record);
 
-// The selects that a connection ran last. They are reset, and thus hold no lock; SQLite prepares
-// them again by itself when the tables have changed. All go before the connection does.
-class KeptSelects {
+// The last few selects of a connection, prepared. A cached statement is reset, so it holds no lock,
+// and SQLite prepares it again by itself when its tables have changed. The cache must be emptied
+// before the connection is closed.
+//
+// While a database is attached nothing is cached: SQLite looks for a table in one database after
+// another, and a statement that found it in a later one would not notice when the same name appears
+// in an earlier one.
+class StatementCache {
   public:
-    // Fills `statement` with a kept one, whose place stays empty until it is back, or with a new
-    // one. Answers SQLite's code.
+    // Fills `statement` with the cached one, whose place stays empty until Keep(), or prepares it.
+    // Answers SQLite's code.
     int Take(sqlite3* handle, const std::string& command, Statement& statement);
 
-    // Keeps the statement that was taken last for the next time, if it only reads and is not of
-    // unusual length.
+    // Puts back the statement that was taken last, unless it writes or is unusually long.
     void Keep(const std::string& command, Statement statement);
 
   private:

@@ -37,7 +37,7 @@ struct sqlite3;
 
 namespace OrvaDRCore {
 
-class KeptSelects;
+class StatementCache;
 
 /// A connection to an SQLite file. The head of sqlite_db.h tells what holds for retries, errors,
 /// threads and forks.
@@ -317,7 +317,7 @@ class ORVADRCORE_API SqliteDB {
     sqlite3* handle = nullptr;
     std::string path;
     unsigned int retryLimit;
-    std::unique_ptr<KeptSelects> selects;  // none before the first
+    std::unique_ptr<StatementCache> cache;  // made at the first select
 };
 
 }  // namespace OrvaDRCore

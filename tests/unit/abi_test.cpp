@@ -155,7 +155,7 @@ TEST(MemberTest, ConnectionsKeepTheirOrder)
 {
     ExpectInOrder(
         0, {offsetof(SqliteDB, errCode), offsetof(SqliteDB, errRecord), offsetof(SqliteDB, handle),
-            offsetof(SqliteDB, path), offsetof(SqliteDB, retryLimit), offsetof(SqliteDB, selects)});
+            offsetof(SqliteDB, path), offsetof(SqliteDB, retryLimit), offsetof(SqliteDB, cache)});
 }
 
 TEST(MemberTest, TransactionsKeepTheirOrder)
