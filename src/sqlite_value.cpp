@@ -109,7 +109,8 @@ SqliteValueList::~SqliteValueList() = default;
 SqliteValueList& SqliteValueList::operator=(const SqliteValueList& other)
 {
     // Through a copy made by construction: assigning value by value would lose `valid`.
-    return *this = SqliteValueList(other);
+    if (this != &other) values = std::map<std::string, SqliteValue>(other.values);
+    return *this;
 }
 
 SqliteValueList& SqliteValueList::operator=(SqliteValueList&& other) noexcept

@@ -134,7 +134,8 @@ class ORVADRCORE_API SqliteValueList {
     virtual ~SqliteValueList();
 
     /// Replaces all fields by copies of the other's.
-    /// \param other  the record to copy
+    /// \param other  the record to copy; for this record itself nothing happens, and references to
+    ///               its values stay good
     /// \return this record
     SqliteValueList& operator=(const SqliteValueList& other);
 

@@ -459,6 +459,25 @@ TEST_F(RequestTest, AMemberCanBeMergedThatReplacesItself)
     EXPECT_TRUE(Same(list.getParams(), ParseJson(R"({"0":["x"],"1":1})")));
 }
 
+TEST_F(RequestTest, ItsOwnPartsCanBeSetAgain)
+{
+    Request request(ParseJson(R"({"api":"An.Api.With.A.Long.Name","method":"get","version":2,)"
+                              R"("a":{"api":"Another.Api.With.A.Long.Name","b":[1,2]}})"));
+    request.setAPI(request.getAPI());
+    request.setMethod(request.getAPI());
+    request.setUploadFile({"a name that is long enough", "a path that is long enough"});
+    request.setUploadFile(request.getUploadFile());
+    request.setRequest(request.getParams());
+    EXPECT_EQ(request.toStr(), "An.Api.With.A.Long.Name/An.Api.With.A.Long.Name/2");
+    EXPECT_EQ(request.getUploadFile().path, "a path that is long enough");
+    request.setRequest(request.getParams()["a"]);
+    EXPECT_EQ(request.getAPI(), "Another.Api.With.A.Long.Name");
+    EXPECT_TRUE(Same(request.getParams(), ParseJson(R"({"b":[1,2]})")));
+    Request& same = request;
+    request = same;
+    EXPECT_EQ(request.getAPI(), "Another.Api.With.A.Long.Name");
+}
+
 // ------------------------------------------------------------------------- validity, JSON and text
 
 TEST_F(RequestTest, ApiMethodAndAVersionAboveZeroMakeARequestValid)

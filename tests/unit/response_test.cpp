@@ -688,4 +688,18 @@ TEST_F(ResponseTest, AResponseCanBeAssignedToItself)
     ExpectAnswers(response, Ask(Response(GoodReply)));
 }
 
+TEST_F(ResponseTest, ItsOwnPartsCanBecomeTheReply)
+{
+    Response response(R"({"success":true,"data":{"success":true,"data":{"task_id":"t"}}})");
+    response.setResp(response.getField("success"));
+    EXPECT_FALSE(response.isValid());
+    ASSERT_TRUE(response.setResp(
+        R"({"success":true,"data":{"success":true,"data":{"text":"{\"success\":true}"}}})"));
+    response.setResp(response.getData());
+    EXPECT_EQ(response.getDataFieldtoStr("text"), R"({"success":true})");
+    EXPECT_TRUE(response.setResp(response.getDataField("text").asCString()));
+    EXPECT_TRUE(response.isSuccess());
+    EXPECT_FALSE(response.hasData());
+}
+
 }  // namespace

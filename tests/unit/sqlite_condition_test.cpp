@@ -249,6 +249,18 @@ TEST_F(SqliteConditionTest, SettingAListReplacesTheText)
     ExpectCondition(condition, true, "d NOT IN (  )");
 }
 
+TEST_F(SqliteConditionTest, ItsOwnTextCanBeAnOperandOfAComparisonAndOfAList)
+{
+    SqliteEqual equal("id % 1000000007", 3);
+    EXPECT_TRUE(equal.SetValue(equal.GetCondition(), true));
+    ExpectCondition(equal, true, "id % 1000000007=3=1");
+    SqliteIn in("id", "SELECT id FROM jobs");
+    EXPECT_TRUE(in.SetValue("id", in.GetCondition()));
+    ExpectCondition(in, true, "id IN ( id IN ( SELECT id FROM jobs ) )");
+    EXPECT_TRUE(in.SetValue(in.GetCondition(), Values{1}));
+    ExpectCondition(in, true, "id IN ( id IN ( SELECT id FROM jobs ) ) IN ( 1 )");
+}
+
 TEST_F(SqliteConditionTest, AnotherKeywordRefusesEveryValue)
 {
     for (const char* keyword :

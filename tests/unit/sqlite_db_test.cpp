@@ -540,6 +540,13 @@ TEST_F(SqliteDbTest, AnErrorObjectHoldsWhatIsKnown)
     }
 }
 
+TEST_F(SqliteDbTest, AnErrorObjectCanRepeatTheOneBeforeIt)
+{
+    db.SetDBErr("a statement that is long enough", 5, "a message that is long enough");
+    db.SetDBErr("S", 6, db.GetErr()["sqlite_errmsg"].asCString());
+    ExpectErr(db, 404, ErrorText({"S", 6, "a message that is long enough"}));
+}
+
 TEST_F(SqliteDbTest, AnErrorObjectOfAClosedObjectHasSqlitesWordsForNoConnection)
 {
     db.SetDBErr("S", 5, nullptr);

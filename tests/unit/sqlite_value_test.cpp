@@ -611,6 +611,40 @@ TEST_F(SqliteValueListTest, AssignedToItselfAListStaysAsItIs)
     EXPECT_EQ(Text(list), "a:1, b:'x'");
 }
 
+TEST_F(SqliteValueListTest, ReferencesIntoAListStayGoodWhenItIsAssignedOrAddedToItself)
+{
+    SqliteValueList list = List({{"a", 1}, {"b", "a text that is too long to be kept in place"}});
+    const SqliteValue& text = list.GetValue("b");
+    const std::string& field = list.GetValues().begin()->first;
+    SqliteValueList& same = list;
+    list = same;
+    list += same;
+    list = std::move(same);
+    EXPECT_EQ(text.ToFormatedValue(), "'a text that is too long to be kept in place'");
+    EXPECT_EQ(field, "a");
+}
+
+TEST_F(SqliteValueListTest, AFieldCanBeGivenAnotherFieldsValueOrItsOwn)
+{
+    SqliteValueList list = List({{"a", 1}, {"b", "a text that is too long to be kept in place"}});
+    EXPECT_TRUE(list.AddValue("c", list.GetValue("b")));
+    EXPECT_TRUE(list.AddValue("a", list.GetValue("b")));
+    EXPECT_TRUE(list.AddValue("b", list.GetValue("b")));
+    EXPECT_TRUE(list.AddValue(list.GetValues().begin()->first, list.GetValue("b")));
+    for (const char* field : {"a", "b", "c"}) {
+        EXPECT_EQ(list.GetValue(field).ToFormatedValue(),
+                  "'a text that is too long to be kept in place'");
+    }
+}
+
+TEST_F(SqliteValueListTest, ATextCanBeReadIntoTheVariableThatNamesItsField)
+{
+    const SqliteValueList list = List({{"name", "backup"}});
+    std::string text = "name";
+    EXPECT_TRUE(list.GetValue(text, text));
+    EXPECT_EQ(text, "backup");
+}
+
 TEST_F(SqliteValueListTest, ACopyGoesItsOwnWay)
 {
     const SqliteValueList original = List({{"a", 1}});
