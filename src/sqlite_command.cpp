@@ -28,6 +28,13 @@ bool AddFieldValue(SqliteValueList& record, const std::string& field, const T& v
     return true;
 }
 
+// Writes to the stream's buffer, which throws when memory runs out. The stream's operators would
+// swallow that and leave a text that is cut off.
+void Write(std::stringstream& out, const std::string& text)
+{
+    out.rdbuf()->sputn(text.data(), static_cast<std::streamsize>(text.size()));
+}
+
 // The text of a condition object, for the caller's setter of texts; null when it is not valid.
 const std::string* TextOf(const SqliteCondition& condition)
 {
@@ -82,8 +89,7 @@ bool SqliteCommand::SetTable(const SqliteTableHandler& handler)
 std::string SqliteCommand::ToStr() const
 {
     std::stringstream out;
-    out.exceptions(std::ios::badbit);  // or a text for which memory is short comes out cut off
-    out << table.GetName() << "]";     // has no opening bracket, on purpose
+    Write(out, table.GetName() + "]");  // there is no opening bracket, because the contract says so
     DumpParam(out);
     return out.str();
 }
@@ -141,7 +147,7 @@ std::string InsertCommand::GetCommand() const
 
 void InsertCommand::DumpParam(std::stringstream& out) const
 {
-    out << PairsForLog(fieldValues);
+    Write(out, PairsForLog(fieldValues));
 }
 
 UpdateCommand::~UpdateCommand() = default;
@@ -196,7 +202,7 @@ std::string UpdateCommand::GetCommand() const
 
 void UpdateCommand::DumpParam(std::stringstream& out) const
 {
-    out << "condition:[" << condition << "]/" << PairsForLog(fieldValues);
+    Write(out, "condition:[" + condition + "]/" + PairsForLog(fieldValues));
 }
 
 SelectCommand::~SelectCommand() = default;
@@ -255,8 +261,8 @@ std::string SelectCommand::GetCommand() const
 
 void SelectCommand::DumpParam(std::stringstream& out) const
 {
-    out << "condition:[" << condition << "]/fields:["
-        << (selectAll ? "all" : Container::ToString(fields, ", ")) << "]";
+    Write(out, "condition:[" + condition + "]/fields:[" +
+                   (selectAll ? "all" : Container::ToString(fields, ", ")) + "]");
 }
 
 template bool InsertCommand::AddFieldValue(const std::string&, const std::string&);

@@ -74,7 +74,9 @@ class ORVADRCORE_API SqliteCommand {
     virtual bool IsValid() const = 0;
 
     /// Writes the command's parameters for a reader of the log.
-    /// \param[out] out  takes the text, behind what it holds already
+    /// \param[out] out  takes the text, after what it holds already. An override may leave the stream
+    ///                  in a failed state, as writing a null `const char*` does: what its operators
+    ///                  write from then on is missing, and nothing else follows from it
     virtual void DumpParam(std::stringstream& out) const = 0;
 
     /// Sets the table.

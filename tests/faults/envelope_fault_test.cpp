@@ -69,6 +69,28 @@ TEST(EnvelopeFaults, InsertForAReader)
     });
 }
 
+TEST(EnvelopeFaults, UpdateForAReader)
+{
+    EveryCallFails("UpdateCommand::ToStr", [] {
+        UpdateCommand update;
+        update.SetTable(SqliteTableHandler("a_table_with_a_name", ""));
+        update.AddFieldValue("name", "a value that is long enough");
+        update.SetCondition("a condition that is long enough");
+        ExpectText(update.ToStr(), [&] { return update.ToStr(); });
+    });
+}
+
+TEST(EnvelopeFaults, SelectForAReader)
+{
+    EveryCallFails("SelectCommand::ToStr", [] {
+        SelectCommand select;
+        select.SetTable(SqliteTableHandler("a_table_with_a_name", ""));
+        select.AddField("a_field_with_a_name");
+        select.SetCondition("a condition that is long enough");
+        ExpectText(select.ToStr(), [&] { return select.ToStr(); });
+    });
+}
+
 TEST(EnvelopeFaults, UpdateWithConditions)
 {
     EveryCallFails("UpdateCommand", [] {

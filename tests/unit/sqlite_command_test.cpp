@@ -542,6 +542,31 @@ TYPED_TEST(AnyCommandTest, ASubclassDescribesItsOwnParameters)
     EXPECT_EQ(Decided(TypeParam(), false).ToStr(), "]own parameters");
 }
 
+// A command that describes itself by what its user has, which may be nothing.
+template <class Command>
+class Careless : public Command {
+  public:
+    Careless(const Command& command, const char* text) : Command(command), comment(text) {}
+    void DumpParam(std::stringstream& out) const noexcept override
+    {
+        Command::DumpParam(out);
+        out << "/comment:[" << comment << "]";
+        Command::DumpParam(out);
+    }
+
+  private:
+    const char* comment;
+};
+
+TYPED_TEST(AnyCommandTest, ANullTextThatASubclassWritesCutsTheDescriptionAtMost)
+{
+    const TypeParam command = OnJobs<TypeParam>();
+    const std::string plain = command.ToStr();
+    EXPECT_EQ(Careless<TypeParam>(command, "x").ToStr(),
+              plain + "/comment:[x]" + plain.substr(plain.find(']') + 1));
+    EXPECT_EQ(Careless<TypeParam>(command, NullText).ToStr().rfind(plain + "/comment:[", 0), 0U);
+}
+
 // Digits in groups of three, everywhere in the program, as long as one lives.
 class GroupedDigits {
   public:
