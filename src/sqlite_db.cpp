@@ -5,6 +5,7 @@
 #include <algorithm>
 #include <map>
 #include <memory>
+#include <optional>
 #include <utility>
 
 #include <orvadrcore/errors.h>
@@ -403,10 +404,14 @@ bool SqliteDB::DoExecSqliteCommand(const std::string& command)
 
 bool SqliteDB::DoSelectSqliteRecord(const std::string& command, SqliteValueList& record)
 {
-    return DoSelect(command, [&](sqlite3_stmt* statement, const auto& names) {
-        record = ParseRecord(statement, names);
+    std::optional<SqliteValueList> first;  // a row that is not committed is none
+    const auto takeFirst = [&](sqlite3_stmt* statement, const auto& names) {
+        first = ParseRecord(statement, names);
         return false;
-    });
+    };
+    if (!DoSelect(command, takeFirst)) return false;
+    if (first) record = std::move(*first);
+    return true;
 }
 
 bool SqliteDB::DoSelectSqliteRecords(const std::string& command,
@@ -463,7 +468,8 @@ bool SqliteDB::DoSelect(const std::string& command, TakeRow takeRow)
     while (code == SQLITE_ROW && takeRow(statement.get(), names)) {
         code = sqlite3_step(statement.get());
     }
-    if (code != SQLITE_ROW && code != SQLITE_DONE) {
+    if (code == SQLITE_ROW) code = EndBeforeLastRow(statement.get());
+    if (code != SQLITE_OK && code != SQLITE_DONE) {
         SetDBErr(command, code, nullptr);
         return false;
     }

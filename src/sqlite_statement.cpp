@@ -84,6 +84,11 @@ int InsertRow(sqlite3_stmt* statement, const SqliteValueList& record)
     return code == SQLITE_DONE ? SQLITE_OK : code;
 }
 
+int EndBeforeLastRow(sqlite3_stmt* statement)
+{
+    return sqlite3_stmt_readonly(statement) != 0 ? SQLITE_OK : sqlite3_reset(statement);
+}
+
 int StatementCache::Take(sqlite3* handle, const std::string& command, Statement& statement)
 {
     if (!HasNothingAttached(handle)) selects.clear();

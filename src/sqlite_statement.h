@@ -29,6 +29,10 @@ std::string InsertStatement(const std::string& table, const SqliteValueList& rec
 // SQLITE_OK when the row is there.
 int InsertRow(sqlite3_stmt* statement, const SqliteValueList& record);
 
+// Ends a statement whose last row was not reached. One that writes commits only now, which may fail.
+// Answers SQLite's code.
+int EndBeforeLastRow(sqlite3_stmt* statement);
+
 // The last few selects of a connection, prepared. A cached statement is reset, so it holds no lock,
 // and SQLite prepares it again by itself when its tables have changed. The cache must be emptied
 // before the connection is closed.

@@ -218,8 +218,8 @@ class ORVADRCORE_API SqliteDB {
     ///       statement leads to it.
     /// \warning Integers are read as 32 bits: larger ones arrive truncated. Select such a column as
     ///          text, `CAST(size AS TEXT) AS size`.
-    /// \warning A statement that changes the file runs through here, too, and is stepped once a
-    ///          try.
+    /// \note A statement that changes the file runs through here, too. Its row, of a `RETURNING`
+    ///       clause, counts only when the change is committed: where committing fails, the try does.
     bool SelectByCommand(const std::string& command, SqliteValueList& record);
 
     /// As above, for all rows.

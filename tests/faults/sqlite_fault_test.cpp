@@ -105,6 +105,16 @@ bool Select(SqliteDB& db)
     return isRead;
 }
 
+bool InsertWithRow(SqliteDB& db)
+{
+    SqliteValueList record;
+    record.AddValue("old", 1);
+    const std::string insert = "INSERT INTO nodes VALUES (4,'" + Long('d') + "') RETURNING id";
+    const bool isInserted = db.Open() && db.SelectByCommand(insert, record);
+    EXPECT_EQ(record.ToStr(), isInserted ? "id:4" : "old:1");
+    return isInserted;
+}
+
 const std::vector<Operation>& Operations()
 {
     static const std::vector<Operation> operations{
@@ -123,6 +133,7 @@ const std::vector<Operation>& Operations()
         {"DeleteAllRecords", [](SqliteDB& db) { return db.DeleteAllRecords(Nodes); }, ""},
         {"Exec", [](SqliteDB& db) { return db.Open() && db.Exec("DELETE FROM nodes WHERE id=3"); },
          "1a,2b", true},
+        {"SelectByCommand of an INSERT with RETURNING", InsertWithRow, "1a,2b,3c,4d", true},
         {"CreateTable", [](SqliteDB& db) { return db.Open() && db.CreateTable(Others); }, Before,
          true},
         {"a transaction that is committed", Work, "2x,3x,4x,5x"},

@@ -263,6 +263,45 @@ TEST_F(SqliteDbSelectTest, AStatementThatGivesNoRowsRunsOnceAndSucceeds)
     EXPECT_EQ(Run("SELECT id FROM jobs ORDER BY id"), "1;2");
 }
 
+TEST_F(SqliteDbSelectTest, TheRowOfAStatementThatWritesIsThereWhenTheChangeIs)
+{
+    Run("CREATE TABLE jobs (id)");
+    ASSERT_TRUE(db.Open());
+    SqliteValueList record(earlier);
+    EXPECT_TRUE(db.SelectByCommand("INSERT INTO jobs VALUES (1),(2) RETURNING id", record));
+    ExpectErr(db, 0);
+    EXPECT_EQ(record.ToStr(), "id:1");
+    Records records;
+    EXPECT_TRUE(db.SelectByCommand("UPDATE jobs SET id=id+5 RETURNING id", records));
+    EXPECT_EQ(ToText(records), "{id:6}{id:7}");
+    EXPECT_EQ(Run("SELECT id FROM jobs"), "6;7");
+}
+
+TEST_F(SqliteDbSelectTest, TheRowOfAStatementWhoseCommitMeetsAReaderIsNone)
+{
+    const Failure busy{"INSERT INTO jobs VALUES (1),(2) RETURNING id", SQLITE_BUSY, Locked};
+    Run("CREATE TABLE jobs (id)");
+    LockHolder reader(path, "BEGIN; SELECT * FROM jobs");
+    ASSERT_TRUE(retrying.Open());
+    SqliteValueList record(earlier);
+    EXPECT_FALSE(retrying.SelectByCommand(busy.command, record));
+    ExpectErr(retrying, 404, TriesText(busy, 4));
+    EXPECT_EQ(record.ToStr(), "kept:1");
+    ExpectLines({OneRowGaveUp(busy, 4)});
+    EXPECT_EQ(Run("SELECT count(*) FROM jobs"), "0");
+
+    pauses.OnPause([&](std::size_t number) {
+        if (number == 5) reader.Release();
+    });
+    EXPECT_TRUE(retrying.SelectByCommand(busy.command, record));
+    ExpectErr(retrying, 0);
+    EXPECT_EQ(record.ToStr(), "id:1");
+    ExpectLines(
+        {Info("SelectByCommand", "After retry [2] times, success to exec command [" + busy.command +
+                                     "], previous errs[" + TriesText(busy, 2) + "]")});
+    EXPECT_EQ(Run("SELECT id FROM jobs"), "1;2");
+}
+
 TEST_F(SqliteDbSelectTest, SideEffectsHappenOncePerTry)
 {
     const std::string insert = "INSERT INTO jobs VALUES (1)";
