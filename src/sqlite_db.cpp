@@ -15,7 +15,7 @@
 #include "log.h"
 #include "retry.h"
 #include "sqlite_internals.h"
-#include "sqlite_statement.h"
+#include "sqlite_state.h"
 
 namespace OrvaDRCore {
 
@@ -140,26 +140,28 @@ struct SqliteDB::Operation {
 SqliteDB::SqliteDB(const std::string& file, unsigned int limit) : path(file), retryLimit(limit) {}
 
 SqliteDB::SqliteDB(SqliteDB&& other) noexcept
-    : errCode(other.errCode),
+    : errCode(std::exchange(other.errCode, 0)),
       errRecord(std::move(other.errRecord)),
       handle(std::exchange(other.handle, nullptr)),
       // A copy: for an empty path SQLite would open a temporary file.
       path(other.path),  // NOLINT(performance-move-constructor-init)
       retryLimit(other.retryLimit),
-      cache(std::move(other.cache))
+      state(std::move(other.state))
 {
+    other.transaction = nullptr;  // it refers to the other object, which has no connection now
 }
 
 SqliteDB& SqliteDB::operator=(SqliteDB&& other) noexcept
 {
     if (this != &other) {
         Close();
-        errCode = other.errCode;
-        errRecord = std::move(other.errRecord);
+        errCode = std::exchange(other.errCode, 0);
+        errRecord = std::exchange(other.errRecord, Json::Value());
         handle = std::exchange(other.handle, nullptr);
         path = other.path;
         retryLimit = other.retryLimit;
-        cache = std::move(other.cache);
+        state = std::move(other.state);
+        transaction = other.transaction = nullptr;
     }
     return *this;
 }
@@ -185,7 +187,7 @@ bool SqliteDB::InsertRecords(const SqliteTableHandler& table,
         DR_LOG(Err, "invalid insert records: table[%s]", table.GetName().c_str());
         return false;
     }
-    // Asked before the look for the table, which may be what SQLite ends a transaction at.
+    // Checked first: SQLite may end the transaction during the table lookup.
     const bool isNested = IsInTransaction();
     SetErr(ERR::ERR_DATABASE_OPERATION);
     if (!OpenWithTable(__func__, table)) return false;
@@ -362,11 +364,13 @@ bool SqliteDB::SelectRows(const std::string& command, TakeRow takeRow)
 bool SqliteDB::Open()
 {
     if (handle != nullptr) return true;
+    ConnectionState& own = State();
     if (sqlite3_open(path.c_str(), &handle) != SQLITE_OK) {
         Close();  // SQLite may hand out a handle also when it fails
         DR_LOG(Warn, "Failed to open db[%s]", path.c_str());
         return false;
     }
+    own.watch.Start(handle);
     if (sqlite3_busy_timeout(handle, BusyTimeoutMSec) != SQLITE_OK) {
         // The connection stays open, on purpose: the next call answers true.
         DR_LOG(Warn, "Failed to set busy timeout with error");
@@ -377,8 +381,8 @@ bool SqliteDB::Open()
 
 void SqliteDB::Close()
 {
-    cache.reset();  // SQLite keeps a connection alive as long as it has statements
     if (handle == nullptr) return;
+    state->cache.Clear();  // SQLite closes no connection that has statements
     sqlite3_close(handle);
     handle = nullptr;
 }
@@ -442,7 +446,8 @@ SqliteDB::Tries SqliteDB::TryRepeatedly(Attempt attempt)
         return false;
     };
     const auto pause = [] { RandomSleepInMSec(MinPauseMSec, MaxPauseMSec); };
-    const RetryOutcome outcome = Retry(retryLimit, attemptAndNote, pause);
+    const unsigned int limit = transaction != nullptr ? 0 : retryLimit;
+    const RetryOutcome outcome = Retry(limit, attemptAndNote, pause);
 
     Tries tries{outcome.succeeded, static_cast<unsigned int>(outcome.failures), {}};
     if (outcome.failures > 0) tries.errors = toString(errors);
@@ -459,9 +464,9 @@ template <class TakeRow>
 bool SqliteDB::DoSelect(const std::string& command, TakeRow takeRow)
 {
     SetErr(ERR::ERR_DATABASE_OPERATION);
-    if (cache == nullptr) cache = std::make_unique<StatementCache>();
+    StatementCache& cache = State().cache;
     Statement statement;
-    int code = cache->Take(handle, command, statement);
+    int code = cache.Take(handle, command, statement);
     if (code == SQLITE_OK) code = sqlite3_step(statement.get());
     // Read after the first step, which prepares a cached statement again if the schema changed.
     const auto names = ColumnNames(statement.get());
@@ -473,14 +478,25 @@ bool SqliteDB::DoSelect(const std::string& command, TakeRow takeRow)
         SetDBErr(command, code, nullptr);
         return false;
     }
-    cache->Keep(command, std::move(statement));
+    cache.Keep(command, std::move(statement));
     SetErr(0);
     return true;
+}
+
+ConnectionState& SqliteDB::State()
+{
+    if (state == nullptr) state = std::make_unique<ConnectionState>();
+    return *state;
 }
 
 bool SqliteDB::IsInTransaction() const
 {
     return handle != nullptr && sqlite3_get_autocommit(handle) == 0;
+}
+
+std::uint64_t SqliteDB::CountTransactions() const
+{
+    return state != nullptr ? state->watch.CountTransactions() : 0;
 }
 
 // Inserts row by row, up to the first that fails, with one statement for all records of a kind.

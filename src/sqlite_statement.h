@@ -34,7 +34,7 @@ int InsertRow(sqlite3_stmt* statement, const SqliteValueList& record);
 int EndBeforeLastRow(sqlite3_stmt* statement);
 
 // The last few selects of a connection, prepared. A cached statement is reset, so it holds no lock,
-// and SQLite prepares it again by itself when its tables have changed. The cache must be emptied
+// and SQLite prepares it again by itself when its tables have changed. The cache must be cleared
 // before the connection is closed.
 //
 // While a database is attached nothing is cached: SQLite looks for a table in one database after
@@ -48,6 +48,8 @@ class StatementCache {
 
     // Puts back the statement that was taken last, unless it writes or is unusually long.
     void Keep(const std::string& command, Statement statement);
+
+    void Clear() { selects.clear(); }
 
   private:
     struct Select {

@@ -1,7 +1,5 @@
 #include <orvadrcore/sqlite_transaction.h>
 
-#include <utility>
-
 #include <orvadrcore/errors.h>
 
 #include "log.h"
@@ -19,7 +17,7 @@ SqliteTransaction::~SqliteTransaction()
     try {
         Rollback();
     } catch (...) {
-        // Memory is short. The connection is closed, and with it the transaction.
+        // Ran out of memory. The connection is closed, which has rolled back, too.
     }
     db.errCode = errCode;
     db.errRecord.swap(errRecord);
@@ -32,7 +30,7 @@ bool SqliteTransaction::Begin()
         DR_LOG(Err, "transaction is already open in db[%s]", db.path.c_str());
         return false;
     }
-    SetBegun(false);  // one that SQLite has ended by itself
+    Release();  // one that SQLite has ended
     db.SetErr(ERR::ERR_DATABASE_OPERATION);
     if (!db.Open()) {
         DR_LOG(Err, "Failed to open db [%s]", db.path.c_str());
@@ -42,7 +40,6 @@ bool SqliteTransaction::Begin()
         DR_LOG(Err, "Failed to begin transaction in db[%s]", db.path.c_str());
         return false;
     }
-    SetBegun(true);
     return true;
 }
 
@@ -53,14 +50,13 @@ bool SqliteTransaction::Commit()
         DR_LOG(Err, "no transaction to commit in db[%s]", db.path.c_str());
         return false;
     }
-    SetBegun(false);
-    if (!db.IsInTransaction()) {
+    if (!IsOpen()) {
+        Release();
         db.SetErr(ERR::ERR_DATABASE_OPERATION);
         DR_LOG(Err, "transaction in db[%s] was rolled back", db.path.c_str());
         return false;
     }
     if (!Exec("COMMIT")) {
-        SetBegun(db.IsInTransaction());
         DR_LOG(Err, "Failed to commit transaction in db[%s]", db.path.c_str());
         return false;
     }
@@ -69,13 +65,13 @@ bool SqliteTransaction::Commit()
 
 bool SqliteTransaction::Rollback()
 {
-    const bool isOpen = begun && db.IsInTransaction();
-    SetBegun(false);
+    const bool isOpen = IsOpen();
+    Release();
     db.SetErr(0);
     bool isDone = true;
     try {
         isDone = !isOpen || db.DoExecSqliteCommand("ROLLBACK");
-    } catch (...) {  // memory is short
+    } catch (...) {  // ran out of memory
         db.Close();
         throw;
     }
@@ -87,23 +83,37 @@ bool SqliteTransaction::Rollback()
     return true;
 }
 
-// Where memory runs out, too, what has been begun and not ended is this object's to roll back.
-bool SqliteTransaction::Exec(const char* statement)
+// Whether the transaction that this object began is the one that is open on the connection.
+bool SqliteTransaction::IsOpen() const
 {
-    try {
-        return db.Exec(statement);
-    } catch (...) {
-        SetBegun(db.IsInTransaction());
-        throw;
-    }
+    return db.transaction == this && db.IsInTransaction() && db.CountTransactions() == number;
 }
 
-// The connection's own limit holds for BEGIN and COMMIT, and for nothing between.
-void SqliteTransaction::SetBegun(bool isBegun)
+// Begins or commits, with the retries of the connection. What is open afterwards is this object's,
+// also where memory runs out.
+bool SqliteTransaction::Exec(const char* statement)
 {
-    if (begun == isBegun) return;
-    begun = isBegun;
-    std::swap(retryLimit, db.retryLimit);
+    struct Claim {
+        SqliteTransaction& transaction;
+        ~Claim() { transaction.ClaimWhatIsOpen(); }
+    };
+    const Claim claim{*this};
+    db.transaction = nullptr;
+    return db.Exec(statement);
+}
+
+void SqliteTransaction::ClaimWhatIsOpen()
+{
+    begun = db.IsInTransaction();
+    if (!begun) return;
+    db.transaction = this;
+    number = db.CountTransactions();
+}
+
+void SqliteTransaction::Release()
+{
+    begun = false;
+    if (db.transaction == this) db.transaction = nullptr;
 }
 
 }  // namespace OrvaDRCore

@@ -23,6 +23,7 @@
 #ifndef ORVADRCORE_SQLITE_DB_H
 #define ORVADRCORE_SQLITE_DB_H
 
+#include <cstdint>
 #include <memory>
 #include <string>
 #include <vector>
@@ -37,7 +38,8 @@ struct sqlite3;
 
 namespace OrvaDRCore {
 
-class StatementCache;
+struct ConnectionState;
+class SqliteTransaction;
 
 /// A connection to an SQLite file. The head of sqlite_db.h tells what holds for retries, errors,
 /// threads and forks.
@@ -60,10 +62,12 @@ class ORVADRCORE_API SqliteDB {
     SqliteDB(const SqliteDB&) = delete;
     SqliteDB& operator=(const SqliteDB&) = delete;
 
-    /// Takes the connection over, with error code and record; `other` is closed then and still
-    /// names its file.
+    /// Takes the connection over, with error code and record. `other` is closed then, without an
+    /// error, and still names its file.
     /// \param other  the connection to take
     /// \note Copies the file's name: without memory for that the program ends.
+    /// \note A transaction that is open moves along, but not the SqliteTransaction that began it,
+    ///       which has nothing to commit or to roll back any more: end the transaction by Exec().
     SqliteDB(SqliteDB&& other) noexcept;
 
     /// Closes this connection and takes the other over, as the constructor does.
@@ -285,7 +289,7 @@ class ORVADRCORE_API SqliteDB {
     bool DoSelectSqliteRecords(const std::string& command, std::vector<SqliteValueList>& records);
 
   private:
-    friend class SqliteTransaction;  // asks whether one is open; keeps retries out of it
+    friend class SqliteTransaction;  // owns the connection's transaction, see `transaction`
 
     struct Tries;
     struct Operation;
@@ -298,7 +302,9 @@ class ORVADRCORE_API SqliteDB {
     template <class TakeRow>
     bool DoSelect(const std::string& command, TakeRow takeRow);
 
+    ORVADRCORE_LOCAL ConnectionState& State();
     ORVADRCORE_LOCAL bool IsInTransaction() const;
+    ORVADRCORE_LOCAL std::uint64_t CountTransactions() const;
     ORVADRCORE_LOCAL bool InsertRows(const std::string& table,
                                      const std::vector<SqliteValueList>& records, bool replacable);
     template <class Work>
@@ -317,7 +323,11 @@ class ORVADRCORE_API SqliteDB {
     sqlite3* handle = nullptr;
     std::string path;
     unsigned int retryLimit;
-    std::unique_ptr<StatementCache> cache;  // made at the first select
+    std::unique_ptr<ConnectionState> state;  // made when it is needed first
+
+    // The object that began the transaction of this connection last and was not told yet that it
+    // is over. While there is one, nothing is retried.
+    const SqliteTransaction* transaction = nullptr;
 };
 
 }  // namespace OrvaDRCore

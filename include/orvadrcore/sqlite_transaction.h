@@ -13,16 +13,23 @@
 /// rolls back the whole transaction by itself, and a second try would run outside of it. What fails
 /// ends the transaction: do not go on to other operations, roll back.
 ///
+/// **An object commits and rolls back what it began itself and nothing else.** Its transaction may
+/// end without it: SQLite rolls back, the connection is closed, or somebody runs COMMIT or ROLLBACK
+/// as a statement. Another object, or a BEGIN as a statement, may then begin another transaction on
+/// the connection. The first object leaves that alone, and its Commit() says that its own is gone.
+///
 /// The transaction refers to its connection, which must outlive it and must not be moved meanwhile.
 /// Both are used by one thread. Log lines name the file `sqlite_transaction.cpp`.
 ///
 /// \warning Other processes cannot write to the file until the end. Do not fork either, nor read a
 ///          Cache, which forks: see the head of sqlite_db.h.
-/// \warning Give the operations tables without a schema and make the tables beforehand. The look for
-///          a table is a statement, too: where SQLite rolls back at that one, the operation goes on
+/// \warning Give the operations tables without a schema and make the tables beforehand. The table
+///          lookup is a statement, too: where SQLite rolls back at that one, the operation goes on
 ///          outside of the transaction, and Commit() is the first to tell.
 #ifndef ORVADRCORE_SQLITE_TRANSACTION_H
 #define ORVADRCORE_SQLITE_TRANSACTION_H
+
+#include <cstdint>
 
 #include <orvadrcore/export.h>
 #include <orvadrcore/sqlite_db.h>
@@ -40,7 +47,7 @@ class ORVADRCORE_API SqliteTransaction {
     SqliteTransaction(const SqliteTransaction&) = delete;
     SqliteTransaction& operator=(const SqliteTransaction&) = delete;
 
-    /// Rolls back what is still open. The connection's error code and record stay as they are, so
+    /// Rolls back what it began, if that is still open. The connection's error code and record stay as they are, so
     /// that they tell why.
     ~SqliteTransaction();
 
@@ -58,8 +65,8 @@ class ORVADRCORE_API SqliteTransaction {
     /// \return false, with the error code and a line at ERR:
     ///         - 401 and `no transaction to commit in db[%s]` when none was begun, or when it has
     ///           been committed or rolled back already;
-    ///         - 404 and `transaction in db[%s] was rolled back` when SQLite has ended it by itself,
-    ///           or the connection was closed; nothing is run;
+    ///         - 404 and `transaction in db[%s] was rolled back` when it is not open any more, as
+    ///           the head of this file tells; nothing is run;
     ///         - 404 and `Failed to commit transaction in db[%s]`, behind the WARN line of
     ///           SqliteDB::Exec(). Unless SQLite has ended it by that, the transaction is still open
     ///           and can be committed or rolled back
@@ -68,19 +75,21 @@ class ORVADRCORE_API SqliteTransaction {
     /// Rolls back, in a single try. A failure closes the connection, which rolls back, too: the
     /// transaction is over in any case.
     /// \return true when that is done, and when there is nothing to roll back: nothing was begun, or
-    ///         SQLite has ended it by itself. False with 404, an error object and ERR
+    ///         it is not open any more. False with 404, an error object and ERR
     ///         `Failed to roll back transaction in db[%s]`
     /// \note Like any operation it replaces the error code and record: take those that matter before,
     ///       or leave rolling back to the destructor.
     bool Rollback();
 
   private:
+    ORVADRCORE_LOCAL bool IsOpen() const;
     ORVADRCORE_LOCAL bool Exec(const char* statement);
-    ORVADRCORE_LOCAL void SetBegun(bool isBegun);
+    ORVADRCORE_LOCAL void ClaimWhatIsOpen();
+    ORVADRCORE_LOCAL void Release();
 
     SqliteDB& db;
-    bool begun = false;
-    unsigned int retryLimit = 0;  // of the connection, while it is 0 there
+    bool begun = false;        // and not yet told that it is over
+    std::uint64_t number = 0;  // of the transaction, among all that were begun on the connection
 };
 
 }  // namespace OrvaDRCore

@@ -155,14 +155,15 @@ TEST(MemberTest, ConnectionsKeepTheirOrder)
 {
     ExpectInOrder(
         0, {offsetof(SqliteDB, errCode), offsetof(SqliteDB, errRecord), offsetof(SqliteDB, handle),
-            offsetof(SqliteDB, path), offsetof(SqliteDB, retryLimit), offsetof(SqliteDB, cache)});
+            offsetof(SqliteDB, path), offsetof(SqliteDB, retryLimit), offsetof(SqliteDB, state),
+            offsetof(SqliteDB, transaction)});
 }
 
 TEST(MemberTest, TransactionsKeepTheirOrder)
 {
     // The connection is a reference, which has no offset.
     ExpectInOrder(sizeof(void*),
-                  {offsetof(SqliteTransaction, begun), offsetof(SqliteTransaction, retryLimit)});
+                  {offsetof(SqliteTransaction, begun), offsetof(SqliteTransaction, number)});
 }
 
 TEST(MemberTest, LocksAndCachesKeepTheirOrder)

@@ -187,6 +187,7 @@ TEST_F(SqliteDbTest, AMovedFromObjectIsClosedAndNamesItsFileStill)
     assigned = std::move(taken);
     // That they can be used is what this is about. NOLINTBEGIN(bugprone-use-after-move)
     for (SqliteDB* moved : {&db, &taken}) {
+        ExpectErr(*moved, 0);
         EXPECT_FALSE(moved->Exec("SELECT 1"));
         ExpectErr(*moved, 403);
         ExpectLines({Err("Exec", "DB[" + path + "] is not opened")});
@@ -196,6 +197,20 @@ TEST_F(SqliteDbTest, AMovedFromObjectIsClosedAndNamesItsFileStill)
     }
     // NOLINTEND(bugprone-use-after-move)
     EXPECT_EQ(Run("SELECT name FROM sqlite_master"), "jobs");
+}
+
+TEST_F(SqliteDbTest, AMoveLeavesNoErrorBehind)
+{
+    const std::string record = R"({"sqlite_errmsg":"why"})";
+    db.SetDBErr("", 0, "why");
+    SqliteDB built(std::move(db));
+    ExpectErr(built, 404, record);
+    ExpectErr(db, 0);  // NOLINT(bugprone-use-after-move)
+    SqliteDB assigned(path, 0);
+    assigned.SetDBErr("", 0, "earlier");
+    assigned = std::move(built);
+    ExpectErr(assigned, 404, record);
+    ExpectErr(built, 0);  // NOLINT(bugprone-use-after-move)
 }
 
 TEST_F(SqliteDbTest, AMoveAssignmentClosesWhatWasOpen)

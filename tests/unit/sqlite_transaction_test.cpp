@@ -1,5 +1,9 @@
 #include <orvadrcore/sqlite_transaction.h>
 
+#include <functional>
+#include <memory>
+#include <utility>
+
 #include "support/sqlite_fixture.h"
 
 namespace {
@@ -31,6 +35,21 @@ class SqliteTransactionTest : public SqliteFixture {
 
     std::string Ids() const { return Run("SELECT id FROM jobs"); }
 
+    // Has SQLite roll back what is open on the connection, at a row that is there already.
+    void HaveSqliteRollBack(SqliteDB& connection)
+    {
+        EXPECT_FALSE(connection.InsertRecord(Insert(7)));
+        EXPECT_EQ(TakeLines().size(), 2U);
+    }
+
+    // How often a statement that fails is tried.
+    static std::size_t CountTries(SqliteDB& connection)
+    {
+        EXPECT_FALSE(connection.Exec("BAD"));
+        EXPECT_EQ(TakeLines().size(), 1U);
+        return connection.GetErr().size();
+    }
+
     // A row that makes SQLite roll back whatever is open.
     void MakeConflictsRollBack() const
     {
@@ -44,6 +63,7 @@ class SqliteTransactionTest : public SqliteFixture {
     const LogLine duplicateFailed =
         Err("InsertRecord", "Failed to exec [" + duplicate.command + "] in db[" + path + "]");
     const LogLine alreadyOpen = Told("Begin", "transaction is already open in db[" + path + "]");
+    const LogLine wasRolledBack = Told("Commit", "transaction in db[" + path + "] was rolled back");
 };
 
 // ------------------------------------------------------------------------------------- all or none
@@ -226,7 +246,7 @@ TEST_F(SqliteTransactionTest, NoOperationGoesOnOutsideOfATransactionThatSqliteHa
     EXPECT_EQ(Ids(), "7");
     EXPECT_FALSE(transaction.Commit());
     ExpectErr(retrying, 404);
-    ExpectLines({Told("Commit", "transaction in db[" + path + "] was rolled back")});
+    ExpectLines({wasRolledBack});
     ExpectPauses(0);
     EXPECT_EQ(Ids(), "7");
 }
@@ -339,7 +359,7 @@ TEST_F(SqliteTransactionTest, AConnectionThatIsClosedMeanwhileHasRolledBack)
     db.Close();
     EXPECT_FALSE(transaction.Commit());
     ExpectErr(db, 404);
-    ExpectLines({Told("Commit", "transaction in db[" + path + "] was rolled back")});
+    ExpectLines({wasRolledBack});
     EXPECT_EQ(Ids(), "");
 }
 
@@ -369,6 +389,158 @@ TEST_F(SqliteTransactionTest, WhatCannotBeRolledBackEndsWithTheConnection)
     ExpectLines({failed});
     EXPECT_EQ(Closed(), 2);
     EXPECT_EQ(Ids(), "");
+}
+
+// ------------------------------------------------------------------------------------------- owner
+
+TEST_F(SqliteTransactionTest, ASecondObjectThatBeginsAfterSqlitesRollbackOwnsTheTransactionAlone)
+{
+    MakeConflictsRollBack();
+    SqliteTransaction second(retrying);
+    {
+        SqliteTransaction first(retrying);
+        ASSERT_TRUE(first.Begin());
+        HaveSqliteRollBack(retrying);
+        ASSERT_TRUE(second.Begin() && retrying.InsertRecord(Insert(1)));
+        EXPECT_TRUE(first.Rollback());  // it has none
+        ExpectErr(retrying, 0);
+        EXPECT_EQ(CountTries(retrying), 1U);
+        EXPECT_FALSE(first.Begin());
+        ExpectLines({alreadyOpen});
+    }
+    EXPECT_EQ(CountTries(retrying), 1U);
+    EXPECT_TRUE(second.Commit());
+    EXPECT_EQ(CountTries(retrying), 4U);
+    EXPECT_EQ(Ids(), "1;7");
+}
+
+TEST_F(SqliteTransactionTest, TheFirstOfTwoObjectsLearnsAtItsCommitThatSqliteRolledBack)
+{
+    MakeConflictsRollBack();
+    SqliteTransaction first(retrying);
+    ASSERT_TRUE(first.Begin());
+    HaveSqliteRollBack(retrying);
+    {
+        SqliteTransaction second(retrying);
+        ASSERT_TRUE(second.Begin() && retrying.InsertRecord(Insert(1)));
+        EXPECT_FALSE(first.Commit());
+        ExpectErr(retrying, 404);
+        EXPECT_FALSE(first.Commit());
+        ExpectErr(retrying, 401);
+        ExpectLines(
+            {wasRolledBack, Told("Commit", "no transaction to commit in db[" + path + "]")});
+        EXPECT_EQ(CountTries(retrying), 1U);
+    }
+    EXPECT_EQ(CountTries(retrying), 4U);
+    EXPECT_EQ(Ids(), "7");  // the second one's was rolled back, by the second one
+}
+
+TEST_F(SqliteTransactionTest, TheFirstOfTwoObjectsLeavesTheSecondOnesTransactionAloneWhenItGoes)
+{
+    MakeConflictsRollBack();
+    auto first = std::make_unique<SqliteTransaction>(retrying);
+    ASSERT_TRUE(first->Begin());
+    HaveSqliteRollBack(retrying);
+    SqliteTransaction second(retrying);
+    ASSERT_TRUE(second.Begin() && retrying.InsertRecord(Insert(1)));
+    first.reset();
+    EXPECT_EQ(CountTries(retrying), 1U);
+    EXPECT_TRUE(second.Commit());
+    EXPECT_EQ(CountTries(retrying), 4U);
+    EXPECT_EQ(Ids(), "1;7");
+}
+
+TEST_F(SqliteTransactionTest, ATransactionThatTheCallerBeganAfterTheOwnersIsTheCallers)
+{
+    MakeConflictsRollBack();
+    const std::vector<std::function<void()>> ways{
+        [this] {
+            HaveSqliteRollBack(db);
+            EXPECT_TRUE(db.Exec("BEGIN"));
+        },
+        [this] {
+            HaveSqliteRollBack(db);
+            EXPECT_TRUE(db.Exec("SAVEPOINT mine"));
+        },
+        [this] {
+            HaveSqliteRollBack(db);
+            SqliteValueList none;
+            EXPECT_TRUE(db.SelectByCommand("BEGIN", none));
+        },
+        [this] { EXPECT_TRUE(db.Exec("COMMIT; BEGIN")); },
+        [this] { EXPECT_TRUE(db.Exec("ROLLBACK; SELECT 1; BEGIN IMMEDIATE")); },
+        [this] {
+            db.Close();
+            EXPECT_TRUE(db.Open() && db.Exec("BEGIN"));
+        },
+    };
+    for (const auto& endAndBegin : ways) {
+        {
+            SqliteTransaction left(db);
+            ASSERT_TRUE(left.Begin());
+            endAndBegin();
+            EXPECT_TRUE(db.InsertRecord(Insert(1)));
+        }
+        EXPECT_TRUE(db.InsertRecord(Insert(2)) && db.Exec("COMMIT"));
+
+        SqliteTransaction ended(db);
+        ASSERT_TRUE(ended.Begin());
+        endAndBegin();
+        EXPECT_TRUE(db.InsertRecord(Insert(3)) && ended.Rollback());
+        EXPECT_TRUE(db.InsertRecord(Insert(4)) && db.Exec("COMMIT"));
+
+        ASSERT_TRUE(ended.Begin());
+        endAndBegin();
+        EXPECT_TRUE(db.InsertRecord(Insert(5)));
+        EXPECT_FALSE(ended.Commit());
+        ExpectErr(db, 404);
+        ExpectLines({wasRolledBack});
+        EXPECT_TRUE(db.InsertRecord(Insert(6)) && db.Exec("COMMIT"));
+        EXPECT_EQ(Ids(), "1;2;3;4;5;6;7");
+        Run("DELETE FROM jobs WHERE id < 7");
+    }
+}
+
+TEST_F(SqliteTransactionTest, WhatHappensInsideATransactionLeavesItToItsOwner)
+{
+    SqliteTransaction transaction(db);
+    ASSERT_TRUE(transaction.Begin() && db.InsertRecord(Insert(1)));
+    EXPECT_TRUE(db.Exec("SAVEPOINT part"));
+    EXPECT_TRUE(db.InsertRecord(Insert(2)) && db.Exec("ROLLBACK TO part; RELEASE part"));
+    EXPECT_FALSE(db.Exec("BEGIN"));
+    EXPECT_EQ(TakeLines().size(), 1U);
+    EXPECT_TRUE(transaction.Commit());
+    EXPECT_EQ(Ids(), "1");
+    ASSERT_TRUE(transaction.Begin() && db.InsertRecord(Insert(3)));
+    EXPECT_FALSE(db.Exec("BEGIN"));
+    EXPECT_EQ(TakeLines().size(), 1U);
+    EXPECT_TRUE(transaction.Rollback());
+    EXPECT_EQ(Ids(), "1");
+}
+
+TEST_F(SqliteTransactionTest, AMoveOfTheConnectionPartsATransactionFromItsObject)
+{
+    SqliteDB target(path, 2);
+    SqliteTransaction ofTarget(target);
+    ASSERT_TRUE(ofTarget.Begin() && target.InsertRecord(Insert(5)));
+    target.Close();
+    {
+        SqliteTransaction moved(retrying);
+        ASSERT_TRUE(moved.Begin() && retrying.InsertRecord(Insert(1)));
+        SqliteDB between(std::move(retrying));
+        target = std::move(between);
+        // That it can be used is what this is about.
+        EXPECT_TRUE(retrying.Open());  // NOLINT(bugprone-use-after-move)
+        EXPECT_EQ(CountTries(retrying), 4U);
+        EXPECT_TRUE(retrying.Exec("BEGIN"));
+        EXPECT_FALSE(moved.Commit());
+        EXPECT_FALSE(ofTarget.Commit());
+        ExpectLines({wasRolledBack, wasRolledBack});
+    }
+    EXPECT_TRUE(retrying.Exec("COMMIT"));
+    EXPECT_EQ(CountTries(target), 4U);  // the limit has moved along
+    EXPECT_TRUE(target.InsertRecord(Insert(2)) && target.Exec("COMMIT"));
+    EXPECT_EQ(Ids(), "1;2");
 }
 
 }  // namespace
