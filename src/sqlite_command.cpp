@@ -106,8 +106,26 @@ void InsertCommand::SetReplacable(bool allowed)
     replacable = allowed;
 }
 
-template <class T>
-bool InsertCommand::AddFieldValue(const std::string& field, const T& value)
+template <>
+bool InsertCommand::AddFieldValue(const std::string& field, const std::string& value)
+{
+    return OrvaDRCore::AddFieldValue(fieldValues, field, value);
+}
+
+template <>
+bool InsertCommand::AddFieldValue(const std::string& field, const bool& value)
+{
+    return OrvaDRCore::AddFieldValue(fieldValues, field, value);
+}
+
+template <>
+bool InsertCommand::AddFieldValue(const std::string& field, const int& value)
+{
+    return OrvaDRCore::AddFieldValue(fieldValues, field, value);
+}
+
+template <>
+bool InsertCommand::AddFieldValue(const std::string& field, const unsigned int& value)
 {
     return OrvaDRCore::AddFieldValue(fieldValues, field, value);
 }
@@ -157,8 +175,26 @@ void UpdateCommand::SetFieldValues(const SqliteValueList& values)
     fieldValues = values;
 }
 
-template <class T>
-bool UpdateCommand::AddFieldValue(const std::string& field, const T& value)
+template <>
+bool UpdateCommand::AddFieldValue(const std::string& field, const std::string& value)
+{
+    return OrvaDRCore::AddFieldValue(fieldValues, field, value);
+}
+
+template <>
+bool UpdateCommand::AddFieldValue(const std::string& field, const bool& value)
+{
+    return OrvaDRCore::AddFieldValue(fieldValues, field, value);
+}
+
+template <>
+bool UpdateCommand::AddFieldValue(const std::string& field, const int& value)
+{
+    return OrvaDRCore::AddFieldValue(fieldValues, field, value);
+}
+
+template <>
+bool UpdateCommand::AddFieldValue(const std::string& field, const unsigned int& value)
 {
     return OrvaDRCore::AddFieldValue(fieldValues, field, value);
 }
@@ -264,14 +300,5 @@ void SelectCommand::DumpParam(std::stringstream& out) const
     Write(out, "condition:[" + condition + "]/fields:[" +
                    (selectAll ? "all" : Container::ToString(fields, ", ")) + "]");
 }
-
-template bool InsertCommand::AddFieldValue(const std::string&, const std::string&);
-template bool InsertCommand::AddFieldValue(const std::string&, const bool&);
-template bool InsertCommand::AddFieldValue(const std::string&, const int&);
-template bool InsertCommand::AddFieldValue(const std::string&, const unsigned int&);
-template bool UpdateCommand::AddFieldValue(const std::string&, const std::string&);
-template bool UpdateCommand::AddFieldValue(const std::string&, const bool&);
-template bool UpdateCommand::AddFieldValue(const std::string&, const int&);
-template bool UpdateCommand::AddFieldValue(const std::string&, const unsigned int&);
 
 }  // namespace OrvaDRCore

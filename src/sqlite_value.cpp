@@ -165,25 +165,45 @@ const SqliteValue& SqliteValueList::GetValue(const std::string& field) const
 }
 
 template <class T>
-bool SqliteValueList::GetValue(const std::string& field, T& out) const
+bool SqliteValueList::ReadField(const std::string& field, T& out) const
 {
+    constexpr const char* Function = "GetValue";
     if (field.empty()) {
-        DR_LOG(Err, "Invalid field [%s]", field.c_str());
+        DR_LOG_AS(Function, Err, "Invalid field [%s]", field.c_str());
         return false;
     }
     const auto entry = values.find(field);
     if (entry == values.end()) {
-        // A lower level than in the other GetValue, on purpose: asking this way is a test, too.
-        DR_LOG(Debug, "field [%s] is not existed", field.c_str());
+        // A lower level than in the other GetValue, because asking this way is a test, too.
+        DR_LOG_AS(Function, Debug, "field [%s] is not existed", field.c_str());
         return false;
     }
     return entry->second.GetValue(out);
 }
 
-template bool SqliteValueList::GetValue(const std::string&, std::string&) const;
-template bool SqliteValueList::GetValue(const std::string&, bool&) const;
-template bool SqliteValueList::GetValue(const std::string&, int&) const;
-template bool SqliteValueList::GetValue(const std::string&, unsigned int&) const;
+template <>
+bool SqliteValueList::GetValue(const std::string& field, std::string& out) const
+{
+    return ReadField(field, out);
+}
+
+template <>
+bool SqliteValueList::GetValue(const std::string& field, unsigned int& out) const
+{
+    return ReadField(field, out);
+}
+
+template <>
+bool SqliteValueList::GetValue(const std::string& field, int& out) const
+{
+    return ReadField(field, out);
+}
+
+template <>
+bool SqliteValueList::GetValue(const std::string& field, bool& out) const
+{
+    return ReadField(field, out);
+}
 
 std::string SqliteValueList::ToStr() const
 {

@@ -50,6 +50,26 @@ void Append(std::string& text, double element)
     text += std::isfinite(low) ? static_cast<char>(static_cast<unsigned char>(low)) : '\0';
 }
 
+template <class T>
+Json::Value ToArray(const std::vector<T>& values)
+{
+    Json::Value array(Json::arrayValue);
+    for (const auto& value : values) array.append(Json::Value(value));
+    return array;
+}
+
+template <class T>
+std::string Join(const std::vector<T>& values, const std::string& separator)
+{
+    std::string text;
+    for (const auto& value : values) {
+        // The text decides, not the position: the contract has empty elements at the beginning vanish.
+        if (!text.empty()) text += separator;
+        Append(text, value);
+    }
+    return text;
+}
+
 }  // namespace
 
 std::string GenerateUUID()
@@ -81,34 +101,54 @@ bool RandomSleepInMSec(unsigned int min, unsigned int max)
     return true;
 }
 
-template <class T>
-Json::Value Container::ToJsonArray(const std::vector<T>& values)
+template <>
+Json::Value Container::ToJsonArray(const std::vector<std::string>& values)
 {
-    Json::Value array(Json::arrayValue);
-    for (const auto& value : values) array.append(Json::Value(value));
-    return array;
+    return ToArray(values);
 }
 
-template <class T>
-std::string Container::ToString(const std::vector<T>& values, const std::string& separator)
+template <>
+Json::Value Container::ToJsonArray(const std::vector<int>& values)
 {
-    std::string text;
-    for (const auto& value : values) {
-        // The text is asked, not the position: empty elements at the beginning vanish, on purpose.
-        if (!text.empty()) text += separator;
-        Append(text, value);
-    }
-    return text;
+    return ToArray(values);
 }
 
-template Json::Value Container::ToJsonArray(const std::vector<std::string>&);
-template Json::Value Container::ToJsonArray(const std::vector<int>&);
-template Json::Value Container::ToJsonArray(const std::vector<bool>&);
-template Json::Value Container::ToJsonArray(const std::vector<double>&);
-template std::string Container::ToString(const std::vector<std::string>&, const std::string&);
-template std::string Container::ToString(const std::vector<int>&, const std::string&);
-template std::string Container::ToString(const std::vector<bool>&, const std::string&);
-template std::string Container::ToString(const std::vector<double>&, const std::string&);
+template <>
+Json::Value Container::ToJsonArray(const std::vector<bool>& values)
+{
+    return ToArray(values);
+}
+
+template <>
+Json::Value Container::ToJsonArray(const std::vector<double>& values)
+{
+    return ToArray(values);
+}
+
+template <>
+std::string Container::ToString(const std::vector<std::string>& values,
+                                const std::string& separator)
+{
+    return Join(values, separator);
+}
+
+template <>
+std::string Container::ToString(const std::vector<int>& values, const std::string& separator)
+{
+    return Join(values, separator);
+}
+
+template <>
+std::string Container::ToString(const std::vector<bool>& values, const std::string& separator)
+{
+    return Join(values, separator);
+}
+
+template <>
+std::string Container::ToString(const std::vector<double>& values, const std::string& separator)
+{
+    return Join(values, separator);
+}
 
 bool Validator::IsVolPath(const std::string& path)
 {

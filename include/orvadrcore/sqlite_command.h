@@ -124,7 +124,8 @@ class ORVADRCORE_API InsertCommand : public SqliteCommand {
     /// \return false when `field` is empty, with ERR `Bad Field [%s] /value[%s]`; the columns are
     ///         unchanged then
     template <class T>
-    bool AddFieldValue(const std::string& field, const T& value);
+    bool AddFieldValue(  // T: std::string, bool, int or unsigned int
+        const std::string& field, const T& value) = delete;
 
     /// As above, for a text.
     /// \param field  the column's name
@@ -180,7 +181,8 @@ class ORVADRCORE_API UpdateCommand : public SqliteCommand {
     /// \param value  its new value; a text is quoted but not escaped
     /// \return false as InsertCommand::AddFieldValue(), with the same line
     template <class T>
-    bool AddFieldValue(const std::string& field, const T& value);
+    bool AddFieldValue(  // T: std::string, bool, int or unsigned int
+        const std::string& field, const T& value) = delete;
 
     /// As above, for a text.
     /// \param field  the column's name
@@ -272,15 +274,27 @@ class ORVADRCORE_API SelectCommand : public SqliteCommand {
     std::string condition;
 };
 
-/// \cond INSTANTIATIONS
-extern template bool InsertCommand::AddFieldValue(const std::string&, const std::string&);
-extern template bool InsertCommand::AddFieldValue(const std::string&, const bool&);
-extern template bool InsertCommand::AddFieldValue(const std::string&, const int&);
-extern template bool InsertCommand::AddFieldValue(const std::string&, const unsigned int&);
-extern template bool UpdateCommand::AddFieldValue(const std::string&, const std::string&);
-extern template bool UpdateCommand::AddFieldValue(const std::string&, const bool&);
-extern template bool UpdateCommand::AddFieldValue(const std::string&, const int&);
-extern template bool UpdateCommand::AddFieldValue(const std::string&, const unsigned int&);
+/// \cond SPECIALISATIONS
+template <>
+ORVADRCORE_API bool InsertCommand::AddFieldValue<std::string>(const std::string& field,
+                                                              const std::string& value);
+template <>
+ORVADRCORE_API bool InsertCommand::AddFieldValue<bool>(const std::string& field, const bool& value);
+template <>
+ORVADRCORE_API bool InsertCommand::AddFieldValue<int>(const std::string& field, const int& value);
+template <>
+ORVADRCORE_API bool InsertCommand::AddFieldValue<unsigned int>(const std::string& field,
+                                                               const unsigned int& value);
+template <>
+ORVADRCORE_API bool UpdateCommand::AddFieldValue<std::string>(const std::string& field,
+                                                              const std::string& value);
+template <>
+ORVADRCORE_API bool UpdateCommand::AddFieldValue<bool>(const std::string& field, const bool& value);
+template <>
+ORVADRCORE_API bool UpdateCommand::AddFieldValue<int>(const std::string& field, const int& value);
+template <>
+ORVADRCORE_API bool UpdateCommand::AddFieldValue<unsigned int>(const std::string& field,
+                                                               const unsigned int& value);
 /// \endcond
 
 }  // namespace OrvaDRCore

@@ -19,6 +19,7 @@
 #include <cstddef>
 #include <map>
 #include <string>
+#include <type_traits>
 #include <vector>
 
 #include <json/value.h>
@@ -55,6 +56,12 @@ class ORVADRCORE_API SqliteValue {
 
     SqliteValue(std::nullptr_t) = delete;
 
+    // Any other pointer would become a boolean that is true.
+    template <class T, class = std::enable_if_t<!std::is_same_v<std::remove_const_t<T>, char>>>
+    SqliteValue(T* pointer) = delete;  // of all pointers, char* and const char* alone are texts
+    template <class T, class Class>
+    SqliteValue(T Class::*pointer) = delete;  // a pointer to a member is no value
+
     SqliteValue(const SqliteValue&) = default;      ///< A copy, as valid as the other.
     SqliteValue(SqliteValue&&) noexcept = default;  ///< Takes the value; the other is empty then.
     ~SqliteValue() = default;
@@ -82,7 +89,7 @@ class ORVADRCORE_API SqliteValue {
     ///         `[%s] is not int` (both integer types) or `[%s] is not bool`, filled with the value
     ///         as JSON; the line's function is `GetValue<int>` and the like
     template <class T>
-    bool GetValue(T& out) const = delete;
+    bool GetValue(T& out) const = delete;  // T: std::string, unsigned int, int or bool
 
     /// The value as an SQL literal.
     /// \return a text between single quotes, a number in decimals, a boolean as 1 or 0; empty when
@@ -182,7 +189,8 @@ class ORVADRCORE_API SqliteValueList {
     ///         DEBUG `field [%s] is not existed`; for a value of another kind, with the line of
     ///         SqliteValue::GetValue()
     template <class T>
-    bool GetValue(const std::string& field, T& out) const;
+    bool GetValue(  // T: std::string, unsigned int, int or bool
+        const std::string& field, T& out) const = delete;
 
     /// All fields, for walking over a record whose columns are not known beforehand.
     /// \return values by name; a reference that is good until the record goes
@@ -195,16 +203,25 @@ class ORVADRCORE_API SqliteValueList {
   private:
     friend struct SqliteInternals;  // fills records with rows
 
+    template <class T>
+    ORVADRCORE_LOCAL bool ReadField(const std::string& field, T& out) const;
+
     // Behind the reference that is given out for what is not there; never changes.
     SqliteValue invalidValue;
     std::map<std::string, SqliteValue> values;
 };
 
-/// \cond INSTANTIATIONS
-extern template bool SqliteValueList::GetValue(const std::string&, std::string&) const;
-extern template bool SqliteValueList::GetValue(const std::string&, bool&) const;
-extern template bool SqliteValueList::GetValue(const std::string&, int&) const;
-extern template bool SqliteValueList::GetValue(const std::string&, unsigned int&) const;
+/// \cond SPECIALISATIONS
+template <>
+ORVADRCORE_API bool SqliteValueList::GetValue<std::string>(const std::string& field,
+                                                           std::string& out) const;
+template <>
+ORVADRCORE_API bool SqliteValueList::GetValue<unsigned int>(const std::string& field,
+                                                            unsigned int& out) const;
+template <>
+ORVADRCORE_API bool SqliteValueList::GetValue<int>(const std::string& field, int& out) const;
+template <>
+ORVADRCORE_API bool SqliteValueList::GetValue<bool>(const std::string& field, bool& out) const;
 /// \endcond
 
 /// Base of a program's own record types, which turn themselves into a SqliteValueList.

@@ -48,7 +48,8 @@ class ORVADRCORE_API Container {
     /// \param values  the elements
     /// \return the array; an empty array, not null, for an empty vector
     template <class T>
-    static Json::Value ToJsonArray(const std::vector<T>& values);
+    static Json::Value ToJsonArray(  // T: std::string, int, bool or double
+        const std::vector<T>& values) = delete;
 
     /// The elements one after the other, with `separator` between them.
     /// \tparam T         the type of the elements
@@ -62,19 +63,31 @@ class ORVADRCORE_API Container {
     /// \note No separator follows as long as the result is empty, so empty texts at the beginning
     ///       vanish: "" and "b" give "b". Later ones keep their separator.
     template <class T>
-    static std::string ToString(const std::vector<T>& values, const std::string& separator);
+    static std::string ToString(  // T: std::string, int, bool or double
+        const std::vector<T>& values, const std::string& separator) = delete;
 };
 
-/// \cond INSTANTIATIONS
-extern template Json::Value Container::ToJsonArray(const std::vector<std::string>&);
-extern template Json::Value Container::ToJsonArray(const std::vector<int>&);
-extern template Json::Value Container::ToJsonArray(const std::vector<bool>&);
-extern template Json::Value Container::ToJsonArray(const std::vector<double>&);
-extern template std::string Container::ToString(const std::vector<std::string>&,
-                                                const std::string&);
-extern template std::string Container::ToString(const std::vector<int>&, const std::string&);
-extern template std::string Container::ToString(const std::vector<bool>&, const std::string&);
-extern template std::string Container::ToString(const std::vector<double>&, const std::string&);
+/// \cond SPECIALISATIONS
+template <>
+ORVADRCORE_API Json::Value Container::ToJsonArray(const std::vector<std::string>& values);
+template <>
+ORVADRCORE_API Json::Value Container::ToJsonArray(const std::vector<int>& values);
+template <>
+ORVADRCORE_API Json::Value Container::ToJsonArray(const std::vector<bool>& values);
+template <>
+ORVADRCORE_API Json::Value Container::ToJsonArray(const std::vector<double>& values);
+template <>
+ORVADRCORE_API std::string Container::ToString(const std::vector<std::string>& values,
+                                               const std::string& separator);
+template <>
+ORVADRCORE_API std::string Container::ToString(const std::vector<int>& values,
+                                               const std::string& separator);
+template <>
+ORVADRCORE_API std::string Container::ToString(const std::vector<bool>& values,
+                                               const std::string& separator);
+template <>
+ORVADRCORE_API std::string Container::ToString(const std::vector<double>& values,
+                                               const std::string& separator);
 /// \endcond
 
 /// Tests of texts.

@@ -62,6 +62,34 @@ static_assert(!std::is_constructible_v<SqliteValue, long>);
 static_assert(!std::is_constructible_v<SqliteValue, unsigned long>);
 static_assert(!std::is_constructible_v<SqliteValue, double>);
 
+// Pointers that would become the boolean true.
+static_assert(!std::is_constructible_v<SqliteValue, const unsigned char*>);
+static_assert(!std::is_constructible_v<SqliteValue, unsigned char (&)[4]>);
+static_assert(!std::is_constructible_v<SqliteValue, const signed char*>);
+static_assert(!std::is_constructible_v<SqliteValue, const wchar_t*>);
+static_assert(!std::is_constructible_v<SqliteValue, volatile char*>);
+static_assert(!std::is_constructible_v<SqliteValue, const volatile char*>);
+static_assert(!std::is_constructible_v<SqliteValue, void*>);
+static_assert(!std::is_constructible_v<SqliteValue, const void*>);
+static_assert(!std::is_constructible_v<SqliteValue, int*>);
+static_assert(!std::is_constructible_v<SqliteValue, int (&)[4]>);
+static_assert(!std::is_constructible_v<SqliteValue, bool*>);
+static_assert(!std::is_constructible_v<SqliteValue, const char**>);
+static_assert(!std::is_constructible_v<SqliteValue, const string*>);
+static_assert(!std::is_constructible_v<SqliteValue, const SqliteValue*>);
+static_assert(!std::is_constructible_v<SqliteValue, void (*)()>);
+static_assert(!std::is_constructible_v<SqliteValue, void (&)()>);
+static_assert(!std::is_constructible_v<SqliteValue, int std::pair<int, int>::*>);
+static_assert(!std::is_constructible_v<SqliteValue, bool (SqliteValue::*)() const>);
+// What still is a value: texts of every kind, numbers, and what stands for a boolean.
+static_assert(std::is_convertible_v<char*, SqliteValue>);
+static_assert(std::is_convertible_v<char* const, SqliteValue>);
+static_assert(std::is_convertible_v<const char (&)[4], SqliteValue>);
+static_assert(std::is_convertible_v<char (&)[4], SqliteValue>);
+static_assert(std::is_convertible_v<string&, SqliteValue>);
+static_assert(std::is_constructible_v<SqliteValue, std::vector<bool>::reference>);
+static_assert(std::is_convertible_v<const bool&, SqliteValue>);
+
 static_assert(Has<bool (SqliteValue::*)() const>(&SqliteValue::IsValid));
 static_assert(Has<string (SqliteValue::*)() const>(&SqliteValue::ToFormatedValue));
 static_assert(Has<bool (SqliteValue::*)(string&) const>(&SqliteValue::GetValue<string>));
@@ -90,6 +118,16 @@ static_assert(
     Has<bool (SqliteValueList::*)(const string&, unsigned int&) const>(&SqliteValueList::GetValue));
 static_assert(Has<SqliteValueList& (SqliteValueList::*)(const SqliteValueList&)>(
     &SqliteValueList::operator+=));
+// Other types are refused by the compiler, not by the linker.
+template <class T, class = void>
+constexpr bool HasFieldOf = false;
+template <class T>
+constexpr bool HasFieldOf<T, std::void_t<decltype(std::declval<const SqliteValueList&>().GetValue(
+                                 std::declval<string>(), std::declval<T&>()))>> = true;
+static_assert(HasFieldOf<string> && HasFieldOf<bool> && HasFieldOf<int> &&
+              HasFieldOf<unsigned int>);
+static_assert(!HasFieldOf<long> && !HasFieldOf<unsigned long> && !HasFieldOf<double> &&
+              !HasFieldOf<char> && !HasFieldOf<const char*> && !HasFieldOf<SqliteValue>);
 static_assert(Has<string (SqliteValueList::*)() const>(&SqliteValueList::ToStr));
 
 static_assert(std::is_abstract_v<SqliteRecord>);
@@ -131,12 +169,27 @@ constexpr bool TakesValues =
     Has<bool (T::*)(const string&, const unsigned int&)>(
         &T::template AddFieldValue<unsigned int>) &&
     Has<bool (T::*)(const string&, const char*)>(&T::AddFieldValue);
+template <class Command, class T, class = void>
+constexpr bool TakesValuesOf = false;
+template <class Command, class T>
+constexpr bool TakesValuesOf<Command, T,
+                             std::void_t<decltype(std::declval<Command&>().AddFieldValue(
+                                 std::declval<string>(), std::declval<T>()))>> = true;
+template <class Command>
+constexpr bool TakesNothingElse =
+    TakesValuesOf<Command, string>&& TakesValuesOf<Command, const char*>&& TakesValuesOf<
+        Command, char*>&& TakesValuesOf<Command, const char (&)[4]>&& TakesValuesOf<Command, int>&&
+        TakesValuesOf<Command, unsigned int>&& TakesValuesOf<Command, bool> &&
+    !TakesValuesOf<Command, long> && !TakesValuesOf<Command, unsigned long> &&
+    !TakesValuesOf<Command, double> && !TakesValuesOf<Command, const unsigned char*> &&
+    !TakesValuesOf<Command, void*> && !TakesValuesOf<Command, int*>;
 template <class T>
 constexpr bool TakesACondition = Has<bool (T::*)(const string&)>(&T::SetCondition) &&
                                  Has<bool (T::*)(const SqliteCondition&)>(&T::SetCondition);
 
 static_assert(IsBuilder<InsertCommand> && TakesValues<InsertCommand>);
 static_assert(IsBuilder<UpdateCommand> && TakesValues<UpdateCommand>);
+static_assert(TakesNothingElse<InsertCommand> && TakesNothingElse<UpdateCommand>);
 static_assert(IsBuilder<SelectCommand>);
 static_assert(TakesACondition<UpdateCommand> && TakesACondition<SelectCommand>);
 static_assert(Has<void (InsertCommand::*)(bool)>(&InsertCommand::SetReplacable));
@@ -297,6 +350,20 @@ constexpr bool IsJoined =
     Has<Json::Value (*)(const std::vector<T>&)>(&Container::ToJsonArray<T>) &&
     Has<string (*)(const std::vector<T>&, const string&)>(&Container::ToString<T>);
 static_assert(IsJoined<string> && IsJoined<int> && IsJoined<bool> && IsJoined<double>);
+template <class T, class = void>
+constexpr bool CanBeAnArray = false;
+template <class T>
+constexpr bool
+    CanBeAnArray<T, std::void_t<decltype(Container::ToJsonArray(std::declval<std::vector<T>>()))>> =
+        true;
+template <class T, class = void>
+constexpr bool CanBeJoined = false;
+template <class T>
+constexpr bool CanBeJoined<
+    T, std::void_t<decltype(Container::ToString(std::declval<std::vector<T>>(), string()))>> = true;
+static_assert(CanBeAnArray<string> && CanBeJoined<string>);
+static_assert(!CanBeAnArray<long> && !CanBeAnArray<const char*> && !CanBeAnArray<SqliteValue>);
+static_assert(!CanBeJoined<long> && !CanBeJoined<const char*> && !CanBeJoined<unsigned int>);
 
 // ------------------------------------------------------------- which overload a literal comes to
 
@@ -327,6 +394,16 @@ TEST(ApiTest, AStringLiteralIsATextAndNeverABoolean)
     Request request;
     EXPECT_TRUE(request.addParam("name", "abc"));
     EXPECT_EQ(request.getParams()["name"].asString(), "abc");
+}
+
+TEST(ApiTest, AnElementOfAVectorOfBooleansIsABoolean)
+{
+    std::vector<bool> flags{true, false};
+    EXPECT_EQ(SqliteValue(flags[0]).ToFormatedValue(), "1");
+    EXPECT_EQ(SqliteValue(flags[1]).ToFormatedValue(), "0");
+    bool flag = false;
+    EXPECT_TRUE(SqliteValue(flags[0]).GetValue(flag));
+    EXPECT_TRUE(flag);
 }
 
 TEST(ApiTest, ABufferIsATextToo)
