@@ -143,8 +143,27 @@ bool Holds(const Json::Value& value, int levels, Reals reals)
 
 }  // namespace
 
+// jsoncpp keeps a text behind its length, both in memory whose size must be a positive int.
+bool FitsJsonText(std::size_t length)
+{
+    return length <= static_cast<std::size_t>(Json::Value::maxInt) - sizeof(unsigned int) - 1;
+}
+
+// jsoncpp keeps the length of a name in 30 bits.
+bool FitsJsonName(std::size_t length)
+{
+    return length < std::size_t{1} << 30U;
+}
+
+Json::Value ToJsonText(std::string_view text)
+{
+    if (!FitsJsonText(text.size())) return {};
+    return {text.data(), text.data() + text.size()};
+}
+
 bool fromString(Json::Value& value, const std::string& text)
 {
+    if (!FitsJsonText(text.size())) return false;
     // The reader takes a zero byte for the end of the text and would pass over what follows it. No
     // JSON document holds one: in strings it is written \u0000.
     if (text.find('\0') != std::string::npos) return false;
@@ -185,7 +204,8 @@ bool toFile(const Json::Value& value, const std::string& path)
 const Json::Value* FindMember(const Json::Value& object, const char* key)
 {
     if (key == nullptr || !object.isObject()) return nullptr;
-    return object.find(key, key + std::strlen(key));
+    const std::size_t length = std::strlen(key);
+    return FitsJsonName(length) ? object.find(key, key + length) : nullptr;
 }
 
 bool AsBool(const Json::Value& value)

@@ -3,7 +3,9 @@
 #ifndef ORVADRCORE_SRC_JSON_HELPERS_H
 #define ORVADRCORE_SRC_JSON_HELPERS_H
 
+#include <cstddef>
 #include <string>
+#include <string_view>
 
 #include <json/value.h>
 
@@ -12,9 +14,17 @@ namespace OrvaDRCore {
 // How deep a document may nest to be read. A scalar and an empty array have one level.
 constexpr int MaxLevels = 1000;
 
+// Whether a JSON value can hold a text, or an object the name of a member, of so many bytes. jsoncpp
+// throws at texts from 2 GiB on, and from 4 GiB on it cuts them, as it cuts names from 1 GiB on.
+bool FitsJsonText(std::size_t length);
+bool FitsJsonName(std::size_t length);
+
+// The text as a JSON value; null for one that is too long.
+Json::Value ToJsonText(std::string_view text);
+
 // Parses `text`, which must be one whole JSON document of any type, into `value`. A text that does
-// not parse, that goes on after its document or that nests deeper than MaxLevels gives false and
-// leaves `value` as it was.
+// not parse, that goes on after its document, that nests deeper than MaxLevels or that is so long
+// that it may hold a text which no value can gives false and leaves `value` as it was.
 bool fromString(Json::Value& value, const std::string& text);
 
 // The document on one line, without blanks or a final newline. Bytes above 0x7f stand as they are,

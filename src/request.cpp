@@ -102,7 +102,7 @@ bool Request::takesParams() const
 
 bool Request::addParam(const std::string& key, const Json::Value& value)
 {
-    if (!isValidKey(key) || !takesParams()) return false;
+    if (!isValidKey(key) || !FitsJsonName(key.size()) || !takesParams()) return false;
     Json::Value copy(value);  // made first: the value may be a part of the parameters
     params[key] = std::move(copy);
     return true;
@@ -133,8 +133,8 @@ bool Request::isValid() const
 Json::Value Request::toJson() const
 {
     Json::Value json = takesParams() ? params : Json::Value(Json::objectValue);
-    json[ApiKey] = api;
-    json[MethodKey] = method;
+    json[ApiKey] = ToJsonText(api);
+    json[MethodKey] = ToJsonText(method);
     json[VersionKey] = version;
     return json;
 }

@@ -1,7 +1,5 @@
 #include <orvadrcore/sqlite_command.h>
 
-#include <type_traits>
-
 #include <orvadrcore/utils.h>
 
 #include "log.h"
@@ -17,9 +15,7 @@ constexpr std::size_t UsualLength = 240;
 template <class T>
 bool AddFieldValue(SqliteValueList& record, const std::string& field, const T& value)
 {
-    bool isThere = !field.empty();
-    if constexpr (std::is_pointer_v<T>) isThere = isThere && value != nullptr;
-    if (!isThere) {
+    if (field.empty() || !MakesValue(value)) {
         DR_LOG(Err, "Bad Field [%s] /value[%s]", field.c_str(),
                SqliteValue(value).ToFormatedValue().c_str());
         return false;

@@ -390,9 +390,9 @@ void SqliteDB::Close()
 void SqliteDB::SetDBErr(const std::string& command, int sqliteCode, const char* message) const
 {
     Json::Value record(Json::objectValue);
-    if (!command.empty()) record["command"] = command;
+    if (!command.empty() && FitsJsonText(command.size())) record["command"] = command;
     if (sqliteCode != SQLITE_OK) record["sqlite_errcode"] = sqliteCode;
-    record["sqlite_errmsg"] = message != nullptr ? message : sqlite3_errmsg(handle);
+    record["sqlite_errmsg"] = ToJsonText(message != nullptr ? message : sqlite3_errmsg(handle));
     errCode = ERR::ERR_DATABASE_OPERATION;
     errRecord.swap(record);
 }
@@ -400,7 +400,10 @@ void SqliteDB::SetDBErr(const std::string& command, int sqliteCode, const char* 
 bool SqliteDB::DoExecSqliteCommand(const std::string& command)
 {
     char* text = nullptr;  // SQLite leaves it alone when the handle is null
-    const int code = sqlite3_exec(handle, command.c_str(), nullptr, nullptr, &text);
+    Statement refused;
+    const int code = IsTooLong(command)
+                         ? PrepareStatement(handle, command, refused)
+                         : sqlite3_exec(handle, command.c_str(), nullptr, nullptr, &text);
     const std::unique_ptr<char, FreeText> message(text);
     if (code != SQLITE_OK) SetDBErr(command, code, message.get());
     return code == SQLITE_OK;

@@ -1,6 +1,8 @@
 #include "sqlite_statement.h"
 
 #include <algorithm>
+#include <cstring>
+#include <limits>
 #include <utility>
 
 #include "sqlite_internals.h"
@@ -50,10 +52,19 @@ int BindValue(sqlite3_stmt* statement, int place, const SqliteValue& value)
 
 }  // namespace
 
+// SQLite counts the bytes of a literal in an int and crashes when that overflows.
+bool IsTooLong(const std::string& command)
+{
+    constexpr std::size_t Limit = std::numeric_limits<int>::max();
+    return command.size() >= Limit && ::strnlen(command.c_str(), Limit) == Limit;
+}
+
 int PrepareStatement(sqlite3* handle, const std::string& command, Statement& statement)
 {
+    // A length that is beyond SQLite's own limit is refused before the text is read.
+    const int length = IsTooLong(command) ? std::numeric_limits<int>::max() : -1;
     sqlite3_stmt* made = nullptr;
-    const int code = sqlite3_prepare_v2(handle, command.c_str(), -1, &made, nullptr);
+    const int code = sqlite3_prepare_v2(handle, command.c_str(), length, &made, nullptr);
     statement.reset(made);
     return code;
 }

@@ -18,7 +18,11 @@ struct FinalizeStatement {
 };
 using Statement = std::unique_ptr<sqlite3_stmt, FinalizeStatement>;
 
-// Fills `statement`, with null for a text that holds no statement. Answers SQLite's code.
+// Whether a statement is as long as SQLite must not be given it.
+bool IsTooLong(const std::string& command);
+
+// Fills `statement`, with null for a text that holds no statement. Answers SQLite's code, which is
+// SQLITE_TOOBIG for a statement that is too long.
 int PrepareStatement(sqlite3* handle, const std::string& command, Statement& statement);
 
 // The INSERT of records with these fields, with placeholders for the values.

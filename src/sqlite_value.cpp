@@ -1,5 +1,6 @@
 #include <orvadrcore/sqlite_value.h>
 
+#include <cstring>
 #include <utility>
 
 #include "json_helpers.h"
@@ -14,11 +15,20 @@ SqliteValue::SqliteValue(unsigned int number) : valid(true), value(number) {}
 
 SqliteValue::SqliteValue(bool truth) : valid(true), value(truth) {}
 
-SqliteValue::SqliteValue(const std::string& text) : valid(true), value(text) {}
+SqliteValue::SqliteValue(const std::string& text) : SqliteValue(text.data(), text.size()) {}
 
-SqliteValue::SqliteValue(const char* text) : valid(text != nullptr)
+SqliteValue::SqliteValue(const char* text)
+    : SqliteValue(text, text != nullptr ? std::strlen(text) : 0)
 {
-    if (valid) value = text;
+}
+
+SqliteValue::SqliteValue(const char* text, std::size_t length)
+    : valid(text != nullptr && FitsJsonText(length)),
+      value(valid ? Json::Value(text, text + length) : Json::Value())
+{
+    if (text != nullptr && !valid) {
+        DR_LOG(Err, "text of [%zu] bytes is too long for a value", length);
+    }
 }
 
 // `valid` stays as it was, on purpose: only construction makes a value valid.

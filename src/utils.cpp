@@ -10,6 +10,7 @@
 #include <memory>
 #include <string_view>
 
+#include "json_helpers.h"
 #include "log.h"
 
 namespace OrvaDRCore {
@@ -50,11 +51,22 @@ void Append(std::string& text, double element)
     text += std::isfinite(low) ? static_cast<char>(static_cast<unsigned char>(low)) : '\0';
 }
 
+Json::Value ToJson(const std::string& element)
+{
+    return ToJsonText(element);
+}
+
+template <class T>
+Json::Value ToJson(T element)
+{
+    return element;
+}
+
 template <class T>
 Json::Value ToArray(const std::vector<T>& values)
 {
     Json::Value array(Json::arrayValue);
-    for (const auto& value : values) array.append(Json::Value(value));
+    for (const auto& value : values) array.append(ToJson(value));
     return array;
 }
 

@@ -130,8 +130,8 @@ class ORVADRCORE_API Request {
     /// Sets one parameter.
     /// \param key    its key; of two with the same key the later counts
     /// \param value  its value, copied
-    /// \return false, nothing changed, for a reserved key and when the parameters are neither null
-    ///         nor an object
+    /// \return false, nothing changed, for a reserved key, for one of 1 GiB or more, which JSON
+    ///         values cannot hold, and when the parameters are neither null nor an object
     bool addParam(const std::string& key, const Json::Value& value);
 
     /// Sets a parameter for each member of `object`; reserved keys are passed over.
@@ -149,7 +149,8 @@ class ORVADRCORE_API Request {
 
     /// The JSON form: the parameters and the three reserved keys, in one object.
     /// \return the object, of a request that is not valid, too. Parameters that are neither null
-    ///         nor an object are left out; one with a reserved key gives way
+    ///         nor an object are left out; one with a reserved key gives way. An API or a method
+    ///         of 2 GiB or more, which no JSON value can hold, is null
     Json::Value toJson() const;
 
     /// The request for a reader of the log, without parameters.

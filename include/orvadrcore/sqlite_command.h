@@ -121,8 +121,8 @@ class ORVADRCORE_API InsertCommand : public SqliteCommand {
     /// \tparam T     `std::string`, `bool`, `int` or `unsigned int`
     /// \param field  the column's name, written as it stands
     /// \param value  its value; a text is quoted but not escaped
-    /// \return false when `field` is empty, with ERR `Bad Field [%s] /value[%s]`; the columns are
-    ///         unchanged then
+    /// \return false when `field` is empty or a text too long for a SqliteValue, with
+    ///         ERR `Bad Field [%s] /value[%s]`; the columns are unchanged then
     template <class T>
     bool AddFieldValue(  // T: std::string, bool, int or unsigned int
         const std::string& field, const T& value) = delete;

@@ -264,9 +264,11 @@ class ORVADRCORE_API SqliteDB {
     const Json::Value& GetErr() const { return errRecord; }
 
     /// Records a failure of SQLite: code 404 and an error object.
-    /// \param command     the statement; left out of the object when empty
+    /// \param command     the statement; left out of the object when empty, and when it has 2 GiB or
+    ///                    more, which no JSON value can hold
     /// \param sqliteCode  SQLite's result code; left out when 0
-    /// \param message     SQLite's text; null takes the connection's last one
+    /// \param message     SQLite's text; null takes the connection's last one. In the object it is
+    ///                    null when it has 2 GiB or more
     void SetDBErr(const std::string& command, int sqliteCode, const char* message) const;
 
     // ---------------------------------------------------------------------------- single tries

@@ -47,11 +47,13 @@ class ORVADRCORE_API SqliteValue {
     SqliteValue(bool truth);
 
     /// A text.
-    /// \param text  the text, copied; see the warning at ToFormatedValue()
+    /// \param text  the text, copied; see the warning at ToFormatedValue(). One of 2 GiB (2147483643
+    ///              bytes) or more makes no value, with ERR
+    ///              `text of [%zu] bytes is too long for a value`
     SqliteValue(const std::string& text);
 
-    /// A text.
-    /// \param text  the text, copied; no value when it is null
+    /// As above.
+    /// \param text  the text, copied; no value, without a line, when it is null
     SqliteValue(const char* text);
 
     SqliteValue(std::nullptr_t) = delete;
@@ -111,6 +113,8 @@ class ORVADRCORE_API SqliteValue {
 
   private:
     friend struct SqliteInternals;  // writes the payload into statements
+
+    ORVADRCORE_LOCAL SqliteValue(const char* text, std::size_t length);
 
     bool valid = false;
     Json::Value value;

@@ -46,7 +46,8 @@ class ORVADRCORE_API Container {
     /// The elements, in order, as a JSON array of text, integers, booleans or numbers.
     /// \tparam T      the type of the elements
     /// \param values  the elements
-    /// \return the array; an empty array, not null, for an empty vector
+    /// \return the array; an empty array, not null, for an empty vector. A text of 2 GiB or more,
+    ///         which no JSON value can hold, is null there
     template <class T>
     static Json::Value ToJsonArray(  // T: std::string, int, bool or double
         const std::vector<T>& values) = delete;

@@ -9,6 +9,7 @@
 #include <limits>
 #include <random>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "support/global_locale.h"
@@ -546,6 +547,23 @@ TEST(NestsAtMostTest, CountsTheLevelsOfTheDeepestMember)
         EXPECT_TRUE(NestsAtMost(value, levels));
         EXPECT_FALSE(NestsAtMost(value, levels - 1));
         EXPECT_FALSE(NestsAtMost(value, -1));
+    }
+}
+
+// The limits are jsoncpp's own; tests/huge has texts of that length.
+TEST(JsonLengthTest, TextsAndNamesFitUpToTheirLimits)
+{
+    EXPECT_TRUE(OrvaDRCore::FitsJsonText(0) && OrvaDRCore::FitsJsonText(2'147'483'642));
+    EXPECT_FALSE(OrvaDRCore::FitsJsonText(2'147'483'643) || OrvaDRCore::FitsJsonText(1ULL << 32U));
+    EXPECT_TRUE(OrvaDRCore::FitsJsonName(0) && OrvaDRCore::FitsJsonName((1U << 30U) - 1));
+    EXPECT_FALSE(OrvaDRCore::FitsJsonName(1U << 30U) || OrvaDRCore::FitsJsonName(1ULL << 32U));
+}
+
+TEST(JsonLengthTest, ATextBecomesAValueByteForByte)
+{
+    using namespace std::string_view_literals;
+    for (const std::string_view text : {""sv, "abc"sv, "a\0b"sv, "\xff"sv}) {
+        EXPECT_EQ(OrvaDRCore::ToJsonText(text).asString(), text);
     }
 }
 
