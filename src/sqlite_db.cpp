@@ -21,9 +21,6 @@ namespace OrvaDRCore {
 
 namespace {
 
-// How long a single try waits for another process's lock.
-constexpr int BusyTimeoutMSec = 1000;
-
 // The pause between tries: random, so that competing writers come apart.
 constexpr unsigned int MinPauseMSec = 500;
 constexpr unsigned int MaxPauseMSec = 1000;
@@ -376,12 +373,14 @@ bool SqliteDB::Open()
         DR_LOG(Warn, "Failed to set busy timeout with error");
         return false;
     }
+    own.wait.Install(handle);
     return true;
 }
 
 void SqliteDB::Close()
 {
     if (handle == nullptr) return;
+    state->wait.Forget();
     state->cache.Clear();  // SQLite closes no connection that has statements
     sqlite3_close(handle);
     handle = nullptr;
@@ -399,12 +398,16 @@ void SqliteDB::SetDBErr(const std::string& command, int sqliteCode, const char* 
 
 bool SqliteDB::DoExecSqliteCommand(const std::string& command)
 {
+    ConnectionState& own = State();
+    const BusyTimeoutAccess access(own.wait, own.watch, command);
+    if (!IsInTransaction()) own.wait.GiveWay();
     char* text = nullptr;  // SQLite leaves it alone when the handle is null
     Statement refused;
     const int code = IsTooLong(command)
                          ? PrepareStatement(handle, command, refused)
                          : sqlite3_exec(handle, command.c_str(), nullptr, nullptr, &text);
     const std::unique_ptr<char, FreeText> message(text);
+    if (!IsInTransaction()) own.wait.NoteRelease();
     if (code != SQLITE_OK) SetDBErr(command, code, message.get());
     return code == SQLITE_OK;
 }
@@ -467,9 +470,10 @@ template <class TakeRow>
 bool SqliteDB::DoSelect(const std::string& command, TakeRow takeRow)
 {
     SetErr(ERR::ERR_DATABASE_OPERATION);
-    StatementCache& cache = State().cache;
+    ConnectionState& own = State();
+    const BusyTimeoutAccess access(own.wait, own.watch, command);
     Statement statement;
-    int code = cache.Take(handle, command, statement);
+    int code = own.cache.Take(handle, command, statement);
     if (code == SQLITE_OK) code = sqlite3_step(statement.get());
     // Read after the first step, which prepares a cached statement again if the schema changed.
     const auto names = ColumnNames(statement.get());
@@ -481,7 +485,7 @@ bool SqliteDB::DoSelect(const std::string& command, TakeRow takeRow)
         SetDBErr(command, code, nullptr);
         return false;
     }
-    cache.Keep(command, std::move(statement));
+    own.cache.Keep(command, std::move(statement));
     SetErr(0);
     return true;
 }

@@ -2,6 +2,7 @@
 #ifndef ORVADRCORE_SRC_SQLITE_STATE_H
 #define ORVADRCORE_SRC_SQLITE_STATE_H
 
+#include "sqlite_busy.h"
 #include "sqlite_statement.h"
 #include "sqlite_watch.h"
 
@@ -11,6 +12,7 @@ namespace OrvaDRCore {
 // serves one connection after the other when the SqliteDB is closed and opened again.
 struct ConnectionState {
     StatementWatch watch;
+    BusyWait wait;
     StatementCache cache;
 };
 

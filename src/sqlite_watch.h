@@ -25,12 +25,16 @@ class StatementWatch {
     // While the number stays the same and a transaction is open, it is the same transaction.
     std::uint64_t CountTransactions() const { return transactions; }
 
+    // Whether a statement has set the busy timeout of this connection.
+    bool IsBusyTimeoutSet() const { return isBusyTimeoutSet; }
+
   private:
     static int Note(void* watch, int action, const char* first, const char* second,
                     const char* database, const char* trigger);
 
     sqlite3* handle = nullptr;
     std::uint64_t transactions = 0;
+    bool isBusyTimeoutSet = false;
 };
 
 }  // namespace OrvaDRCore

@@ -11,7 +11,13 @@
 /// **Retries.** Each try of a statement may wait up to a second wherever SQLite meets a lock. A
 /// statement that fails, for whatever reason, is tried again after a random pause of 500 to 1000
 /// milliseconds, as often as the retry limit says: limit + 1 tries in all, so that a call may block
-/// for long. Many processes may use one file at the same time.
+/// for long.
+///
+/// **Waiting.** Many processes may use one file at the same time, and all of them get their turn. A
+/// try that meets a lock looks again every 0.5 to 2.5 milliseconds. A connection that had to wait
+/// before it wrote pauses for up to 2.5 milliseconds before it writes again, so that others can.
+/// `PRAGMA busy_timeout` answers 1000. A program that sets it gets SQLite's own waiting, which looks
+/// ever more seldom, on that connection until it is opened anew.
 ///
 /// **Errors.** Operations answer true or false. GetErrCode() and GetErr() describe the last one: 0
 /// and null after a success, otherwise an ERR::Code and, for what SQLite refused, the failed
@@ -241,7 +247,8 @@ class ORVADRCORE_API SqliteDB {
 
     // --------------------------------------------------------------------------------- connection
 
-    /// Opens the file, unless it is open. The error code and record stay as they are. A file that
+    /// Opens the file, unless it is open, and sets the busy timeout of a second. The error code and
+    /// record stay as they are. A file that
     /// cannot be opened for writing, for want of rights or of descriptors, SQLite opens for reading:
     /// statements that write then fail until the connection is closed.
     /// \return false, with WARN `Failed to open db[%s]`, the connection closed; or with WARN

@@ -7,9 +7,13 @@
 #include <array>
 #include <atomic>
 #include <chrono>
+#include <ctime>
 #include <functional>
+#include <ostream>
+#include <stdexcept>
 #include <string>
 #include <thread>
+#include <tuple>
 #include <vector>
 
 #include <orvadrcore/sqlite_command.h>
@@ -22,6 +26,7 @@
 #include "support/process_test.h"
 #include "support/scale.h"
 #include "support/shared_memory.h"
+#include "support/steady_disk.h"
 
 namespace {
 
@@ -49,8 +54,10 @@ milliseconds LongestWait(int statements, int retryLimit)
 // An operation looks for its table, makes it where looking has failed, and runs its statement.
 constexpr int MostStatements = 3;
 
-// How long the file is locked at a time, which no single try outlasts, and how long it is free then.
-constexpr std::chrono::seconds Held(2);
+// How long the file is locked at a time: longer than a single try waits, and longer than the tries of
+// all statements of an operation wait; and how long it is free then.
+constexpr std::chrono::seconds HeldForATry(2);
+constexpr std::chrono::seconds HeldForAnOperation(MostStatements + 1);
 constexpr std::chrono::seconds Free(3);
 
 constexpr int UsualLimit = 5;
@@ -178,11 +185,11 @@ class ContentionTest : public ProcessTest {
     void Run(int retryLimit, std::chrono::seconds time, const std::function<void()>& onStart);
 
     // The same while a process keeps all others out now and then.
-    void RunBesideHolder(int retryLimit, std::chrono::seconds time);
+    void RunBesideHolder(int retryLimit, std::chrono::seconds time, std::chrono::seconds held);
 
     // A process that tells when it has locked everybody out of the database. When it is told to, it
     // lets them in after a while, and out again now and then for a time.
-    ChildProcess StartHolder(std::chrono::seconds time);
+    ChildProcess StartHolder(std::chrono::seconds time, std::chrono::seconds held);
 
     // What is in the file is what was answered, record by record.
     void ExpectWhatWasAnswered() const;
@@ -201,6 +208,7 @@ class ContentionTest : public ProcessTest {
         return most;
     }
 
+    const SteadyDisk disk;
     SharedMemory<Writers> writers;
     SharedMemory<std::atomic<int>> holds;
 };
@@ -233,9 +241,10 @@ void ContentionTest::Run(int retryLimit, std::chrono::seconds time,
     ReportCount("longest_operation_msec", Most(&Writer::longest));
 }
 
-void ContentionTest::RunBesideHolder(int retryLimit, std::chrono::seconds time)
+void ContentionTest::RunBesideHolder(int retryLimit, std::chrono::seconds time,
+                                     std::chrono::seconds held)
 {
-    ChildProcess holder = StartHolder(time);
+    ChildProcess holder = StartHolder(time, held);
     ASSERT_TRUE(holder.Await());
     Run(retryLimit, time, [&holder] { holder.Tell(); });
     EXPECT_EQ(holder.Join(), 0);
@@ -243,10 +252,10 @@ void ContentionTest::RunBesideHolder(int retryLimit, std::chrono::seconds time)
     ReportCount("holds", *holds);
 }
 
-ChildProcess ContentionTest::StartHolder(std::chrono::seconds time)
+ChildProcess ContentionTest::StartHolder(std::chrono::seconds time, std::chrono::seconds held)
 {
     constexpr unsigned int DeadlineSeconds = 600;
-    return ChildProcess([this, time](ChildProcess::Link& link) {
+    return ChildProcess([this, time, held](ChildProcess::Link& link) {
         ::alarm(DeadlineSeconds);
         SqliteDB db(Path(), UsualLimit);
         if (!db.Open() || !db.Exec("BEGIN EXCLUSIVE")) return;
@@ -254,7 +263,7 @@ ChildProcess ContentionTest::StartHolder(std::chrono::seconds time)
         link.Await();
         const Clock::time_point end = Clock::now() + time;
         do {
-            std::this_thread::sleep_for(Held);
+            std::this_thread::sleep_for(held);
             if (db.Exec("COMMIT")) ++*holds;
             std::this_thread::sleep_for(Free);
             while (Clock::now() < end && !db.Exec("BEGIN EXCLUSIVE")) {
@@ -293,19 +302,163 @@ void ContentionTest::ExpectWhatWasAnswered() const
 TEST_F(ContentionTest, WhatIsAnsweredHappensAndNothingElse)
 {
     Run(UsualLimit, std::chrono::seconds(Scaled(3, 60)), [] {});
+    EXPECT_EQ(Sum(&Writer::failed), 0);
 }
 
 TEST_F(ContentionTest, AProcessThatHoldsTheLockForLongIsWaitedFor)
 {
-    RunBesideHolder(UsualLimit, std::chrono::seconds(Scaled(4, 60)));
+    RunBesideHolder(UsualLimit, std::chrono::seconds(Scaled(4, 60)), HeldForATry);
+    EXPECT_EQ(Sum(&Writer::failed), 0);
     EXPECT_GT(Sum(&Writer::pauses), 0);
 }
 
 TEST_F(ContentionTest, WhatIsGivenUpDoesNotHappen)
 {
-    RunBesideHolder(0, std::chrono::seconds(Scaled(4, 60)));
+    RunBesideHolder(0, std::chrono::seconds(Scaled(6, 60)), HeldForAnOperation);
     EXPECT_EQ(Sum(&Writer::pauses), 0);
     EXPECT_GT(Sum(&Writer::failed), 0);
+}
+
+// ----------------------------------------------------------------------------- everybody is served
+
+// What a process of a queue has got.
+struct Participant {
+    std::atomic<int> served;
+    std::atomic<int> failed;
+    std::atomic<int> wait;  // the longest, in milliseconds
+};
+
+// Writers that insert row by row into one file, as fast as they can, and readers between them.
+struct Queue {
+    int writers;
+    int readers;
+    int rowsPerWriter;  // so many that chance keeps nobody from having a tenth of its share
+    int longestWaitSeconds;
+};
+
+std::ostream& operator<<(std::ostream& out, const Queue& queue)
+{
+    return out << queue.writers << " writers and " << queue.readers << " readers";
+}
+
+class QueueTest : public ProcessTest,
+                  public ::testing::WithParamInterface<std::tuple<const char*, Queue>> {
+  protected:
+    static constexpr int MaxParticipants = 80;
+    static constexpr std::chrono::seconds Deadline{120};
+
+    static int Goal(const Queue& queue) { return queue.writers * queue.rowsPerWriter; }
+
+    // What the processes share.
+    struct Board {
+        std::array<Participant, MaxParticipants> participants;
+        std::atomic<int> ready;
+        std::atomic<int> rows;
+    };
+
+    void TakePart(const Queue& queue, int number) const;
+    bool DoOnce(SqliteDB& db, bool isWriter, int id) const;
+
+    const SteadyDisk disk;
+    const std::string path = dir.File("jobs.db");
+    SharedMemory<Board> board;
+};
+
+bool QueueTest::DoOnce(SqliteDB& db, bool isWriter, int id) const
+{
+    if (isWriter) {
+        InsertCommand insert;
+        insert.SetTable(Jobs());
+        insert.AddFieldValue("id", id);
+        insert.AddFieldValue("state", Made);
+        return db.InsertRecord(insert);
+    }
+    SelectCommand select;
+    select.SetTable(Jobs());
+    select.SelectAll();
+    select.SetCondition(SqliteEqual("id", id));
+    SqliteValueList row;
+    return db.SelectRecord(select, row);
+}
+
+void QueueTest::TakePart(const Queue& queue, int number) const
+{
+    SqliteDB db(path, UsualLimit);
+    if (!db.Open()) throw std::runtime_error("cannot open");
+    Participant& participant = board->participants.at(static_cast<std::size_t>(number));
+    const bool isWriter = number < queue.writers;
+    const Clock::time_point deadline = Clock::now() + Deadline;
+    ++board->ready;
+    while (board->ready < queue.writers + queue.readers && Clock::now() < deadline) {
+        std::this_thread::sleep_for(milliseconds(1));
+    }
+    for (int turn = 0; board->rows < Goal(queue) && Clock::now() < deadline; ++turn) {
+        const long long before = CountSlept().microseconds;
+        const bool done = DoOnce(db, isWriter, number * 1'000'000 + turn);
+        const auto wait = static_cast<int>((CountSlept().microseconds - before) / 1000);
+        participant.wait = std::max<int>(participant.wait, wait);
+        ++(done ? participant.served : participant.failed);
+        if (isWriter && done) ++board->rows;
+        if (!isWriter) std::this_thread::sleep_for(milliseconds(5));
+    }
+}
+
+TEST_P(QueueTest, EveryWriterIsServedAndNothingIsGivenUp)
+{
+    const auto& [journal, queue] = GetParam();
+    {
+        SqliteDB db(path, 0);
+        SqliteValueList mode;
+        ASSERT_TRUE(db.Open() && db.CreateTable(Jobs()) &&
+                    db.SelectByCommand(std::string("PRAGMA journal_mode=") + journal, mode));
+    }
+    const Crowd crowd(queue.writers + queue.readers,
+                      [this](int number) { TakePart(std::get<Queue>(GetParam()), number); });
+    ASSERT_TRUE(crowd.Start());
+    EXPECT_TRUE(crowd.Join());
+
+    int least = board->rows;
+    int longestWait = 0;
+    for (int number = 0; number < queue.writers + queue.readers; ++number) {
+        const Participant& participant = board->participants.at(static_cast<std::size_t>(number));
+        EXPECT_EQ(participant.failed, 0);
+        longestWait = std::max<int>(longestWait, participant.wait);
+        if (number < queue.writers) least = std::min<int>(least, participant.served);
+    }
+    EXPECT_GE(board->rows, Goal(queue));
+    EXPECT_GE(least, queue.rowsPerWriter / 10);
+    EXPECT_LE(longestWait, queue.longestWaitSeconds * 1000);
+    ReportCount("rows", board->rows);
+    ReportCount("rows_of_the_least_served", least);
+    ReportCount("longest_wait_msec", longestWait);
+}
+
+const int RowsOf16 = Scaled(100, 1000);
+const int RowsOf64 = Scaled(40, 400);
+
+INSTANTIATE_TEST_SUITE_P(
+    Journals, QueueTest,
+    ::testing::Combine(::testing::Values("delete", "wal"),
+                       ::testing::Values(Queue{16, 0, RowsOf16, 5}, Queue{16, 4, RowsOf16, 5},
+                                         Queue{64, 0, RowsOf64, 10}, Queue{64, 16, RowsOf64, 10})));
+
+TEST_F(ContentionTest, WaitingCostsLittleProcessorTime)
+{
+    constexpr int MostOfASecond = 100;  // milliseconds
+    SqliteDB holder(Path(), 0);
+    ASSERT_TRUE(holder.Open() && holder.CreateTable(Jobs()) && holder.Exec("BEGIN IMMEDIATE"));
+    const SharedMemory<std::atomic<int>> processorMSec;
+    ChildProcess waiting([&](ChildProcess::Link&) {
+        SqliteDB db(Path(), 0);
+        if (!db.Open()) throw std::runtime_error("cannot open");
+        const std::clock_t before = std::clock();
+        const bool isDone = db.DoExecSqliteCommand("INSERT INTO jobs VALUES (1,1)");
+        *processorMSec = static_cast<int>((std::clock() - before) * 1000 / CLOCKS_PER_SEC);
+        if (isDone) throw std::runtime_error("the lock does not hold");
+    });
+    EXPECT_EQ(waiting.Join(), 0);
+    EXPECT_LE(*processorMSec, MostOfASecond);
+    ReportCount("processor_msec", *processorMSec);
 }
 
 }  // namespace

@@ -4,6 +4,7 @@
 
 #include <cstdlib>
 #include <ctime>
+#include <utility>
 
 namespace {
 
@@ -43,9 +44,19 @@ Pauses::~Pauses()
 
 void Pauses::Note(unsigned int microseconds)
 {
-    if (microseconds < ShortestOwnPause) return;
+    if (microseconds < ShortestOwnPause) {
+        if (!onWait) return;
+        waits.push_back(microseconds);
+        onWait(waits.size());
+        return;
+    }
     taken.push_back(microseconds);
     if (onPause) onPause(taken.size());
+}
+
+void Pauses::OnWait(std::function<void(std::size_t)> action)
+{
+    onWait = std::move(action);
 }
 
 Slept CountSlept()

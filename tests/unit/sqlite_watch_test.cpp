@@ -52,6 +52,22 @@ TEST_F(StatementWatchTest, CountsTransactionsThatAreBegunOutsideOfAnyOther)
     EXPECT_NE(sqlite3_get_autocommit(db.get()), 0);
 }
 
+TEST_F(StatementWatchTest, SeesTheBusyTimeoutSetInEverySpelling)
+{
+    for (const char* text : {"PRAGMA busy_timeout", "SELECT timeout FROM pragma_busy_timeout",
+                             "PRAGMA cache_size=100", "PRAGMA nowhere.busy_timeout=5"}) {
+        Run(text);
+        EXPECT_FALSE(watch.IsBusyTimeoutSet()) << text;
+    }
+    for (const char* text : {"PRAGMA busy_timeout=5", "pragma main.\"Busy_TIMEOUT\"(5)",
+                             "SELECT 1; PRAGMA/**/[busy_timeout] = -1; BAD"}) {
+        db = OpenInMemory(watch);
+        EXPECT_FALSE(watch.IsBusyTimeoutSet());
+        Run(text);
+        EXPECT_TRUE(watch.IsBusyTimeoutSet()) << text;
+    }
+}
+
 TEST_F(StatementWatchTest, GoesOnCountingOnTheNextConnection)
 {
     Run("BEGIN");
