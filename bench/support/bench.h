@@ -138,6 +138,10 @@ void AddCurves();
 // table of its own and writes it to `out`.csv and `out`.md, unless that is empty.
 void RunCrowds(const std::string& out, int runs, int seconds);
 
+// Processes that insert row by row into one file, and those that read between them, for so many
+// seconds each; prints and writes as above.
+void RunWriters(const std::string& out, int seconds);
+
 }  // namespace Bench
 
 #endif

@@ -110,7 +110,7 @@ class ContractEngine {
 template <class Library>
 class Peer {
   public:
-    explicit Peer(const std::string& path);
+    explicit Peer(const std::string& path, int busyTimeoutMSec = BusyTimeoutMSec);
     ~Peer();
     Peer(const Peer&) = delete;
     Peer& operator=(const Peer&) = delete;
@@ -127,7 +127,8 @@ class Peer {
 };
 
 template <class Library>
-Peer<Library>::Peer(const std::string& path) : library(std::make_unique<Library>(path))
+Peer<Library>::Peer(const std::string& path, int busyTimeoutMSec)
+    : library(std::make_unique<Library>(path, busyTimeoutMSec))
 {
 }
 

@@ -1,6 +1,6 @@
 // Checks the contestants of each item against each other, measures them by turns, and prints a table.
 //
-//     orvadr_bench [--quick] [--curves] [--out NAME] [TEXT]
+//     orvadr_bench [--quick] [--curves | --writers] [--out NAME] [TEXT]
 //
 // TEXT picks the items whose name holds it. The figures go to NAME.csv, as a table to NAME.md, and
 // those of processes to NAME-processes.csv and .md. Files of the benchmarks lie in the working directory, in
@@ -22,6 +22,7 @@ using Bench::Item;
 struct Options {
     bool quick = false;
     bool curves = false;
+    bool writers = false;
     std::string out;
     std::string text;
 };
@@ -34,6 +35,8 @@ Options ParseOptions(const std::vector<std::string>& arguments)
             options.quick = true;
         } else if (*at == "--curves") {
             options.curves = true;
+        } else if (*at == "--writers") {
+            options.writers = true;
         } else if (*at == "--out" && at + 1 != arguments.end()) {
             options.out = *++at;
         } else {
@@ -105,6 +108,11 @@ void CheckResults(const Item& item)
 
 void Run(const Options& options)
 {
+    if (options.writers) {
+        NamePeersLeftOut();
+        Bench::RunWriters(options.out, options.quick ? 1 : 10);
+        return;
+    }
     InitializeLibrary(options.quick);
     AddItems(options.curves);
     NamePeersLeftOut();

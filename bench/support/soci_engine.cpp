@@ -10,8 +10,10 @@ namespace Bench {
 
 // As its documents advise: statements are prepared once, with variables bound to them.
 struct Soci {
-    explicit Soci(const std::string& path)
-        : session(soci::sqlite3, "db=" + path + " timeout=1"), created(Create())
+    Soci(const std::string& path, int busyTimeoutMSec)
+        : session(soci::sqlite3,
+                  "db=" + path + " timeout=" + std::to_string(busyTimeoutMSec / 1000)),
+          created(Create())
     {
     }
 

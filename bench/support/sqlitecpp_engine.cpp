@@ -20,8 +20,8 @@ Node NodeOfRow(SQLite::Statement& statement)
 
 // As its documents advise: statements are prepared once and reset.
 struct SqliteCpp {
-    explicit SqliteCpp(const std::string& path)
-        : db(path, SQLite::OPEN_READWRITE | SQLite::OPEN_CREATE, BusyTimeoutMSec),
+    SqliteCpp(const std::string& path, int busyTimeoutMSec)
+        : db(path, SQLite::OPEN_READWRITE | SQLite::OPEN_CREATE, busyTimeoutMSec),
           created(db.exec(std::string("CREATE TABLE IF NOT EXISTS nodes (") + NodesSchema + ")"))
     {
     }
@@ -50,13 +50,13 @@ void SqliteCpp::Exec(const char* statement)
 
 void SqliteCpp::Insert(const Node& node)
 {
+    insert.reset();  // first, because one that failed needs it, too
     insert.bind(1, node.id);
     insert.bindNoCopy(2, node.name);
     insert.bindNoCopy(3, node.address);
     insert.bind(4, node.port);
     insert.bind(5, node.state);
     insert.exec();
-    insert.reset();
 }
 
 void SqliteCpp::Select(int id)
