@@ -179,7 +179,7 @@ class ContentionTest : public ProcessTest {
   protected:
     using Writers = std::array<Writer, MaxWriters>;
 
-    std::string Path() const { return dir.File("jobs.db"); }
+    std::string Path() const { return disk.File("jobs.db"); }
 
     // Lets processes work at once for a time, and checks that what they were answered is so.
     void Run(int retryLimit, std::chrono::seconds time, const std::function<void()>& onStart);
@@ -360,7 +360,7 @@ class QueueTest : public ProcessTest,
     bool DoOnce(SqliteDB& db, bool isWriter, int id) const;
 
     const SteadyDisk disk;
-    const std::string path = dir.File("jobs.db");
+    const std::string path = disk.File("jobs.db");
     SharedMemory<Board> board;
 };
 

@@ -1,8 +1,13 @@
-// A disk that other programs on the machine cannot slow down. While a SteadyDisk object lives, here or
-// in a process that this one has forked, flushing a file takes a fixed time and does nothing else;
-// afterwards it is what it always is. For tests of how long something waits for something else.
+// A disk that other programs on the machine cannot slow down, for tests of how long something waits
+// for something else: a directory in memory, where the system has such a place. While the object
+// lives, here or in a process that this one has forked, flushing any file takes a fixed time and does
+// nothing else.
 #ifndef ORVADRCORE_TESTS_STEADY_DISK_H
 #define ORVADRCORE_TESTS_STEADY_DISK_H
+
+#include <string>
+
+#include "temp_dir.h"
 
 class SteadyDisk {
   public:
@@ -10,6 +15,11 @@ class SteadyDisk {
     SteadyDisk(const SteadyDisk&) = delete;
     SteadyDisk& operator=(const SteadyDisk&) = delete;
     ~SteadyDisk();
+
+    std::string File(const std::string& name) const { return dir.File(name); }
+
+  private:
+    const TempDir dir;
 };
 
 #endif

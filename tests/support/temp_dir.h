@@ -9,7 +9,8 @@
 
 class TempDir {
   public:
-    TempDir() : path((std::filesystem::temp_directory_path() / "orvadr-test-XXXXXX").string())
+    explicit TempDir(const std::filesystem::path& parent = std::filesystem::temp_directory_path())
+        : path((parent / "orvadr-test-XXXXXX").string())
     {
         if (::mkdtemp(path.data()) == nullptr) std::abort();
     }
