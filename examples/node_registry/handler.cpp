@@ -102,10 +102,44 @@ std::string ToFullPath(const std::string& path)
     return error ? path : full.string();
 }
 
+// The status of a database, beside it unless a directory is given.
+std::string StatusPathOf(const std::string& database, const std::string& directory)
+{
+    const std::filesystem::path file(database);
+    const std::filesystem::path place =
+        directory.empty() ? file.parent_path() : std::filesystem::path(ToFullPath(directory));
+    return place / (file.filename().string() + ".status");
+}
+
+// The lock that keeps other exports and restores away. It is freed by name: closing the file alone
+// would leave it to a child of another thread's that was forked meanwhile.
+class Exclusion {
+  public:
+    explicit Exclusion(const std::string& name)
+        : lock(name), isHeld(lock.lock(LockAlone, LockRetries))
+    {
+    }
+    Exclusion(const Exclusion&) = delete;
+    Exclusion& operator=(const Exclusion&) = delete;
+    ~Exclusion()
+    {
+        if (isHeld) lock.unlock();
+    }
+
+    bool IsHeld() const { return isHeld; }
+
+  private:
+    FileLock lock;
+    bool isHeld;
+};
+
 }  // namespace
 
-Handler::Handler(const std::string& database, long statusTimeoutSeconds)
-    : registry(database), fullPath(ToFullPath(database)), statusTimeout(statusTimeoutSeconds)
+Handler::Handler(const Settings& settings)
+    : registry(settings.database),
+      fullPath(ToFullPath(settings.database)),
+      statusPath(StatusPathOf(fullPath, settings.statusDirectory)),
+      statusTimeout(settings.statusTimeout)
 {
 }
 
@@ -217,22 +251,22 @@ Json::Value Handler::List(const Json::Value& params)
     return Success(data);
 }
 
-Json::Value Handler::Status(const Json::Value& params) const
+Json::Value Handler::Status(const Json::Value& params)
 {
     Parameters parameters(params);
     if (!parameters.AreOnly({})) return BadParameter(parameters);
-    if (!StatusCache::IsUsable(fullPath)) {
+    if (!StatusCache::IsUsable(statusPath)) {
         return Failure(ERR::ERR_NO_PERMISSION,
                        Reason("status", "has no directory or no lock that may be used"));
     }
-    const StatusCache cache(fullPath, statusTimeout);
+    const StatusCache cache(statusPath, statusTimeout, registry);
     Json::Value status = cache.Read();
     if (cache.IsValidData(status)) {
         const Json::Int64 age = std::time(nullptr) - status["time"].asInt64();
         status["age"] = std::max(age, Json::Int64{0});
         return Success(status);
     }
-    if (cache.GetErrCode() != 0) return Failure(cache.GetErrCode(), cache.GetErr());
+    if (cache.HasFailedToList()) return RegistryFailure();
     return Failure(ERR::ERR_NODE_GET, Reason("status", "could not be taken or stored"));
 }
 
@@ -280,8 +314,8 @@ Json::Value Handler::Export(const Json::Value& params)
         return BadParameter(parameters);
     }
     if (!IsWritable(file, fullPath)) return BadFile("is the database, or no regular file");
-    FileLock lock(fullPath + ".lock");
-    if (!lock.lock(LockAlone, LockRetries)) return NotAlone(ERR::ERR_NODE_GET);
+    const Exclusion exclusion(fullPath + ".lock");
+    if (!exclusion.IsHeld()) return NotAlone(ERR::ERR_NODE_GET);
 
     std::vector<Node> nodes;
     if (!registry.List("", nodes)) return RegistryFailure();
@@ -299,8 +333,8 @@ Json::Value Handler::Restore(const Json::Value& params)
         return BadParameter(parameters);
     }
     if (!IsReadable(file)) return BadFile("cannot be read");
-    FileLock lock(fullPath + ".lock");
-    if (!lock.lock(LockAlone, LockRetries)) return NotAlone(ERR::ERR_NODE_SET);
+    const Exclusion exclusion(fullPath + ".lock");
+    if (!exclusion.IsHeld()) return NotAlone(ERR::ERR_NODE_SET);
 
     Json::Value document;
     if (!File::Read(file, document)) return BadFile("cannot be read, or is no JSON document");

@@ -7,14 +7,14 @@
 #include <json/value.h>
 
 #include "registry.h"
+#include "settings.h"
 
 namespace NodeRegistry {
 
+// A handler is used by one thread at a time; each thread of a service has its own.
 class Handler {
   public:
-    // `database` is the file that keeps the nodes; a status older than `statusTimeoutSeconds` is
-    // taken anew.
-    Handler(const std::string& database, long statusTimeoutSeconds);
+    explicit Handler(const Settings& settings);
 
     // Answers every line, whatever it holds.
     Json::Value Answer(const std::string& line);
@@ -25,7 +25,7 @@ class Handler {
     Json::Value Set(const Json::Value& params);
     Json::Value Delete(const Json::Value& params);
     Json::Value List(const Json::Value& params);
-    Json::Value Status(const Json::Value& params) const;
+    Json::Value Status(const Json::Value& params);
     Json::Value Import(const Json::Value& params);
     Json::Value Export(const Json::Value& params);
     Json::Value Restore(const Json::Value& params);
@@ -33,7 +33,8 @@ class Handler {
     Json::Value RegistryFailure() const;
 
     Registry registry;
-    std::string fullPath;  // of the database; caches and locks are called after it
+    std::string fullPath;    // of the database; the lock of exports is called after it
+    std::string statusPath;  // of the status, without what the cache adds
     long statusTimeout;
 };
 

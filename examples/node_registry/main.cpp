@@ -41,7 +41,7 @@ int Print(const std::string& text)
 int Serve(const Options& options)
 {
     LineReader reader(options.input);
-    Handler handler(options.database, options.statusTimeout);
+    Handler handler(options.settings);
     std::string line;
     while (reader.Read(line)) {
         if (options.isPretty && Print(DescribeRequest(line) + "\n") != EXIT_SUCCESS) {
@@ -66,7 +66,7 @@ int main(int argc, char** argv)
     // A reader who has gone is a failed write like any other, not the end by a signal.
     static_cast<void>(std::signal(SIGPIPE, SIG_IGN));
     if (options.wantsHelp) {
-        return Print(std::string(NodeRegistry::UsageText) + NodeRegistry::HelpText);
+        return Print(NodeRegistry::HelpText());
     }
     ::openlog("node_registry", LOG_PID | (options.isVerbose ? LOG_PERROR : 0), LOG_USER);
     return Serve(options);

@@ -4,12 +4,13 @@
 
 #include <string>
 
+#include "settings.h"
+
 namespace NodeRegistry {
 
 struct Options {
-    std::string database = "./node_registry.db";
+    Settings settings;
     std::string input = "-";  // standard input
-    int statusTimeout = 30;   // in seconds
     bool isVerbose = false;
     bool isPretty = false;
     bool wantsHelp = false;
@@ -18,9 +19,9 @@ struct Options {
 // False for a command line that the usage does not allow.
 bool ReadOptions(int argc, const char* const* argv, Options& ret_options);
 
-// How the program is called: in short for those who called it wrongly, and all there is to know.
+// How the program is called: in short, for those who called it wrongly, and in full.
 extern const char* const UsageText;
-extern const char* const HelpText;
+std::string HelpText();
 
 }  // namespace NodeRegistry
 

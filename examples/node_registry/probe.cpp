@@ -1,33 +1,45 @@
 #include "probe.h"
 
-#include <netdb.h>
+#include <arpa/inet.h>
+#include <netinet/in.h>
 #include <poll.h>
 #include <sys/socket.h>
 #include <sys/statvfs.h>
 #include <unistd.h>
 
 #include <cerrno>
-#include <memory>
 
 namespace NodeRegistry {
 
 namespace {
 
-struct FreeAddress {
-    void operator()(addrinfo* address) const { ::freeaddrinfo(address); }
+// A socket address of either family.
+struct Endpoint {
+    sockaddr_storage address{};
+    socklen_t size = 0;
 };
-using Address = std::unique_ptr<addrinfo, FreeAddress>;
 
-// Null for what is no numeric address. Nothing is looked up, not even "localhost".
-Address ToAddress(const std::string& address, int port)
+// Fills `endpoint` from a numeric address. No name is looked up, not even "localhost", and no lock
+// is taken, which getaddrinfo() does: this may run in a forked child.
+bool ToEndpoint(const std::string& address, int port, Endpoint& endpoint)
 {
-    addrinfo hints{};
-    hints.ai_flags = AI_NUMERICHOST | AI_NUMERICSERV;
-    hints.ai_socktype = SOCK_STREAM;
     const std::string host = address == "localhost" ? "127.0.0.1" : address;
-    addrinfo* found = nullptr;
-    if (::getaddrinfo(host.c_str(), std::to_string(port).c_str(), &hints, &found) != 0) return {};
-    return Address(found);
+    const in_port_t networkPort = htons(static_cast<in_port_t>(port));
+    auto* ipv4 = reinterpret_cast<sockaddr_in*>(&endpoint.address);
+    if (::inet_pton(AF_INET, host.c_str(), &ipv4->sin_addr) == 1) {
+        ipv4->sin_family = AF_INET;
+        ipv4->sin_port = networkPort;
+        endpoint.size = sizeof *ipv4;
+        return true;
+    }
+    auto* ipv6 = reinterpret_cast<sockaddr_in6*>(&endpoint.address);
+    if (::inet_pton(AF_INET6, host.c_str(), &ipv6->sin6_addr) == 1) {
+        ipv6->sin6_family = AF_INET6;
+        ipv6->sin6_port = networkPort;
+        endpoint.size = sizeof *ipv6;
+        return true;
+    }
+    return false;
 }
 
 // Whether a connection that is being made comes about in time.
@@ -40,12 +52,13 @@ bool IsMade(int fd)
     return ::getsockopt(fd, SOL_SOCKET, SO_ERROR, &error, &size) == 0 && error == 0;
 }
 
-bool Accepts(const addrinfo& address)
+bool Accepts(const Endpoint& endpoint)
 {
-    const int fd = ::socket(address.ai_family, SOCK_STREAM | SOCK_NONBLOCK | SOCK_CLOEXEC, 0);
+    const auto* address = reinterpret_cast<const sockaddr*>(&endpoint.address);
+    const int fd = ::socket(address->sa_family, SOCK_STREAM | SOCK_NONBLOCK | SOCK_CLOEXEC, 0);
     if (fd < 0) return false;
-    const bool isConnected = ::connect(fd, address.ai_addr, address.ai_addrlen) == 0 ||
-                             (errno == EINPROGRESS && IsMade(fd));
+    const bool isConnected =
+        ::connect(fd, address, endpoint.size) == 0 || (errno == EINPROGRESS && IsMade(fd));
     ::close(fd);
     return isConnected;
 }
@@ -54,9 +67,9 @@ bool Accepts(const addrinfo& address)
 
 Json::Value ProbeAddress(const std::string& address, int port)
 {
-    const Address target = ToAddress(address, port);
-    if (target == nullptr) return {};
-    return Accepts(*target) ? "reachable" : "unreachable";
+    Endpoint endpoint;
+    if (!ToEndpoint(address, port, endpoint)) return {};
+    return Accepts(endpoint) ? "reachable" : "unreachable";
 }
 
 Json::Value MeasureVolume(const std::string& path)

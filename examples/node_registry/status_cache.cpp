@@ -1,14 +1,15 @@
 #include "status_cache.h"
 
+#include <unistd.h>
+
 #include <ctime>
 #include <filesystem>
 #include <system_error>
-#include <vector>
 
 #include <orvadrcore/file_lock.h>
 
+#include "child_process.h"
 #include "probe.h"
-#include "registry.h"
 
 namespace NodeRegistry {
 
@@ -19,73 +20,69 @@ namespace {
 // A registry retries by itself.
 constexpr int SingleTry = -1;
 
-// Others hold the lock alone for moments only; a second apart.
+// Others hold the lock exclusively for moments only; a second apart.
 constexpr unsigned int LockRetries = 3;
 
-std::string DirectoryOf(const std::string& database)
+std::string DirectoryOf(const std::string& path)
 {
-    return std::filesystem::path(database).parent_path();
+    return std::filesystem::path(path).parent_path();
 }
 
-std::string NameOf(const std::string& database)
+std::string NameOf(const std::string& path)
 {
-    return std::filesystem::path(database).filename().string() + ".status";
-}
-
-// As the cache calls its lock.
-std::string LockNameOf(const std::string& database)
-{
-    return DirectoryOf(database) + "/" + NameOf(database) + ".cached.lock";
+    return std::filesystem::path(path).filename();
 }
 
 }  // namespace
 
-bool StatusCache::IsUsable(const std::string& database)
+bool StatusCache::IsUsable(const std::string& path)
 {
     std::error_code ignored;
-    if (!std::filesystem::is_directory(DirectoryOf(database), ignored)) return false;
-    // The first opening may make the file. An ordinary user could not open it again, which the
-    // cache does all the time, so it is the second one that counts.
-    FileLock maker(LockNameOf(database));
-    FileLock lock(LockNameOf(database));
-    return maker.openLockedFile() && lock.lock(LOCK_SH | LOCK_NB, LockRetries);
+    if (!std::filesystem::is_directory(DirectoryOf(path), ignored)) return false;
+    // The cache opens its lock file again and again. An ordinary user can make the file, but not
+    // open it a second time.
+    const std::string name = path + ".cached.lock";
+    FileLock maker(name);
+    FileLock lock(name);
+    if (!maker.openLockedFile() || !lock.lock(LOCK_SH | LOCK_NB, LockRetries)) return false;
+    lock.unlock();  // closing is not enough: a child that was just forked has the file open, too
+    return true;
 }
 
-StatusCache::StatusCache(const std::string& path, long timeoutSeconds)
-    : Cache(DirectoryOf(path), NameOf(path), timeoutSeconds, false, SingleTry),
-      database(path),
-      isAlwaysOld(timeoutSeconds == 0)
+StatusCache::StatusCache(const std::string& file, long timeoutSeconds, Registry& nodes)
+    : Cache(DirectoryOf(file), NameOf(file), timeoutSeconds, false, SingleTry),
+      path(file),
+      isAlwaysOld(timeoutSeconds == 0),
+      owner(::getpid()),
+      registry(nodes)
 {
 }
 
 Json::Value StatusCache::GetInfo() const
 {
-    return "status of the nodes in " + database;
+    return "node status " + path;
 }
 
-// May run in a child, where the caller's connection must not be used: it opens its own, and closes
-// it before the slow part. The nodes are probed one after the other: those that are silent cost
-// ProbeTimeoutMSec each.
+bool StatusCache::IsUpdatedDataRequired() const
+{
+    listing = registry.List("", listed) ? Listing::Done : Listing::Failed;
+    return Cache::IsUpdatedDataRequired();
+}
+
+// The nodes are probed one after the other: those that are silent cost ProbeTimeoutMSec each.
 bool StatusCache::GetUpdatedData(Json::Value& data) const
 {
+    if (::getpid() != owner) LeaveServer();
+    if (listing != Listing::Done) return false;
     const std::time_t begin = std::time(nullptr);
-    std::vector<Node> nodes;
-    {
-        Registry registry(database);
-        if (!registry.List("", nodes)) {
-            errCode = registry.GetErrCode();
-            err = registry.GetErr();
-            return false;
-        }
-    }
     Json::Value volumes(Json::objectValue);
     Json::Value probes(Json::objectValue);
-    for (const Node& node : nodes) {
+    for (const Node& node : listed) {
         if (!volumes.isMember(node.volume)) volumes[node.volume] = MeasureVolume(node.volume);
         if (node.enabled) probes[node.name] = ProbeAddress(node.address, node.port);
     }
     data["time"] = Json::Int64{begin};
-    data["total"] = static_cast<Json::UInt>(nodes.size());
+    data["total"] = static_cast<Json::UInt>(listed.size());
     data["enabled"] = probes.size();
     data["volumes"] = volumes;
     data["probes"] = probes;

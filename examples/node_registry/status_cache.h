@@ -4,43 +4,59 @@
 //      "volumes":{"/volume1/replica":{"used":bytes,"free":bytes},"/volume9":null},
 //      "probes":{"backup-01":"reachable"}}
 //
-// Of two handlers that need one at the same time one takes it. Later ones get the last one at once,
-// and when it is old a child takes a new one meanwhile.
+// Of several handlers that need one at the same time, one takes it. Later ones get the last one at
+// once; when it is old, a child takes a new one meanwhile.
 #ifndef NODE_REGISTRY_STATUS_CACHE_H
 #define NODE_REGISTRY_STATUS_CACHE_H
 
+#include <sys/types.h>
+
 #include <string>
+#include <vector>
 
 #include <json/value.h>
 
 #include <orvadrcore/cache.h>
 
+#include "registry.h"
+
 namespace NodeRegistry {
 
 class StatusCache : public OrvaDRCore::Cache {
   public:
-    // Whether the cache of a database has its directory and a lock that this user can open. To be
-    // asked first: without the lock, Read() waits without end.
-    static bool IsUsable(const std::string& database);
+    // Whether the cache has its directory and a lock that this user can open. To be asked first:
+    // without the lock, Read() waits without end.
+    static bool IsUsable(const std::string& path);
 
-    // `path` is the database's, in full, and the cache file `path` + ".status.cached". A status
-    // older than `timeoutSeconds` is old; with 0 each one is, however new.
-    StatusCache(const std::string& path, long timeoutSeconds);
+    // The cache file is `path` + ".cached", in full. A status older than `timeoutSeconds` is old;
+    // with 0 each one is, however new. The nodes come out of `nodes`, which must outlive the cache.
+    StatusCache(const std::string& path, long timeoutSeconds, Registry& nodes);
 
     Json::Value GetInfo() const override;
-    bool GetUpdatedData(Json::Value& data) const override;
     bool IsValidData(const Json::Value& data) const override;
     bool IsNeedUpdate(const Json::Value& data) const override;
 
-    // Why this process could not take a status; 0 and null when it did not try, or could.
-    int GetErrCode() const { return errCode; }
-    const Json::Value& GetErr() const { return err; }
+    // Lists the nodes, too. The caller is asked this before a refresh and before the fork for one:
+    // the last moment at which its database may be used. See GetUpdatedData().
+    bool IsUpdatedDataRequired() const override;
+
+    // Probes the nodes. Uses no database, not even one that it opens itself: it may run in a child
+    // of a process with threads, where SQLite's mutexes and its notes about locked files are as the
+    // other threads had them at the fork. The child would wait for ever, or read unlocked.
+    bool GetUpdatedData(Json::Value& data) const override;
+
+    // Whether the last refresh failed because the nodes could not be listed; the registry says why.
+    bool HasFailedToList() const { return listing == Listing::Failed; }
 
   private:
-    std::string database;
+    enum class Listing { None, Done, Failed };
+
+    std::string path;
     bool isAlwaysOld;
-    mutable int errCode = 0;
-    mutable Json::Value err;
+    pid_t owner;
+    Registry& registry;
+    mutable Listing listing = Listing::None;
+    mutable std::vector<Node> listed;
 };
 
 }  // namespace NodeRegistry

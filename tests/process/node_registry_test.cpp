@@ -28,8 +28,9 @@ using ::testing::StartsWith;
 
 constexpr const char* ProgramFile = NODE_REGISTRY_PROGRAM;
 constexpr const char* Usage =
-    "usage: node_registry [--db FILE] [--status-timeout SECONDS] [--verbose]\n"
-    "                     [--pretty] [--help] [INPUT]\n";
+    "usage: node_registry [--db FILE] [--status-timeout SECONDS]\n"
+    "                     [--status-dir DIRECTORY] [--verbose] [--pretty] [--help]\n"
+    "                     [INPUT]\n";
 constexpr const char* Injection = "x'; DROP TABLE nodes; --";
 constexpr const char* UnknownId = "00000000-0000-4000-8000-000000000000";
 
@@ -593,6 +594,8 @@ TEST_F(NodeRegistryTest, WrongOptionsGetTheUsage)
         {"--status-timeout", "-1"},
         {"--status-timeout", "1s"},
         {"--status-timeout", "99999999999"},
+        {"--status-dir"},
+        {"--status-dir", ""},
     };
     for (const std::vector<std::string>& options : rows) {
         const ProgramResult result = Run(options);
@@ -610,6 +613,7 @@ TEST_F(NodeRegistryTest, HelpNamesEverything)
     EXPECT_THAT(result.out, StartsWith(Usage));
     for (const char* word : {"--db FILE",
                              "--status-timeout SECONDS",
+                             "--status-dir DIRECTORY",
                              "--verbose",
                              "--pretty",
                              "--help",
