@@ -5,7 +5,8 @@ cd "$(dirname "${BASH_SOURCE[0]}")/.."
 
 # What the library and its examples are built with and run with.
 # shellcheck disable=SC2034  # used by the scripts that read this file
-build_packages=(g++ make cmake libsqlite3-dev libjsoncpp-dev uuid-runtime)
+build_packages=(g++ make cmake libsqlite3-dev libjsoncpp-dev uuid-runtime
+    libcpp-httplib-dev pkg-config) # these two for examples/node_service
 # shellcheck disable=SC2034
 test_packages=(libgtest-dev libgmock-dev)
 # shellcheck disable=SC2034

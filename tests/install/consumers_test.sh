@@ -57,6 +57,11 @@ quietly cmake -S "$prefix/share/doc/liborvadrcore-examples/examples" -B "$work/e
     -DCMAKE_PREFIX_PATH="$prefix"
 quietly cmake --build "$work/examples" -j "$(nproc)"
 (cd "$work" && examples/quick_start >/dev/null)
+[[ -x $work/examples/node_service ]]
+step "the installed examples without cpp-httplib"
+quietly cmake -S "$prefix/share/doc/liborvadrcore-examples/examples" -B "$work/fewer" \
+    -DCMAKE_PREFIX_PATH="$prefix" -DCMAKE_DISABLE_FIND_PACKAGE_PkgConfig=ON
+grep -q 'node_service is left out' "$work/log"
 
 step "the lock directory at boot"
 grep '^d /tmp/.orvadr_lock ' "$prefix/lib/tmpfiles.d/orvadrcore.conf" |

@@ -126,6 +126,11 @@ void Program::CloseOutput()
     Close(out);
 }
 
+void Program::Kill(int signal) const
+{
+    ::kill(pid, signal);
+}
+
 ProgramResult Program::Finish()
 {
     isInputComplete = true;

@@ -44,6 +44,11 @@ class Program {
     // Closes our end of its standard output.
     void CloseOutput();
 
+    pid_t Pid() const { return pid; }
+
+    // Sends it a signal.
+    void Kill(int signal) const;
+
     // Ends its input and waits for its end. The result has the output that no ReadLine took.
     ProgramResult Finish();
 
