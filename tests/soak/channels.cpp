@@ -1,0 +1,188 @@
+#include "channels.h"
+
+#include <poll.h>
+#include <unistd.h>
+
+#include <array>
+#include <cerrno>
+#include <utility>
+
+#include <orvadrcore/response.h>
+
+#include "examples/node_registry/json_line.h"
+#include "support/http_client.h"
+
+namespace Soak {
+
+using OrvaDRCore::Response;
+
+namespace {
+
+// No answer comes so late: who has none by then never gets one.
+constexpr seconds Patience{60};
+
+constexpr milliseconds AwaitFresh{100};
+constexpr int BadParameter = 401;
+
+Answer Told(const std::string& text)
+{
+    Answer answer;
+    answer.outcome = Answer::Outcome::Told;
+    if (!NodeRegistry::ParseLine(text, answer.reply)) answer.reply = text;
+    return answer;
+}
+
+Answer Lost()
+{
+    return {Answer::Outcome::Lost, {}};
+}
+
+void ReportNoAnswer(Findings& findings, const std::string& who)
+{
+    findings.Add(Promise::Waits,
+                 who + ": no answer within " + std::to_string(Patience.count()) + " s");
+}
+
+// What is no request to the registry, and the HTTP status that it has to get.
+struct Oddity {
+    std::string bytes;
+    int status;
+};
+
+Oddity OddityOf(int which)
+{
+    constexpr std::size_t TooLarge = 1'100'000;
+    switch (which % 4) {
+        case 0: return {HttpRequest("POST", "/webapi", "{\"api\":"), 200};
+        case 1: return {HttpRequest("POST", "/nowhere", "{}"), 404};
+        case 2: return {HttpRequest("GET", "/webapi", ""), 405};
+        default: return {HttpRequest("POST", "/webapi", std::string(TooLarge, ' ')), 413};
+    }
+}
+
+}  // namespace
+
+HttpChannel::HttpChannel(int servicePort, Findings& where) : port(servicePort), findings(where) {}
+
+Answer HttpChannel::Ask(const std::string& request)
+{
+    const auto begin = Clock::now();
+    const HttpConnection connection(port, Patience);
+    if (!connection.IsOpen()) return {};
+    connection.Send(HttpRequest("POST", "/webapi", request));
+    const HttpReply reply = connection.Receive();
+    if (reply.status == 200) return Told(reply.body);
+    if (Clock::now() - begin >= Patience) ReportNoAnswer(findings, request);
+    if (reply.status != 0) {
+        findings.Add(Promise::Answers, request + " got HTTP " + std::to_string(reply.status));
+    }
+    return Lost();
+}
+
+std::optional<bool> HttpChannel::AskNonsense(int which)
+{
+    const HttpConnection connection(port, Patience);
+    if (!connection.IsOpen()) return std::nullopt;
+    const Oddity oddity = OddityOf(which);
+    connection.Send(oddity.bytes);
+    const HttpReply reply = connection.Receive();
+    if (reply.status == 0) return std::nullopt;
+    return reply.status == oddity.status && !Response(reply.body).isSuccess();
+}
+
+LineChannel::LineChannel(std::string who, Findings& where) : name(std::move(who)), findings(where)
+{
+}
+
+LineChannel::~LineChannel()
+{
+    CloseCurrent();
+}
+
+void LineChannel::Give(Pipes fresh)
+{
+    const std::lock_guard<std::mutex> lock(mutex);
+    given = fresh;
+    changed.notify_all();
+}
+
+void LineChannel::Close()
+{
+    if (current.in < 0) TakeFresh();
+    if (current.in >= 0) ::close(current.in);
+    current.in = -1;
+}
+
+Answer LineChannel::Ask(const std::string& request)
+{
+    if (current.in < 0 && !TakeFresh()) return {};
+    if (!Write(request + "\n")) {
+        CloseCurrent();
+        return Lost();
+    }
+    const std::optional<std::string> line = ReadLine();
+    return line ? Told(*line) : Lost();
+}
+
+std::optional<bool> LineChannel::AskNonsense(int /*which*/)
+{
+    const Answer answer = Ask("{\"api\":");
+    if (answer.outcome != Answer::Outcome::Told) return std::nullopt;
+    return Response(answer.reply).getErrCode() == BadParameter;
+}
+
+std::optional<std::string> LineChannel::ReadLine()
+{
+    if (current.out < 0 && !TakeFresh()) return std::nullopt;
+    std::size_t end = unread.find('\n');
+    while (end == std::string::npos) {
+        pollfd waiting{current.out, POLLIN, 0};
+        if (::poll(&waiting, 1, static_cast<int>(milliseconds(Patience).count())) == 0) {
+            ReportNoAnswer(findings, name);
+        }
+        std::array<char, 16384> buffer{};
+        const ssize_t count =
+            waiting.revents == 0 ? 0 : ::read(current.out, buffer.data(), buffer.size());
+        if (count <= 0) {
+            CloseCurrent();
+            return std::nullopt;
+        }
+        unread.append(buffer.data(), static_cast<std::size_t>(count));
+        end = unread.find('\n');
+    }
+    std::string line = unread.substr(0, end);
+    unread.erase(0, end + 1);
+    return line;
+}
+
+// Takes over the pipes of the next process, if there is one soon.
+bool LineChannel::TakeFresh()
+{
+    std::unique_lock<std::mutex> lock(mutex);
+    if (!changed.wait_for(lock, AwaitFresh, [this] { return given.has_value(); })) return false;
+    current = *given;
+    given.reset();
+    return true;
+}
+
+bool LineChannel::Write(const std::string& text) const
+{
+    std::size_t written = 0;
+    while (written < text.size()) {
+        const ssize_t count = ::write(current.in, text.data() + written, text.size() - written);
+        if (count < 0 && errno == EINTR) continue;
+        if (count <= 0) return false;
+        written += static_cast<std::size_t>(count);
+    }
+    return true;
+}
+
+void LineChannel::CloseCurrent()
+{
+    if (current.in >= 0) ::close(current.in);
+    if (current.out >= 0) ::close(current.out);
+    current = {};
+    unread.clear();
+}
+
+}  // namespace Soak

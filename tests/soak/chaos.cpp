@@ -1,0 +1,122 @@
+#include "chaos.h"
+
+#include <fcntl.h>
+#include <signal.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <array>
+#include <fstream>
+
+namespace Soak {
+
+namespace {
+
+enum class Event {
+    KillService,
+    KillRegistry,
+    KillOtherRegistry,
+    KillNeighbour,
+    KillRefresh,
+    FillDisk,
+    HoldLock
+};
+
+// Every event meets every other one sooner or later: the disk stays full beyond the next event.
+constexpr std::array<Event, 12> Order = {
+    Event::HoldLock,    Event::KillService,       Event::FillDisk,      Event::KillRegistry,
+    Event::KillRefresh, Event::HoldLock,          Event::KillNeighbour, Event::FillDisk,
+    Event::KillService, Event::KillOtherRegistry, Event::KillRefresh,   Event::KillNeighbour};
+
+std::string Ballast(const Plan& plan)
+{
+    return plan.StatusDirectory() + "/ballast";
+}
+
+}  // namespace
+
+Chaos::Chaos(const Plan& thePlan, Company& theCompany, Reaper& theReaper)
+    : plan(thePlan), company(theCompany), reaper(theReaper)
+{
+}
+
+void Chaos::Step(bool areSurvivorsSpared)
+{
+    const auto now = Clock::now();
+    if (isDiskFull && now >= diskEmptyDue) EmptyDisk();
+    if (now < due) return;
+    due = now + EventEvery;
+    switch (Order.at(next++ % Order.size())) {
+        case Event::KillService:
+            return areSurvivorsSpared ? KillRefresh() : KillSome(company.Service());
+        case Event::KillRegistry: return KillSome(company.Registry(areSurvivorsSpared ? 1 : 0));
+        case Event::KillOtherRegistry: return KillSome(company.Registry(1));
+        case Event::KillNeighbour: return KillSome(company.Neighbour());
+        case Event::KillRefresh: return KillRefresh();
+        case Event::FillDisk: return FillDisk();
+        case Event::HoldLock: return HoldLock();
+    }
+}
+
+void Chaos::Calm()
+{
+    if (isDiskFull) EmptyDisk();
+    if (holder) static_cast<void>(reaper.AwaitEnd(*holder, plan.bounds.end));
+}
+
+void Chaos::KillSome(Member& member)
+{
+    member.Kill();
+}
+
+// Whoever is marked as refreshing, unless that is a member, which refreshes in itself when there is no
+// status yet.
+void Chaos::KillRefresh()
+{
+    pid_t updater = 0;
+    const auto deadline = Clock::now() + EventEvery;
+    while (updater == 0 && Clock::now() < deadline) {
+        std::ifstream(plan.StatusFile() + ".pid") >> updater;
+    }
+    // Whatever stands in that file, nobody but our own processes is killed.
+    if (updater <= 0 || CommandOf(updater).find(plan.directory) == std::string::npos) return;
+    for (const auto& member : company.Members()) {
+        if (member->Pid() == updater) return;
+    }
+    if (::kill(updater, SIGKILL) == 0) ++events.refreshesKilled;
+}
+
+void Chaos::FillDisk()
+{
+    const int file = ::open(Ballast(plan).c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0600);
+    const std::array<char, 512> block{};
+    while (::write(file, block.data(), block.size()) > 0) {
+    }
+    ::close(file);
+    isDiskFull = true;
+    diskEmptyDue = Clock::now() + DiskIsFull;
+    ++events.disksFilled;
+}
+
+void Chaos::EmptyDisk()
+{
+    ::unlink(Ballast(plan).c_str());
+    isDiskFull = false;
+}
+
+void Chaos::HoldLock()
+{
+    if (holder) {
+        const auto end = reaper.EndOf(*holder);
+        if (!end) return;  // still waiting for the last one
+        if (!WIFEXITED(*end) || WEXITSTATUS(*end) != 0) ++events.locksMissed;
+    }
+    Pipes pipes;
+    holder =
+        StartProgram({"/proc/self/exe", "--hold", plan.Database()}, plan.LogFile("holder"), pipes);
+    ::close(pipes.in);
+    ::close(pipes.out);
+    ++events.locksHeld;
+}
+
+}  // namespace Soak

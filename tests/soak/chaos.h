@@ -1,0 +1,56 @@
+// What goes wrong during a soak, one thing every few seconds.
+#ifndef ORVADRCORE_TESTS_SOAK_CHAOS_H
+#define ORVADRCORE_TESTS_SOAK_CHAOS_H
+
+#include <atomic>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "company.h"
+#include "plan.h"
+
+namespace Soak {
+
+// How often what happened.
+struct Events {
+    int refreshesKilled = 0;
+    int disksFilled = 0;
+    int locksHeld = 0;
+    int locksMissed = 0;  // the lock was not to be had
+};
+
+class Chaos {
+  public:
+    Chaos(const Plan& plan, Company& company, Reaper& reaper);
+
+    // Does what is due. From the survivors' time on the service and the first registry are spared.
+    void Step(bool areSurvivorsSpared);
+
+    // Ends what still goes on.
+    void Calm();
+
+    bool IsDiskFull() const { return isDiskFull; }
+    const Events& GetEvents() const { return events; }
+
+  private:
+    void KillSome(Member& member);
+    void KillRefresh();
+    void FillDisk();
+    void EmptyDisk();
+    void HoldLock();
+
+    const Plan& plan;
+    Company& company;
+    Reaper& reaper;
+    Events events;
+    std::size_t next = 0;
+    Clock::time_point due = Clock::now();
+    Clock::time_point diskEmptyDue;
+    std::atomic<bool> isDiskFull{false};
+    std::optional<pid_t> holder;
+};
+
+}  // namespace Soak
+
+#endif

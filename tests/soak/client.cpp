@@ -1,0 +1,281 @@
+#include "client.h"
+
+#include <algorithm>
+#include <thread>
+#include <utility>
+
+#include <orvadrcore/errors.h>
+#include <orvadrcore/response.h>
+
+#include "examples/node_registry/json_line.h"
+
+namespace Soak {
+
+using OrvaDRCore::ERR;
+using OrvaDRCore::Response;
+
+namespace {
+
+// How often a client asks for what, of a hundred requests.
+struct Share {
+    Kind kind;
+    int percent;
+};
+constexpr Share Shares[] = {{Kind::Create, 30}, {Kind::Get, 35}, {Kind::Set, 10},
+                            {Kind::Delete, 10}, {Kind::List, 5}, {Kind::Status, 8},
+                            {Kind::Nonsense, 2}};
+
+constexpr int MaxPort = 65535;
+constexpr milliseconds TryAgain{5};  // where nobody listens
+
+Kind KindAt(int percent)
+{
+    for (const Share& share : Shares) {
+        percent -= share.percent;
+        if (percent < 0) return share.kind;
+    }
+    return Kind::Get;
+}
+
+Json::Value Named(const std::string& name)
+{
+    Json::Value parameters(Json::objectValue);
+    parameters["name"] = name;
+    return parameters;
+}
+
+// Of the nodes of which it is not known whether they are there, every other one stays as it is until the
+// end; the rest are asked for again.
+bool IsToBeRetried(const Ledger::value_type& node)
+{
+    const auto& [name, account] = node;
+    return account.state == State::Unknown && (name.back() - '0') % 2 == 0;
+}
+
+bool IsTold(const Answer& answer)
+{
+    return answer.outcome == Answer::Outcome::Told;
+}
+
+}  // namespace
+
+const char* NameOf(Kind kind)
+{
+    constexpr std::array<const char*, Kinds> names = {"create", "get",    "set",     "delete",
+                                                      "list",   "status", "nonsense"};
+    return names.at(static_cast<std::size_t>(kind));
+}
+
+Client::Client(const std::string& clientName, Ask how, AskNonsense howNonsense,
+               const Bounds& limits, Findings& where)
+    : name(clientName),
+      ask(std::move(how)),
+      nonsense(std::move(howNonsense)),
+      bounds(limits),
+      findings(where),
+      random(static_cast<unsigned int>(std::hash<std::string>()(clientName)))
+{
+}
+
+void Client::ForgetGap()
+{
+    lastAnswer = Clock::now();
+}
+
+std::size_t Client::CountAnswers() const
+{
+    std::size_t count = 0;
+    for (const auto& times : notes.microseconds) count += times.size();
+    return count;
+}
+
+void Client::AskOne()
+{
+    Node* node = PickStored();
+    switch (KindAt(Random(99))) {
+        case Kind::Create: return Create();
+        case Kind::Get: return node != nullptr ? Get(*node) : Create();
+        case Kind::Set: return node != nullptr ? Set(*node) : Create();
+        case Kind::Delete: return node != nullptr ? Delete(*node) : Create();
+        case Kind::List: return ListSome();
+        case Kind::Status: return Status();
+        case Kind::Nonsense: return Nonsense();
+    }
+}
+
+// A new node, or one that is asked for again.
+void Client::Create()
+{
+    const auto unknown = std::find_if(ledger.begin(), ledger.end(), IsToBeRetried);
+    if (unknown != ledger.end() && Random(1) == 0) return CreateAs(*unknown);
+
+    const auto isStored = [](const Node& node) { return node.second.state == State::Stored; };
+    if (std::count_if(ledger.begin(), ledger.end(), isStored) >= LiveNodes) {
+        return Delete(*PickStored());
+    }
+    const auto [node, isNew] = ledger.try_emplace(name + "-" + std::to_string(++made));
+    node->second.ports = {Random(MaxPort - 1) + 1};
+    CreateAs(*node);
+}
+
+void Client::CreateAs(Node& node)
+{
+    auto& [nodeName, account] = node;
+    Json::Value parameters = Named(nodeName);
+    parameters["address"] = "127.0.0.1";
+    parameters["port"] = *account.ports.begin();
+    parameters["volume"] = "/volume1/replica";
+    parameters["enabled"] = Random(9) == 0;
+    const Answer answer = Request(Kind::Create, "create", parameters);
+    if (answer.outcome == Answer::Outcome::Lost) account = {State::Unknown, "", account.ports};
+    if (!IsTold(answer) || IsGivenUp(answer)) return;
+
+    const Response reply(answer.reply);
+    const bool wasUnknown = account.state == State::Unknown;
+    if (reply.isSuccess()) {
+        account = {State::Stored, reply.getDataFieldtoStr("id"), {parameters["port"].asInt()}};
+    } else if (reply.getErrCode() == ERR::ERR_NODE_EXIST && wasUnknown) {
+        account.state = State::Stored;  // made by the request whose answer was lost
+    } else {
+        ReportWrong("create " + nodeName, answer);
+    }
+}
+
+void Client::Get(const Node& node)
+{
+    const auto& [nodeName, account] = node;
+    const Answer answer = Request(Kind::Get, "get", Named(nodeName));
+    if (!IsTold(answer) || IsGivenUp(answer)) return;
+
+    const Response reply(answer.reply);
+    const Json::Value& found = reply.getData();
+    const bool isRight = reply.isSuccess() && found["name"] == nodeName &&
+                         account.ports.count(found["port"].asInt()) == 1 &&
+                         (account.id.empty() || found["id"] == account.id);
+    if (!isRight) ReportWrong("get " + nodeName, answer);
+}
+
+void Client::Set(Node& node)
+{
+    auto& [nodeName, account] = node;
+    Json::Value parameters = Named(nodeName);
+    const int port = Random(MaxPort - 1) + 1;
+    parameters["port"] = port;
+    const Answer answer = Request(Kind::Set, "set", parameters);
+    if (answer.outcome == Answer::Outcome::Lost) account.ports.insert(port);
+    if (!IsTold(answer) || IsGivenUp(answer)) return;
+    if (!Response(answer.reply).isSuccess()) return ReportWrong("set " + nodeName, answer);
+    account.ports = {port};
+}
+
+void Client::Delete(Node& node)
+{
+    auto& [nodeName, account] = node;
+    const Answer answer = Request(Kind::Delete, "delete", Named(nodeName));
+    if (answer.outcome == Answer::Outcome::Lost) account.state = State::Unknown;
+    if (!IsTold(answer) || IsGivenUp(answer)) return;
+    if (!Response(answer.reply).isSuccess()) return ReportWrong("delete " + nodeName, answer);
+    account.state = State::Absent;
+}
+
+// The nodes of this client by their ids: all that are stored, and no others.
+void Client::ListSome()
+{
+    Json::Value ids(Json::arrayValue);
+    for (const auto& [nodeName, account] : ledger) {
+        if (account.state == State::Stored && !account.id.empty()) ids.append(account.id);
+    }
+    Json::Value parameters(Json::objectValue);
+    parameters["filter"]["ids"] = ids;
+    const Answer answer = Request(Kind::List, "list", parameters);
+    if (!IsTold(answer) || IsGivenUp(answer)) return;
+    const Response reply(answer.reply);
+    if (!reply.isSuccess() || reply.getDataField("nodes").size() != ids.size()) {
+        ReportWrong("list of " + std::to_string(ids.size()), answer);
+    }
+}
+
+void Client::Status()
+{
+    const Answer answer = Request(Kind::Status, "status", Json::Value());
+    if (!IsTold(answer) || IsGivenUp(answer)) return;
+    if (!Response(answer.reply).isSuccess()) ReportWrong("status", answer);
+}
+
+void Client::Nonsense()
+{
+    Measure(Kind::Nonsense, [this]() -> Answer {
+        const std::optional<bool> isRight = nonsense(Random(3));
+        if (!isRight) return {};
+        if (!*isRight) findings.Add(Promise::Answers, name + ": nonsense got a wrong answer");
+        return {Answer::Outcome::Told, {}};
+    });
+}
+
+Client::Node* Client::PickStored()
+{
+    std::vector<Node*> stored;
+    for (Node& node : ledger) {
+        if (node.second.state == State::Stored) stored.push_back(&node);
+    }
+    if (stored.empty()) return nullptr;
+    return stored.at(static_cast<std::size_t>(Random(static_cast<int>(stored.size()) - 1)));
+}
+
+Answer Client::Request(Kind kind, const std::string& method, const Json::Value& parameters)
+{
+    Json::Value request = parameters;
+    request["api"] = "DR.Node";
+    request["version"] = 1;
+    request["method"] = method;
+    return Measure(kind, [&] { return ask(NodeRegistry::ToLine(request)); });
+}
+
+template <class Operation>
+Answer Client::Measure(Kind kind, Operation operation)
+{
+    const auto start = Clock::now();
+    Answer answer = operation();
+    const auto end = Clock::now();
+    if (answer.outcome == Answer::Outcome::NotSent) std::this_thread::sleep_for(TryAgain);
+    if (answer.outcome == Answer::Outcome::Lost) ++notes.lost;
+    if (!IsTold(answer)) return answer;
+
+    const auto took = std::chrono::duration_cast<std::chrono::microseconds>(end - start);
+    notes.microseconds.at(static_cast<std::size_t>(kind))
+        .push_back(static_cast<std::uint32_t>(took.count()));
+    if (took > bounds.wait) {
+        const auto waited = std::chrono::duration_cast<milliseconds>(took);
+        findings.Add(Promise::Waits, name + ": " + NameOf(kind) + " took " +
+                                         std::to_string(waited.count()) + " ms");
+    }
+    notes.longestGap =
+        std::max(notes.longestGap, std::chrono::duration_cast<milliseconds>(end - lastAnswer));
+    lastAnswer = end;
+    return answer;
+}
+
+// The registry has said that it could not do it; nothing has changed then.
+bool Client::IsGivenUp(const Answer& answer)
+{
+    const int code = Response(answer.reply).getErrCode();
+    if (code != ERR::ERR_DATABASE_OPERATION && code != ERR::ERR_NODE_CREATE &&
+        code != ERR::ERR_NODE_GET && code != ERR::ERR_NO_PERMISSION) {
+        return false;
+    }
+    ++notes.givenUp[code];
+    return true;
+}
+
+void Client::ReportWrong(const std::string& what, const Answer& answer)
+{
+    findings.Add(Promise::Answers,
+                 name + ": " + what + " was answered " + NodeRegistry::ToLine(answer.reply));
+}
+
+int Client::Random(int most)
+{
+    return std::uniform_int_distribution<int>(0, most)(random);
+}
+
+}  // namespace Soak

@@ -1,0 +1,90 @@
+// Who takes part in a soak: the service, two command-line registries and a neighbour. Whoever is
+// killed is started again.
+#ifndef ORVADRCORE_TESTS_SOAK_COMPANY_H
+#define ORVADRCORE_TESTS_SOAK_COMPANY_H
+
+#include <functional>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "channels.h"
+#include "findings.h"
+#include "plan.h"
+#include "process.h"
+
+namespace Soak {
+
+// A program that runs all the time.
+class Member {
+  public:
+    struct Program {
+        std::vector<std::string> words;
+        std::string logFile;
+        std::function<bool(Pipes)> welcome;  // takes the pipes; false when the program is of no use
+        std::function<void(pid_t)> tellToEnd;
+    };
+
+    Member(std::string name, Program program, const Bounds& bounds, Reaper& reaper,
+           Findings& findings);
+
+    // Starts it, again and again as long as the bounds allow.
+    void Start();
+
+    void Kill();
+
+    // Starts it again when it has ended, which it may only do when it was killed.
+    void Tend();
+
+    // Ends it, which must come about in time and with code 0.
+    void End() const;
+
+    const std::string& Name() const { return name; }
+    pid_t Pid() const { return pid; }
+    int Kills() const { return kills; }
+    milliseconds LongestStart() const { return longestStart; }
+
+  private:
+    std::string name;
+    Program program;
+    const Bounds& bounds;
+    Reaper& reaper;
+    Findings& findings;
+    pid_t pid = -1;
+    bool isKilled = false;
+    int kills = 0;
+    milliseconds longestStart{0};
+};
+
+// All members, and the ways to them. Used by one thread, but for the channels: each has a client.
+class Company {
+  public:
+    Company(const Plan& plan, Reaper& reaper, Findings& findings);
+
+    void Start();
+    void Tend();
+    void End();
+
+    // The service first, then the registries, the neighbour last.
+    const std::vector<std::unique_ptr<Member>>& Members() const { return members; }
+    Member& Service() const { return *members.front(); }
+    Member& Registry(std::size_t index) const { return *members.at(1 + index); }
+    Member& Neighbour() const { return *members.back(); }
+
+    int Port() const { return port; }
+    LineChannel& RegistryChannel(std::size_t index) const { return *channels.at(index); }
+    LineChannel& NeighbourChannel() const { return *channels.back(); }
+
+  private:
+    void AddLineProgram(const Plan& plan, const std::string& name, std::vector<std::string> words);
+
+    Reaper& reaper;
+    Findings& findings;
+    int port;
+    std::vector<std::unique_ptr<LineChannel>> channels;
+    std::vector<std::unique_ptr<Member>> members;
+};
+
+}  // namespace Soak
+
+#endif

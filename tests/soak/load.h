@@ -1,0 +1,75 @@
+// All clients of a soak, with a thread each.
+#ifndef ORVADRCORE_TESTS_SOAK_LOAD_H
+#define ORVADRCORE_TESTS_SOAK_LOAD_H
+
+#include <atomic>
+#include <condition_variable>
+#include <functional>
+#include <memory>
+#include <mutex>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "channels.h"
+#include "client.h"
+#include "company.h"
+#include "findings.h"
+#include "plan.h"
+
+namespace Soak {
+
+// Keeps clients from beginning a request.
+class Gate {
+  public:
+    // Around a request. Entering waits while the gate is closed; whether it did.
+    bool Enter();
+    void Leave();
+
+    // Returns when no request is under way, or false when that takes too long.
+    bool Close(milliseconds patience);
+    void Open();
+
+  private:
+    std::mutex mutex;
+    std::condition_variable changed;
+    bool isClosed = false;
+    int inside = 0;
+};
+
+class Load {
+  public:
+    Load(const Plan& plan, const Company& company, Findings& findings);
+    Load(const Load&) = delete;
+    Load& operator=(const Load&) = delete;
+    ~Load() { Stop(); }
+
+    void Start();
+
+    // Returns when all clients have their last answer.
+    void Stop();
+
+    // Calls `look` while no request is under way.
+    void Pause(const std::function<void()>& look);
+
+    // To be looked at when they have stopped. Those who ask over HTTP come first.
+    std::vector<const Client*> Clients() const;
+    std::vector<const Client*> HttpClients() const;
+
+  private:
+    template <class Channel>
+    void Add(const std::string& name, Channel& channel);
+    void Run(Client& client);
+
+    const Plan& plan;
+    Findings& findings;
+    HttpChannel http;
+    std::vector<std::unique_ptr<Client>> clients;
+    std::vector<std::thread> threads;
+    Gate gate;
+    std::atomic<bool> isStopping{false};
+};
+
+}  // namespace Soak
+
+#endif

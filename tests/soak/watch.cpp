@@ -1,0 +1,130 @@
+#include "watch.h"
+
+#include <sys/stat.h>
+
+#include <algorithm>
+#include <fstream>
+#include <utility>
+
+namespace Soak {
+
+namespace {
+
+constexpr milliseconds LookEvery{2};
+
+Edition EditionOf(const std::string& path)
+{
+    struct stat status {};
+    if (::stat(path.c_str(), &status) != 0) return {};
+    return {status.st_ino, status.st_mtim.tv_sec, status.st_mtim.tv_nsec};
+}
+
+// The process that a pid file names; 0 without one.
+pid_t MarkedIn(const std::string& pidFile)
+{
+    pid_t pid = 0;
+    std::ifstream(pidFile) >> pid;
+    return pid;
+}
+
+}  // namespace
+
+RefreshWatch::RefreshWatch(const Plan& thePlan, std::function<bool()> isFull, Findings& where)
+    : plan(thePlan), isDiskFull(std::move(isFull)), findings(where)
+{
+    // Taken here: what comes from now on counts.
+    thread = std::thread([this, first = EditionOf(plan.StatusFile())] { Watch(first); });
+}
+
+void RefreshWatch::Stop()
+{
+    isStopping = true;
+    if (thread.joinable()) thread.join();
+}
+
+void RefreshWatch::Watch(Edition last)
+{
+    auto lastChange = Clock::now();
+    auto lastReport = lastChange;
+    pid_t reported = -1;  // each process once
+    while (!isStopping) {
+        std::this_thread::sleep_for(LookEvery);
+        const auto now = Clock::now();
+        const Edition edition = EditionOf(plan.StatusFile());
+        if (edition != last) ++refreshes;
+        if (edition != last || isDiskFull()) lastChange = lastReport = now;
+        last = edition;
+        longestGap =
+            std::max(longestGap, std::chrono::duration_cast<milliseconds>(now - lastChange));
+        if (now - lastReport > plan.bounds.stale) {
+            const pid_t updater = MarkedIn(plan.StatusFile() + ".pid");
+            if (updater != reported) Report(updater);
+            reported = updater;
+            lastReport = now;
+        }
+    }
+}
+
+void RefreshWatch::Report(pid_t updater)
+{
+    findings.Add(Promise::Refreshes,
+                 "the status has not been refreshed for " +
+                     std::to_string(plan.bounds.stale.count()) + " ms; " +
+                     (updater == 0 ? std::string("nobody is marked as refreshing")
+                                   : "marked as refreshing: " + Describe(updater)));
+}
+
+NeighbourWatch::NeighbourWatch(LineChannel& channel)
+{
+    thread = std::thread([this, &channel] { Watch(channel); });
+}
+
+void NeighbourWatch::Stop()
+{
+    isStopping = true;
+    if (thread.joinable()) thread.join();
+}
+
+void NeighbourWatch::Watch(LineChannel& channel)
+{
+    auto last = Clock::now();
+    while (!isStopping) {
+        const std::optional<std::string> line = channel.ReadLine();
+        if (!line) continue;
+        const auto now = Clock::now();
+        ++(*line == "read" ? reads : failures);
+        longestGap = std::max(longestGap, std::chrono::duration_cast<milliseconds>(now - last));
+        last = now;
+    }
+}
+
+std::vector<Usage> UsagesOf(const Company& company)
+{
+    std::vector<Usage> usages = {UsageOf(company.Service().Name(), company.Service().Pid())};
+    for (std::size_t index = 0; index < Registries; ++index) {
+        const Member& registry = company.Registry(index);
+        usages.push_back(UsageOf(registry.Name(), registry.Pid()));
+    }
+    return usages;
+}
+
+void CompareUsages(const Plan& plan, const std::vector<Usage>& before,
+                   const std::vector<Usage>& after, Findings& findings)
+{
+    const auto check = [&](const Usage& usage, const char* what, long first, long last, long more) {
+        if (last <= first + more) return;
+        findings.Add(Promise::Growth, usage.name + " had " + std::to_string(first) + " " + what +
+                                          ", and has " + std::to_string(last));
+    };
+    for (std::size_t index = 0; index < before.size(); ++index) {
+        const Usage& first = before[index];
+        const Usage& last = after[index];
+        if (first.pid != last.pid) continue;
+        check(last, "open descriptors", first.descriptors, last.descriptors,
+              plan.bounds.descriptors);
+        if (plan.length < LongEnoughForMemory) continue;
+        check(last, "KiB of memory", first.kiBytes, last.kiBytes, plan.bounds.kiBytes);
+    }
+}
+
+}  // namespace Soak

@@ -1,0 +1,93 @@
+// Looks on during a soak: is the status refreshed, do clients get answers, do processes grow.
+#ifndef ORVADRCORE_TESTS_SOAK_WATCH_H
+#define ORVADRCORE_TESTS_SOAK_WATCH_H
+
+#include <sys/types.h>
+
+#include <atomic>
+#include <functional>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "company.h"
+#include "findings.h"
+#include "plan.h"
+#include "process.h"
+
+namespace Soak {
+
+// What tells one file of that name from the next.
+struct Edition {
+    ino_t inode = 0;
+    long seconds = 0;
+    long nanoseconds = 0;
+
+    bool operator!=(const Edition& other) const
+    {
+        return inode != other.inode || seconds != other.seconds || nanoseconds != other.nanoseconds;
+    }
+};
+
+// Counts refreshes: each one replaces the file of the status. Reports one that does not come while it
+// could, and what the process looks like that has marked itself as refreshing.
+class RefreshWatch {
+  public:
+    RefreshWatch(const Plan& plan, std::function<bool()> isDiskFull, Findings& findings);
+    RefreshWatch(const RefreshWatch&) = delete;
+    RefreshWatch& operator=(const RefreshWatch&) = delete;
+    ~RefreshWatch() { Stop(); }
+
+    void Stop();
+
+    int Refreshes() const { return refreshes; }
+    milliseconds LongestGap() const { return longestGap; }
+
+  private:
+    void Watch(Edition last);
+    void Report(pid_t updater);
+
+    const Plan& plan;
+    std::function<bool()> isDiskFull;
+    Findings& findings;
+    std::atomic<int> refreshes{0};
+    milliseconds longestGap{0};
+    std::atomic<bool> isStopping{false};
+    std::thread thread;
+};
+
+// Reads what the neighbour prints: a line each time that it has read the status.
+class NeighbourWatch {
+  public:
+    explicit NeighbourWatch(LineChannel& channel);
+    NeighbourWatch(const NeighbourWatch&) = delete;
+    NeighbourWatch& operator=(const NeighbourWatch&) = delete;
+    ~NeighbourWatch() { Stop(); }
+
+    void Stop();
+
+    // After Stop().
+    int Reads() const { return reads; }
+    int Failures() const { return failures; }
+    milliseconds LongestGap() const { return longestGap; }
+
+  private:
+    void Watch(LineChannel& channel);
+
+    int reads = 0;
+    int failures = 0;
+    milliseconds longestGap{0};
+    std::atomic<bool> isStopping{false};
+    std::thread thread;
+};
+
+// What the service and the registries use. The neighbour is never at rest.
+std::vector<Usage> UsagesOf(const Company& company);
+
+// Reports processes that have been alive all the time between two looks and have grown.
+void CompareUsages(const Plan& plan, const std::vector<Usage>& before,
+                   const std::vector<Usage>& after, Findings& findings);
+
+}  // namespace Soak
+
+#endif
