@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <string_view>
+#include <utility>
 
 namespace OrvaDRCore {
 
@@ -17,7 +18,13 @@ constexpr microseconds Patience = std::chrono::milliseconds(BusyTimeoutMSec);
 // An attempt costs some 20 us of processor time, a commit to a disk half a millisecond and more.
 constexpr microseconds ShortestPause(500);
 constexpr microseconds LongestPause(2500);
+constexpr microseconds LongestPauseOfMany(15'000);
 constexpr microseconds LongestFirstPauseInCommit(50);
+constexpr microseconds TurnLength(3000);
+
+// A wait for the turn grows with the number of those that wait. Pauses that grow with it keep the
+// number of attempts in a second the same.
+constexpr int PausesInAWait = 32;
 
 // Whether the connection waits with changes of its own. Before SQLite 3.34 there is no way to ask.
 bool HasChanges([[maybe_unused]] sqlite3* handle)
@@ -83,14 +90,17 @@ void BusyWait::GiveWay()
     if (left > Microseconds::zero()) Sleep(left);
 }
 
-// For half as long as the lock was held: then the others get it, and the file is idle for a small
-// part of the time only, however long a commit takes.
+// For half as long as the turn was: then others get the lock, and the file is idle for a small part
+// of the time only, however long a commit takes.
 void BusyWait::NoteRelease()
 {
-    if (!hasWaited) return;
-    hasWaited = false;
+    if (!hasTurn) return;
     const Clock::time_point now = Clock::now();
-    giveWayUntil = now + std::min<Clock::duration>((now - lastPauseEnd) / 2, LongestPause);
+    const Clock::duration turn = now - turnBegin;
+    if (turn < TurnLength) return;
+    hasTurn = false;
+    lastWait = std::exchange(turnsWait, Microseconds::zero());
+    giveWayUntil = now + std::min<Clock::duration>(turn / 2, LongestPause);
 }
 
 // SQLite calls this when it has met a lock, with the number of calls before, and tries again if the
@@ -104,10 +114,12 @@ bool BusyWait::Pause(bool isFirst)
 {
     if (isFirst) asked = slept = beforeCommit = Microseconds::zero();
     const Microseconds spent = Spent();
-    if (spent >= Patience) return false;
+    if (spent >= Patience) {
+        hasTurn = false;  // which never came
+        return false;
+    }
 
-    Microseconds longest = ShortestPause + (LongestPause - ShortestPause) *
-                                               (Patience - spent).count() / Patience.count();
+    Microseconds longest = LongestPauseNow();
     Microseconds shortest = ShortestPause;
     const bool isCommitting = HasChanges(handle);
     if (isCommitting) {
@@ -117,12 +129,24 @@ bool BusyWait::Pause(bool isFirst)
     const Microseconds pause = Between(shortest, longest);
     const Clock::time_point begin = Clock::now();
     Sleep(pause);
-    lastPauseEnd = Clock::now();
+    const Clock::time_point end = Clock::now();
     asked += pause;
-    slept += std::chrono::duration_cast<Microseconds>(lastPauseEnd - begin);
-    if (!isCommitting) beforeCommit = Spent();
-    hasWaited = true;
+    slept += std::chrono::duration_cast<Microseconds>(end - begin);
+    if (isCommitting) return true;
+    beforeCommit = Spent();
+    turnsWait += Spent() - spent;
+    turnBegin = end;
+    hasTurn = true;
     return true;
+}
+
+// Of a connection that waits for its turn.
+BusyWait::Microseconds BusyWait::LongestPauseNow() const
+{
+    const Microseconds usual =
+        std::clamp(std::max(turnsWait, lastWait) / PausesInAWait, LongestPause, LongestPauseOfMany);
+    return ShortestPause +
+           (usual - ShortestPause) * (Patience - Spent()).count() / Patience.count();
 }
 
 BusyWait::Microseconds BusyWait::Spent() const

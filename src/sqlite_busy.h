@@ -2,8 +2,12 @@
 //
 // SQLite's own waiting tries again ever more seldom, up to 100 ms apart, while the connection that
 // just wrote comes back at once: some processes write all the time and others starve. Here a waiting
-// connection tries again after 0.5 to 2.5 ms, at random, and sooner as its second runs out. One that
-// had to wait lets others have the lock before it writes again.
+// connection tries again after 0.5 to 2.5 ms, at random. Where many wait, their attempts would keep
+// the processors busy, so whoever waits for long has longer pauses, up to 15 ms, and shorter ones
+// again as its second runs out.
+//
+// A connection that had to wait may then write for 3 ms, because passing the lock on costs as much as
+// a small write. Before it writes again after that, it pauses so that others get the lock.
 //
 // Who commits to a file with a rollback journal waits for readers while nobody else can get a lock,
 // not even other readers. It tries again within 0.1 ms, and then ever more seldom: most readers that
@@ -45,8 +49,8 @@ class BusyWait {
     void LeaveToSqlite();
     void TakeBack();
 
-    // To be called before a statement that may begin to write: pauses when this connection had to
-    // wait for its last write and comes back too soon after it, 2.5 ms at most.
+    // To be called before a statement that may begin to write: pauses for 2.5 ms at most when this
+    // connection had to wait, has had its turn, and comes back too soon after it.
     void GiveWay();
 
     // To be called after each statement that leaves no transaction open.
@@ -58,6 +62,7 @@ class BusyWait {
 
     static int OnBusy(void* self, int count);
     bool Pause(bool isFirst);
+    Microseconds LongestPauseNow() const;
     Microseconds Spent() const;
     Microseconds Between(Microseconds shortest, Microseconds longest);
 
@@ -70,8 +75,12 @@ class BusyWait {
     Microseconds slept{};
     Microseconds beforeCommit{};
 
-    bool hasWaited = false;  // since the last release
-    Clock::time_point lastPauseEnd;
+    // Of this connection's turn: it begins when a wait is over and ends with the first statement
+    // that ends more than 3 ms after that.
+    bool hasTurn = false;
+    Clock::time_point turnBegin;
+    Microseconds turnsWait{};        // all pauses since the turn before, but those in commits
+    Microseconds lastWait{};         // the same for the turn before
     Clock::time_point giveWayUntil;  // the clock's beginning when there is no need to
 };
 

@@ -481,6 +481,7 @@ bool SqliteDB::DoSelect(const std::string& command, TakeRow takeRow)
         code = sqlite3_step(statement.get());
     }
     if (code == SQLITE_ROW) code = EndBeforeLastRow(statement.get());
+    if (!IsInTransaction()) own.wait.NoteRelease();
     if (code != SQLITE_OK && code != SQLITE_DONE) {
         SetDBErr(command, code, nullptr);
         return false;

@@ -14,8 +14,9 @@
 /// for long.
 ///
 /// **Waiting.** Many processes may use one file at the same time, and all of them get their turn. A
-/// try that meets a lock looks again every 0.5 to 2.5 milliseconds. A connection that had to wait
-/// before it wrote pauses for up to 2.5 milliseconds before it writes again, so that others can.
+/// try that meets a lock tries again after 0.5 to 2.5 milliseconds, or after up to 15 where many
+/// wait. A connection that had to wait pauses for up to 2.5 milliseconds when it has written for
+/// three, so that others can.
 /// `PRAGMA busy_timeout` answers 1000. A program that sets it gets SQLite's own waiting, which looks
 /// ever more seldom, on that connection until it is opened anew.
 ///
@@ -248,9 +249,9 @@ class ORVADRCORE_API SqliteDB {
     // --------------------------------------------------------------------------------- connection
 
     /// Opens the file, unless it is open, and sets the busy timeout of a second. The error code and
-    /// record stay as they are. A file that
-    /// cannot be opened for writing, for want of rights or of descriptors, SQLite opens for reading:
-    /// statements that write then fail until the connection is closed.
+    /// record stay as they are. A file that cannot be opened for writing, for want of rights or of
+    /// descriptors, SQLite opens for reading: statements that write then fail until the connection
+    /// is closed.
     /// \return false, with WARN `Failed to open db[%s]`, the connection closed; or with WARN
     ///         `Failed to set busy timeout with error`, the connection open: the next call answers
     ///         true

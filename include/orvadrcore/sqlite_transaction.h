@@ -47,8 +47,8 @@ class ORVADRCORE_API SqliteTransaction {
     SqliteTransaction(const SqliteTransaction&) = delete;
     SqliteTransaction& operator=(const SqliteTransaction&) = delete;
 
-    /// Rolls back what it began, if that is still open. The connection's error code and record stay as they are, so
-    /// that they tell why.
+    /// Rolls back what it began, if that is still open. The connection's error code and record stay
+    /// as they are, so that they tell why.
     ~SqliteTransaction();
 
     /// Opens the file, unless it is open, and begins: BEGIN IMMEDIATE, which waits for another
