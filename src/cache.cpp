@@ -283,7 +283,8 @@ bool Cache::UpdateWithData(const Json::Value& data, long begin, long finish) con
     const std::string text = toString(document);
     struct stat written {};
     const auto write = [&] { return ReplaceFile(cachedPath, text, std::nullopt, &written); };
-    if (!Retry(RetriesOf(retryLimit), write, WritePause).succeeded) {
+    // A document that is too long could not be loaded again.
+    if (!FitsJsonText(text.size()) || !Retry(RetriesOf(retryLimit), write, WritePause).succeeded) {
         DR_LOG(Debug, "Failed to write cache to file [%s] and reach retry limit[%d]",
                cachedPath.c_str(), retryLimit);
         return false;

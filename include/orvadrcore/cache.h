@@ -199,15 +199,16 @@ class ORVADRCORE_API Cache {
 
     /// Writes data, with retries after pauses of 300 to 1000 milliseconds; the file is replaced
     /// whole. Takes no lock and marks nothing. What could not be loaded again is not written: data,
-    /// or a GetInfo(), that holds an infinity or nests more than 999 levels deep.
+    /// or a GetInfo(), that holds an infinity or nests more than 999 levels deep, and a document of
+    /// 2 GiB or more.
     /// \param data    the data; not a number is written as null
     /// \param begin   when producing began, in seconds since the epoch; below 1 if not known
     /// \param finish  when it ended, likewise; when one is not known, both are stored as 0
     /// \return false with DEBUG `[%s] is not valid to update for cache [%s]` (IsValidData() refuses
     ///         the data, or it could not be loaded again; a text of more than 5000 levels is given
     ///         as `(nested too deep)`) or
-    ///         `Failed to write cache to file [%s] and reach retry limit[%d]`; file and data in
-    ///         memory are as they were
+    ///         `Failed to write cache to file [%s] and reach retry limit[%d]` (also, without a try,
+    ///         for a document of 2 GiB or more); file and data in memory are as they were
     bool UpdateWithData(const Json::Value& data, long begin, long finish) const;
 
     /// As above, times not known.

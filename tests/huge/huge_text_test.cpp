@@ -1,6 +1,7 @@
 // Texts of 2 GiB and more, which no JSON value can hold: they are refused whole, never cut, and
 // nothing throws. Each case makes its text once, shortens it, and lets it go at its end.
 #include <json/value.h>
+#include <orvadrcore/cache.h>
 #include <orvadrcore/request.h>
 #include <orvadrcore/response.h>
 #include <orvadrcore/sqlite_command.h>
@@ -127,6 +128,30 @@ TEST_F(HugeTextTest, WhatIsTooLongForJsonIsNullOrRefused)
     std::vector<std::string> elements(3, "e");
     elements[1] = std::move(text);
     EXPECT_EQ(OrvaDRCore::toString(Container::ToJsonArray(elements)), R"(["e",null,"e"])");
+}
+
+class PlainCache : public OrvaDRCore::Cache {
+  public:
+    using Cache::Cache;
+    Json::Value GetInfo() const override { return {}; }
+    bool GetUpdatedData(Json::Value& /*data*/) const override { return false; }
+    bool IsValidData(const Json::Value& /*data*/) const override { return true; }
+};
+
+TEST_F(HugeTextTest, ADocumentThatIsTooLongToBeLoadedAgainIsNotCached)
+{
+    const PlainCache cache(dir.Path(), "status", 30, false, 2);
+    ASSERT_TRUE(cache.UpdateWithData("old"));
+    {
+        const Json::Value data(std::string(TooLong / 6 + 1, '\1'));  // each is written as \u0001
+        EXPECT_FALSE(cache.UpdateWithData(data));
+    }
+    ExpectLines(
+        {Debug("UpdateWithData", "Failed to write cache to file [" + dir.File("status.cached") +
+                                     "] and reach retry limit[2]")
+             .In("cache.cpp")});
+    EXPECT_TRUE(cache.Load());
+    EXPECT_EQ(cache.Read(), "old");
 }
 
 TEST_F(HugeTextTest, ANameThatIsTooLongForJsonIsNoParameterAndNoField)
