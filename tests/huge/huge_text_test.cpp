@@ -151,7 +151,7 @@ TEST_F(HugeTextTest, ADocumentThatIsTooLongToBeLoadedAgainIsNotCached)
                                      "] and reach retry limit[2]")
              .In("cache.cpp")});
     EXPECT_TRUE(cache.Load());
-    EXPECT_EQ(cache.Read(), "old");
+    EXPECT_EQ(cache.GetCachedData(), "old");
 }
 
 TEST_F(HugeTextTest, ANameThatIsTooLongForJsonIsNoParameterAndNoField)
