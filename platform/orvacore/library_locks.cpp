@@ -76,11 +76,13 @@ void TakeAllocatorLocks()
     struct Block {
         Block* next;
     };
+    // Classes lie 16 bytes apart at first, and then no closer than an eighth of their size. The last
+    // size has no class, and a lock of its own.
     constexpr std::size_t MostCached = 256;  // of one class
     constexpr std::size_t MostBytes = 131'072;
-    constexpr std::size_t Step = 16;  // between small classes; larger ones are a quarter apart
+    constexpr std::size_t Step = 16;
     Block* taken = nullptr;
-    for (std::size_t size = Step; size <= MostBytes / 2; size += std::max(Step, size / 4)) {
+    for (std::size_t size = Step; size <= 2 * MostBytes; size += std::max(Step, size / 8)) {
         for (std::size_t count = 0; count <= std::min(MostCached, MostBytes / size); ++count) {
             void* const memory = std::malloc(size);
             if (memory != nullptr) taken = new (memory) Block{taken};
