@@ -12,6 +12,7 @@
 
 #include <atomic>
 #include <climits>
+#include <csignal>
 #include <ctime>
 #include <filesystem>
 #include <thread>
@@ -378,20 +379,24 @@ TEST(DetachedForkTest, AnIntermediateProcessThatIsKilledIsAFailure)
     });
 }
 
-// Its end does not show in the pipe then.
+// Its end does not show in the pipe then, and where the caller ignores SIGCHLD nobody can ask for its
+// result either.
 TEST(DetachedForkTest, AnIntermediateProcessThatIsKilledIsNoticedThoughSomebodyHoldsItsPipe)
 {
-    InProcess([] {
-        static Pipe life;  // of the caller: closed when that ends
-        forkFault = {2, [] {
-                         if (::fork() == 0) {
-                             life.ReadToEnd();
-                             ::_exit(0);
-                         }
-                         ::kill(::getpid(), SIGKILL);
-                     }};
-        ExpectNotForked(ECHILD);
-    });
+    for (auto* const disposition : {SIG_DFL, SIG_IGN}) {
+        InProcess([disposition] {
+            static Pipe life;  // of the caller: closed when that ends
+            EXPECT_NE(std::signal(SIGCHLD, disposition), SIG_ERR);
+            forkFault = {2, [] {
+                             if (::fork() == 0) {
+                                 life.ReadToEnd();
+                                 ::_exit(0);
+                             }
+                             ::kill(::getpid(), SIGKILL);
+                         }};
+            ExpectNotForked(ECHILD);
+        });
+    }
 }
 
 // As a mutex waits, and as a spin lock does.
