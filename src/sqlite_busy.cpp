@@ -20,7 +20,7 @@ constexpr microseconds ShortestPause(500);
 constexpr microseconds LongestPause(2500);
 constexpr microseconds LongestPauseOfMany(15'000);
 constexpr microseconds LongestFirstPauseInCommit(50);
-constexpr microseconds TurnLength(3000);
+constexpr microseconds TurnLength(6000);
 
 // A wait for the turn grows with the number of those that wait. Pauses that grow with it keep the
 // number of attempts in a second the same.

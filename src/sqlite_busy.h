@@ -6,7 +6,7 @@
 // the processors busy, so whoever waits for long has longer pauses, up to 15 ms, and shorter ones
 // again as its second runs out.
 //
-// A connection that had to wait may then write for 3 ms, because passing the lock on costs as much as
+// A connection that had to wait may then write for 6 ms, because passing the lock on costs as much as
 // a small write. Before it writes again after that, it pauses so that others get the lock.
 //
 // Who commits to a file with a rollback journal waits for readers while nobody else can get a lock,
@@ -76,7 +76,7 @@ class BusyWait {
     Microseconds beforeCommit{};
 
     // Of this connection's turn: it begins when a wait is over and ends with the first statement
-    // that ends more than 3 ms after that.
+    // that ends more than 6 ms after that.
     bool hasTurn = false;
     Clock::time_point turnBegin;
     Microseconds turnsWait{};        // all pauses since the turn before, but those in commits

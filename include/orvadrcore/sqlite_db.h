@@ -16,7 +16,7 @@
 /// **Waiting.** Many processes may use one file at the same time, and all of them get their turn. A
 /// try that meets a lock tries again after 0.5 to 2.5 milliseconds, or after up to 15 where many
 /// wait. A connection that had to wait pauses for up to 2.5 milliseconds when it has written for
-/// three, so that others can.
+/// six, so that others can.
 /// `PRAGMA busy_timeout` answers 1000. A program that sets it gets SQLite's own waiting, which looks
 /// ever more seldom, on that connection until it is opened anew.
 ///

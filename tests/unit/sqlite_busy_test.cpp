@@ -204,7 +204,7 @@ TEST_F(SqliteBusyTest, ACommitTriesAgainAtOnceAlsoAfterALongWaitForItsTurn)
 TEST_F(SqliteBusyTest, WhoHadToWaitWritesForATurnAndThenGivesWayOnce)
 {
     ASSERT_TRUE(db.Open());
-    constexpr std::chrono::milliseconds Turn(3);
+    constexpr std::chrono::milliseconds Turn(6);
     // Where this process is kept from running for long enough there is no need to give way any more.
     for (int attempt = 0; attempt < 1000 && pauses.Waits().empty(); ++attempt) {
         const auto begin = std::chrono::steady_clock::now();
