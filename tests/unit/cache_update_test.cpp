@@ -581,7 +581,8 @@ TEST_F(UnreadableDataTest, WhatIsProducedIsRefusedLikewiseAndNotProducedAgain)
 TEST_F(UnreadableDataTest, OfWhatNestsMonstrouslyNoTextIsMade)
 {
     CheckInChild([this] {
-        const Json::Value& data = *new Json::Value(Nested(1'000'000));  // nor could it be destroyed
+        // Nor could it be destroyed.
+        static const Json::Value& data = *new Json::Value(Nested(1'000'000));
         const auto refused = Debug("UpdateWithData",
                                    "[(nested too deep)] is not valid to update "
                                    R"(for cache ["test cache"])");
