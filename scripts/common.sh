@@ -26,6 +26,13 @@ fail() {
     exit 1
 }
 
+# help_if_asked ARGUMENT...: for -h and --help prints the comment at the head of the script, and ends.
+help_if_asked() {
+    [[ ${1:-} == -h || ${1:-} == --help ]] || return 0
+    sed -n '2,/^$/s/^# \{0,1\}//p' "scripts/$(basename "$0")"
+    exit
+}
+
 # quietly NAME COMMAND...: keeps the command's output in build/NAME.log, shows it when it fails.
 quietly() {
     local log=build/$1.log
@@ -78,3 +85,13 @@ build_package() (
     export CXXFLAGS LDFLAGS
     build package
 )
+
+# read_by_tidy GREP-OPTION...: has clang-tidy read the sources whose paths grep picks.
+read_by_tidy() {
+    install_missing clang clang-tidy
+    quietly tidy-configure cmake --preset tidy
+    sed -n 's/^  "file": "\(.*\)",\{0,1\}$/\1/p' build/tidy/compile_commands.json |
+        grep "$@" | sort >build/tidy-sources
+    step "reading $(wc -l <build/tidy-sources) sources"
+    xargs -P "$(nproc)" -n 1 clang-tidy -p build/tidy --quiet <build/tidy-sources 2>build/tidy.log
+}
