@@ -9,7 +9,7 @@
 #include <filesystem>
 #include <fstream>
 
-#include "json_helpers.h"
+#include "base/json_helpers.h"
 #include "support/fuzz.h"
 #include "support/process_faults.h"
 #include "support/syscall_faults.h"

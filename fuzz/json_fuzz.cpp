@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <cmath>
 
-#include "json_helpers.h"
+#include "base/json_helpers.h"
 #include "support/fuzz.h"
 
 namespace {

@@ -4,7 +4,7 @@
 
 #include <charconv>
 
-#include "file_io.h"
+#include "base/file_io.h"
 #include "support/fuzz.h"
 #include "support/memory_file.h"
 #include "support/temp_dir.h"

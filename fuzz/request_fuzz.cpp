@@ -1,7 +1,7 @@
 // A request from any JSON, and parameters added from any other: the first and the second line.
 #include <orvadrcore/request.h>
 
-#include "json_helpers.h"
+#include "base/json_helpers.h"
 #include "support/fuzz.h"
 
 using OrvaDRCore::Request;

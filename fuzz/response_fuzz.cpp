@@ -1,7 +1,7 @@
 // A reply from any text: all questions get an answer, and the one that its JSON says.
 #include <orvadrcore/response.h>
 
-#include "json_helpers.h"
+#include "base/json_helpers.h"
 #include "support/fuzz.h"
 
 using OrvaDRCore::Response;

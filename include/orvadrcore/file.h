@@ -128,7 +128,8 @@ class ORVADRCORE_API File {
     ///       an empty line and NOTICE `Cannot find separator[%s] in line[%s]` for one without "="
     ///       (both in the function `parseLineKeyValue`).
     template <class K, class V>
-    static int Read(const std::string& path, std::map<K, V>& out);
+    static int Read(  // K: std::string, V: std::string, int or double
+        const std::string& path, std::map<K, V>& out) = delete;
 
     /// Reads a value from a text, as the standard streams do: the first word, or the number that
     /// the text begins with.
@@ -144,10 +145,13 @@ class ORVADRCORE_API File {
     static bool toType(const In& in, Out& out, const Out& fallback);
 };
 
-/// \cond INSTANTIATIONS
-extern template int File::Read(const std::string&, std::map<std::string, std::string>&);
-extern template int File::Read(const std::string&, std::map<std::string, int>&);
-extern template int File::Read(const std::string&, std::map<std::string, double>&);
+/// \cond SPECIALISATIONS
+template <>
+ORVADRCORE_API int File::Read(const std::string& path, std::map<std::string, std::string>& out);
+template <>
+ORVADRCORE_API int File::Read(const std::string& path, std::map<std::string, int>& out);
+template <>
+ORVADRCORE_API int File::Read(const std::string& path, std::map<std::string, double>& out);
 
 template <class In, class Out>
 bool File::toType(const In& in, Out& out, const Out& fallback)

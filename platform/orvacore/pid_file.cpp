@@ -6,9 +6,9 @@
 #include <charconv>
 #include <string>
 
-#include "file_io.h"
-#include "process_status.h"
-#include "replace_file.h"
+#include "base/file_io.h"
+#include "base/process_status.h"
+#include "base/replace_file.h"
 
 namespace {
 

@@ -11,9 +11,9 @@
 #include <cerrno>
 #include <chrono>
 
+#include "base/process_status.h"
 #include "child_report.h"
 #include "library_locks.h"
-#include "process_status.h"
 
 namespace {
 

@@ -17,10 +17,10 @@ diff <(printf '%s\n' "$declared") <(printf '%s\n' "$shown") || {
 }
 
 # Each enumerator's case gives its own name; a case and its text may stand on two lines.
-named=$(tr '\n' ' ' <src/errors.cpp |
+named=$(tr '\n' ' ' <src/common/errors.cpp |
     grep -o 'case ERR::[A-Z_]*: *return "[A-Z_]*";' |
     sed 's/case ERR::\([A-Z_]*\): *return "\([A-Z_]*\)";/\1 \2/')
 diff <(printf '%s\n' "$declared" | sed 's/^[0-9]* \(.*\)/\1 \1/') <(printf '%s\n' "$named") || {
-    echo "src/errors.cpp (>) names other codes than include/orvadrcore/errors.h (<)" >&2
+    echo "src/common/errors.cpp (>) names other codes than include/orvadrcore/errors.h (<)" >&2
     exit 1
 }

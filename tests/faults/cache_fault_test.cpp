@@ -8,8 +8,8 @@
 #include <chrono>
 #include <filesystem>
 
+#include "base/json_helpers.h"
 #include "fault.h"
-#include "json_helpers.h"
 #include "support/temp_dir.h"
 #include "support/test_files.h"
 

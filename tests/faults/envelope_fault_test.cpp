@@ -4,8 +4,8 @@
 #include <orvadrcore/sqlite_command.h>
 #include <orvadrcore/sqlite_condition.h>
 
+#include "base/json_helpers.h"
 #include "fault.h"
-#include "json_helpers.h"
 
 using OrvaDRCore::InsertCommand;
 using OrvaDRCore::Request;

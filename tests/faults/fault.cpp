@@ -19,7 +19,7 @@
 #include <optional>
 #include <vector>
 
-#include "json_helpers.h"
+#include "base/json_helpers.h"
 #include "support/allocation_faults.h"
 #include "support/child_checks.h"
 #include "support/pauses.h"

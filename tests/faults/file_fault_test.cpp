@@ -5,9 +5,9 @@
 
 #include <filesystem>
 
+#include "base/file_io.h"
+#include "base/json_helpers.h"
 #include "fault.h"
-#include "file_io.h"
-#include "json_helpers.h"
 #include "support/child_checks.h"
 #include "support/temp_dir.h"
 #include "support/test_files.h"

@@ -11,8 +11,8 @@
 #include <cstdint>
 #include <utility>
 
-#include "json_helpers.h"
-#include "sqlite_internals.h"
+#include "base/json_helpers.h"
+#include "sqlite/sqlite_internals.h"
 #include "support/sqlite_fixture.h"
 
 namespace {

@@ -1,5 +1,5 @@
 /*
- * The update protocol of src/cache.cpp, one step for each system call that others can notice.
+ * The update protocol of src/cache/cache.cpp, one step for each system call that others can notice.
  * run.sh says which properties are checked of which variants, docs/cache.md what follows from it.
  *
  * There are three places in the process table. A process is born into a free one, by the world or by

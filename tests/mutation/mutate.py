@@ -186,7 +186,7 @@ def durations(build, program):
 
 def suites_of(source):
     """The suites of a source's own tests: those of NAME_test.cpp and of NAME_..._test.cpp."""
-    files = (ROOT / "tests" / "unit").glob(f"{Path(source).stem}_*test.cpp")
+    files = (ROOT / "tests" / "unit").rglob(f"{Path(source).stem}_*test.cpp")
     return {suite for file in files
             for suite in re.findall(r"^(?:TYPED_)?TEST(?:_[FP])?\((\w+),", file.read_text(), re.M)}
 
@@ -211,7 +211,7 @@ def shares(count, sizes):
 def plan(arguments):
     """What the workers do: sources with some of their faults and how many of these to try."""
     chosen = arguments.sources or sorted(
-        str(path.relative_to(ROOT)) for path in (ROOT / "src").glob("*.[ch]*"))
+        str(path.relative_to(ROOT)) for path in (ROOT / "src").rglob("*.[ch]*"))
     found = {source: faults.find((ROOT / source).read_text(), f"{arguments.seed} {source}")
              for source in chosen}
     found = {source: some for source, some in found.items() if some}
@@ -333,7 +333,7 @@ def main():
     parser.add_argument("--minimum", type=float, default=95, help="percent to be caught (95)")
     parser.add_argument("--resume", action="store_true",
                         help="go on where a run stopped; try survivors again")
-    parser.add_argument("sources", nargs="*", help="such as src/utils.cpp; without: all")
+    parser.add_argument("sources", nargs="*", help="such as src/common/utils.cpp; without: all")
     arguments = parser.parse_args()
 
     begin = time.monotonic()

@@ -19,7 +19,7 @@
 #include <orvadrcore/sqlite_db.h>
 #include <orvadrcore/sqlite_transaction.h>
 
-#include "json_helpers.h"
+#include "base/json_helpers.h"
 #include "support/kills.h"
 #include "support/process_test.h"
 #include "support/shared_memory.h"

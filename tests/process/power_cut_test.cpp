@@ -12,7 +12,7 @@
 
 #include <orvadrcore/file.h>
 
-#include "json_helpers.h"
+#include "base/json_helpers.h"
 #include "support/power_cut.h"
 #include "support/process_test.h"
 #include "support/scale.h"

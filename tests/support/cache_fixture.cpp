@@ -15,8 +15,8 @@
 #include <filesystem>
 #include <utility>
 
+#include "base/json_helpers.h"
 #include "child_checks.h"
-#include "json_helpers.h"
 #include "test_files.h"
 
 Json::Value TestCache::GetInfo() const

@@ -13,7 +13,7 @@
 #include <string>
 #include <vector>
 
-#include "json_helpers.h"
+#include "base/json_helpers.h"
 #include "support/child_process.h"
 #include "support/log_capture.h"
 #include "support/pauses.h"

@@ -3,6 +3,7 @@
 #include <json/value.h>
 #include <orvadrcore/cache.h>
 #include <orvadrcore/errors.h>
+#include <orvadrcore/file.h>
 #include <orvadrcore/request.h>
 #include <orvadrcore/response.h>
 #include <orvadrcore/sqlite_command.h>
@@ -13,6 +14,7 @@
 #include <orvadrcore/utils.h>
 
 #include <cstddef>
+#include <map>
 #include <memory>
 #include <sstream>
 #include <string>
@@ -273,6 +275,19 @@ static_assert(!std::is_move_constructible_v<SqliteTransaction> &&
 static_assert(Has<bool (SqliteTransaction::*)()>(&SqliteTransaction::Begin));
 static_assert(Has<bool (SqliteTransaction::*)()>(&SqliteTransaction::Commit));
 static_assert(Has<bool (SqliteTransaction::*)()>(&SqliteTransaction::Rollback));
+
+// ------------------------------------------------------------------------------------------ files
+
+template <class Key, class Value, class = void>
+constexpr bool ReadsPairsInto = false;
+template <class Key, class Value>
+constexpr bool ReadsPairsInto<
+    Key, Value,
+    std::void_t<decltype(File::Read(string(), std::declval<std::map<Key, Value>&>()))>> = true;
+static_assert(ReadsPairsInto<string, string> && ReadsPairsInto<string, int> &&
+              ReadsPairsInto<string, double>);
+static_assert(!ReadsPairsInto<string, long> && !ReadsPairsInto<string, bool> &&
+              !ReadsPairsInto<string, float> && !ReadsPairsInto<int, string>);
 
 // ------------------------------------------------------------------------------------------ cache
 

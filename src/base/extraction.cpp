@@ -1,0 +1,95 @@
+#include "base/extraction.h"
+
+#include <cfenv>
+#include <charconv>
+#include <cmath>
+#include <limits>
+#include <system_error>
+
+namespace OrvaDRCore {
+
+namespace {
+
+constexpr std::string_view Digits = "0123456789";
+
+// std::from_chars knows no plus; a sign behind it would be one too many.
+std::string_view SkipPlus(std::string_view text)
+{
+    const bool signedTwice = text.size() > 1 && text[1] == '-';
+    if (!text.empty() && text[0] == '+' && !signedTwice) text.remove_prefix(1);
+    return text;
+}
+
+// Whether a text begins as a number does that std::from_chars and a stream read alike: not as
+// "inf" or "nan" do, which a stream does not know.
+bool BeginsWithDigit(std::string_view text)
+{
+    const std::size_t at = text.find_first_not_of("-.");
+    return at != std::string_view::npos && Digits.find(text[at]) != std::string_view::npos;
+}
+
+}  // namespace
+
+Extraction::Extraction()
+    : kinds(std::use_facet<std::ctype<char>>(locale)),
+      plain(locale == std::locale::classic() && std::fegetround() == FE_TONEAREST)
+{
+}
+
+void Extraction::Read(std::string_view text, std::string& word) const
+{
+    text = SkipBlanks(text);
+    if (text.empty()) return;
+    const char* end = kinds.scan_is(std::ctype_base::space, text.begin(), text.end());
+    word.assign(text.data(), static_cast<std::size_t>(end - text.data()));
+}
+
+void Extraction::Read(std::string_view text, int& number)
+{
+    if (!plain) return ReadByStream(text, number);
+    text = SkipBlanks(text);
+    if (text.empty()) return;
+    text = SkipPlus(text);
+    int value = 0;
+    const std::errc error = std::from_chars(text.begin(), text.end(), value).ec;
+    if (error == std::errc::result_out_of_range) {
+        using Limits = std::numeric_limits<int>;
+        value = text[0] == '-' ? Limits::min() : Limits::max();
+    }
+    number = value;
+}
+
+void Extraction::Read(std::string_view text, double& number)
+{
+    const std::string_view digits = SkipPlus(SkipBlanks(text));
+    if (!plain || !BeginsWithDigit(digits)) return ReadByStream(text, number);
+    double value = 0;
+    const auto [stop, error] = std::from_chars(digits.begin(), digits.end(), value);
+    // Too large and too small numbers, and an exponent without digits, which fails a stream.
+    const bool brokenOff = stop != digits.end() && (*stop == 'e' || *stop == 'E');
+    if (error != std::errc() || !std::isfinite(value) || brokenOff) {
+        return ReadByStream(text, number);
+    }
+    number = value;
+}
+
+std::string_view Extraction::SkipBlanks(std::string_view text) const
+{
+    const char* begin = kinds.scan_not(std::ctype_base::space, text.begin(), text.end());
+    text.remove_prefix(static_cast<std::size_t>(begin - text.data()));
+    return text;
+}
+
+template <class Number>
+void Extraction::ReadByStream(std::string_view text, Number& number)
+{
+    if (!stream) {
+        stream.emplace().imbue(locale);
+        stream->exceptions(std::ios::badbit);  // or memory that is short reads as no number
+    }
+    stream->clear();
+    stream->str(std::string(text));
+    *stream >> number;
+}
+
+}  // namespace OrvaDRCore

@@ -1,0 +1,68 @@
+#include "base/file_io.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <utility>
+
+namespace OrvaDRCore {
+
+namespace {
+
+constexpr std::size_t ReadSize = 16384;
+
+}  // namespace
+
+FileDescriptor::FileDescriptor(const std::string& path, int flags, mode_t mode)
+    : fd(::open(path.c_str(), flags | O_CLOEXEC, mode))
+{
+}
+
+FileDescriptor::FileDescriptor(FileDescriptor&& other) noexcept : fd(std::exchange(other.fd, -1)) {}
+
+FileDescriptor::~FileDescriptor()
+{
+    const int error = errno;
+    if (fd >= 0) ::close(fd);
+    errno = error;
+}
+
+bool ReadAll(int fd, std::string& text, std::size_t most)
+{
+    std::array<char, ReadSize> chunk;  // NOLINT(cppcoreguidelines-pro-type-member-init)
+    while (most > 0) {
+        const ssize_t count = ::read(fd, chunk.data(), std::min(most, chunk.size()));
+        if (count < 0 && errno == EINTR) continue;
+        if (count <= 0) return count == 0;
+        text.append(chunk.data(), static_cast<std::size_t>(count));
+        most -= static_cast<std::size_t>(count);
+    }
+    return true;
+}
+
+bool ReadRegularFile(const std::string& path, std::string& text, std::size_t most)
+{
+    // Opening neither waits for the writer of a pipe nor makes a terminal this process's own.
+    const FileDescriptor file(path, O_RDONLY | O_NONBLOCK | O_NOCTTY);
+    struct stat status {};
+    if (!file.IsOpen() || ::fstat(file.Get(), &status) < 0) return false;
+    errno = EINVAL;
+    return S_ISREG(status.st_mode) && ReadAll(file.Get(), text, most);
+}
+
+bool WriteAll(int fd, std::string_view text)
+{
+    while (!text.empty()) {
+        const ssize_t count = ::write(fd, text.data(), text.size());
+        if (count < 0 && errno == EINTR) continue;
+        if (count <= 0) return false;
+        text.remove_prefix(static_cast<std::size_t>(count));
+    }
+    return true;
+}
+
+}  // namespace OrvaDRCore

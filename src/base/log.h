@@ -1,0 +1,70 @@
+// The one log line of the library:
+//
+//     sqlite_db.cpp:81(Exec)[ERR][4242]: DB[/var/dr/nodes.db] is not opened
+//
+// DR_LOG(Err, "DB[%s] is not opened", path) writes it with one syslog call, through the connection
+// that the calling program has set up (ident, facility and mask are its own). The message must be a
+// literal, which the compiler checks against its arguments. "%m" gives the errno that the caller of
+// DR_LOG sees, and errno is the same after the call.
+#ifndef ORVADRCORE_SRC_BASE_LOG_H
+#define ORVADRCORE_SRC_BASE_LOG_H
+
+#include <syslog.h>
+#include <unistd.h>
+
+#include <cerrno>
+
+namespace OrvaDRCore::Log {
+
+struct Level {
+    int priority;
+    const char* word;
+};
+
+inline constexpr Level Err{LOG_ERR, "ERR"};
+inline constexpr Level Warn{LOG_WARNING, "WARN"};
+inline constexpr Level Notice{LOG_NOTICE, "NOTICE"};
+inline constexpr Level Info{LOG_INFO, "INFO"};
+inline constexpr Level Debug{LOG_DEBUG, "DEBUG"};
+
+struct Site {
+    const char* file;
+    int line;
+    const char* function;
+};
+
+constexpr const char* BaseName(const char* path)
+{
+    const char* name = path;
+    for (const char* at = path; *at != '\0'; ++at) {
+        if (*at == '/') name = at + 1;
+    }
+    return name;
+}
+
+// Never called: lets the compiler hold a message against its arguments.
+[[gnu::format(printf, 1, 2)]] inline void CheckFormat(const char* /*message*/, ...) {}
+
+template <class... Args>
+void Write(const Level& level, const Site& site, const char* format, Args... args)
+{
+    const int error = errno;
+    ::syslog(level.priority, format, site.file, site.line, site.function, level.word, ::getpid(),
+             args...);
+    errno = error;
+}
+
+}  // namespace OrvaDRCore::Log
+
+#define DR_LOG(level, ...) DR_LOG_AS(__func__, level, __VA_ARGS__)
+
+// For a line that carries another function's name than that of the code that writes it.
+// (__extension__ admits "%m", which is none of ISO C++.)
+#define DR_LOG_AS(function, level, ...)                                                    \
+    __extension__(false ? ::OrvaDRCore::Log::CheckFormat(__VA_ARGS__)                      \
+                        : ::OrvaDRCore::Log::Write(                                        \
+                              ::OrvaDRCore::Log::level,                                    \
+                              {::OrvaDRCore::Log::BaseName(__FILE__), __LINE__, function}, \
+                              "%s:%d(%s)[%s][%d]: " __VA_ARGS__))
+
+#endif

@@ -1,0 +1,253 @@
+#include <orvadrcore/file.h>
+
+#include <orvacore/orvacore.h>
+#include <sys/stat.h>
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <cstdio>
+#include <iterator>
+#include <memory>
+#include <string_view>
+#include <utility>
+
+#include "base/extraction.h"
+#include "base/file_io.h"
+#include "base/json_helpers.h"
+#include "base/log.h"
+
+namespace OrvaDRCore {
+
+namespace {
+
+constexpr int MaxDirMode = 0777;
+constexpr std::size_t ChunkSize = 1024;
+
+constexpr mode_t NewFileMode = 0666;  // less the umask
+
+constexpr char Separator = '=';
+
+// The line at the beginning of the text, which is taken off it.
+std::string_view TakeLine(std::string_view& text)
+{
+    const std::size_t end = std::min(text.find('\n'), text.size());
+    const std::string_view line = text.substr(0, end);
+    text.remove_prefix(std::min(end + 1, text.size()));
+    return line;
+}
+
+// A line that a failed read has cut off is no line: those before it count.
+void DropTornLine(std::string& text)
+{
+    text.erase(text.rfind('\n') + 1);  // all of it when there is no newline
+}
+
+// The lines that can be read.
+std::string ReadLines(const FileDescriptor& file)
+{
+    std::string text;
+    if (!ReadAll(file.Get(), text)) DropTornLine(text);
+    return text;
+}
+
+// Reads key and value out of a line, each as File::toType does.
+template <class Value>
+bool parseLineKeyValue(std::string_view line, Extraction& extraction, std::string& key,
+                       Value& value)
+{
+    if (line.empty()) {
+        DR_LOG(Warn, "Bad Parameter.");
+        return false;
+    }
+    const std::size_t at = line.find(Separator);
+    if (at == std::string_view::npos) {
+        DR_LOG(Notice, "Cannot find separator[%c] in line[%s]", Separator,
+               std::string(line).c_str());
+        return false;
+    }
+    const std::string_view left = line.substr(0, at);
+    const std::string_view right = line.substr(at + 1);
+    if (left.empty() || right.empty()) return false;
+    extraction.Read(left, key);
+    extraction.Read(right, value);
+    return true;
+}
+
+// Runs a program. Where its result is lost because another thread has waited for all children,
+// `isDone` tells instead whether it has done its work.
+template <class IsDone>
+bool RunProgram(const char* path, const char* argument1, const char* argument2,
+                const char* argument3, const char* argument4, IsDone isDone)
+{
+    errno = 0;
+    const int result = CoreLibExec(path, argument1, argument2, argument3, argument4);
+    return result == 0 || (result < 0 && errno == ECHILD && isDone());
+}
+
+bool IsDirectory(const std::string& path)
+{
+    return CoreLibFileCheckDir(path.c_str()) == 1;
+}
+
+struct CloseStream {
+    void operator()(FILE* stream) const { (void)std::fclose(stream); }
+};
+using Stream = std::unique_ptr<FILE, CloseStream>;
+
+template <class Value>
+int ReadPairs(const std::string& path, std::map<std::string, Value>& out)
+{
+    constexpr const char* Function = "Read";
+    const FileDescriptor file(path, O_RDONLY);
+    if (!file.IsOpen()) {
+        if (!CoreLibFileExist(path.c_str())) return 0;
+        DR_LOG_AS(Function, Warn, "File[%s] is not opened.", path.c_str());
+        return -1;
+    }
+    const std::string text = ReadLines(file);
+
+    out.clear();
+    Extraction extraction;
+    auto next = out.end();
+    for (std::string_view rest = text; !rest.empty();) {
+        const std::string_view line = TakeLine(rest);
+        std::string key;
+        Value value{};
+        if (!parseLineKeyValue(line, extraction, key, value)) {
+            DR_LOG_AS(Function, Notice, "Failed to parse line[%s] from file [%s]",
+                      std::string(line).c_str(), path.c_str());
+            continue;
+        }
+        // The first of two lines with one key counts. Most files are sorted, more or less.
+        next = std::next(out.try_emplace(next, std::move(key), std::move(value)));
+    }
+    return static_cast<int>(out.size());
+}
+
+}  // namespace
+
+bool File::Read(const std::string& path, Json::Value& value)
+{
+    const FileDescriptor file(path, O_RDONLY);
+    if (!file.IsOpen()) {
+        if (!CoreLibFileExist(path.c_str())) return true;
+        DR_LOG(Err, "File[%s] is not opened.", path.c_str());
+        return false;
+    }
+    std::string text = ReadLines(file);
+    // The lines are joined with nothing between them.
+    text.erase(std::remove(text.begin(), text.end(), '\n'), text.end());
+    return fromString(value, text);
+}
+
+bool File::Read(int fd, Json::Value& value)
+{
+    const Stream stream(::fdopen(fd, "r"));
+    if (stream == nullptr) {
+        DR_LOG(Err, "Failed to open file descriptor [%d]", fd);
+        return false;
+    }
+    std::string text;
+    std::array<char, ChunkSize> chunk{};
+    while (std::fgets(chunk.data(), static_cast<int>(chunk.size()), stream.get()) != nullptr) {
+        text += chunk.data();
+    }
+    if (std::feof(stream.get()) == 0) DropTornLine(text);
+    return fromString(value, text);
+}
+
+bool File::Write(const std::string& path, const Json::Value& value)
+{
+    if (path.empty()) {
+        DR_LOG(Err, "Empty path to write.");
+        return false;
+    }
+    std::string text = toString(value) + "\n";
+    const FileDescriptor file(path, O_WRONLY | O_CREAT | O_TRUNC, NewFileMode);
+    if (!file.IsOpen()) {
+        DR_LOG(Err, "File [%s] is not opened.", path.c_str());
+        return false;
+    }
+    if (!WriteAll(file.Get(), text)) {
+        text.pop_back();
+        DR_LOG(Err, "Failed to write [%s] to [%s].", text.c_str(), path.c_str());
+        return false;
+    }
+    return true;
+}
+
+bool File::Write(int fd, const Json::Value& value)
+{
+    const Stream stream(::fdopen(fd, "w"));
+    if (stream == nullptr) {
+        DR_LOG(Err, "Failed to open file descriptor [%d]", fd);
+        return false;
+    }
+    // Without a buffer it is fprintf itself that meets a full disk, not the close behind it.
+    (void)std::setvbuf(stream.get(), nullptr, _IONBF, 0);
+    const std::string text = toString(value);
+    const bool written = std::fprintf(stream.get(), "%s", text.c_str()) >= 0;
+    if (!written) DR_LOG(Err, "Failed to write [%s] to fd[%d]", text.c_str(), fd);
+    return written;
+}
+
+bool File::CreateDir(const std::string& path, int mode)
+{
+    if (path.empty()) return false;
+    if (IsDirectory(path)) return true;
+
+    const auto bits = static_cast<unsigned int>(mode);
+    if (mode > MaxDirMode) {
+        DR_LOG(Err, "Directory mode error: %o", bits);
+        return false;
+    }
+    std::array<char, 4> octal{};
+    if (std::snprintf(octal.data(), octal.size(), "%o", bits) >= static_cast<int>(octal.size())) {
+        DR_LOG(Err, "snprintf error with mode [%o]", bits);
+        return false;
+    }
+    const auto isMade = [&path] { return IsDirectory(path); };
+    if (!RunProgram("/bin/mkdir", "-p", path.c_str(), "-m", octal.data(), isMade)) {
+        DR_LOG(Err, "Failed to create dir [%s] with mode [%o]", path.c_str(), bits);
+        return false;
+    }
+    return true;
+}
+
+bool File::RemoveDir(const std::string& path)
+{
+    const auto isGone = [&path] { return !IsDirectory(path); };
+    return isGone() || RunProgram("/bin/rm", "-rf", path.c_str(), nullptr, nullptr, isGone);
+}
+
+std::string File::GetParentDir(const std::string& path)
+{
+    return path.substr(0, path.rfind('/'));
+}
+
+bool File::IsRegularFile(int fd)
+{
+    struct stat status {};
+    return fd >= 0 && ::fstat(fd, &status) == 0 && S_ISREG(status.st_mode);
+}
+
+template <>
+int File::Read(const std::string& path, std::map<std::string, std::string>& out)
+{
+    return ReadPairs(path, out);
+}
+
+template <>
+int File::Read(const std::string& path, std::map<std::string, int>& out)
+{
+    return ReadPairs(path, out);
+}
+
+template <>
+int File::Read(const std::string& path, std::map<std::string, double>& out)
+{
+    return ReadPairs(path, out);
+}
+
+}  // namespace OrvaDRCore

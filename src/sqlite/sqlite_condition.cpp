@@ -1,0 +1,176 @@
+#include <orvadrcore/sqlite_condition.h>
+
+#include "base/log.h"
+#include "sqlite/sqlite_internals.h"
+
+namespace OrvaDRCore {
+
+namespace {
+
+constexpr const char* In = "IN";
+constexpr const char* NotIn = "NOT IN";
+
+// Every line of this file carries the name of the setter that the caller used.
+constexpr const char* Setter = "SetValue";
+
+bool SetComparison(std::string& condition, const std::string& lvalue, const char* sign,
+                   const SqliteValue& value)
+{
+    if (lvalue.empty() || !value.IsValid()) {
+        DR_LOG_AS(Setter, Err, "Bad lvalue[%s] or rvalue[%s]", lvalue.c_str(),
+                  value.ToFormatedValue().c_str());
+        return false;
+    }
+    condition = lvalue + sign + value.ToFormatedValue();
+    return true;
+}
+
+// Appends, on purpose: a second call on the same condition puts the new text behind the old one.
+bool AppendJunction(std::string& condition, const std::string& left, const char* word,
+                    const std::string& right)
+{
+    if (left.empty() || right.empty()) {
+        DR_LOG_AS(Setter, Err, "Bad lvalue[%s] or rvalue[%s]", left.c_str(), right.c_str());
+        return false;
+    }
+    condition += "(" + left + ") " + word + " (" + right + ")";
+    return true;
+}
+
+}  // namespace
+
+SqliteCondition::SqliteCondition(const std::string& text) : condition(text) {}
+
+bool SqliteCondition::IsValid() const
+{
+    return !condition.empty();
+}
+
+SqliteEqual::SqliteEqual(const std::string& lvalue, const SqliteValue& value)
+{
+    SetValue(lvalue, value);
+}
+
+bool SqliteEqual::SetValue(const std::string& lvalue, const SqliteValue& value)
+{
+    return SetComparison(condition, lvalue, "=", value);
+}
+
+SqliteNotEqual::SqliteNotEqual(const std::string& lvalue, const SqliteValue& value)
+{
+    SetValue(lvalue, value);
+}
+
+bool SqliteNotEqual::SetValue(const std::string& lvalue, const SqliteValue& value)
+{
+    return SetComparison(condition, lvalue, "!=", value);
+}
+
+SqliteAnd::SqliteAnd(const std::string& left, const std::string& right)
+{
+    SetValue(left, right);
+}
+
+bool SqliteAnd::SetValue(const std::string& left, const std::string& right)
+{
+    return AppendJunction(condition, left, "AND", right);
+}
+
+SqliteOr::SqliteOr(const std::string& left, const std::string& right)
+{
+    SetValue(left, right);
+}
+
+bool SqliteOr::SetValue(const std::string& left, const std::string& right)
+{
+    return AppendJunction(condition, left, "OR", right);
+}
+
+SqliteInFamily::SqliteInFamily(const std::string& word) : keyword(word) {}
+
+SqliteInFamily::SqliteInFamily(const std::string& word, const std::string& lvalue,
+                               const std::vector<SqliteValue>& values)
+    : keyword(word)
+{
+    SetValue(lvalue, values);
+}
+
+SqliteInFamily::SqliteInFamily(const std::string& word, const std::string& lvalue,
+                               const std::string& value)
+    : keyword(word)
+{
+    SetValue(lvalue, value);
+}
+
+// The text is not asked, on purpose: a refused list leaves a condition that is empty yet valid.
+bool SqliteInFamily::IsValid() const
+{
+    return keyword == In || keyword == NotIn;
+}
+
+bool SqliteInFamily::CheckKeyword() const
+{
+    // The constructors ask this class's own, any other caller the object's.
+    if (IsValid()) return true;  // NOLINT(clang-analyzer-optin.cplusplus.VirtualCall)
+    DR_LOG_AS(Setter, Err, "Bad keyword [%s]", keyword.c_str());
+    return false;
+}
+
+bool SqliteInFamily::SetValue(const std::string& lvalue, const std::vector<SqliteValue>& values)
+{
+    if (!CheckKeyword()) return false;
+    if (lvalue.empty()) {
+        DR_LOG(Err, "Bad lvalue[%s]", lvalue.c_str());
+        return false;
+    }
+    condition = lvalue + " " + keyword + " ( ";
+    for (const SqliteValue& value : values) {
+        if (!value.IsValid()) {
+            condition.clear();
+            DR_LOG(Err, "Invalid rvalue [%s]", value.ToFormatedValue().c_str());
+            return false;
+        }
+        AppendLiteral(condition, value);
+        condition += ',';
+    }
+    if (!values.empty()) condition.pop_back();
+    condition += " )";
+    return true;
+}
+
+bool SqliteInFamily::SetValue(const std::string& lvalue, const std::string& value)
+{
+    if (!CheckKeyword()) return false;
+    if (lvalue.empty() || value.empty()) {
+        DR_LOG(Err, "Bad lvalue[%s] or value[%s]", lvalue.c_str(), value.c_str());
+        return false;
+    }
+    condition = lvalue + " " + keyword + " ( " + value + " )";
+    return true;
+}
+
+SqliteIn::SqliteIn() : SqliteInFamily(In) {}
+
+SqliteIn::SqliteIn(const std::string& lvalue, const std::vector<SqliteValue>& values)
+    : SqliteInFamily(In, lvalue, values)
+{
+}
+
+SqliteIn::SqliteIn(const std::string& lvalue, const std::string& value)
+    : SqliteInFamily(In, lvalue, value)
+{
+}
+
+SqliteNotIn::SqliteNotIn() : SqliteInFamily(NotIn) {}
+
+SqliteNotIn::SqliteNotIn(const std::string& lvalue, const std::vector<SqliteValue>& values)
+    : SqliteInFamily(NotIn, lvalue, values)
+{
+}
+
+SqliteNotIn::SqliteNotIn(const std::string& lvalue, const std::string& value)
+    : SqliteInFamily(NotIn, lvalue, value)
+{
+}
+
+}  // namespace OrvaDRCore

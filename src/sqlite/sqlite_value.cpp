@@ -1,0 +1,235 @@
+#include <orvadrcore/sqlite_value.h>
+
+#include <cstring>
+#include <utility>
+
+#include "base/json_helpers.h"
+#include "base/log.h"
+#include "sqlite/sqlite_internals.h"
+
+namespace OrvaDRCore {
+
+SqliteValue::SqliteValue(int number) : valid(true), value(number) {}
+
+SqliteValue::SqliteValue(unsigned int number) : valid(true), value(number) {}
+
+SqliteValue::SqliteValue(bool truth) : valid(true), value(truth) {}
+
+SqliteValue::SqliteValue(const std::string& text) : SqliteValue(text.data(), text.size()) {}
+
+SqliteValue::SqliteValue(const char* text)
+    : SqliteValue(text, text != nullptr ? std::strlen(text) : 0)
+{
+}
+
+SqliteValue::SqliteValue(const char* text, std::size_t length)
+    : valid(text != nullptr && FitsJsonText(length)),
+      value(valid ? Json::Value(text, text + length) : Json::Value())
+{
+    if (text != nullptr && !valid) {
+        DR_LOG(Err, "text of [%zu] bytes is too long for a value", length);
+    }
+}
+
+// `valid` stays as it was, on purpose: only construction makes a value valid.
+SqliteValue& SqliteValue::operator=(const SqliteValue& other)
+{
+    value = other.value;
+    return *this;
+}
+
+bool SqliteValue::IsValid() const
+{
+    // The kinds that a value is built from; it may have lost its payload to another since.
+    const Json::ValueType kind = value.type();
+    return valid && (kind == Json::intValue || kind == Json::uintValue ||
+                     kind == Json::stringValue || kind == Json::booleanValue);
+}
+
+template <>
+bool SqliteValue::GetValue(std::string& out) const
+{
+    if (!value.isString()) {
+        DR_LOG_AS("GetValue<std::basic_string<char> >", Warn, "[%s] is not string",
+                  toString(value).c_str());
+        return false;
+    }
+    out = value.asString();
+    return true;
+}
+
+template <>
+bool SqliteValue::GetValue(unsigned int& out) const
+{
+    if (!value.isUInt()) {
+        DR_LOG_AS("GetValue<unsigned int>", Warn, "[%s] is not int", toString(value).c_str());
+        return false;
+    }
+    out = value.asUInt();
+    return true;
+}
+
+template <>
+bool SqliteValue::GetValue(int& out) const
+{
+    if (!value.isInt()) {
+        DR_LOG_AS("GetValue<int>", Warn, "[%s] is not int", toString(value).c_str());
+        return false;
+    }
+    out = value.asInt();
+    return true;
+}
+
+template <>
+bool SqliteValue::GetValue(bool& out) const
+{
+    const bool isBit = value.isInt() && (value.asInt() == 0 || value.asInt() == 1);
+    if (!value.isBool() && !isBit) {
+        DR_LOG_AS("GetValue<bool>", Warn, "[%s] is not bool", toString(value).c_str());
+        return false;
+    }
+    out = value.asBool();
+    return true;
+}
+
+std::string SqliteValue::ToFormatedValue() const
+{
+    std::string text;
+    AppendLiteral(text, *this);
+    return text;
+}
+
+std::string SqliteValue::EscapeText(const std::string& text)
+{
+    std::string escaped;
+    escaped.reserve(text.size());
+    for (const char character : text) {
+        if (character == '\'') escaped += '\'';
+        escaped += character;
+    }
+    return escaped;
+}
+
+SqliteValueList::SqliteValueList(SqliteValueList&& other) noexcept : values(std::move(other.values))
+{
+}
+
+SqliteValueList::~SqliteValueList() = default;
+
+SqliteValueList& SqliteValueList::operator=(const SqliteValueList& other)
+{
+    // Through a copy made by construction: assigning value by value would lose `valid`.
+    if (this != &other) values = std::map<std::string, SqliteValue>(other.values);
+    return *this;
+}
+
+SqliteValueList& SqliteValueList::operator=(SqliteValueList&& other) noexcept
+{
+    values.swap(other.values);
+    return *this;
+}
+
+bool SqliteValueList::AddValue(const std::string& field, const SqliteValue& value)
+{
+    return AddValue(field, SqliteValue(value));
+}
+
+bool SqliteValueList::AddValue(const std::string& field, SqliteValue&& value)
+{
+    if (field.empty() || !value.IsValid()) {
+        DR_LOG(Err, "Bad Field[%s] or value [%s]", field.c_str(), value.ToFormatedValue().c_str());
+        return false;
+    }
+    const auto [entry, added] = values.try_emplace(field, std::move(value));
+    if (!added) entry->second = value;  // try_emplace has left it alone
+    return true;
+}
+
+SqliteValueList& SqliteValueList::operator+=(const SqliteValueList& other)
+{
+    for (const auto& [field, value] : other.values) AddValue(field, value);
+    return *this;
+}
+
+bool SqliteValueList::HasField(const std::string& field) const
+{
+    if (field.empty()) {
+        DR_LOG(Err, "Invalid field [%s]", field.c_str());
+        return false;
+    }
+    return values.count(field) > 0;
+}
+
+const SqliteValue& SqliteValueList::GetValue(const std::string& field) const
+{
+    if (field.empty()) {
+        DR_LOG(Err, "Invalid field [%s]", field.c_str());
+        return invalidValue;
+    }
+    const auto entry = values.find(field);
+    if (entry == values.end()) {
+        DR_LOG(Warn, "Failed to find field [%s]", field.c_str());
+        return invalidValue;
+    }
+    return entry->second;
+}
+
+template <class T>
+bool SqliteValueList::ReadField(const std::string& field, T& out) const
+{
+    constexpr const char* Function = "GetValue";
+    if (field.empty()) {
+        DR_LOG_AS(Function, Err, "Invalid field [%s]", field.c_str());
+        return false;
+    }
+    const auto entry = values.find(field);
+    if (entry == values.end()) {
+        // A lower level than in the other GetValue, because asking this way is a test, too.
+        DR_LOG_AS(Function, Debug, "field [%s] is not existed", field.c_str());
+        return false;
+    }
+    return entry->second.GetValue(out);
+}
+
+template <>
+bool SqliteValueList::GetValue(const std::string& field, std::string& out) const
+{
+    return ReadField(field, out);
+}
+
+template <>
+bool SqliteValueList::GetValue(const std::string& field, unsigned int& out) const
+{
+    return ReadField(field, out);
+}
+
+template <>
+bool SqliteValueList::GetValue(const std::string& field, int& out) const
+{
+    return ReadField(field, out);
+}
+
+template <>
+bool SqliteValueList::GetValue(const std::string& field, bool& out) const
+{
+    return ReadField(field, out);
+}
+
+std::string SqliteValueList::ToStr() const
+{
+    return JoinPairs(*this, ":", ", ");
+}
+
+SqliteRecord::~SqliteRecord() = default;
+
+bool SqliteRecord::LoadRecord(const SqliteValueList& /*record*/)
+{
+    return false;
+}
+
+SqliteValueList SqliteRecord::ToSqliteRecord() const
+{
+    return BuildRecord(GetRecordFields());
+}
+
+}  // namespace OrvaDRCore

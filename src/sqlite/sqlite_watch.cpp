@@ -1,0 +1,25 @@
+#include "sqlite/sqlite_watch.h"
+
+namespace OrvaDRCore {
+
+void StatementWatch::Start(sqlite3* connection)
+{
+    handle = connection;
+    isBusyTimeoutSet = false;
+    sqlite3_set_authorizer(handle, Note, this);
+}
+
+// SQLite calls this while it prepares a statement, before the statement does anything.
+int StatementWatch::Note(void* watch, int action, const char* name, const char* value,
+                         const char* /*database*/, const char* /*trigger*/)
+{
+    auto& self = *static_cast<StatementWatch*>(watch);
+    const bool setsPragma = action == SQLITE_PRAGMA && value != nullptr;
+    if (setsPragma && sqlite3_stricmp(name, "busy_timeout") == 0) self.isBusyTimeoutSet = true;
+    const bool endsOrBegins = action == SQLITE_TRANSACTION || action == SQLITE_SAVEPOINT;
+    // Outside of a transaction such a statement can only begin one.
+    if (endsOrBegins && sqlite3_get_autocommit(self.handle) != 0) ++self.transactions;
+    return SQLITE_OK;
+}
+
+}  // namespace OrvaDRCore

@@ -1,0 +1,151 @@
+#include <orvadrcore/response.h>
+
+#include "base/json_helpers.h"
+
+namespace OrvaDRCore {
+
+Response::Response(const Response& other) : resp(other.resp) {}
+
+Response::Response(const std::string& text)
+{
+    setResp(text);
+}
+
+Response::Response(const char* text)
+{
+    setResp(text);
+}
+
+Response::Response(const Json::Value& reply) : resp(reply) {}
+
+Response::~Response() = default;
+
+bool Response::setResp(const std::string& text)
+{
+    resp = Json::Value();  // a reply that breaks off is none, and the one before it is past
+    return fromString(resp, text);
+}
+
+bool Response::setResp(const char* text)
+{
+    return setResp(std::string(text != nullptr ? text : ""));
+}
+
+void Response::setResp(const Json::Value& reply)
+{
+    resp = reply;
+}
+
+void Response::clear()
+{
+    Clear(resp);
+}
+
+bool Response::isValid() const
+{
+    return hasField("success");
+}
+
+bool Response::isSuccess() const
+{
+    return AsBool(getField("success"));
+}
+
+int Response::getErrCode() const
+{
+    const Json::Value* code = findErrorField("code");
+    return code != nullptr && code->isInt() ? code->asInt() : -1;
+}
+
+Json::Value Response::getErrMsg() const
+{
+    const Json::Value* errors = findErrorField("errors");
+    return errors != nullptr ? *errors : Json::Value();
+}
+
+Json::Value Response::getErr() const
+{
+    return getField("error");
+}
+
+bool Response::hasData() const
+{
+    return findData() != nullptr;
+}
+
+const Json::Value& Response::getData() const
+{
+    const Json::Value* data = findData();
+    return data != nullptr ? *data : emptyValue;
+}
+
+bool Response::hasDataField(const char* key) const
+{
+    return findDataField(key) != nullptr;
+}
+
+const Json::Value& Response::getDataField(const char* key) const
+{
+    const Json::Value* field = findDataField(key);
+    return field != nullptr ? *field : emptyValue;
+}
+
+std::string Response::getDataFieldtoStr(const char* key) const
+{
+    const Json::Value& field = getDataField(key);
+    return field.isString() ? field.asString() : std::string();
+}
+
+bool Response::isPollFinish() const
+{
+    return AsBool(getDataField("finish"));
+}
+
+bool Response::isPollSuccess() const
+{
+    return AsBool(getDataField("success"));
+}
+
+std::string Response::getTaskId() const
+{
+    return AsString(getDataField("task_id"));
+}
+
+bool Response::hasField(const char* key) const
+{
+    return FindMember(resp, key) != nullptr;
+}
+
+const Json::Value& Response::getField(const char* key) const
+{
+    const Json::Value* field = FindMember(resp, key);
+    return field != nullptr ? *field : emptyValue;
+}
+
+bool Response::hasAdditional() const
+{
+    return hasDataField("additional");
+}
+
+const Json::Value& Response::getAdditional() const
+{
+    return getDataField("additional");
+}
+
+const Json::Value* Response::findData() const
+{
+    return isSuccess() ? FindMember(resp, "data") : nullptr;
+}
+
+const Json::Value* Response::findDataField(const char* key) const
+{
+    const Json::Value* data = findData();
+    return data != nullptr ? FindMember(*data, key) : nullptr;
+}
+
+const Json::Value* Response::findErrorField(const char* key) const
+{
+    return isValid() ? FindMember(getField("error"), key) : nullptr;
+}
+
+}  // namespace OrvaDRCore

@@ -1,0 +1,79 @@
+#include "sqlite/sqlite_watch.h"
+
+#include <gtest/gtest.h>
+
+#include <memory>
+
+namespace {
+
+using OrvaDRCore::StatementWatch;
+
+struct CloseDatabase {
+    void operator()(sqlite3* handle) const { sqlite3_close(handle); }
+};
+using Database = std::unique_ptr<sqlite3, CloseDatabase>;
+
+Database OpenInMemory(StatementWatch& watch)
+{
+    sqlite3* handle = nullptr;
+    EXPECT_EQ(sqlite3_open_v2(":memory:", &handle, SQLITE_OPEN_READWRITE, nullptr), SQLITE_OK);
+    watch.Start(handle);
+    return Database(handle);
+}
+
+class StatementWatchTest : public ::testing::Test {
+  protected:
+    void Run(const char* text) const { sqlite3_exec(db.get(), text, nullptr, nullptr, nullptr); }
+
+    StatementWatch watch;
+    Database db = OpenInMemory(watch);
+};
+
+TEST_F(StatementWatchTest, CountsTransactionsThatAreBegunOutsideOfAnyOther)
+{
+    EXPECT_EQ(watch.CountTransactions(), 0U);
+    struct Row {
+        const char* text;
+        std::uint64_t count;
+    };
+    for (const Row& row : {
+             Row{"CREATE TABLE jobs (id); INSERT INTO jobs VALUES (1)", 0},
+             Row{"BEGIN", 1},
+             Row{"SAVEPOINT inner; ROLLBACK TO inner; RELEASE inner", 1},
+             Row{"BEGIN", 1},  // fails
+             Row{"COMMIT", 1},
+             Row{"begin immediate; rollback; savepoint outer; release outer", 3},
+             Row{"BEGIN EXCLUSIVE; COMMIT; BEGIN; END", 5},
+             Row{"SELECT 'BEGIN'; -- BEGIN", 5},
+         }) {
+        Run(row.text);
+        EXPECT_EQ(watch.CountTransactions(), row.count) << row.text;
+    }
+    EXPECT_NE(sqlite3_get_autocommit(db.get()), 0);
+}
+
+TEST_F(StatementWatchTest, SeesTheBusyTimeoutSetInEverySpelling)
+{
+    for (const char* text : {"PRAGMA busy_timeout", "SELECT timeout FROM pragma_busy_timeout",
+                             "PRAGMA cache_size=100", "PRAGMA nowhere.busy_timeout=5"}) {
+        Run(text);
+        EXPECT_FALSE(watch.IsBusyTimeoutSet()) << text;
+    }
+    for (const char* text : {"PRAGMA busy_timeout=5", "pragma main.\"Busy_TIMEOUT\"(5)",
+                             "SELECT 1; PRAGMA/**/[busy_timeout] = -1; BAD"}) {
+        db = OpenInMemory(watch);
+        EXPECT_FALSE(watch.IsBusyTimeoutSet());
+        Run(text);
+        EXPECT_TRUE(watch.IsBusyTimeoutSet()) << text;
+    }
+}
+
+TEST_F(StatementWatchTest, GoesOnCountingOnTheNextConnection)
+{
+    Run("BEGIN");
+    db = OpenInMemory(watch);
+    Run("BEGIN");
+    EXPECT_EQ(watch.CountTransactions(), 2U);
+}
+
+}  // namespace
