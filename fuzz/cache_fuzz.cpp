@@ -10,10 +10,10 @@
 #include <fstream>
 
 #include "base/json_helpers.h"
+#include "support/fakes/process_faults.h"
+#include "support/fakes/syscall_faults.h"
+#include "support/fixtures/temp_dir.h"
 #include "support/fuzz.h"
-#include "support/process_faults.h"
-#include "support/syscall_faults.h"
-#include "support/temp_dir.h"
 
 using OrvaDRCore::Cache;
 

@@ -5,9 +5,9 @@
 #include <charconv>
 
 #include "base/file_io.h"
+#include "support/fixtures/temp_dir.h"
 #include "support/fuzz.h"
 #include "support/memory_file.h"
-#include "support/temp_dir.h"
 
 namespace {
 

@@ -10,8 +10,8 @@
 
 #include "base/json_helpers.h"
 #include "fault.h"
-#include "support/temp_dir.h"
-#include "support/test_files.h"
+#include "support/fixtures/temp_dir.h"
+#include "support/fixtures/test_files.h"
 
 using OrvaDRCore::Cache;
 using OrvaDRCore::FileLock;

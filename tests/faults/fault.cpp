@@ -20,15 +20,15 @@
 #include <vector>
 
 #include "base/json_helpers.h"
-#include "support/allocation_faults.h"
-#include "support/child_checks.h"
-#include "support/pauses.h"
-#include "support/process_faults.h"
-#include "support/scale.h"
-#include "support/shared_memory.h"
-#include "support/syscall_faults.h"
-#include "support/temp_dir.h"
-#include "support/test_files.h"
+#include "support/fakes/allocation_faults.h"
+#include "support/fakes/pauses.h"
+#include "support/fakes/process_faults.h"
+#include "support/fakes/syscall_faults.h"
+#include "support/fixtures/scale.h"
+#include "support/fixtures/temp_dir.h"
+#include "support/fixtures/test_files.h"
+#include "support/processes/child_checks.h"
+#include "support/processes/shared_memory.h"
 
 // In builds with the address sanitizer: whether what is in use can still be reached.
 extern "C" __attribute__((weak)) int __lsan_do_recoverable_leak_check();  // NOLINT

@@ -8,9 +8,9 @@
 #include "base/file_io.h"
 #include "base/json_helpers.h"
 #include "fault.h"
-#include "support/child_checks.h"
-#include "support/temp_dir.h"
-#include "support/test_files.h"
+#include "support/fixtures/temp_dir.h"
+#include "support/fixtures/test_files.h"
+#include "support/processes/child_checks.h"
 
 using OrvaDRCore::File;
 using OrvaDRCore::fromFile;

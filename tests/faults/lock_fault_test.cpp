@@ -2,8 +2,8 @@
 #include <orvadrcore/file_lock.h>
 
 #include "fault.h"
-#include "support/temp_dir.h"
-#include "support/test_files.h"
+#include "support/fixtures/temp_dir.h"
+#include "support/fixtures/test_files.h"
 
 using OrvaDRCore::FileLock;
 

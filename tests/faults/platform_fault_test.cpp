@@ -11,8 +11,8 @@
 #include <memory>
 
 #include "fault.h"
-#include "support/temp_dir.h"
-#include "support/test_files.h"
+#include "support/fixtures/temp_dir.h"
+#include "support/fixtures/test_files.h"
 
 using OrvaDRCore::Container;
 using OrvaDRCore::GenerateUUID;

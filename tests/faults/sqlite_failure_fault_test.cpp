@@ -4,9 +4,9 @@
 #include <orvadrcore/sqlite_transaction.h>
 
 #include "fault.h"
-#include "support/plain_db.h"
-#include "support/sqlite_faults.h"
-#include "support/temp_dir.h"
+#include "support/fakes/sqlite_faults.h"
+#include "support/fixtures/plain_db.h"
+#include "support/fixtures/temp_dir.h"
 
 using OrvaDRCore::SqliteDB;
 using OrvaDRCore::SqliteTableHandler;

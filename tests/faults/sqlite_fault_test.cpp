@@ -9,8 +9,8 @@
 
 #include "fault.h"
 #include "faulty_vfs.h"
-#include "support/plain_db.h"
-#include "support/temp_dir.h"
+#include "support/fixtures/plain_db.h"
+#include "support/fixtures/temp_dir.h"
 
 using OrvaDRCore::InsertCommand;
 using OrvaDRCore::SelectCommand;

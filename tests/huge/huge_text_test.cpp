@@ -13,7 +13,7 @@
 
 #include "base/json_helpers.h"
 #include "sqlite/sqlite_internals.h"
-#include "support/sqlite_fixture.h"
+#include "support/fixtures/sqlite_fixture.h"
 
 namespace {
 

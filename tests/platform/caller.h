@@ -24,7 +24,7 @@
 #include <string>
 #include <vector>
 
-#include "support/child_process.h"
+#include "support/processes/child_process.h"
 
 // Runs `body` in a process of its own, which ends after a minute at the latest. Expectations that
 // fail there fail the test.

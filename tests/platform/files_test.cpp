@@ -8,7 +8,7 @@
 #include <filesystem>
 
 #include "caller.h"
-#include "support/temp_dir.h"
+#include "support/fixtures/temp_dir.h"
 
 namespace {
 

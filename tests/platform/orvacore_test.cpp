@@ -17,8 +17,8 @@
 #include <string>
 #include <vector>
 
-#include "support/child_process.h"
-#include "support/temp_dir.h"
+#include "support/fixtures/temp_dir.h"
+#include "support/processes/child_process.h"
 
 namespace {
 

@@ -10,7 +10,7 @@
 #include <set>
 #include <vector>
 
-#include "support/child_process.h"
+#include "support/processes/child_process.h"
 
 namespace {
 

@@ -18,8 +18,8 @@
 #include <thread>
 
 #include "caller.h"
-#include "support/shared_memory.h"
-#include "support/temp_dir.h"
+#include "support/fixtures/temp_dir.h"
+#include "support/processes/shared_memory.h"
 
 namespace {
 

@@ -12,8 +12,8 @@
 #include <thread>
 
 #include "caller.h"
-#include "support/old_kernel.h"
-#include "support/temp_dir.h"
+#include "support/fakes/old_kernel.h"
+#include "support/fixtures/temp_dir.h"
 
 namespace {
 

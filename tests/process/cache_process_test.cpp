@@ -25,14 +25,14 @@
 
 #include <orvadrcore/file_lock.h>
 
-#include "support/await.h"
-#include "support/child_process.h"
-#include "support/crowd.h"
-#include "support/pauses.h"
-#include "support/process_test.h"
-#include "support/rights.h"
-#include "support/scale.h"
-#include "support/shared_memory.h"
+#include "support/fakes/pauses.h"
+#include "support/fixtures/process_test.h"
+#include "support/fixtures/scale.h"
+#include "support/processes/await.h"
+#include "support/processes/child_process.h"
+#include "support/processes/crowd.h"
+#include "support/processes/rights.h"
+#include "support/processes/shared_memory.h"
 
 namespace {
 

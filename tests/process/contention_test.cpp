@@ -20,13 +20,13 @@
 #include <orvadrcore/sqlite_condition.h>
 #include <orvadrcore/sqlite_db.h>
 
-#include "support/child_process.h"
-#include "support/crowd.h"
-#include "support/pauses.h"
-#include "support/process_test.h"
-#include "support/scale.h"
-#include "support/shared_memory.h"
-#include "support/steady_disk.h"
+#include "support/fakes/pauses.h"
+#include "support/fakes/steady_disk.h"
+#include "support/fixtures/process_test.h"
+#include "support/fixtures/scale.h"
+#include "support/processes/child_process.h"
+#include "support/processes/crowd.h"
+#include "support/processes/shared_memory.h"
 
 namespace {
 

@@ -20,9 +20,9 @@
 #include <orvadrcore/sqlite_transaction.h>
 
 #include "base/json_helpers.h"
-#include "support/kills.h"
-#include "support/process_test.h"
-#include "support/shared_memory.h"
+#include "support/fixtures/process_test.h"
+#include "support/processes/kills.h"
+#include "support/processes/shared_memory.h"
 
 namespace {
 

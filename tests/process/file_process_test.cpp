@@ -15,9 +15,9 @@
 #include <json/value.h>
 #include <orvadrcore/file.h>
 
-#include "support/child_process.h"
-#include "support/process_test.h"
-#include "support/shared_memory.h"
+#include "support/fixtures/process_test.h"
+#include "support/processes/child_process.h"
+#include "support/processes/shared_memory.h"
 
 namespace {
 

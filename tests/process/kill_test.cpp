@@ -16,13 +16,13 @@
 
 #include <orvadrcore/file_lock.h>
 
-#include "support/await.h"
-#include "support/child_process.h"
-#include "support/kills.h"
-#include "support/pauses.h"
-#include "support/process_test.h"
-#include "support/scale.h"
-#include "support/traced_process.h"
+#include "support/fakes/pauses.h"
+#include "support/fixtures/process_test.h"
+#include "support/fixtures/scale.h"
+#include "support/processes/await.h"
+#include "support/processes/child_process.h"
+#include "support/processes/kills.h"
+#include "support/processes/traced_process.h"
 
 namespace {
 

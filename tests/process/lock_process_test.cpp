@@ -17,13 +17,13 @@
 #include <orvadrcore/file_lock.h>
 #include <orvadrcore/utils.h>
 
-#include "support/await.h"
-#include "support/child_process.h"
-#include "support/crowd.h"
-#include "support/process_test.h"
-#include "support/scale.h"
-#include "support/shared_memory.h"
-#include "support/traced_process.h"
+#include "support/fixtures/process_test.h"
+#include "support/fixtures/scale.h"
+#include "support/processes/await.h"
+#include "support/processes/child_process.h"
+#include "support/processes/crowd.h"
+#include "support/processes/shared_memory.h"
+#include "support/processes/traced_process.h"
 
 namespace {
 

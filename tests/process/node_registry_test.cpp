@@ -14,9 +14,9 @@
 #include <orvadrcore/response.h>
 #include <orvadrcore/sqlite_db.h>
 
-#include "support/listener.h"
-#include "support/node_registry.h"
-#include "support/program.h"
+#include "support/fixtures/node_registry.h"
+#include "support/processes/listener.h"
+#include "support/processes/program.h"
 
 namespace {
 

@@ -18,10 +18,10 @@
 
 #include <orvadrcore/response.h>
 
-#include "support/http_client.h"
-#include "support/listener.h"
-#include "support/node_registry.h"
-#include "support/program.h"
+#include "support/fixtures/node_registry.h"
+#include "support/processes/http_client.h"
+#include "support/processes/listener.h"
+#include "support/processes/program.h"
 
 namespace {
 

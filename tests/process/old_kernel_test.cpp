@@ -13,10 +13,10 @@
 #include <orvadrcore/sqlite_db.h>
 #include <orvadrcore/utils.h>
 
-#include "support/await.h"
-#include "support/child_process.h"
-#include "support/old_kernel.h"
-#include "support/process_test.h"
+#include "support/fakes/old_kernel.h"
+#include "support/fixtures/process_test.h"
+#include "support/processes/await.h"
+#include "support/processes/child_process.h"
 
 namespace {
 

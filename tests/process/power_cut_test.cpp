@@ -1,5 +1,5 @@
 // Files that are replaced while the power goes. The disk is rebuilt in each of the states in which
-// it can be found afterwards: support/power_cut.h.
+// it can be found afterwards: support/processes/power_cut.h.
 #include <gmock/gmock.h>
 #include <sys/stat.h>
 
@@ -13,9 +13,9 @@
 #include <orvadrcore/file.h>
 
 #include "base/json_helpers.h"
-#include "support/power_cut.h"
-#include "support/process_test.h"
-#include "support/scale.h"
+#include "support/fixtures/process_test.h"
+#include "support/fixtures/scale.h"
+#include "support/processes/power_cut.h"
 
 namespace {
 

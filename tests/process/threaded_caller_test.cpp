@@ -26,11 +26,11 @@
 
 #include <orvadrcore/file_lock.h>
 
-#include "support/await.h"
-#include "support/child_process.h"
-#include "support/global_locale.h"
-#include "support/process_test.h"
-#include "support/scale.h"
+#include "support/fakes/global_locale.h"
+#include "support/fixtures/process_test.h"
+#include "support/fixtures/scale.h"
+#include "support/processes/await.h"
+#include "support/processes/child_process.h"
 
 namespace {
 

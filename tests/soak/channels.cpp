@@ -10,7 +10,7 @@
 #include <orvadrcore/response.h>
 
 #include "examples/node_registry/json_line.h"
-#include "support/http_client.h"
+#include "support/processes/http_client.h"
 
 namespace Soak {
 

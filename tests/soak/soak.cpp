@@ -22,7 +22,7 @@
 #include "load.h"
 #include "process.h"
 #include "report.h"
-#include "support/rights.h"
+#include "support/processes/rights.h"
 #include "watch.h"
 
 namespace Soak {

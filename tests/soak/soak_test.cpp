@@ -25,9 +25,9 @@
 #include "ledger.h"
 #include "plan.h"
 #include "process.h"
-#include "support/await.h"
-#include "support/child_process.h"
-#include "support/temp_dir.h"
+#include "support/fixtures/temp_dir.h"
+#include "support/processes/await.h"
+#include "support/processes/child_process.h"
 #include "watch.h"
 
 namespace {

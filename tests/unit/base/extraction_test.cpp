@@ -14,8 +14,8 @@
 #include <string>
 #include <vector>
 
-#include "support/global_locale.h"
-#include "support/test_files.h"
+#include "support/fakes/global_locale.h"
+#include "support/fixtures/test_files.h"
 
 namespace {
 

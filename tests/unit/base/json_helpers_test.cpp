@@ -12,8 +12,8 @@
 #include <string_view>
 #include <vector>
 
-#include "support/global_locale.h"
-#include "support/json_kinds.h"
+#include "support/fakes/global_locale.h"
+#include "support/fixtures/json_kinds.h"
 
 namespace {
 

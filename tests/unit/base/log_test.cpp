@@ -5,7 +5,7 @@
 
 #include <fstream>
 
-#include "support/log_capture.h"
+#include "support/fakes/log_capture.h"
 
 namespace {
 

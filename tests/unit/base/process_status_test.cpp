@@ -10,8 +10,8 @@
 #include <climits>
 #include <cstring>
 
-#include "support/child_process.h"
-#include "support/syscall_faults.h"
+#include "support/fakes/syscall_faults.h"
+#include "support/processes/child_process.h"
 
 namespace {
 

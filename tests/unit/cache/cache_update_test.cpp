@@ -22,11 +22,11 @@
 #include <utility>
 
 #include "base/json_helpers.h"
-#include "support/cache_fixture.h"
-#include "support/child_checks.h"
-#include "support/json_kinds.h"
-#include "support/special_file.h"
-#include "support/test_files.h"
+#include "support/fixtures/cache_fixture.h"
+#include "support/fixtures/json_kinds.h"
+#include "support/fixtures/special_file.h"
+#include "support/fixtures/test_files.h"
+#include "support/processes/child_checks.h"
 
 namespace {
 

@@ -13,12 +13,12 @@
 #include <utility>
 #include <vector>
 
-#include "support/child_checks.h"
-#include "support/global_locale.h"
-#include "support/log_capture.h"
-#include "support/syscall_faults.h"
-#include "support/temp_dir.h"
-#include "support/test_files.h"
+#include "support/fakes/global_locale.h"
+#include "support/fakes/log_capture.h"
+#include "support/fakes/syscall_faults.h"
+#include "support/fixtures/temp_dir.h"
+#include "support/fixtures/test_files.h"
+#include "support/processes/child_checks.h"
 
 namespace {
 

@@ -13,13 +13,13 @@
 #include <string>
 #include <vector>
 
-#include "support/child_checks.h"
-#include "support/child_process.h"
-#include "support/log_capture.h"
-#include "support/special_file.h"
-#include "support/syscall_faults.h"
-#include "support/temp_dir.h"
-#include "support/test_files.h"
+#include "support/fakes/log_capture.h"
+#include "support/fakes/syscall_faults.h"
+#include "support/fixtures/special_file.h"
+#include "support/fixtures/temp_dir.h"
+#include "support/fixtures/test_files.h"
+#include "support/processes/child_checks.h"
+#include "support/processes/child_process.h"
 
 namespace {
 

@@ -11,7 +11,7 @@
 #include <memory>
 #include <numeric>
 
-#include "support/sqlite_fixture.h"
+#include "support/fixtures/sqlite_fixture.h"
 
 namespace {
 

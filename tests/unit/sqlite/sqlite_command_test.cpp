@@ -4,7 +4,7 @@
 #include <locale>
 #include <type_traits>
 
-#include "support/log_capture.h"
+#include "support/fakes/log_capture.h"
 
 // Conditions have no virtual destructor, on purpose, and neither have those that are derived here.
 #pragma GCC diagnostic ignored "-Wnon-virtual-dtor"

@@ -2,7 +2,7 @@
 
 #include <type_traits>
 
-#include "support/log_capture.h"
+#include "support/fakes/log_capture.h"
 
 // Conditions have no virtual destructor, on purpose, and neither has the one that is derived here.
 #pragma GCC diagnostic ignored "-Wnon-virtual-dtor"

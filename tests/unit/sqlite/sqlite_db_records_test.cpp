@@ -5,7 +5,7 @@
 #include <fstream>
 #include <functional>
 
-#include "support/sqlite_fixture.h"
+#include "support/fixtures/sqlite_fixture.h"
 
 namespace {
 

@@ -1,7 +1,7 @@
 // SqliteDB's statements that give rows: what comes out of a row, and both forms of SelectByCommand.
 #include <orvadrcore/sqlite_db.h>
 
-#include "support/sqlite_fixture.h"
+#include "support/fixtures/sqlite_fixture.h"
 
 namespace {
 

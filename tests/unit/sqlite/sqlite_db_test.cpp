@@ -11,7 +11,7 @@
 #include <type_traits>
 #include <utility>
 
-#include "support/sqlite_fixture.h"
+#include "support/fixtures/sqlite_fixture.h"
 
 namespace {
 

@@ -4,7 +4,7 @@
 #include <memory>
 #include <utility>
 
-#include "support/sqlite_fixture.h"
+#include "support/fixtures/sqlite_fixture.h"
 
 namespace {
 

@@ -7,7 +7,7 @@
 #include <type_traits>
 #include <utility>
 
-#include "support/log_capture.h"
+#include "support/fakes/log_capture.h"
 
 namespace {
 

@@ -6,8 +6,8 @@
 #include <string>
 #include <vector>
 
-#include "support/json_kinds.h"
-#include "support/log_capture.h"
+#include "support/fakes/log_capture.h"
+#include "support/fixtures/json_kinds.h"
 
 namespace {
 

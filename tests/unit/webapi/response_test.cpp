@@ -12,8 +12,8 @@
 #include <utility>
 #include <vector>
 
-#include "support/json_kinds.h"
-#include "support/log_capture.h"
+#include "support/fakes/log_capture.h"
+#include "support/fixtures/json_kinds.h"
 
 namespace {
 

@@ -1,4 +1,4 @@
-#include "http_client.h"
+#include "support/processes/http_client.h"
 
 #include <netinet/in.h>
 #include <sys/socket.h>

@@ -1,4 +1,4 @@
-#include "rights.h"
+#include "support/processes/rights.h"
 
 #include <grp.h>
 #include <linux/capability.h>

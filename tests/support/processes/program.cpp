@@ -1,4 +1,4 @@
-#include "program.h"
+#include "support/processes/program.h"
 
 #include <fcntl.h>
 #include <poll.h>

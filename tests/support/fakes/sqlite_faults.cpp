@@ -1,4 +1,4 @@
-#include "sqlite_faults.h"
+#include "support/fakes/sqlite_faults.h"
 
 #include <dlfcn.h>
 

@@ -9,7 +9,7 @@
 #include <memory>
 #include <vector>
 
-#include "child_process.h"
+#include "support/processes/child_process.h"
 
 class Crowd {
     static constexpr unsigned int DeadlineSeconds = 600;  // for what is done very often

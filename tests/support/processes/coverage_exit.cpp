@@ -6,7 +6,7 @@
 
 #include <cstdlib>
 
-#include "allocation_faults.h"
+#include "support/fakes/allocation_faults.h"
 
 // Not every test program has it.
 [[gnu::weak]] void AskBeforeAllocating(bool (*fails)());

@@ -1,4 +1,4 @@
-#include "power_cut.h"
+#include "support/processes/power_cut.h"
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -12,7 +12,7 @@
 #include <tuple>
 #include <utility>
 
-#include "traced_process.h"
+#include "support/processes/traced_process.h"
 
 namespace {
 

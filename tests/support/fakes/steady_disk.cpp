@@ -1,11 +1,11 @@
-#include "steady_disk.h"
+#include "support/fakes/steady_disk.h"
 
 #include <unistd.h>
 
 #include <ctime>
 #include <filesystem>
 
-#include "real_function.h"
+#include "support/fakes/real_function.h"
 
 namespace {
 

@@ -1,4 +1,4 @@
-#include "child_checks.h"
+#include "support/processes/child_checks.h"
 
 #include <grp.h>
 #include <gtest/gtest.h>
@@ -9,7 +9,7 @@
 #include <cstdio>
 #include <stdexcept>
 
-#include "child_process.h"
+#include "support/processes/child_process.h"
 
 namespace {
 

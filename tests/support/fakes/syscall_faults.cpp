@@ -1,4 +1,4 @@
-#include "syscall_faults.h"
+#include "support/fakes/syscall_faults.h"
 
 #include <fcntl.h>
 #include <sys/file.h>
@@ -12,7 +12,7 @@
 #include <cstdio>
 #include <cstdlib>
 
-#include "real_function.h"
+#include "support/fakes/real_function.h"
 
 namespace {
 

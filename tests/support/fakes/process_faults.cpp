@@ -1,10 +1,10 @@
-#include "process_faults.h"
+#include "support/fakes/process_faults.h"
 
 #include <unistd.h>
 
 #include <cstdlib>
 
-#include "real_function.h"
+#include "support/fakes/real_function.h"
 
 namespace {
 

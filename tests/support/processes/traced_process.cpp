@@ -1,4 +1,4 @@
-#include "traced_process.h"
+#include "support/processes/traced_process.h"
 
 #include <signal.h>
 #include <sys/ptrace.h>

@@ -1,4 +1,4 @@
-#include "child_process.h"
+#include "support/processes/child_process.h"
 
 #include <fcntl.h>
 #include <poll.h>

@@ -1,4 +1,4 @@
-#include "log_capture.h"
+#include "support/fakes/log_capture.h"
 
 #include <syslog.h>
 #include <unistd.h>

@@ -5,7 +5,7 @@
 
 #include <functional>
 
-#include "temp_dir.h"
+#include "support/fixtures/temp_dir.h"
 
 // In a process in which anything may be closed, limited or ignored; SIGPIPE is ignored already.
 void CheckInChild(const std::function<void()>& checks);

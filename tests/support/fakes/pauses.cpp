@@ -1,4 +1,4 @@
-#include "pauses.h"
+#include "support/fakes/pauses.h"
 
 #include <unistd.h>
 

@@ -7,7 +7,7 @@
 
 #include <string>
 
-#include "temp_dir.h"
+#include "support/fixtures/temp_dir.h"
 
 class SteadyDisk {
   public:

@@ -1,13 +1,13 @@
-#include "kills.h"
+#include "support/processes/kills.h"
 
 #include <gtest/gtest.h>
 #include <signal.h>
 
 #include <string>
 
-#include "pauses.h"
-#include "scale.h"
-#include "traced_process.h"
+#include "support/fakes/pauses.h"
+#include "support/fixtures/scale.h"
+#include "support/processes/traced_process.h"
 
 namespace {
 

@@ -1,4 +1,4 @@
-#include "allocation_faults.h"
+#include "support/fakes/allocation_faults.h"
 
 #include <cerrno>
 #include <cstdlib>
