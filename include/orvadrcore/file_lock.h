@@ -97,8 +97,8 @@ class ORVADRCORE_API FileLock {
     void unlock() const;
 
   private:
-    int fd = -1;
-    std::string path;
+    int fd_ = -1;
+    std::string path_;
 };
 
 }  // namespace OrvaDRCore

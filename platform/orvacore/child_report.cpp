@@ -7,6 +7,8 @@
 
 #include <cerrno>
 
+#include "base/errno.h"
+
 namespace {
 
 // How often the parent looks whether the child is still there.
@@ -32,8 +34,7 @@ bool CanRead(int fd, int timeoutMSec)
 
 void SendReport(int fd, const void* report, std::size_t size)
 {
-    while (::write(fd, report, size) < 0 && errno == EINTR) {
-    }
+    OrvaDRCore::RetryOnEintr([&] { return ::write(fd, report, size); });
 }
 
 bool ReceiveReport(int fd, pid_t child, void* report, std::size_t size)
@@ -42,9 +43,5 @@ bool ReceiveReport(int fd, pid_t child, void* report, std::size_t size)
         // A report comes before the end.
         if (HasEnded(child) && !CanRead(fd, 0)) return false;
     }
-    ssize_t count = 0;
-    do {
-        count = ::read(fd, report, size);
-    } while (count < 0 && errno == EINTR);
-    return count > 0;
+    return OrvaDRCore::RetryOnEintr([&] { return ::read(fd, report, size); }) > 0;
 }

@@ -14,6 +14,8 @@
 #include <new>
 #include <utility>
 
+#include "base/errno.h"
+
 namespace {
 
 // A process that waits for a lock uses no processor time; one that is merely slow does. Two ticks
@@ -52,13 +54,12 @@ long NSecBetween(const std::timespec& begin, const std::timespec& end)
 
 void OnTick(int /*signal*/)
 {
-    const int error = errno;
+    const OrvaDRCore::PreserveErrno preserve;
     const std::timespec used = UsedProcessorTime();
     const bool isIdle = NSecBetween(watch.used, used) < IdleNSec;
     watch.used = used;
     watch.idleTicks = isIdle ? watch.idleTicks + 1 : 0;
     if (watch.idleTicks == IdleTicksWhenStuck || ++watch.ticks == TicksWhenStuck) watch.whenStuck();
-    errno = error;
 }
 
 void SetTicks(long microseconds)

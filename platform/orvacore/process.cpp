@@ -11,6 +11,7 @@
 #include <cerrno>
 #include <chrono>
 
+#include "base/errno.h"
 #include "base/process_status.h"
 #include "child_report.h"
 #include "library_locks.h"
@@ -91,8 +92,7 @@ ForkResult TryForkDetached()
     if (intermediate > 0) {
         if (!ReceiveReport(pipe[0], intermediate, &result, sizeof result)) result = {-1, ECHILD};
         // ECHILD means that a caller who ignores SIGCHLD, or its handler, has reaped it already.
-        while (::waitpid(intermediate, nullptr, 0) < 0 && errno == EINTR) {
-        }
+        OrvaDRCore::RetryOnEintr([&] { return ::waitpid(intermediate, nullptr, 0); });
     }
     ::close(pipe[0]);
     return result;

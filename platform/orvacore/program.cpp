@@ -21,9 +21,13 @@
 #include <memory>
 #include <new>
 
+#include "base/errno.h"
 #include "child_report.h"
 
 namespace {
+
+using OrvaDRCore::PreserveErrno;
+using OrvaDRCore::RetryOnEintr;
 
 constexpr std::size_t MaxArguments = 16;
 constexpr int FirstOther = STDERR_FILENO + 1;  // from here on descriptors are closed for programs
@@ -36,7 +40,7 @@ using Arguments = std::array<char*, MaxArguments + 1>;
 class Start {
   public:
     // `output` becomes descriptor 1; -1 leaves that as it is.
-    Start(const Arguments& programArguments, int output);
+    Start(const Arguments& arguments, int output);
     Start(const Start&) = delete;
     Start& operator=(const Start&) = delete;
     ~Start();
@@ -45,17 +49,17 @@ class Start {
     int Run(pid_t& program) const;
 
   private:
-    const Arguments& arguments;
-    posix_spawn_file_actions_t files{};
-    posix_spawnattr_t attributes{};
-    int error = 0;
+    const Arguments& arguments_;
+    posix_spawn_file_actions_t files_{};
+    posix_spawnattr_t attributes_{};
+    int error_ = 0;
 };
 
-Start::Start(const Arguments& programArguments, int output) : arguments(programArguments)
+Start::Start(const Arguments& arguments, int output) : arguments_(arguments)
 {
-    ::posix_spawn_file_actions_init(&files);
-    if (output >= 0) error = ::posix_spawn_file_actions_adddup2(&files, output, STDOUT_FILENO);
-    if (error == 0) error = ::posix_spawn_file_actions_addclosefrom_np(&files, FirstOther);
+    ::posix_spawn_file_actions_init(&files_);
+    if (output >= 0) error_ = ::posix_spawn_file_actions_adddup2(&files_, output, STDOUT_FILENO);
+    if (error_ == 0) error_ = ::posix_spawn_file_actions_addclosefrom_np(&files_, FirstOther);
 
     // Programs wait for children of their own.
     sigset_t defaults;
@@ -63,22 +67,23 @@ Start::Start(const Arguments& programArguments, int output) : arguments(programA
     ::sigaddset(&defaults, SIGCHLD);
     sigset_t mask;
     ::pthread_sigmask(SIG_SETMASK, nullptr, &mask);
-    ::posix_spawnattr_init(&attributes);
-    ::posix_spawnattr_setsigdefault(&attributes, &defaults);
-    ::posix_spawnattr_setsigmask(&attributes, &mask);
-    ::posix_spawnattr_setflags(&attributes, POSIX_SPAWN_SETSIGDEF | POSIX_SPAWN_SETSIGMASK);
+    ::posix_spawnattr_init(&attributes_);
+    ::posix_spawnattr_setsigdefault(&attributes_, &defaults);
+    ::posix_spawnattr_setsigmask(&attributes_, &mask);
+    ::posix_spawnattr_setflags(&attributes_, POSIX_SPAWN_SETSIGDEF | POSIX_SPAWN_SETSIGMASK);
 }
 
 Start::~Start()
 {
-    ::posix_spawnattr_destroy(&attributes);
-    ::posix_spawn_file_actions_destroy(&files);
+    ::posix_spawnattr_destroy(&attributes_);
+    ::posix_spawn_file_actions_destroy(&files_);
 }
 
 int Start::Run(pid_t& program) const
 {
-    if (error != 0) return error;
-    return ::posix_spawn(&program, arguments[0], &files, &attributes, arguments.data(), environ);
+    if (error_ != 0) return error_;
+    return ::posix_spawn(&program, arguments_[0], &files_, &attributes_, arguments_.data(),
+                         environ);
 }
 
 // The exit code of a child; -1 when a signal ended it (errno EINTR) or when its result has been
@@ -86,9 +91,7 @@ int Start::Run(pid_t& program) const
 int WaitFor(pid_t pid)
 {
     int status = 0;
-    while (::waitpid(pid, &status, __WALL) < 0) {
-        if (errno != EINTR) return -1;
-    }
+    if (RetryOnEintr([&] { return ::waitpid(pid, &status, __WALL); }) < 0) return -1;
     if (WIFEXITED(status)) return WEXITSTATUS(status);
     errno = EINTR;
     return -1;
@@ -171,21 +174,16 @@ bool SpawnForReading(const Arguments& arguments, Program& program)
     std::array<int, 2> pipe{};
     if (::pipe2(pipe.data(), O_CLOEXEC) < 0) return false;
     program = {pipe[0], Spawn(arguments, pipe[1])};
-    const int error = errno;
+    const PreserveErrno preserve;
     ::close(pipe[1]);
     if (program.pid < 0) ::close(pipe[0]);
-    errno = error;
     return program.pid >= 0;
 }
 
 ssize_t ReadOutput(void* cookie, char* buffer, std::size_t size)
 {
     const auto* program = static_cast<const Program*>(cookie);
-    ssize_t count = 0;
-    do {
-        count = ::read(program->output, buffer, size);
-    } while (count < 0 && errno == EINTR);
-    return count;
+    return RetryOnEintr([&] { return ::read(program->output, buffer, size); });
 }
 
 int CloseOutput(void* cookie)

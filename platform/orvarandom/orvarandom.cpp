@@ -2,8 +2,9 @@
 
 #include <sys/random.h>
 
-#include <cerrno>
 #include <cstdint>
+
+#include "base/errno.h"
 
 namespace ORVA::RANDOM {
 
@@ -14,8 +15,7 @@ namespace {
 std::uint64_t KernelBits()
 {
     std::uint64_t bits = 0;
-    while (::getrandom(&bits, sizeof bits, 0) < 0 && errno == EINTR) {
-    }
+    OrvaDRCore::RetryOnEintr([&] { return ::getrandom(&bits, sizeof bits, 0); });
     return bits;
 }
 

@@ -31,8 +31,8 @@ bool BeginsWithDigit(std::string_view text)
 }  // namespace
 
 Extraction::Extraction()
-    : kinds(std::use_facet<std::ctype<char>>(locale)),
-      plain(locale == std::locale::classic() && std::fegetround() == FE_TONEAREST)
+    : kinds_(std::use_facet<std::ctype<char>>(locale_)),
+      plain_(locale_ == std::locale::classic() && std::fegetround() == FE_TONEAREST)
 {
 }
 
@@ -40,13 +40,13 @@ void Extraction::Read(std::string_view text, std::string& word) const
 {
     text = SkipBlanks(text);
     if (text.empty()) return;
-    const char* end = kinds.scan_is(std::ctype_base::space, text.begin(), text.end());
+    const char* end = kinds_.scan_is(std::ctype_base::space, text.begin(), text.end());
     word.assign(text.data(), static_cast<std::size_t>(end - text.data()));
 }
 
 void Extraction::Read(std::string_view text, int& number)
 {
-    if (!plain) return ReadByStream(text, number);
+    if (!plain_) return ReadByStream(text, number);
     text = SkipBlanks(text);
     if (text.empty()) return;
     text = SkipPlus(text);
@@ -62,7 +62,7 @@ void Extraction::Read(std::string_view text, int& number)
 void Extraction::Read(std::string_view text, double& number)
 {
     const std::string_view digits = SkipPlus(SkipBlanks(text));
-    if (!plain || !BeginsWithDigit(digits)) return ReadByStream(text, number);
+    if (!plain_ || !BeginsWithDigit(digits)) return ReadByStream(text, number);
     double value = 0;
     const auto [stop, error] = std::from_chars(digits.begin(), digits.end(), value);
     // Too large and too small numbers, and an exponent without digits, which fails a stream.
@@ -75,7 +75,7 @@ void Extraction::Read(std::string_view text, double& number)
 
 std::string_view Extraction::SkipBlanks(std::string_view text) const
 {
-    const char* begin = kinds.scan_not(std::ctype_base::space, text.begin(), text.end());
+    const char* begin = kinds_.scan_not(std::ctype_base::space, text.begin(), text.end());
     text.remove_prefix(static_cast<std::size_t>(begin - text.data()));
     return text;
 }
@@ -83,13 +83,13 @@ std::string_view Extraction::SkipBlanks(std::string_view text) const
 template <class Number>
 void Extraction::ReadByStream(std::string_view text, Number& number)
 {
-    if (!stream) {
-        stream.emplace().imbue(locale);
-        stream->exceptions(std::ios::badbit);  // or memory that is short reads as no number
+    if (!stream_) {
+        stream_.emplace().imbue(locale_);
+        stream_->exceptions(std::ios::badbit);  // or memory that is short reads as no number
     }
-    stream->clear();
-    stream->str(std::string(text));
-    *stream >> number;
+    stream_->clear();
+    stream_->str(std::string(text));
+    *stream_ >> number;
 }
 
 }  // namespace OrvaDRCore

@@ -26,10 +26,10 @@ class Extraction {
     template <class Number>
     void ReadByStream(std::string_view text, Number& number);
 
-    std::locale locale;
-    const std::ctype<char>& kinds;
-    bool plain;  // numbers are written as in C and rounded to the nearest
-    std::optional<std::istringstream> stream;
+    std::locale locale_;
+    const std::ctype<char>& kinds_;
+    bool plain_;  // numbers are written as in C and rounded to the nearest
+    std::optional<std::istringstream> stream_;
 };
 
 }  // namespace OrvaDRCore

@@ -9,6 +9,8 @@
 #include <cerrno>
 #include <utility>
 
+#include "base/errno.h"
+
 namespace OrvaDRCore {
 
 namespace {
@@ -18,25 +20,26 @@ constexpr std::size_t ReadSize = 16384;
 }  // namespace
 
 FileDescriptor::FileDescriptor(const std::string& path, int flags, mode_t mode)
-    : fd(::open(path.c_str(), flags | O_CLOEXEC, mode))
+    : fd_(::open(path.c_str(), flags | O_CLOEXEC, mode))
 {
 }
 
-FileDescriptor::FileDescriptor(FileDescriptor&& other) noexcept : fd(std::exchange(other.fd, -1)) {}
+FileDescriptor::FileDescriptor(FileDescriptor&& other) noexcept : fd_(std::exchange(other.fd_, -1))
+{
+}
 
 FileDescriptor::~FileDescriptor()
 {
-    const int error = errno;
-    if (fd >= 0) ::close(fd);
-    errno = error;
+    const PreserveErrno preserve;
+    if (fd_ >= 0) ::close(fd_);
 }
 
 bool ReadAll(int fd, std::string& text, std::size_t most)
 {
     std::array<char, ReadSize> chunk;  // NOLINT(cppcoreguidelines-pro-type-member-init)
     while (most > 0) {
-        const ssize_t count = ::read(fd, chunk.data(), std::min(most, chunk.size()));
-        if (count < 0 && errno == EINTR) continue;
+        const ssize_t count =
+            RetryOnEintr([&] { return ::read(fd, chunk.data(), std::min(most, chunk.size())); });
         if (count <= 0) return count == 0;
         text.append(chunk.data(), static_cast<std::size_t>(count));
         most -= static_cast<std::size_t>(count);
@@ -57,8 +60,7 @@ bool ReadRegularFile(const std::string& path, std::string& text, std::size_t mos
 bool WriteAll(int fd, std::string_view text)
 {
     while (!text.empty()) {
-        const ssize_t count = ::write(fd, text.data(), text.size());
-        if (count < 0 && errno == EINTR) continue;
+        const ssize_t count = RetryOnEintr([&] { return ::write(fd, text.data(), text.size()); });
         if (count <= 0) return false;
         text.remove_prefix(static_cast<std::size_t>(count));
     }

@@ -23,11 +23,11 @@ class FileDescriptor {
     FileDescriptor& operator=(const FileDescriptor&) = delete;
     ~FileDescriptor();  // keeps errno
 
-    bool IsOpen() const { return fd >= 0; }
-    int Get() const { return fd; }
+    bool IsOpen() const { return fd_ >= 0; }
+    int Get() const { return fd_; }
 
   private:
-    int fd = -1;
+    int fd_ = -1;
 };
 
 // Appends all that can be read to `text`, or the first `most` bytes of it. False when reading fails

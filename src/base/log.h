@@ -12,7 +12,7 @@
 #include <syslog.h>
 #include <unistd.h>
 
-#include <cerrno>
+#include "base/errno.h"
 
 namespace OrvaDRCore::Log {
 
@@ -48,10 +48,9 @@ constexpr const char* BaseName(const char* path)
 template <class... Args>
 void Write(const Level& level, const Site& site, const char* format, Args... args)
 {
-    const int error = errno;
+    const PreserveErrno preserve;
     ::syslog(level.priority, format, site.file, site.line, site.function, level.word, ::getpid(),
              args...);
-    errno = error;
 }
 
 }  // namespace OrvaDRCore::Log

@@ -16,6 +16,7 @@
 #include <limits>
 #include <memory>
 
+#include "base/errno.h"
 #include "base/file_io.h"
 #include "base/process_status.h"
 
@@ -185,9 +186,8 @@ bool ReplaceFile(const std::string& path, std::string_view text, std::optional<m
         return true;
     }
 
-    const int error = errno;
+    const PreserveErrno preserve;
     ::unlink(temporary.c_str());
-    errno = error;
     return false;
 }
 

@@ -28,11 +28,11 @@ bool IsNamedPipe(const std::string& path)
 
 }  // namespace
 
-FileLock::FileLock(const std::string& name) : path(getLockFilePath(name)) {}
+FileLock::FileLock(const std::string& name) : path_(getLockFilePath(name)) {}
 
 FileLock::~FileLock()
 {
-    if (fd >= 0) ::close(fd);
+    if (fd_ >= 0) ::close(fd_);
 }
 
 std::string FileLock::getLockFilePath(const std::string& name)
@@ -51,19 +51,19 @@ bool FileLock::setLockFile(const std::string& name)
         return false;
     }
     const std::string newPath = getLockFilePath(name);
-    if (newPath == path) return true;
-    if (fd >= 0) {
-        DR_LOG(Err, "File [%s] has been open, can not set file path to [%s]", path.c_str(),
+    if (newPath == path_) return true;
+    if (fd_ >= 0) {
+        DR_LOG(Err, "File [%s] has been open, can not set file path to [%s]", path_.c_str(),
                newPath.c_str());
         return false;
     }
-    path = newPath;
+    path_ = newPath;
     return true;
 }
 
 bool FileLock::checkLockDir() const
 {
-    const std::string dir = File::GetParentDir(path);
+    const std::string dir = File::GetParentDir(path_);
     if (dir.empty()) return false;
     if (!File::CreateDir(dir, LockDirMode)) {
         DR_LOG(Err, "Failed to create lock dir [%s] in local host", dir.c_str());
@@ -74,25 +74,25 @@ bool FileLock::checkLockDir() const
 
 bool FileLock::openLockedFile()
 {
-    if (path.empty()) {
+    if (path_.empty()) {
         DR_LOG(Err, "Bad Lock File");
         return false;
     }
     if (!checkLockDir()) {
-        DR_LOG(Err, "Failed to check lock dir of lock file [%s].", path.c_str());
+        DR_LOG(Err, "Failed to check lock dir of lock file [%s].", path_.c_str());
         return false;
     }
-    if (File::IsRegularFile(fd)) return true;
-    if (fd >= 0) ::close(fd);
-    fd = -1;
-    if (IsNamedPipe(path)) {
+    if (File::IsRegularFile(fd_)) return true;
+    if (fd_ >= 0) ::close(fd_);
+    fd_ = -1;
+    if (IsNamedPipe(path_)) {
         errno = EINVAL;
     } else {
         // flock needs no write access.
-        fd = ::open64(path.c_str(), O_RDONLY | O_CREAT, LockFileMode);
+        fd_ = ::open64(path_.c_str(), O_RDONLY | O_CREAT, LockFileMode);
     }
-    if (fd < 0) {
-        DR_LOG(Err, "Failed to open lock file[%s], errno=%m", path.c_str());
+    if (fd_ < 0) {
+        DR_LOG(Err, "Failed to open lock file[%s], errno=%m", path_.c_str());
         return false;
     }
     return true;
@@ -102,10 +102,10 @@ bool FileLock::openLockedFile()
 bool FileLock::lock(int operation, unsigned int retries)
 {
     if (!openLockedFile()) {
-        DR_LOG(Err, "Bad fd [%d] to lock [%s]", fd, path.c_str());
+        DR_LOG(Err, "Bad fd [%d] to lock [%s]", fd_, path_.c_str());
         return false;
     }
-    for (unsigned int attempts = 0; ::flock(fd, operation) != 0; ++attempts) {
+    for (unsigned int attempts = 0; ::flock(fd_, operation) != 0; ++attempts) {
         if (attempts == retries) return false;
         ::sleep(RetrySeconds);  // NOLINT(concurrency-mt-unsafe): unsafe beside SIGALRM alone
     }
@@ -121,9 +121,9 @@ bool FileLock::tryLock(int operation)
 
 void FileLock::unlock() const
 {
-    if (fd <= 0) return;  // 0 counts as not open here, and only here, on purpose
-    if (::flock(fd, LOCK_UN) < 0) {
-        DR_LOG(Err, "Failed to unlock [%s] with fd [%d], errno=[%m]", path.c_str(), fd);
+    if (fd_ <= 0) return;  // 0 counts as not open here, and only here, on purpose
+    if (::flock(fd_, LOCK_UN) < 0) {
+        DR_LOG(Err, "Failed to unlock [%s] with fd [%d], errno=[%m]", path_.c_str(), fd_);
     }
 }
 
