@@ -1,27 +1,24 @@
 #include <orvadrcore/cache.h>
 
 #include <orvacore/orvacore.h>
-#include <sys/file.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <cerrno>
 #include <ctime>
-#include <functional>
-#include <limits>
-#include <optional>
 #include <string>
+#include <utility>
 
 #include <orvadrcore/file.h>
 #include <orvadrcore/file_lock.h>
 #include <orvadrcore/utils.h>
 
-#include "base/file_io.h"
 #include "base/json_helpers.h"
 #include "base/log.h"
-#include "base/replace_file.h"
 #include "base/retry.h"
+#include "base/scope_guard.h"
+#include "cache/cache_file.h"
+#include "cache/freshness.h"
+#include "cache/updater_mark.h"
 
 namespace OrvaDRCore {
 
@@ -29,11 +26,6 @@ namespace {
 
 constexpr const char* DefaultPath = "/tmp/default_dr_cache";
 constexpr int CacheDirMode = 0755;
-
-constexpr int ProbeLock = LOCK_SH | LOCK_NB;    // to read the pid file
-constexpr int MarkingLock = LOCK_EX | LOCK_NB;  // to check and write it
-constexpr unsigned int LockRetries = 5;         // a second apart
-
 constexpr int DetachedFork = 0x40;
 
 struct PauseMSec {
@@ -41,7 +33,6 @@ struct PauseMSec {
     unsigned int max;
     void operator()() const { RandomSleepInMSec(min, max); }
 };
-constexpr PauseMSec WaitPause{300, 1000};
 constexpr PauseMSec ProducePause{500, 1000};
 constexpr PauseMSec WritePause{300, 1000};
 
@@ -58,87 +49,58 @@ std::string GetCachedPath(const std::string& dir, const std::string& file)
     return dir + "/" + file + ".cached";
 }
 
-// In whole seconds since the epoch; -1 for what is not there.
-std::time_t GetModifyTime(const std::string& path)
-{
-    struct stat status {};
-    return ::stat(path.c_str(), &status) == 0 ? status.st_mtime : -1;
-}
-
-// The longest refresh that a document speaks of; 0 when it does not say, or not as an integer.
-int GetLongestRefresh(const Json::Value& document)
-{
-    const Json::Value* longest = FindMember(document, "max_updated_time");
-    // A real number counts as absent, on purpose, although to jsoncpp 3.0 is an int.
-    const bool known = longest != nullptr && longest->isInt() && longest->type() != Json::realValue;
-    return known ? longest->asInt() : 0;
-}
-
-// The text form of a value, for a line in the log. Of one that nests so deep that its making could
-// overflow the stack there is none.
+// A value as text for a log line. Converting one that nests too deep could overflow the stack.
 std::string TextForLine(const Json::Value& value)
 {
     return NestsAtMost(value, 5 * MaxLevels) ? toString(value) : "(nested too deep)";
 }
 
-std::size_t HashOf(const std::string& text)
-{
-    return std::hash<std::string>()(text);
-}
-
-bool IsLiving(pid_t pid)
-{
-    return pid > 0 && CoreLibProcAlive(pid) == 1;
-}
-
-// The cache's lock, unlocked before its file is closed. A program that another thread starts at
-// that moment inherits the descriptor: if it were only closed here, the program would hold the lock
-// for as long as it runs.
-class CacheLock {
-  public:
-    explicit CacheLock(const std::string& name) : lock(name) {}
-    CacheLock(const CacheLock&) = delete;
-    CacheLock& operator=(const CacheLock&) = delete;
-    ~CacheLock();
-
-    bool Lock(int operation) { return isHeld = lock.lock(operation, LockRetries); }
-
-  private:
-    FileLock lock;
-    bool isHeld = false;
-};
-
-CacheLock::~CacheLock()
-{
-    if (!isHeld) return;
-    try {
-        (void)lock.lock(LOCK_UN, 0);  // not unlock(), which passes over descriptor 0
-    } catch (...) {
-        // Out of memory: closing the file has to do.
-    }
-}
-
-// The limit of both retry loops: one try more than it says, and a single one when it is negative.
-std::uint64_t RetriesOf(int limit)
+// What Retry() takes as its limit: one more than a cache's own, and 0 when that is negative.
+std::uint64_t RetryLimitOf(int limit)
 {
     return limit < 0 ? 0 : static_cast<std::uint64_t>(limit) + 1;
 }
 
-int ToWholeSeconds(double seconds)
-{
-    constexpr double Largest = std::numeric_limits<int>::max();
-    return static_cast<int>(std::clamp(seconds, -Largest, Largest));
-}
-
 }  // namespace
+
+// The state, and the steps that only Cache calls.
+struct Cache::Impl {
+    Impl(const std::string& path, long timeoutSeconds, bool updatedRequired, int retries)
+        : file(path),
+          mark(path),
+          timeout(timeoutSeconds),
+          updatedDataRequired(updatedRequired),
+          retryLimit(retries)
+    {
+    }
+
+    CacheFile file;
+    UpdaterMark mark;
+    long timeout;
+    bool updatedDataRequired;
+    int retryLimit;
+
+    const Json::Value& LoadedData(const Cache& cache, std::time_t& modifyTime);
+    bool RefreshIfStale(const Cache& cache, const char* function, const Json::Value& data,
+                        std::time_t modifyTime) const;
+    bool Refresh(const Cache& cache) const;
+    void Unmark(const Cache& cache) const noexcept;
+    [[noreturn]] void RefreshInChild(const Cache& cache) const;
+};
 
 Cache::Cache(const std::string& dir, const std::string& file, long timeoutSeconds,
              bool updatedRequired, int retries)
-    : cachedPath(GetCachedPath(dir, file)),
-      timeout(timeoutSeconds),
-      updatedDataRequired(updatedRequired),
-      retryLimit(retries)
+    : impl_(std::make_unique<Impl>(GetCachedPath(dir, file), timeoutSeconds, updatedRequired,
+                                   retries))
 {
+}
+
+Cache::Cache(const Cache& other) : impl_(std::make_unique<Impl>(*other.impl_)) {}
+
+Cache& Cache::operator=(const Cache& other)
+{
+    *impl_ = *other.impl_;
+    return *this;
 }
 
 Cache::~Cache() = default;
@@ -155,90 +117,80 @@ bool Cache::IsNeedUpdate(const Json::Value& /*data*/) const
 
 bool Cache::IsUpdatedDataRequired() const
 {
-    return updatedDataRequired || !IsValidData(GetCachedData());
+    return impl_->updatedDataRequired || !IsValidData(GetCachedData());
 }
 
 Json::Value Cache::Read() const
 {
-    // A copy: the refresh may replace what is in memory, and fail.
+    // A copy, because a refresh that fails may have replaced what is in memory.
     std::time_t modifyTime = -1;
-    Json::Value data = LoadedData(modifyTime);
-    if (GivesWay(__func__, data, modifyTime)) data = GetCachedData();
+    Json::Value data = impl_->LoadedData(*this, modifyTime);
+    if (impl_->RefreshIfStale(*this, __func__, data, modifyTime)) data = GetCachedData();
     return data;
 }
 
 const Json::Value& Cache::View() const
 {
     std::time_t modifyTime = -1;
-    const Json::Value& data = LoadedData(modifyTime);
-    return GivesWay(__func__, data, modifyTime) ? LoadedData(modifyTime) : cachedData;
+    const Json::Value& data = impl_->LoadedData(*this, modifyTime);
+    const bool isRefreshed = impl_->RefreshIfStale(*this, __func__, data, modifyTime);
+    return isRefreshed ? impl_->LoadedData(*this, modifyTime) : impl_->file.GetData();
 }
 
 Json::Value Cache::GetCachedData() const
 {
     std::time_t modifyTime = -1;
-    return LoadedData(modifyTime);
+    return impl_->LoadedData(*this, modifyTime);
 }
 
 bool Cache::Load() const
 {
-    // Looked at before reading: a write in between is then seen as one by the next read.
-    struct stat status {};
-    if (::stat(cachedPath.c_str(), &status) != 0) {
-        DR_LOG(Debug, "no data is cached in [%s]", cachedPath.c_str());
-        return false;
+    switch (impl_->file.Load()) {
+        case CacheFile::LoadResult::Loaded: return true;
+        case CacheFile::LoadResult::Missing:
+            DR_LOG(Debug, "no data is cached in [%s]", impl_->file.GetPath().c_str());
+            break;
+        case CacheFile::LoadResult::Unreadable:
+            DR_LOG(Debug, "Failed to read data from cache [%s]", impl_->file.GetPath().c_str());
+            break;
     }
-    std::string text;
-    Json::Value document;
-    if (!ReadRegularFile(cachedPath, text) || !fromString(document, text)) {
-        DR_LOG(Debug, "Failed to read data from cache [%s]", cachedPath.c_str());
-        return false;
-    }
-    knownText = {text.size(), HashOf(text), GetLongestRefresh(document)};
-    // Without "cached_data" the file counts as loaded and the old data stays, on purpose.
-    if (FindMember(document, "cached_data") != nullptr) cachedData.swap(document["cached_data"]);
-    loadedModifyTime = status.st_mtime;
-    return true;
+    return false;
 }
 
 bool Cache::IsTimeout() const
 {
-    return IsTooOld(GetModifyTime(cachedPath));
+    return IsTooOld(impl_->file.GetModifyTime(), impl_->timeout);
 }
 
 int Cache::GetMaxUpdateTime() const
 {
-    std::string text;
-    if (!ReadRegularFile(cachedPath, text)) return 0;
-    // What this object has loaded or written itself is not parsed again. The text tells, because
-    // times do not: after two changes within one step of the clock they are the same.
-    if (text.size() == knownText.size && HashOf(text) == knownText.hash) {
-        return knownText.longestRefresh;
-    }
-    Json::Value document;
-    return fromString(document, text) ? GetLongestRefresh(document) : 0;
+    return impl_->file.GetLongestRefresh();
 }
 
 int Cache::Remove()
 {
-    return ::unlink(cachedPath.c_str());
+    return ::unlink(impl_->file.GetPath().c_str());
 }
 
 bool Cache::Update() const
 {
-    const bool block = IsUpdatedDataRequired();
+    const bool mustWait = IsUpdatedDataRequired();
     if (IsUpdating()) {
-        if (block) WaitForUpdater();
+        if (!mustWait) return true;
+        const char* const path = impl_->file.GetPath().c_str();
+        DR_LOG(Debug, "start to block wait cache [%s] ", path);
+        impl_->mark.WaitForUpdater([this] { return IsTimeout(); });
+        DR_LOG(Debug, "finish to block wait cache [%s] ", path);
         return true;
     }
-    if (block) return Refresh();
+    if (mustWait) return impl_->Refresh(*this);
 
     const pid_t child = CoreLibProcForkEx(DetachedFork);
     if (child < 0) {
         DR_LOG(Warn, "Failed to fork(). errno=[%d/%m]", errno);
         return false;
     }
-    if (child == 0) RefreshInChild();
+    if (child == 0) impl_->RefreshInChild(*this);
     return true;
 }
 
@@ -250,9 +202,10 @@ bool Cache::DoUpdate() const
         data = Json::Value();
         return GetUpdatedData(data);
     };
-    if (!Retry(RetriesOf(retryLimit), produce, ProducePause).succeeded) {
+    const int limit = impl_->retryLimit;
+    if (!Retry(RetryLimitOf(limit), produce, ProducePause).succeeded) {
         DR_LOG(Debug, "Failed to get updated cache [%s] and reach the retry limit[%d]",
-               toString(GetInfo()).c_str(), retryLimit);
+               toString(GetInfo()).c_str(), limit);
         return false;
     }
     return UpdateWithData(data, begin, std::time(nullptr));
@@ -262,36 +215,22 @@ bool Cache::UpdateWithData(const Json::Value& data, long begin, long finish) con
 {
     const bool isValid = IsValidData(data);
     Json::Value info = GetInfo();
-    // In the document both stand one level down.
-    if (!isValid || !IsReadable(data, 1) || !IsReadable(info, 1)) {
+    if (!isValid || !IsStorable(data) || !IsStorable(info)) {
         DR_LOG(Debug, "[%s] is not valid to update for cache [%s]", TextForLine(data).c_str(),
                TextForLine(info).c_str());
         return false;
     }
-    if (begin < 1 || finish < 1) begin = finish = 0;
-    const double took = std::difftime(finish, begin);
-    Json::Value document(Json::objectValue);
-    document["timeout"] = Json::Int64{timeout};
-    document["info"].swap(info);
-    document["cached_data"] = data;
-    document["begin_time_to_update"] = Json::Int64{begin};
-    document["finish_time_to_update"] = Json::Int64{finish};
-    document["updated_time"] = took;
-    const int longest = std::max(GetMaxUpdateTime(), ToWholeSeconds(took));
-    document["max_updated_time"] = longest;
-
-    const std::string text = toString(document);
-    struct stat written {};
-    const auto write = [&] { return ReplaceFile(cachedPath, text, std::nullopt, &written); };
+    CacheFile& file = impl_->file;
+    const int limit = impl_->retryLimit;
+    CacheDocument document = file.Compose({impl_->timeout, std::move(info), data, begin, finish});
+    const auto write = [&] { return file.Write(document); };
     // A document that is too long could not be loaded again.
-    if (!FitsJsonText(text.size()) || !Retry(RetriesOf(retryLimit), write, WritePause).succeeded) {
+    if (!FitsJsonText(document.text.size()) ||
+        !Retry(RetryLimitOf(limit), write, WritePause).succeeded) {
         DR_LOG(Debug, "Failed to write cache to file [%s] and reach retry limit[%d]",
-               cachedPath.c_str(), retryLimit);
+               file.GetPath().c_str(), limit);
         return false;
     }
-    cachedData.swap(document["cached_data"]);
-    loadedModifyTime = written.st_mtime;
-    knownText = {text.size(), HashOf(text), longest};
     return true;
 }
 
@@ -300,136 +239,102 @@ bool Cache::UpdateWithData(const Json::Value& data) const
     return UpdateWithData(data, 0, 0);
 }
 
-std::string Cache::PidPath() const
-{
-    return cachedPath + ".pid";
-}
-
-std::string Cache::LockName() const
-{
-    return cachedPath + ".lock";
-}
-
-// What is in memory, after a look whether the file has changed, whose modification time goes into
-// `modifyTime`.
-const Json::Value& Cache::LoadedData(std::time_t& modifyTime) const
-{
-    modifyTime = GetModifyTime(cachedPath);
-    if (modifyTime != -1 && modifyTime == loadedModifyTime) return cachedData;
-    if (!Load()) {
-        cachedData = GetDefaultValue();
-        DR_LOG_AS("GetCachedData", Debug, "Failed to load cache [%s], use default cache data",
-                  cachedPath.c_str());
-    }
-    modifyTime = GetModifyTime(cachedPath);
-    return cachedData;
-}
-
-bool Cache::IsTooOld(std::time_t modifyTime) const
-{
-    const std::time_t now = std::time(nullptr);
-    return now == -1 || std::difftime(now, modifyTime) > static_cast<double>(timeout);
-}
-
-// Whether stale data gives way to what a refresh has left, or is in the making.
-bool Cache::GivesWay(const char* function, const Json::Value& data, std::time_t modifyTime) const
-{
-    if (!IsTooOld(modifyTime) && IsValidData(data) && !IsNeedUpdate(data)) return false;
-    if (Update()) return true;
-    DR_LOG_AS(function, Debug, "Failed to update cache [%s], use old cache data.",
-              toString(GetInfo()).c_str());
-    return false;
-}
-
-// Whether a living process is marked as updater. The lock is free again when this returns.
 bool Cache::IsUpdating() const
 {
-    CacheLock lock(LockName());
-    return !lock.Lock(ProbeLock) || IsLiving(CoreLibReadPidFile(PidPath().c_str()));
+    return impl_->mark.IsUpdating();
 }
 
-// Marks this process as the updater. The refresh itself runs without a lock: the pid file is
-// enough.
+// Marks this process as the updater.
 bool Cache::SetUpdating() const
 {
-    const std::string pidPath = PidPath();
-    CacheLock lock(LockName());
-    if (!lock.Lock(MarkingLock)) {
-        DR_LOG(Debug, "Failed to lock [%s]", FileLock::getLockFilePath(LockName()).c_str());
+    const UpdaterMark& mark = impl_->mark;
+    const char* const path = impl_->file.GetPath().c_str();
+    MarkLock lock(mark);
+    if (!lock.LockExclusive()) {
+        DR_LOG(Debug, "Failed to lock [%s]", FileLock::getLockFilePath(mark.GetLockName()).c_str());
         return false;
     }
-    if (IsLiving(CoreLibReadPidFile(pidPath.c_str()))) {
-        DR_LOG(Debug, "there is other process to update cache [%s]", cachedPath.c_str());
+    if (mark.IsOfLivingProcess()) {
+        DR_LOG(Debug, "there is other process to update cache [%s]", path);
         return false;
     }
-    if (CoreLibProcPidFileCreate(pidPath.c_str()) != 0) {
-        DR_LOG(Debug, "Failed to set cache [%s] updating", cachedPath.c_str());
+    if (!mark.Set()) {
+        DR_LOG(Debug, "Failed to set cache [%s] updating", path);
         return false;
     }
-    DR_LOG(Debug, "---> Start to update cache [%s]", cachedPath.c_str());
+    DR_LOG(Debug, "---> Start to update cache [%s]", path);
     return true;
 }
 
-// Removes the mark, unless it is by now that of another living process.
+// Removes the mark, unless it is another living process's by now.
 void Cache::UnsetUpdating() const
 {
-    const std::string pidPath = PidPath();
-    CacheLock lock(LockName());
-    if (!lock.Lock(ProbeLock)) return;  // the pid file stays: the contract says so
+    const UpdaterMark& mark = impl_->mark;
+    MarkLock lock(mark);
+    if (!lock.LockShared()) return;  // the pid file stays: the contract says so
     if (IsUpdating()) {
-        const pid_t pid = CoreLibReadPidFile(pidPath.c_str());
+        const pid_t pid = mark.Read();
         if (pid != ::getpid()) {
             DR_LOG(Debug, "Failed to unset updating cache [%s] since different pid[%d]",
-                   pidPath.c_str(), pid);
+                   mark.GetPidPath().c_str(), pid);
             return;
         }
     }
-    DR_LOG(Debug, "<--- Finish to update cache [%s]", cachedPath.c_str());
-    ::unlink(pidPath.c_str());
+    DR_LOG(Debug, "<--- Finish to update cache [%s]", impl_->file.GetPath().c_str());
+    mark.Remove();
 }
 
-// No lock is held during the pauses: it would keep others from marking.
-void Cache::WaitForUpdater() const
+// The data in memory, loaded again if the file has changed. `modifyTime` becomes the file's.
+const Json::Value& Cache::Impl::LoadedData(const Cache& cache, std::time_t& modifyTime)
 {
-    DR_LOG_AS("Update", Debug, "start to block wait cache [%s] ", cachedPath.c_str());
-    do {
-        WaitPause();
-    } while (IsUpdating() && IsTimeout());
-    DR_LOG_AS("Update", Debug, "finish to block wait cache [%s] ", cachedPath.c_str());
-}
-
-// The refresh of a caller that waits, and of the child.
-bool Cache::Refresh() const
-{
-    const std::string mark = PidPath();
-    if (IsUpdating() || !SetUpdating()) return false;
-    // The mark of a living process would make all others wait: it goes also when memory is short.
-    const auto unset = [&] {
-        try {
-            UnsetUpdating();
-        } catch (...) {
-            ::unlink(mark.c_str());
-            throw;
-        }
-    };
-    bool updated = false;
-    try {
-        updated = DoUpdate();
-    } catch (...) {  // a subclass's, too
-        unset();
-        throw;
+    modifyTime = file.GetModifyTime();
+    if (file.IsLoaded(modifyTime)) return file.GetData();
+    if (!cache.Load()) {
+        file.SetData(cache.GetDefaultValue());
+        DR_LOG_AS("GetCachedData", Debug, "Failed to load cache [%s], use default cache data",
+                  file.GetPath().c_str());
     }
-    unset();
-    return updated;
+    modifyTime = file.GetModifyTime();
+    return file.GetData();
 }
 
-// Nothing of the caller's code runs behind this: no unwinding, no destructors, no exit handlers.
-void Cache::RefreshInChild() const
+// Returns whether the data may have changed: a refresh was made, started or waited for.
+bool Cache::Impl::RefreshIfStale(const Cache& cache, const char* function, const Json::Value& data,
+                                 std::time_t modifyTime) const
+{
+    if (IsFresh(cache, data, modifyTime, timeout)) return false;
+    if (cache.Update()) return true;
+    DR_LOG_AS(function, Debug, "Failed to update cache [%s], use old cache data.",
+              toString(cache.GetInfo()).c_str());
+    return false;
+}
+
+// Runs in a caller that must have fresh data, or in the child.
+bool Cache::Impl::Refresh(const Cache& cache) const
+{
+    if (cache.IsUpdating() || !cache.SetUpdating()) return false;
+    const ScopeGuard unmark([&] { Unmark(cache); });  // the subclass may throw
+    return cache.DoUpdate();
+}
+
+// Removes the mark even if an allocation fails. Otherwise all others would wait for this process as
+// long as it lives.
+void Cache::Impl::Unmark(const Cache& cache) const noexcept
 {
     try {
-        Refresh();
+        cache.UnsetUpdating();
     } catch (...) {
-        // A subclass's; there is nobody left to tell.
+        mark.Remove();
+    }
+}
+
+// Nothing of the caller's code runs after this: no unwinding, no destructors, no exit handlers.
+void Cache::Impl::RefreshInChild(const Cache& cache) const
+{
+    try {
+        Refresh(cache);
+    } catch (...) {
+        // From the subclass. Nobody is left to tell.
     }
     ::_exit(0);
 }

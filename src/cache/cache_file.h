@@ -1,0 +1,80 @@
+// What a cache has on disk, one JSON document in one file, and in memory.
+#ifndef ORVADRCORE_SRC_CACHE_CACHE_FILE_H
+#define ORVADRCORE_SRC_CACHE_CACHE_FILE_H
+
+#include <cstddef>
+#include <ctime>
+#include <string>
+
+#include <json/value.h>
+
+namespace OrvaDRCore {
+
+// What a refresh stores.
+struct CacheEntry {
+    long timeout;  // seconds
+    Json::Value info;
+    Json::Value data;
+    long begin;  // of producing, in seconds since the epoch; below 1 if not known
+    long finish;
+};
+
+// The document to write, as JSON and as text.
+struct CacheDocument {
+    Json::Value value;
+    std::string text;
+    int longestRefresh;  // seconds
+};
+
+// A cache file and the data loaded from it. The modification time tells whether both still agree.
+// Nothing here logs; Cache does.
+class CacheFile {
+  public:
+    enum class LoadResult { Loaded, Missing, Unreadable };
+
+    explicit CacheFile(std::string path) : path_(std::move(path)) {}
+
+    const std::string& GetPath() const { return path_; }
+
+    // In whole seconds since the epoch; -1 without a file.
+    std::time_t GetModifyTime() const;
+
+    const Json::Value& GetData() const { return data_; }
+    void SetData(Json::Value data) { data_ = std::move(data); }
+
+    // Whether the data in memory is that of a file with this modification time.
+    bool IsLoaded(std::time_t modifyTime) const;
+
+    // Reads the file into memory. On failure memory stays as it was. The contract: a document without
+    // "cached_data" counts as loaded and leaves the old data.
+    LoadResult Load();
+
+    // The longest refresh so far according to the file, in seconds, or 0.
+    int GetLongestRefresh() const;
+
+    // Makes the document for an entry. Reads the longest refresh so far from the file.
+    CacheDocument Compose(CacheEntry entry) const;
+
+    // Replaces the file, in one attempt, and takes the data from `document` into memory. On failure
+    // nothing changes.
+    bool Write(CacheDocument& document);
+
+  private:
+    void Remember(const std::string& text, int longestRefresh);
+
+    std::string path_;
+    Json::Value data_;
+    std::time_t loadedModifyTime_ = -1;
+
+    // Size, hash and longest refresh of the text that was loaded or written last.
+    std::size_t knownSize_ = 0;
+    std::size_t knownHash_ = 0;
+    int knownLongestRefresh_ = 0;
+};
+
+// Whether a value could be loaded again as data or info of a cache file.
+bool IsStorable(const Json::Value& value);
+
+}  // namespace OrvaDRCore
+
+#endif
