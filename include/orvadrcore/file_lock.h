@@ -1,29 +1,17 @@
 /// \file
 /// Named locks between processes.
-///
 /// \code
 ///     FileLock lock("registry");
-///     if (!lock.lock(LOCK_EX | LOCK_NB, 5)) return false;   // six tries, a second apart
-///     ...                                                    // ours alone
-///     lock.unlock();                                         // or let the object go
+///     if (!lock.lock(LOCK_EX | LOCK_NB, 5)) return false;  // six attempts, a second apart
+///     ...                                                   // ours alone
+///     lock.unlock();                                        // or at the end of the object
 /// \endcode
-///
-/// A lock is a `flock` on the file of its name in /tmp/.orvadr_lock. Two objects exclude each
-/// other, also within one process, and so does `flock(1)` on the same file; a process that ends,
-/// however it ends, leaves none of its locks behind. The file itself stays. Failures are logged at
-/// ERR (file `file_lock.cpp`), nothing throws unless memory runs out, and an object is used by one
-/// thread at a time.
-///
-/// \warning Named locks are for processes running as root. The lock directory belongs to whoever
-///          made it first. A lock file gets the permission bits 01204 less the umask: an ordinary
-///          user cannot open a second time what it has made itself.
-/// \warning A child made by fork shares descriptor and lock: `unlock` in the child frees the
-///          parent's lock, and the parent's lock ends only when both have closed it.
-/// \warning A program started by exec inherits the descriptor, and destroying the object only closes
-///          the file. A program that another thread starts meanwhile goes on holding the lock for as
-///          long as it runs. Beside threads that start programs, call unlock() before the object
-///          goes: it frees the lock whoever has inherited it. Keep descriptors 0, 1 and 2 open, since
-///          unlock() passes over 0. Programs that this library starts inherit no lock.
+/// A lock is a `flock` on a file in /tmp/.orvadr_lock, which ends at the latest with its process. Two
+/// objects exclude each other, even in one process. One thread at a time may use an object. Failures
+/// are logged at ERR (docs/locks.md has the lines). Nothing throws unless memory runs out.
+/// \warning Named locks are for root: an ordinary user cannot open a lock file a second time.
+/// \warning A child made by fork and a program started by exec inherit the descriptor. The lock then
+///          lasts until all have closed it or one calls unlock().
 #ifndef ORVADRCORE_FILE_LOCK_H
 #define ORVADRCORE_FILE_LOCK_H
 
@@ -35,65 +23,32 @@
 
 namespace OrvaDRCore {
 
-/// A lock file, open from the first use until the object goes. The head of file_lock.h tells what
-/// holds for processes, threads, forks and rights.
+/// A lock file, open from the first use until the end of the object.
 class ORVADRCORE_API FileLock {
   public:
-    /// No lock file yet: see setLockFile().
-    FileLock() = default;
-
-    /// The lock of that name; nothing is opened yet.
-    /// \param name  the name; for an empty one as getLockFilePath()
-    explicit FileLock(const std::string& name);
-
+    FileLock() = default;                        ///< without a name: see setLockFile()
+    explicit FileLock(const std::string& name);  ///< opens nothing yet
     FileLock(const FileLock&) = delete;
     FileLock& operator=(const FileLock&) = delete;
-
-    /// Closes the file, which frees the lock.
+    /// Closes the file, which frees the lock unless another process has inherited it.
     ~FileLock();
 
-    /// The file of a lock: "/tmp/.orvadr_lock/" and the name as it stands.
-    /// \param name  the name; slashes in it make directories, a leading one a double slash
-    /// \return the path; empty for an empty name, with ERR `Bad lock file[%s]`
+    /// "/tmp/.orvadr_lock/" and the name, slashes included; empty for an empty name.
     static std::string getLockFilePath(const std::string& name);
-
-    /// Points the object at another name, as long as its file is not open.
-    /// \param name  the name, as in getLockFilePath()
-    /// \return false for an empty name, with ERR `Failed to set lock path [%s]`; and for another
-    ///         name than that of the open file, with ERR
-    ///         `File [%s] has been open, can not set file path to [%s]`. The name stays then
+    /// Sets the name. Fails if it is empty, or if the file of another name is open.
     bool setLockFile(const std::string& name);
-
-    /// Makes the directory of the lock file, with mode 0755, when it is missing.
-    /// \return false when the object has no name, without a line; and when the directory cannot be
-    ///         made, with ERR `Failed to create lock dir [%s] in local host` behind the lines of
-    ///         File::CreateDir()
+    /// Makes the directory of the lock file, by /bin/mkdir, if it is missing.
     bool checkLockDir() const;
-
-    /// Opens the lock file, unless it is open, and makes it when it is missing.
-    /// \return false with ERR: `Bad Lock File` (no name),
-    ///         `Failed to check lock dir of lock file [%s].` behind the lines of checkLockDir(), or
-    ///         `Failed to open lock file[%s], errno=%m`. A named pipe in the file's place is not
-    ///         waited for: it cannot be opened, with errno EINVAL
+    /// Opens the lock file, if it is not open, and makes it if it is missing.
     bool openLockedFile();
-
-    /// Takes the lock, opening the file first. A lock of the other kind that the object holds is
-    /// given up for it.
-    /// \param operation  `LOCK_SH` or `LOCK_EX`; with `LOCK_NB` it is tried, otherwise waited for
-    /// \param retries    how often a try that failed is made again, a second later each time
-    /// \return false when the tries are used up, without a line; and when the file cannot be
-    ///         opened, with ERR `Bad fd [%d] to lock [%s]` behind the lines of openLockedFile()
+    /// Takes the lock (LOCK_SH or LOCK_EX). With LOCK_NB it makes up to `retries` + 1 attempts, a
+    /// second apart, otherwise it waits. False without a log line when somebody else holds the lock.
+    /// \warning Changing the kind frees the lock first: on failure the object holds none.
     bool lock(int operation, unsigned int retries);
-
-    /// Whether the lock could be taken right now: takes it once and frees it again.
-    /// \param operation  as in lock(); without `LOCK_NB` the call waits
-    /// \return true when it was taken; false as lock()
-    /// \warning The lock is not held afterwards, whatever the answer.
+    /// Whether the lock can be taken. It is free afterwards, even if this object held it before.
     bool tryLock(int operation);
-
-    /// Frees the lock; the file stays open.
-    /// \note Logs ERR `Failed to unlock [%s] with fd [%d], errno=[%m]` when the kernel refuses. An
-    ///       object whose file is not open is passed over.
+    /// Frees the lock, for all who have inherited it, too. The file stays open.
+    /// \warning Ignores descriptor 0: keep 0, 1 and 2 open.
     void unlock() const;
 
   private:
