@@ -11,16 +11,16 @@
 
 namespace {
 
-// How often the parent looks whether the child is still there.
-constexpr int LookMSec = 20;
+// How often the parent checks whether the child is alive.
+constexpr int CheckMSec = 20;
 
-// Does not reap the child. Linux before 4.7 cannot answer: the child seems to live on.
+// Does not reap the child. On Linux before 4.7 the call fails, and the child counts as alive.
 bool HasEnded(pid_t child)
 {
     siginfo_t info{};
     const int flags = WEXITED | WNOHANG | WNOWAIT | __WALL;
     if (::waitid(P_PID, static_cast<id_t>(child), &info, flags) == 0) return info.si_pid == child;
-    // A caller who ignores SIGCHLD, or its handler, has reaped the child already.
+    // Already reaped, by a SIGCHLD handler or because the caller ignores SIGCHLD.
     return errno == ECHILD;
 }
 
@@ -39,8 +39,8 @@ void SendReport(int fd, const void* report, std::size_t size)
 
 bool ReceiveReport(int fd, pid_t child, void* report, std::size_t size)
 {
-    while (!CanRead(fd, LookMSec)) {
-        // A report comes before the end.
+    while (!CanRead(fd, CheckMSec)) {
+        // The report may have arrived between the two checks, just before the end.
         if (HasEnded(child) && !CanRead(fd, 0)) return false;
     }
     return OrvaDRCore::RetryOnEintr([&] { return ::read(fd, report, size); }) > 0;

@@ -18,19 +18,18 @@
 
 namespace {
 
-// A process that waits for a lock uses no processor time; one that is merely slow does. Two ticks
-// in a row without any tell the two apart, because a process that was kept from running meets the
-// ticks of that time as one.
+// A process that waits for a lock uses no processor time. Nor does one that the scheduler does not
+// run, but that gets the ticks of all that time as one. So two idle ticks in a row mean a lock.
 constexpr long TickUSec = 500;
 constexpr int IdleTicksWhenStuck = 2;
 
-// Where a lock is waited for actively, as in sanitizers, nothing else tells.
+// Sanitizers spin while they wait for a lock. Only the number of ticks tells there.
 constexpr int TicksWhenStuck = 400;
 
-// Less processor time than this in a tick is none.
+// A tick with less processor time than this is idle.
 constexpr long IdleNSec = 50'000;
 
-// What the signal handler knows. Used in a process with a single thread only.
+// The state of the signal handler. Only a process with a single thread uses it.
 struct Watch {
     void (*whenStuck)();
     std::timespec used;
@@ -68,9 +67,8 @@ void SetTicks(long microseconds)
     ::setitimer(ITIMER_REAL, &timer, nullptr);
 }
 
-// The address sanitizer's allocator has a lock for each size class of memory, which it takes when a
-// thread has used up what it has cached of that class. Unlike glibc it does not free them in a
-// child.
+// The address sanitizer's allocator has a lock for each size class, which it takes when a thread's
+// cache of that class is empty. Unlike glibc it does not reset them in a child.
 void TakeAllocatorLocks()
 {
 #ifdef ORVADR_SANITIZE
@@ -98,13 +96,13 @@ void TakeAllocatorLocks()
 void TakeLibraryLocks()
 {
     std::array<char, 128> text{};
-    [[maybe_unused]] const char* const translated =  // as "%m" does it
+    [[maybe_unused]] const char* const translated =  // as "%m" does
         ::strerror_r(EDEADLK, text.data(), text.size());
     const std::time_t time = 0;
     std::tm parts{};
-    ::localtime_r(&time, &parts);  // as syslog() does for the time in a line
-    const std::locale copy;        // as each stream has one
-    ::setlogmask(0);               // asks for the mask, under the lock of syslog()
+    ::localtime_r(&time, &parts);  // as syslog() does for its time stamp
+    const std::locale copy;        // as each stream makes one
+    ::setlogmask(0);               // reads the mask, under the lock of syslog()
 }
 
 void TakeLibraryLocksOr(void (*whenStuck)())

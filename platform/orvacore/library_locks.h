@@ -1,18 +1,18 @@
-// Locks of the C and C++ libraries that a fork copies as they are.
+// Locks of the C and C++ libraries, and forks.
 //
 // A lock that another thread holds at the moment of a fork stays locked in the child for ever: the
-// thread that would unlock it is not there. glibc takes care of its allocator and its streams. It
-// does not take care of the locks below syslog(), time zones and error texts, and the C++ library
-// does not take care of the lock that copies of std::locale take.
+// thread that would unlock it does not exist there. glibc takes care of its allocator and its
+// streams, but not of the locks inside syslog(), time zones and error texts. The C++ library does not
+// take care of the lock that copies of std::locale take.
 #ifndef ORVACORE_LIBRARY_LOCKS_H
 #define ORVACORE_LIBRARY_LOCKS_H
 
-// Takes each of these locks and unlocks it again. Waits for other threads that hold one.
+// Takes each of these locks and frees it again. Waits for other threads that hold one.
 void TakeLibraryLocks();
 
-// The same in a process that was just forked and has a single thread. Where a lock cannot be had,
-// `whenStuck` is called, from a signal handler, after a millisecond or a bit more; it must not
-// return. Afterwards all signal settings are what they were.
+// The same in a process that was just forked and has a single thread. If a lock cannot be taken, calls
+// `whenStuck` from a signal handler after a little more than a millisecond; it must not return.
+// Restores all signal settings at the end.
 void TakeLibraryLocksOr(void (*whenStuck)());
 
 #endif

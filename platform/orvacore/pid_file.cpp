@@ -13,9 +13,9 @@
 namespace {
 
 constexpr mode_t ReadableByAll = 0644;
-constexpr std::size_t ReadSize = 64;  // two numbers are shorter
+constexpr std::size_t ReadSize = 64;  // more than two numbers
 
-// The number that a line consists of, and nothing else; 0 for any other line.
+// A line that is a number and nothing else; 0 for any other line.
 template <class Number>
 Number ParseLine(const std::string& line)
 {
@@ -25,7 +25,7 @@ Number ParseLine(const std::string& line)
     return error == std::errc() && stop == end ? number : 0;
 }
 
-// The line at `at`, which is moved to the next.
+// The line at `at`. Moves `at` to the next line.
 std::string TakeLine(const std::string& text, std::size_t& at)
 {
     const std::size_t end = std::min(text.find('\n', at), text.size());

@@ -18,8 +18,8 @@
 
 namespace {
 
-// Each attempt ends after a few milliseconds. That many fail only where other threads do nothing
-// but take the locks, or where one keeps its lock for long. The time counts where forks are slow.
+// An attempt takes a few milliseconds. So many fail only if other threads do nothing but take the
+// locks, or if one keeps its lock for long. The limit of time is for slow forks.
 constexpr int MaxAttempts = 500;
 constexpr int MinAttempts = 50;
 constexpr std::chrono::seconds MaxTime{5};
@@ -30,7 +30,7 @@ struct ForkResult {
     int error;  // of the second fork; EDEADLK when a lock could not be had
 };
 
-// Where the intermediate process reports to.
+// The intermediate process's end of the pipe, for its signal handler.
 int reportFd = -1;
 
 [[noreturn]] void ReportStuck()
@@ -40,7 +40,7 @@ int reportFd = -1;
     ::_exit(0);
 }
 
-// Pipes and sockets among the standard descriptors lead to somebody who waits for their end.
+// Somebody may wait for the end of a pipe or socket among the standard descriptors.
 void DetachStandardStreams()
 {
     for (int fd = STDIN_FILENO; fd <= STDERR_FILENO; ++fd) {
@@ -58,8 +58,8 @@ void DetachStandardStreams()
     }
 }
 
-// In the intermediate process: forks the detached child, tells the caller about it and ends. The
-// child is a copy of a process in which no library lock is held.
+// In the intermediate process: forks the detached child, reports it to the caller and exits. Returns
+// in the child, which is a copy of a process that holds no library lock.
 void ForkAgain(int reading, int writing, bool hasThreads)
 {
     reportFd = writing;
@@ -76,7 +76,8 @@ void ForkAgain(int reading, int writing, bool hasThreads)
     ::_exit(0);
 }
 
-// The child of a child that ends at once belongs to init: the caller never has to wait for it.
+// An intermediate process exits at once, so that init adopts its child: the caller never has to wait
+// for that.
 ForkResult TryForkDetached()
 {
     std::array<int, 2> pipe{};
@@ -91,14 +92,14 @@ ForkResult TryForkDetached()
     ::close(pipe[1]);
     if (intermediate > 0) {
         if (!ReceiveReport(pipe[0], intermediate, &result, sizeof result)) result = {-1, ECHILD};
-        // ECHILD means that a caller who ignores SIGCHLD, or its handler, has reaped it already.
+        // May fail: reaped by a SIGCHLD handler, or because the caller ignores SIGCHLD.
         OrvaDRCore::RetryOnEintr([&] { return ::waitpid(intermediate, nullptr, 0); });
     }
     ::close(pipe[0]);
     return result;
 }
 
-// Forks again where another thread held a library lock at the moment of the fork.
+// Repeats the fork as long as another thread holds a library lock at that moment.
 pid_t ForkDetached()
 {
     using Clock = std::chrono::steady_clock;
@@ -106,7 +107,7 @@ pid_t ForkDetached()
     ForkResult result = TryForkDetached();
     for (int attempt = 1; result.error == EDEADLK; ++attempt) {
         if (attempt == MaxAttempts || (attempt >= MinAttempts && Clock::now() > end)) break;
-        TakeLibraryLocks();  // right after that they are most likely to be free
+        TakeLibraryLocks();  // right after this they are most likely free
         result = TryForkDetached();
     }
     if (result.pid < 0) errno = result.error;

@@ -1,10 +1,10 @@
-// Programs are started by posix_spawn(), which costs the same however much memory the caller has.
+// Programs are started by posix_spawn(), whose cost does not depend on the caller's memory.
 //
-// Usually a program is a child of the caller. Where the caller's handling of SIGCHLD would lose its
-// result, a companion is the parent: a process that waits for the program and then ends as the
-// program did. The companion is a child that sends no signal. Of such a child the kernel keeps the
-// result even if SIGCHLD is ignored, and a handler's waitpid(-1) does not fetch it. The program
-// itself cannot be such a child: execve() makes SIGCHLD the signal of whoever calls it.
+// Usually a program is a child of the caller. If the caller's handling of SIGCHLD would lose the
+// result, a companion is the parent: an intermediate process that waits for the program and then ends
+// as it did. The companion is a child that sends no signal. The kernel keeps the result of such a
+// child even if SIGCHLD is ignored, and a handler's waitpid(-1) does not get it. The program itself
+// cannot be such a child, because execve() resets the signal to SIGCHLD.
 #include <orvacore/orvacore.h>
 
 #include <fcntl.h>
@@ -30,22 +30,22 @@ using OrvaDRCore::PreserveErrno;
 using OrvaDRCore::RetryOnEintr;
 
 constexpr std::size_t MaxArguments = 16;
-constexpr int FirstOther = STDERR_FILENO + 1;  // from here on descriptors are closed for programs
+constexpr int FirstOther = STDERR_FILENO + 1;  // programs inherit no descriptor from here on
 constexpr int ExitCannotStart = 127;
 
-// A program's arguments, its path first, null last.
+// The path, the arguments and a null pointer.
 using Arguments = std::array<char*, MaxArguments + 1>;
 
 // How a program is started: with the caller's signal mask, descriptors 0 to 2 and no others.
 class Start {
   public:
-    // `output` becomes descriptor 1; -1 leaves that as it is.
+    // `output` becomes descriptor 1, unless it is -1.
     Start(const Arguments& arguments, int output);
     Start(const Start&) = delete;
     Start& operator=(const Start&) = delete;
     ~Start();
 
-    // Starts the program as a child of this process. Answers 0, or why that failed.
+    // Starts the program as a child of this process. Returns 0 or an errno.
     int Run(pid_t& program) const;
 
   private:
@@ -61,7 +61,7 @@ Start::Start(const Arguments& arguments, int output) : arguments_(arguments)
     if (output >= 0) error_ = ::posix_spawn_file_actions_adddup2(&files_, output, STDOUT_FILENO);
     if (error_ == 0) error_ = ::posix_spawn_file_actions_addclosefrom_np(&files_, FirstOther);
 
-    // Programs wait for children of their own.
+    // Programs expect the default, to wait for their own children.
     sigset_t defaults;
     ::sigemptyset(&defaults);
     ::sigaddset(&defaults, SIGCHLD);
@@ -86,8 +86,8 @@ int Start::Run(pid_t& program) const
                          environ);
 }
 
-// The exit code of a child; -1 when a signal ended it (errno EINTR) or when its result has been
-// fetched by somebody else (errno ECHILD).
+// Waits for a child. Returns its exit code, or -1 with errno EINTR if a signal ended it, or ECHILD if
+// somebody else got its result.
 int WaitFor(pid_t pid)
 {
     int status = 0;
@@ -97,8 +97,8 @@ int WaitFor(pid_t pid)
     return -1;
 }
 
-// Whether the kernel keeps a child's result until somebody waits for this child. A handler may wait
-// for all children.
+// Whether the kernel keeps a child's result until somebody waits for it. A handler of SIGCHLD may wait
+// for any child.
 bool KeepsResults()
 {
     struct sigaction action {};
@@ -106,14 +106,14 @@ bool KeepsResults()
            (action.sa_flags & SA_NOCLDWAIT) == 0;
 }
 
-// Forks a child that sends no signal. The C library knows nothing of it, and other threads may have
-// held locks: the child calls nothing that takes one.
+// Forks a child that sends no signal. The C library does not know about this fork, and other threads
+// may hold locks: the child must not call anything that takes one.
 pid_t ForkSilently()
 {
     return static_cast<pid_t>(::syscall(SYS_clone, 0L, 0L, 0L, 0L, 0L));
 }
 
-// The companion. Signals stay blocked in it: it is to outlive the program.
+// The companion. Signals stay blocked, so that it outlives the program.
 [[noreturn]] void Accompany(const Start& start, int report)
 {
     struct sigaction byDefault {};
@@ -122,13 +122,13 @@ pid_t ForkSilently()
     const int error = start.Run(program);
     SendReport(report, &error, sizeof error);
     if (error != 0) ::_exit(ExitCannotStart);
-    ::closefrom(0);  // whoever reads the program's output waits for the program alone
+    ::closefrom(0);  // so that the program's output ends with the program
     const int code = WaitFor(program);
     if (code < 0) ::kill(::getpid(), SIGKILL);
     ::_exit(code);
 }
 
-// Starts a program through a companion, which is the process to wait for.
+// Starts a program through a companion. The caller waits for the companion. Returns 0 or an errno.
 int RunAccompanied(const Start& start, pid_t& companion)
 {
     std::array<int, 2> pipe{};
@@ -150,8 +150,8 @@ int RunAccompanied(const Start& start, pid_t& companion)
     return error;
 }
 
-// Starts a program. Answers the id of the process to wait for, which ends as the program does; -1
-// with errno set when the program cannot be started.
+// Starts a program. Returns the id of the process to wait for, which ends as the program does, or -1
+// with errno set.
 pid_t Spawn(const Arguments& arguments, int output)
 {
     const Start start(arguments, output);
@@ -162,13 +162,13 @@ pid_t Spawn(const Arguments& arguments, int output)
     return -1;
 }
 
-// What a stream of CoreLibPopen carries: no table of open programs is needed.
+// The cookie of a CoreLibPopen() stream.
 struct Program {
     int output;  // reading end of the program's standard output
     pid_t pid;
 };
 
-// Starts a program with a pipe for its output, whose reading end goes into `program`.
+// Starts a program whose output can be read from `program`.
 bool SpawnForReading(const Arguments& arguments, Program& program)
 {
     std::array<int, 2> pipe{};

@@ -10,8 +10,8 @@ namespace ORVA::RANDOM {
 
 namespace {
 
-// 64 bits from the kernel. Requests this small are never cut short; before the kernel has gathered
-// its first randomness they wait, and a signal may break the wait.
+// 64 bits from the kernel. It always gives this few at once, but early after boot it waits for
+// randomness, and a signal may interrupt the wait.
 std::uint64_t KernelBits()
 {
     std::uint64_t bits = 0;
@@ -25,7 +25,7 @@ unsigned int ORVARandom::urandom(unsigned int min, unsigned int max)
 {
     if (max <= min) return min;
     const std::uint64_t range = std::uint64_t{max} - min + 1;
-    // The numbers past the last whole multiple of the range would favour the small results.
+    // Numbers beyond the last whole multiple of the range would favour small results.
     const std::uint64_t limit = UINT64_MAX - UINT64_MAX % range;
     std::uint64_t bits = KernelBits();
     while (bits >= limit) bits = KernelBits();

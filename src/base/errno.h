@@ -1,5 +1,4 @@
-// errno around system calls: kept where a cleanup would change it, and calls repeated that a signal
-// has interrupted.
+// errno around system calls: keep it during cleanup, repeat calls that a signal interrupts.
 #ifndef ORVADRCORE_SRC_BASE_ERRNO_H
 #define ORVADRCORE_SRC_BASE_ERRNO_H
 
@@ -7,7 +6,7 @@
 
 namespace OrvaDRCore {
 
-// Gives errno back, at the end of the scope, the value that it had at the beginning.
+// At the end of the scope, sets errno back to the value that it had at the beginning.
 class PreserveErrno {
   public:
     PreserveErrno() = default;
@@ -19,7 +18,7 @@ class PreserveErrno {
     const int error_ = errno;
 };
 
-// Makes a system call, which fails with -1, until no signal interrupts it. Returns its result.
+// Repeats a system call, one that fails with -1, as long as signals interrupt it.
 template <class Call>
 auto RetryOnEintr(Call call)
 {

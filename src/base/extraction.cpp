@@ -12,7 +12,7 @@ namespace {
 
 constexpr std::string_view Digits = "0123456789";
 
-// std::from_chars knows no plus; a sign behind it would be one too many.
+// std::from_chars does not take a plus. "+-1" keeps it, and so stays no number.
 std::string_view SkipPlus(std::string_view text)
 {
     const bool signedTwice = text.size() > 1 && text[1] == '-';
@@ -20,8 +20,8 @@ std::string_view SkipPlus(std::string_view text)
     return text;
 }
 
-// Whether a text begins as a number does that std::from_chars and a stream read alike: not as
-// "inf" or "nan" do, which a stream does not know.
+// Whether std::from_chars and a stream agree on what the text begins with. They do not on "inf" and
+// "nan", which a stream does not read.
 bool BeginsWithDigit(std::string_view text)
 {
     const std::size_t at = text.find_first_not_of("-.");
@@ -32,7 +32,7 @@ bool BeginsWithDigit(std::string_view text)
 
 Extraction::Extraction()
     : kinds_(std::use_facet<std::ctype<char>>(locale_)),
-      plain_(locale_ == std::locale::classic() && std::fegetround() == FE_TONEAREST)
+      isPlain_(locale_ == std::locale::classic() && std::fegetround() == FE_TONEAREST)
 {
 }
 
@@ -46,7 +46,7 @@ void Extraction::Read(std::string_view text, std::string& word) const
 
 void Extraction::Read(std::string_view text, int& number)
 {
-    if (!plain_) return ReadByStream(text, number);
+    if (!isPlain_) return ReadByStream(text, number);
     text = SkipBlanks(text);
     if (text.empty()) return;
     text = SkipPlus(text);
@@ -62,12 +62,12 @@ void Extraction::Read(std::string_view text, int& number)
 void Extraction::Read(std::string_view text, double& number)
 {
     const std::string_view digits = SkipPlus(SkipBlanks(text));
-    if (!plain_ || !BeginsWithDigit(digits)) return ReadByStream(text, number);
+    if (!isPlain_ || !BeginsWithDigit(digits)) return ReadByStream(text, number);
     double value = 0;
     const auto [stop, error] = std::from_chars(digits.begin(), digits.end(), value);
-    // Too large and too small numbers, and an exponent without digits, which fails a stream.
-    const bool brokenOff = stop != digits.end() && (*stop == 'e' || *stop == 'E');
-    if (error != std::errc() || !std::isfinite(value) || brokenOff) {
+    // An exponent without digits fails in a stream; std::from_chars ignores it.
+    const bool lacksExponent = stop != digits.end() && (*stop == 'e' || *stop == 'E');
+    if (error != std::errc() || !std::isfinite(value) || lacksExponent) {
         return ReadByStream(text, number);
     }
     number = value;
@@ -85,7 +85,7 @@ void Extraction::ReadByStream(std::string_view text, Number& number)
 {
     if (!stream_) {
         stream_.emplace().imbue(locale_);
-        stream_->exceptions(std::ios::badbit);  // or memory that is short reads as no number
+        stream_->exceptions(std::ios::badbit);  // or bad_alloc looks like a text without a number
     }
     stream_->clear();
     stream_->str(std::string(text));

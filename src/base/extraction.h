@@ -1,5 +1,5 @@
-// Words and numbers read from texts as the standard streams read them, with a stream only where
-// something unusual stands in the text or where the program's locale has ways of its own.
+// Reads words and numbers from texts as the standard streams do. An actual stream, which is slow,
+// is used only for unusual texts and unusual locales.
 #ifndef ORVADRCORE_SRC_BASE_EXTRACTION_H
 #define ORVADRCORE_SRC_BASE_EXTRACTION_H
 
@@ -11,8 +11,8 @@
 
 namespace OrvaDRCore {
 
-// Reads values as `std::istringstream(text) >> value` does, under the locale and the rounding that
-// the program had when the object was made. Where a stream leaves a value as it was, so does this.
+// Each Read() does what `std::istringstream(text) >> value` does, also where that leaves the value as
+// it was. The program's locale and rounding at construction count.
 class Extraction {
   public:
     Extraction();
@@ -28,7 +28,7 @@ class Extraction {
 
     std::locale locale_;
     const std::ctype<char>& kinds_;
-    bool plain_;  // numbers are written as in C and rounded to the nearest
+    bool isPlain_;  // the C locale, rounding to the nearest
     std::optional<std::istringstream> stream_;
 };
 

@@ -49,7 +49,7 @@ bool ReadAll(int fd, std::string& text, std::size_t most)
 
 bool ReadRegularFile(const std::string& path, std::string& text, std::size_t most)
 {
-    // Opening neither waits for the writer of a pipe nor makes a terminal this process's own.
+    // Do not wait for the writer of a pipe, nor make a terminal the controlling one.
     const FileDescriptor file(path, O_RDONLY | O_NONBLOCK | O_NOCTTY);
     struct stat status {};
     if (!file.IsOpen() || ::fstat(file.Get(), &status) < 0) return false;

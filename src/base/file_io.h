@@ -1,5 +1,5 @@
-// Files at the level of system calls: a descriptor with an owner, whole reads and writes. Nothing
-// here logs; a failure is told with errno set.
+// Files at the level of system calls: an owner for a descriptor, whole reads and writes. Nothing
+// here logs. Failures set errno.
 #ifndef ORVADRCORE_SRC_BASE_FILE_IO_H
 #define ORVADRCORE_SRC_BASE_FILE_IO_H
 
@@ -11,12 +11,12 @@
 
 namespace OrvaDRCore {
 
-// An open file, closed at the end of its owner's life. Programs that are started do not inherit it.
+// Owns an open file. Programs that are started do not inherit it.
 class FileDescriptor {
   public:
-    FileDescriptor() = default;  // none
+    FileDescriptor() = default;  // not open
 
-    // Opens a file, close-on-exec added to `flags`. None, with errno set, when that fails.
+    // Opens a file, with O_CLOEXEC added to `flags`.
     FileDescriptor(const std::string& path, int flags, mode_t mode = 0);
     FileDescriptor(FileDescriptor&& other) noexcept;
     FileDescriptor(const FileDescriptor&) = delete;
@@ -30,12 +30,12 @@ class FileDescriptor {
     int fd_ = -1;
 };
 
-// Appends all that can be read to `text`, or the first `most` bytes of it. False when reading fails
-// before that; what was read until then stays in `text`.
+// Appends everything up to the end of the file to `text`, or the first `most` bytes. On failure `text`
+// holds what was read before.
 bool ReadAll(int fd, std::string& text, std::size_t most = std::string::npos);
 
-// Appends what a regular file holds, as ReadAll() does. Nothing else is read from, or waited for:
-// for a pipe, a device or a socket the answer is false.
+// Likewise, for a path. Fails without reading or waiting if that is no regular file, but a pipe, a
+// device or a socket.
 bool ReadRegularFile(const std::string& path, std::string& text,
                      std::size_t most = std::string::npos);
 

@@ -34,39 +34,38 @@ void Configure(Json::StreamWriterBuilder& builder)
     builder["indentation"] = "";
 }
 
-// The configured builder, which takes longer to make than a small document to read. It is made at
-// the first use and stays as it is. Threads that come first at once make one each: a lock might be
-// held by another thread in a process that forks.
+// The configured builder. Making one takes longer than reading a small document, so it is made once.
+// There is no lock, because another thread might hold it during a fork: threads that come first at
+// the same time make one each.
 template <class Builder>
-const Builder& Kept()
+const Builder& SharedBuilder()
 {
-    static std::atomic<const Builder*> kept{nullptr};
-    const Builder* builder = kept.load(std::memory_order_acquire);
+    static std::atomic<const Builder*> shared{nullptr};
+    const Builder* builder = shared.load(std::memory_order_acquire);
     if (builder == nullptr) {
         auto made = std::make_unique<Builder>();
         Configure(*made);
-        if (kept.compare_exchange_strong(builder, made.get(), std::memory_order_acq_rel)) {
+        if (shared.compare_exchange_strong(builder, made.get(), std::memory_order_acq_rel)) {
             builder = made.release();
         }
     }
     return *builder;
 }
 
-// Whether the program's locale, which the streams of jsoncpp's reader have, writes real numbers as
-// JSON does.
+// Whether the program's locale writes real numbers as JSON does. jsoncpp's reader uses it.
 bool LocaleHasPoint()
 {
     return std::use_facet<std::numpunct<char>>(std::locale()).decimal_point() == '.';
 }
 
-// Whether a number may go on with a point after this: jsoncpp reads ".5" after a sign, too.
+// Whether this byte can come before the point of a number: jsoncpp also reads "-.5".
 bool MayStandBeforePoint(char byte)
 {
     return (byte >= '0' && byte <= '9') || byte == '-' || byte == '+';
 }
 
-// Appends what follows the point of a number, with an exponent that makes up for the point. Answers
-// where that ends in `text`.
+// Appends the digits after the point of a number, which begin at `begin`, and an exponent that makes
+// up for the missing point. Returns where the number ends in `text`.
 std::size_t AppendFraction(const std::string& text, std::size_t begin, std::string& result)
 {
     const std::size_t end = std::min(text.find_first_not_of("0123456789", begin), text.size());
@@ -77,7 +76,7 @@ std::size_t AppendFraction(const std::string& text, std::size_t begin, std::stri
         ++at;
         if (*at == '+' && at[1] != '-') ++at;
         const auto [stop, error] = std::from_chars(at, text.data() + text.size(), exponent);
-        // Without the point alone a number is still none, or still too large or small for any.
+        // None, or a huge one. Without its point the number is as invalid, large or small as before.
         if (error != std::errc()) return end;
         at = stop;
     }
@@ -85,8 +84,8 @@ std::size_t AppendFraction(const std::string& text, std::size_t begin, std::stri
     return static_cast<std::size_t>(at - text.data());
 }
 
-// The document with its real numbers written without a point, which every locale reads alike: 314e8
-// for 3.14e10. What is no document stays none.
+// The document with its real numbers written without a point, which all locales read alike: 314e8
+// for 3.14e10. A text that is no valid document does not become one.
 std::string WithoutPoints(const std::string& text)
 {
     std::string result;
@@ -106,12 +105,12 @@ std::string WithoutPoints(const std::string& text)
     return result;
 }
 
-// Reads a whole document. False, and `value` as it was, when the reader does not take it.
 bool Parse(Json::Value& value, const std::string& text)
 {
-    const std::unique_ptr<Json::CharReader> reader(Kept<Json::CharReaderBuilder>().newCharReader());
+    const std::unique_ptr<Json::CharReader> reader(
+        SharedBuilder<Json::CharReaderBuilder>().newCharReader());
 
-    // A document that breaks off leaves its first members behind in the reader's output.
+    // Not into `value`: of a document that breaks off, the reader leaves the first members.
     Json::Value document;
     try {
         if (!reader->parse(text.data(), text.data() + text.size(), &document, nullptr))
@@ -125,8 +124,8 @@ bool Parse(Json::Value& value, const std::string& text)
 
 enum class Reals { Any, Finite };
 
-// Whether a value has so many levels at most, and none but such real numbers.
-bool Holds(const Json::Value& value, int levels, Reals reals)
+// Whether a value has this many levels at most, and only real numbers of this kind.
+bool StaysWithin(const Json::Value& value, int levels, Reals reals)
 {
     if (levels <= 0) return false;
     switch (value.type()) {
@@ -134,7 +133,7 @@ bool Holds(const Json::Value& value, int levels, Reals reals)
         case Json::arrayValue:
         case Json::objectValue:
             for (const Json::Value& member : value) {
-                if (!Holds(member, levels - 1, reals)) return false;
+                if (!StaysWithin(member, levels - 1, reals)) return false;
             }
             return true;
         default: return true;
@@ -143,13 +142,13 @@ bool Holds(const Json::Value& value, int levels, Reals reals)
 
 }  // namespace
 
-// jsoncpp keeps a text behind its length, both in memory whose size must be a positive int.
+// jsoncpp stores the length, the text and a zero byte in one block, whose size must fit an int.
 bool FitsJsonText(std::size_t length)
 {
     return length <= static_cast<std::size_t>(Json::Value::maxInt) - sizeof(unsigned int) - 1;
 }
 
-// jsoncpp keeps the length of a name in 30 bits.
+// jsoncpp stores the length of a name in 30 bits.
 bool FitsJsonName(std::size_t length)
 {
     return length < std::size_t{1} << 30U;
@@ -164,30 +163,30 @@ Json::Value ToJsonText(std::string_view text)
 bool fromString(Json::Value& value, const std::string& text)
 {
     if (!FitsJsonText(text.size())) return false;
-    // The reader takes a zero byte for the end of the text and would pass over what follows it. No
-    // JSON document holds one: in strings it is written \u0000.
+    // The reader takes a zero byte for the end of the text and would ignore what follows. No JSON
+    // document holds one: in strings it is written \u0000.
     if (text.find('\0') != std::string::npos) return false;
     return LocaleHasPoint() ? Parse(value, text) : Parse(value, WithoutPoints(text));
 }
 
 std::string toString(const Json::Value& value)
 {
-    const auto& builder = Kept<Json::StreamWriterBuilder>();
+    const auto& builder = SharedBuilder<Json::StreamWriterBuilder>();
     const std::unique_ptr<Json::StreamWriter> writer(builder.newStreamWriter());
     std::ostringstream text;
-    text.exceptions(std::ios::badbit);  // or a text for which memory is short comes out cut off
+    text.exceptions(std::ios::badbit);  // or bad_alloc truncates the text
     writer->write(value, &text);
     return text.str();
 }
 
 bool NestsAtMost(const Json::Value& value, int levels)
 {
-    return Holds(value, levels, Reals::Any);
+    return StaysWithin(value, levels, Reals::Any);
 }
 
 bool IsReadable(const Json::Value& value, int levelsAbove)
 {
-    return Holds(value, MaxLevels - levelsAbove, Reals::Finite);
+    return StaysWithin(value, MaxLevels - levelsAbove, Reals::Finite);
 }
 
 bool fromFile(Json::Value& value, const std::string& path)

@@ -1,5 +1,5 @@
-// What Json::Value lacks or throws at. jsoncpp throws when a value is used as a type that it is
-// not; here, and nowhere else, those exceptions end: a value of the wrong kind counts as absent.
+// jsoncpp without its exceptions. It throws when a value is used as another type than its own; here a
+// value of the wrong type counts as absent. No other file catches these exceptions.
 #ifndef ORVADRCORE_SRC_BASE_JSON_HELPERS_H
 #define ORVADRCORE_SRC_BASE_JSON_HELPERS_H
 
@@ -11,47 +11,46 @@
 
 namespace OrvaDRCore {
 
-// How deep a document may nest to be read. A scalar and an empty array have one level.
+// The deepest document that can be read. A scalar and an empty array have one level.
 constexpr int MaxLevels = 1000;
 
-// Whether a JSON value can hold a text, or an object the name of a member, of so many bytes. jsoncpp
-// throws at texts from 2 GiB on, and from 4 GiB on it cuts them, as it cuts names from 1 GiB on.
+// Whether a JSON value can hold a text, or an object a member's name, of this many bytes. jsoncpp
+// throws for texts of 2 GiB or more, and truncates texts of 4 GiB and names of 1 GiB.
 bool FitsJsonText(std::size_t length);
 bool FitsJsonName(std::size_t length);
 
-// The text as a JSON value; null for one that is too long.
+// The text as a JSON value; null if it is too long.
 Json::Value ToJsonText(std::string_view text);
 
-// Parses `text`, which must be one whole JSON document of any type, into `value`. A text that does
-// not parse, that goes on after its document, that nests deeper than MaxLevels or that is so long
-// that it may hold a text which no value can gives false and leaves `value` as it was.
+// Parses `text`, which must be one whole JSON document of any type. False, with `value` as it was, if
+// it does not parse, goes on after the document, nests deeper than MaxLevels, or is so long that a
+// text in it might not fit a value.
 bool fromString(Json::Value& value, const std::string& text);
 
-// The document on one line, without blanks or a final newline. Bytes above 0x7f stand as they are,
-// so that every byte string survives the way through toString and fromString.
+// The document on one line, without blanks or a final newline. Bytes above 0x7f are not escaped, so
+// that every byte string survives toString() and fromString().
 std::string toString(const Json::Value& value);
 
-// Whether a value has so many levels or fewer. It is followed no deeper than that.
+// Whether a value has this many levels or fewer. Looks no deeper than that.
 bool NestsAtMost(const Json::Value& value, int levels);
 
-// Whether fromString() reads what toString() writes of a value that stands below `levelsAbove`
-// others: it may not nest too deep, nor hold an infinity, which is written as 1e+9999. Not a number
-// is written as null, and so can be read.
+// Whether fromString() can read what toString() writes, with the value `levelsAbove` levels down in a
+// document: it may not nest too deep, nor hold an infinity, which is written as 1e+9999.
+// (Not-a-number is written as null, which can be read.)
 bool IsReadable(const Json::Value& value, int levelsAbove = 0);
 
-// Parses a whole regular file. False when it cannot be read to its end, does not parse or is no
-// regular file: a pipe, a device or a socket is not waited for. `value` is as it was then.
+// Parses a whole regular file. False, with `value` as it was, if it cannot be read to its end, does
+// not parse or is no regular file; a pipe is not waited for.
 bool fromFile(Json::Value& value, const std::string& path);
 
-// Replaces a file by the document, whole: see ReplaceFile. False with errno set; the old file is as
-// it was then.
+// Replaces a file by the document: see ReplaceFile().
 bool toFile(const Json::Value& value, const std::string& path);
 
-// The member `key` of an object; null when it is absent, when `object` is no object and when `key`
-// is null. The pointer is good until `object` changes.
+// The member `key` of an object; null if it is absent, if `object` is no object, or if `key` is null.
+// The pointer is good until `object` changes.
 const Json::Value* FindMember(const Json::Value& object, const char* key);
 
-// The library's own conversions, with false and the empty text where it has none.
+// jsoncpp's conversions; false and the empty text for values that it cannot convert.
 bool AsBool(const Json::Value& value);
 std::string AsString(const Json::Value& value);
 

@@ -2,10 +2,9 @@
 //
 //     sqlite_db.cpp:81(Exec)[ERR][4242]: DB[/var/dr/nodes.db] is not opened
 //
-// DR_LOG(Err, "DB[%s] is not opened", path) writes it with one syslog call, through the connection
-// that the calling program has set up (ident, facility and mask are its own). The message must be a
-// literal, which the compiler checks against its arguments. "%m" gives the errno that the caller of
-// DR_LOG sees, and errno is the same after the call.
+// DR_LOG(Err, "DB[%s] is not opened", path) writes it with one syslog call. Ident, facility and mask
+// are those of the calling program. The message must be a literal, which the compiler checks against
+// its arguments. "%m" is the caller's errno, which DR_LOG does not change.
 #ifndef ORVADRCORE_SRC_BASE_LOG_H
 #define ORVADRCORE_SRC_BASE_LOG_H
 
@@ -42,7 +41,7 @@ constexpr const char* BaseName(const char* path)
     return name;
 }
 
-// Never called: lets the compiler hold a message against its arguments.
+// Never called: lets the compiler check a message against its arguments.
 [[gnu::format(printf, 1, 2)]] inline void CheckFormat(const char* /*message*/, ...) {}
 
 template <class... Args>
@@ -57,8 +56,7 @@ void Write(const Level& level, const Site& site, const char* format, Args... arg
 
 #define DR_LOG(level, ...) DR_LOG_AS(__func__, level, __VA_ARGS__)
 
-// For a line that carries another function's name than that of the code that writes it.
-// (__extension__ admits "%m", which is none of ISO C++.)
+// Writes the line under the name of another function. (__extension__ allows "%m", which is not ISO.)
 #define DR_LOG_AS(function, level, ...)                                                    \
     __extension__(false ? ::OrvaDRCore::Log::CheckFormat(__VA_ARGS__)                      \
                         : ::OrvaDRCore::Log::Write(                                        \

@@ -14,7 +14,7 @@ namespace {
 
 constexpr int FirstField = 3;  // after id and name
 
-// A field of the text after the name; null when there are not so many.
+// A field of the text after the name; null if there are fewer.
 const char* Field(const std::string& text, int number)
 {
     std::size_t at = 0;
@@ -47,8 +47,8 @@ std::optional<ProcessStatus> ReadProcessStatus(pid_t pid)
 
 bool IsProcessAlive(pid_t pid, unsigned long long start)
 {
-    // Unlike kill, tgkill takes neither a group nor another thread for a process. It finds zombies,
-    // too; where /proc hides the processes of others its word has to do.
+    // Unlike kill, tgkill does not accept groups or the ids of threads. It also finds zombies, but
+    // where /proc hides the processes of other users nothing else tells.
     if (::tgkill(pid, pid, 0) < 0 && errno != EPERM) return false;
     const auto status = ReadProcessStatus(pid);
     if (!status) return true;

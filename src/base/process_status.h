@@ -1,4 +1,4 @@
-// What /proc says of processes. Used by the library and by the platform stand-ins.
+// What /proc says about processes.
 #ifndef ORVADRCORE_SRC_BASE_PROCESS_STATUS_H
 #define ORVADRCORE_SRC_BASE_PROCESS_STATUS_H
 
@@ -9,17 +9,16 @@
 namespace OrvaDRCore {
 
 struct ProcessStatus {
-    char state;                // of its first thread: 'R', 'S', ..., 'Z' when that has ended
-    long threads;              // 1 for a zombie, more when only the first thread has ended
+    char state;                // of the first thread: 'R', 'S', ..., 'Z' when that has ended
+    long threads;              // 1 for a zombie; more if only the first thread has ended
     unsigned long long start;  // in clock ticks since boot
 };
 
-// None when there is no such process, or when it may not be looked at.
+// None if there is no such process, or if /proc does not show it.
 std::optional<ProcessStatus> ReadProcessStatus(pid_t pid);
 
-// Whether a process lives, whoever its user is; with `start` not 0, only if it was started then.
-// Neither a zombie nor a single thread of a process counts. A process that /proc does not show is
-// taken for the one that is meant.
+// Whether a process of any user is alive; unless `start` is 0, only if it was started then. Zombies
+// and ids of threads do not count. A process that /proc does not show counts, whenever it started.
 bool IsProcessAlive(pid_t pid, unsigned long long start = 0);
 
 }  // namespace OrvaDRCore

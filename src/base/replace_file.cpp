@@ -26,26 +26,26 @@ namespace {
 
 constexpr mode_t PermissionBits = 07777;
 constexpr mode_t NewFileMode = 0666;  // the kernel takes the umask off
-constexpr mode_t OwnerOnly = 0600;    // until the bits that the file is to have are set
+constexpr mode_t OwnerOnly = 0600;    // until the file gets its own bits
 
 constexpr const char* TemporarySuffix = ".orvadr-tmp";
-constexpr std::size_t LongestEnding = 56;  // the suffix, and all digits that its numbers can have
-constexpr unsigned int LastNumber = 9999;  // of a process's files beside one path
+constexpr std::size_t LongestEnding = 56;  // the suffix, and the longest numbers
+constexpr unsigned int LastNumber = 9999;  // of the files of one process beside one path
 
-constexpr double StrangersSeconds = 3600;  // after which a file is a stranger's left-over
-constexpr std::size_t SomeNames = 4000;    // of a directory: looked at within a millisecond or so
+constexpr double UnknownWriterSeconds =
+    3600;                                // a file of an unknown writer is left over after that
+constexpr std::size_t SomeNames = 4000;  // listing so many takes about a millisecond
 constexpr std::size_t AllNames = std::numeric_limits<std::size_t>::max();
 
-// Who writes a temporary file. It stands in the file's name.
+// Who writes a temporary file: part of its name.
 struct Writer {
-    std::uint32_t domain;  // in which ids tell processes apart; 0 when not known
+    std::uint32_t domain;  // in which process ids are unique; 0 when not known
     pid_t pid;
     unsigned long long start;  // in clock ticks since boot; 0 when not known
 };
 
-// The machine's name and the namespace of its process ids, made into a number: on a network file
-// system, or a volume that containers share, another process may have the same id. 0 when they
-// cannot be told.
+// A hash of the machine's name and the process-id namespace: on a network file system, or a volume
+// that containers share, another process may have the same id. 0 if they are unknown.
 std::uint32_t ReadDomain()
 {
     std::array<char, 64> space{};  // "pid:[4026531836]"
@@ -66,7 +66,7 @@ Writer ThisProcess()
     return {ReadDomain(), pid, status ? status->start : 0};
 }
 
-// What stands after the suffix: "3f9c01a7.4242.1870113.0".
+// What follows the suffix: "3f9c01a7.4242.1870113.0".
 std::string WriterText(const Writer& writer, unsigned int number)
 {
     std::array<char, LongestEnding> text{};
@@ -75,7 +75,7 @@ std::string WriterText(const Writer& writer, unsigned int number)
     return text.data();
 }
 
-// Takes a number off the beginning of the text, and a dot after it.
+// Removes a number, and a dot after it, from the beginning of the text.
 template <class Number>
 bool TakeNumber(std::string_view& text, Number& number, int base = 10)
 {
@@ -86,7 +86,7 @@ bool TakeNumber(std::string_view& text, Number& number, int base = 10)
     return error == std::errc();
 }
 
-// The writer that a WriterText() tells of. None for a text that is not exactly one.
+// The writer named by a WriterText(); none for any other text.
 std::optional<Writer> ParseWriter(const std::string_view text)
 {
     Writer writer{};
@@ -98,8 +98,8 @@ std::optional<Writer> ParseWriter(const std::string_view text)
     return writer;
 }
 
-// Whether a temporary file is one that nobody writes any more. Of a writer whose process cannot be
-// looked at from here that is certain never: its file has to be old.
+// Whether nobody writes a temporary file any more. A process of another domain cannot be checked: its
+// file has to be old.
 bool IsLeftOver(const std::string& path, const Writer& writer, const Writer& self)
 {
     struct stat status {};
@@ -107,14 +107,14 @@ bool IsLeftOver(const std::string& path, const Writer& writer, const Writer& sel
     if (writer.domain != 0 && writer.domain == self.domain) {
         return !IsProcessAlive(writer.pid, writer.start);
     }
-    return std::difftime(std::time(nullptr), status.st_mtime) > StrangersSeconds;
+    return std::difftime(std::time(nullptr), status.st_mtime) > UnknownWriterSeconds;
 }
 
 struct CloseDirectory {
     void operator()(DIR* names) const { (void)::closedir(names); }
 };
 
-// Removes the left-overs that begin with `stem`, as far as they are among the first `most` names of
+// Removes the left-overs whose path begins with `stem`, if they are among the first `most` names of
 // the directory. What cannot be listed or removed stays.
 void RemoveLeftOvers(const std::string& stem, const Writer& self, std::size_t most)
 {
@@ -133,27 +133,26 @@ void RemoveLeftOvers(const std::string& stem, const Writer& self, std::size_t mo
     }
 }
 
-// What the names of all temporary files for `path` begin with: the path, its name shortened so that
-// the longest ending fits NAME_MAX, and the suffix.
+// How all temporary files for `path` begin: the path, its name shortened so that the longest ending
+// fits NAME_MAX, and the suffix.
 std::string StemOf(const std::string& path)
 {
     const std::size_t nameAt = path.rfind('/') + 1;  // 0 when there is none
     return path.substr(0, nameAt + NAME_MAX - LongestEnding) + TemporarySuffix;
 }
 
-// Makes a file that nobody else has, whose path goes into `path`. Never opens what is there
-// already, a symbolic link included. None, with errno set, on failure.
+// Makes a new file and returns its path, too. Never opens what already exists, not even through a
+// symbolic link.
 FileDescriptor MakeTemporary(const std::string& stem, const Writer& self, mode_t mode,
                              std::string& path)
 {
-    for (unsigned int number = 0;; ++number) {  // other threads have the numbers before
+    for (unsigned int number = 0;; ++number) {  // other threads use the lower ones
         path = stem + WriterText(self, number);
         FileDescriptor file(path, O_WRONLY | O_CREAT | O_EXCL, mode);
         if (file.IsOpen() || errno != EEXIST || number == LastNumber) return file;
     }
 }
 
-// Gives the temporary file its content, its permission bits and its name.
 bool Complete(const FileDescriptor& file, std::string_view text, std::optional<mode_t> mode,
               const std::string& temporary, const std::string& path)
 {
@@ -172,7 +171,7 @@ bool ReplaceFile(const std::string& path, std::string_view text, std::optional<m
 
     const std::string stem = StemOf(path);
     const Writer self = ThisProcess();
-    // A large directory is listed to its end by the first writer in each second.
+    // The first writer in each second lists a large directory completely.
     const bool isFirst = old.st_mtime != std::time(nullptr);
     RemoveLeftOvers(stem, self, isFirst ? AllNames : SomeNames);
 
@@ -181,7 +180,7 @@ bool ReplaceFile(const std::string& path, std::string_view text, std::optional<m
         MakeTemporary(stem, self, mode ? OwnerOnly : NewFileMode, temporary);
     if (!file.IsOpen()) return false;
     if (Complete(file, text, mode, temporary, path)) {
-        // Of the open file: the name may be another's by now.
+        // By descriptor: somebody else may have replaced `path` by now.
         if (made != nullptr && ::fstat(file.Get(), made) < 0) *made = {};
         return true;
     }

@@ -1,4 +1,4 @@
-// The replacement of a file by another, whole.
+// Replaces a file as a whole.
 #ifndef ORVADRCORE_SRC_BASE_REPLACE_FILE_H
 #define ORVADRCORE_SRC_BASE_REPLACE_FILE_H
 
@@ -10,26 +10,24 @@
 
 namespace OrvaDRCore {
 
-// Replaces the file `path` by one that holds `text`: a temporary file beside it is written, flushed
-// to disk and renamed. Whoever opens `path` sees the old file or the new one, never a part, also
-// after a power cut; which of the two it is then is not certain. The new file has the permission
-// bits `mode`, if given, otherwise those of the old file, if that is a regular one, otherwise 0666
-// less the umask. Any number of processes and threads may replace one file at the same time; the
-// last one's stays. No locks are taken: file systems without them serve as well. On failure, told
-// by false and errno, the old file is as it was and the temporary file gone.
+// Replaces the file `path` by one that holds `text`: writes a temporary file beside it, flushes it to
+// disk and renames it. Whoever opens `path` sees the old file or the new one, never a part, even
+// after a power cut (either of the two then). The new file gets the permission bits `mode`, or else
+// those of the old file if that is a regular one, or else 0666 less the umask. Any number of
+// processes and threads may replace a file at the same time; the last one wins. No lock is taken, so
+// that it works on file systems without locks. False with errno set on failure: the old file is as
+// it was, and the temporary file is gone. `made`, if given, gets the status of the new file.
 //
-// Temporary files are called `path` + ".orvadr-tmp" + "DOMAIN.PID.START.NUMBER". The domain is made
-// of the machine's name and the process-id namespace; the numbers are the writing process's id, its
-// start time in clock ticks since boot (0 when /proc does not tell) and a count from 0, so that no
-// two writers have a name in common. A file name of more than 199 bytes is shortened.
+// A temporary file is called `path` + ".orvadr-tmp" + "DOMAIN.PID.START.NUMBER", so that no two
+// writers use the same name. The domain is made from the machine's name and the process-id
+// namespace. The numbers are the writer's process id, its start time in clock ticks since boot (0
+// without /proc) and a count from 0. A file name of more than 199 bytes is shortened.
 //
-// Before it writes, each writer removes what dead ones have left beside the same path: regular
-// files under such names whose process, of its own domain, is gone, is a zombie, or was started at
-// another time; where that cannot be told, and in other domains, files that were not modified for an
-// hour. A living writer that loses its file to that hour fails with ENOENT. The directory is listed
-// for it; one of more than 4000 names to its end only by the first writer of `path` in each second.
-//
-// What the file system says of the new file goes into `made`, if given.
+// Each writer first removes what dead writers of the same path have left: regular files under such
+// names whose process, of the same domain, is gone, is a zombie, or was started at another time. If
+// that is unknown, or the domain is another, the file must not have been modified for an hour; a
+// living writer that loses its file by this fails with ENOENT. Of a directory of more than 4000
+// names only the first writer of `path` in each second lists more than 4000.
 bool ReplaceFile(const std::string& path, std::string_view text,
                  std::optional<mode_t> mode = std::nullopt, struct stat* made = nullptr);
 

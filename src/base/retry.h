@@ -1,4 +1,4 @@
-// The retry discipline, written once. It logs nothing: its callers have the words.
+// How the library retries. The callers log.
 #ifndef ORVADRCORE_SRC_BASE_RETRY_H
 #define ORVADRCORE_SRC_BASE_RETRY_H
 
@@ -8,12 +8,12 @@ namespace OrvaDRCore {
 
 struct RetryOutcome {
     bool succeeded;
-    // The tries that failed. 64 bits, because it may be one more than the largest limit.
+    // Attempts that failed. 64 bits, because it may be one more than the largest limit.
     std::uint64_t failures;
 };
 
-// Calls `attempt()`, which answers bool, until it succeeds or has failed `limit` + 1 times, with
-// `pause()` between tries and never after the last.
+// Calls `attempt()` until it returns true or has failed `limit` + 1 times, with `pause()` between
+// attempts but not after the last.
 template <class Attempt, class Pause>
 RetryOutcome Retry(std::uint64_t limit, Attempt attempt, Pause pause)
 {

@@ -1,4 +1,4 @@
-// Undoes what was begun when an exception leaves the scope, or on any other way out of it.
+// Cleans up at the end of a scope, also when an exception leaves it.
 //
 //     handle = Begin();
 //     ScopeGuard undo([&] { Abandon(handle); });
@@ -11,7 +11,7 @@
 
 namespace OrvaDRCore {
 
-// Calls a function at the end of the scope, unless it was dismissed. The function must not throw.
+// Calls a function at the end of the scope, unless dismissed. The function must not throw.
 template <class Function>
 class ScopeGuard {
   public:

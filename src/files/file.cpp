@@ -28,7 +28,7 @@ constexpr mode_t NewFileMode = 0666;  // less the umask
 
 constexpr char Separator = '=';
 
-// The line at the beginning of the text, which is taken off it.
+// Removes the first line from the text.
 std::string_view TakeLine(std::string_view& text)
 {
     const std::size_t end = std::min(text.find('\n'), text.size());
@@ -37,17 +37,17 @@ std::string_view TakeLine(std::string_view& text)
     return line;
 }
 
-// A line that a failed read has cut off is no line: those before it count.
-void DropTornLine(std::string& text)
+// After a failed read: the last line may be incomplete, those before it count.
+void DropIncompleteLine(std::string& text)
 {
     text.erase(text.rfind('\n') + 1);  // all of it when there is no newline
 }
 
-// The lines that can be read.
+// The complete lines of a file, as far as it can be read.
 std::string ReadLines(const FileDescriptor& file)
 {
     std::string text;
-    if (!ReadAll(file.Get(), text)) DropTornLine(text);
+    if (!ReadAll(file.Get(), text)) DropIncompleteLine(text);
     return text;
 }
 
@@ -74,8 +74,8 @@ bool parseLineKeyValue(std::string_view line, Extraction& extraction, std::strin
     return true;
 }
 
-// Runs a program. Where its result is lost because another thread has waited for all children,
-// `isDone` tells instead whether it has done its work.
+// Runs a program. If another thread has waited for all children and so got the result, `isDone()`
+// tells whether the program has done its work.
 template <class IsDone>
 bool RunProgram(const char* path, const char* argument1, const char* argument2,
                 const char* argument3, const char* argument4, IsDone isDone)
@@ -119,7 +119,7 @@ int ReadPairs(const std::string& path, std::map<std::string, Value>& out)
                       std::string(line).c_str(), path.c_str());
             continue;
         }
-        // The first of two lines with one key counts. Most files are sorted, more or less.
+        // Of lines with the same key the first counts. The hint is good because most files are sorted.
         next = std::next(out.try_emplace(next, std::move(key), std::move(value)));
     }
     return static_cast<int>(out.size());
@@ -136,7 +136,7 @@ bool File::Read(const std::string& path, Json::Value& value)
         return false;
     }
     std::string text = ReadLines(file);
-    // The lines are joined with nothing between them.
+    // Line ends are removed, even inside a number or a text: the contract says so.
     text.erase(std::remove(text.begin(), text.end(), '\n'), text.end());
     return fromString(value, text);
 }
@@ -153,7 +153,7 @@ bool File::Read(int fd, Json::Value& value)
     while (std::fgets(chunk.data(), static_cast<int>(chunk.size()), stream.get()) != nullptr) {
         text += chunk.data();
     }
-    if (std::feof(stream.get()) == 0) DropTornLine(text);
+    if (std::feof(stream.get()) == 0) DropIncompleteLine(text);
     return fromString(value, text);
 }
 
@@ -184,7 +184,7 @@ bool File::Write(int fd, const Json::Value& value)
         DR_LOG(Err, "Failed to open file descriptor [%d]", fd);
         return false;
     }
-    // Without a buffer it is fprintf itself that meets a full disk, not the close behind it.
+    // Without a buffer a full disk fails in fprintf() rather than in fclose(), after the check.
     (void)std::setvbuf(stream.get(), nullptr, _IONBF, 0);
     const std::string text = toString(value);
     const bool written = std::fprintf(stream.get(), "%s", text.c_str()) >= 0;

@@ -10,13 +10,13 @@ class ORVARandomBase {
   public:
     virtual ~ORVARandomBase() = default;
 
-    /// A random number between two bounds, both included, each equally likely.
-    /// \return the number; `min` when `max` is not above it
+    /// A random number from `min` to `max`, both included and all equally likely; `min` if `max` is not
+    /// above it.
     virtual unsigned int urandom(unsigned int min, unsigned int max) = 0;
 };
 
-/// The kernel's random numbers. It keeps no state: a process and its forked child draw different
-/// numbers, and any thread may use any object.
+/// The kernel's random numbers. Has no state: a process and its forked child get different numbers,
+/// and any thread may use any object.
 class ORVARandom : public ORVARandomBase {
   public:
     unsigned int urandom(unsigned int min, unsigned int max) override;
