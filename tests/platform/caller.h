@@ -1,5 +1,5 @@
-// What the tests of the platform stand-ins share: callers in processes of their own, whose signals,
-// descriptors and user can be changed freely, and looks at what a process has.
+// For the tests of the platform stand-ins: callers in processes of their own, whose signals,
+// descriptors and user can be changed freely, and the state of a process.
 #ifndef ORVADRCORE_TESTS_PLATFORM_CALLER_H
 #define ORVADRCORE_TESTS_PLATFORM_CALLER_H
 
@@ -26,8 +26,8 @@
 
 #include "support/processes/child_process.h"
 
-// Runs `body` in a process of its own, which ends after a minute at the latest. Expectations that
-// fail there fail the test.
+// Runs `body` in a process of its own, for a minute at most. Expectations that fail there fail the
+// test.
 inline void InProcess(const std::function<void()>& body)
 {
     ChildProcess process([&](ChildProcess::Link&) {
@@ -37,7 +37,7 @@ inline void InProcess(const std::function<void()>& body)
     EXPECT_EQ(process.Join(), 0);
 }
 
-// A pipe that programs inherit only as far as their caller hands it on.
+// A pipe that programs inherit only if the caller passes it on.
 class Pipe {
   public:
     Pipe()
@@ -62,7 +62,7 @@ class Pipe {
         EXPECT_EQ(::write(Writing(), text.data(), text.size()), static_cast<ssize_t>(text.size()));
     }
 
-    // What is written until the last writer, this process apart, has closed its end.
+    // Everything until the last writer but this process has closed its end.
     std::string ReadToEnd()
     {
         CloseWriting();
@@ -72,7 +72,7 @@ class Pipe {
         return text;
     }
 
-    // What is written before the next line end.
+    // The next line.
     std::string ReadLine() const
     {
         std::string line;
@@ -119,7 +119,7 @@ inline void SetContent(const std::string& path, const std::string& text)
     std::ofstream(path, std::ios::binary) << text;
 }
 
-// The number at the beginning of a text; 0 when there is none.
+// The number that a text begins with, or 0.
 inline long Number(const std::string& text)
 {
     return std::strtol(text.c_str(), nullptr, 10);
@@ -142,7 +142,7 @@ struct Bystander {
 inline std::set<int> Descriptors()
 {
     std::set<int> open;
-    std::vector<int> listed;  // with that of the list
+    std::vector<int> listed;  // including that of the listing
     for (const auto& entry : std::filesystem::directory_iterator("/proc/self/fd")) {
         listed.push_back(static_cast<int>(Number(entry.path().filename())));
     }
@@ -152,7 +152,7 @@ inline std::set<int> Descriptors()
     return open;
 }
 
-// Leaves room for `count` descriptors more than those that are open.
+// Allows `count` descriptors more than those that are open.
 inline void LeaveDescriptors(int count)
 {
     std::vector<int> free(static_cast<std::size_t>(count) + 1);
@@ -164,13 +164,13 @@ inline void LeaveDescriptors(int count)
     EXPECT_EQ(::setrlimit(RLIMIT_NOFILE, &limits), 0);
 }
 
-// Whether this process has a child that runs or that nobody has waited for.
+// Whether this process has a child, running or not yet waited for.
 inline bool HasChildren()
 {
     return ::waitpid(-1, nullptr, WNOHANG | __WALL) >= 0 || errno != ECHILD;
 }
 
-// The blocked signals, and what each signal does, as a text to be compared.
+// The blocked signals and all actions, as a text to compare.
 inline std::string SignalSettings()
 {
     std::ostringstream text;
@@ -184,7 +184,7 @@ inline std::string SignalSettings()
     for (int signal = 1; signal <= SIGRTMAX; ++signal) {
         struct sigaction action {};
         if (::sigaction(signal, nullptr, &action) < 0) continue;
-        constexpr int Restorer = 0x04000000;  // the C library's own; set with any action
+        constexpr int Restorer = 0x04000000;  // set by the C library with every action
         text << signal << ' ' << reinterpret_cast<void*>(action.sa_handler) << ' '
              << (action.sa_flags & ~Restorer) << ' ';
         print(action.sa_mask);
@@ -208,7 +208,7 @@ inline void BlockSignal(int signal)
     EXPECT_EQ(::pthread_sigmask(SIG_BLOCK, &signals, nullptr), 0);
 }
 
-// A handler that waits for every child there is, as event loops have it.
+// A handler that waits for all children, as in event loops.
 inline void ReapAll(int)
 {
     const int error = errno;
@@ -217,7 +217,7 @@ inline void ReapAll(int)
     errno = error;
 }
 
-// What callers do with the signal of their children.
+// How callers handle SIGCHLD.
 struct ChildSignal {
     const char* name;
     void (*handler)(int);
@@ -231,7 +231,7 @@ const std::array<ChildSignal, 5> ChildSignals{{
     {"reaping handler, no zombies", ReapAll, SA_NOCLDWAIT},
 }};
 
-// Gives up root's rights, for good; an ordinary user has none.
+// Gives up root's rights for good, if there are any.
 inline void BecomeOrdinary()
 {
     constexpr uid_t Nobody = 65534;

@@ -1,4 +1,4 @@
-// Whether there is a file: CoreLibFileExist() and CoreLibFileCheckDir().
+// CoreLibFileExist() and CoreLibFileCheckDir().
 #include <orvacore/orvacore.h>
 
 #include <sys/socket.h>
@@ -25,7 +25,7 @@ class FilesTest : public ::testing::Test {
     TempDir dir;
 };
 
-TEST_F(FilesTest, WhateverHasANameExists)
+TEST_F(FilesTest, EverythingWithANameExists)
 {
     SetContent(dir.File("file"), "text");
     SetContent(dir.File("secret"), "");
@@ -38,7 +38,7 @@ TEST_F(FilesTest, WhateverHasANameExists)
     Expect("/dev/null", true, 0);
 }
 
-TEST_F(FilesTest, DirectoriesAreTold)
+TEST_F(FilesTest, RecognizesDirectories)
 {
     fs::create_directory(dir.File("directory"));
     EXPECT_EQ(::chmod(dir.File("directory").c_str(), 0000), 0);
@@ -59,7 +59,7 @@ TEST_F(FilesTest, WhatHasNoNameDoesNotExist)
     Expect("", false, 0);
 }
 
-TEST_F(FilesTest, SymbolicLinksAreFollowed)
+TEST_F(FilesTest, FollowsSymbolicLinks)
 {
     SetContent(dir.File("file"), "");
     fs::create_symlink("file", dir.File("to file"));
@@ -75,7 +75,7 @@ TEST_F(FilesTest, SymbolicLinksAreFollowed)
     Expect(dir.File("loop"), false, 0);
 }
 
-TEST_F(FilesTest, BehindADirectoryThatMayNotBeSearchedNothingIsSeen)
+TEST_F(FilesTest, NothingExistsInADirectoryThatMayNotBeSearched)
 {
     fs::create_directories(dir.File("closed/directory"));
     EXPECT_EQ(::chmod(dir.Path().c_str(), 0711), 0);

@@ -22,7 +22,7 @@
 
 namespace {
 
-// What a program wrote, and what closing its stream answered.
+// The output of a program, and the result of closing its stream.
 struct Outcome {
     std::string output;
     int closed;
@@ -70,7 +70,7 @@ bool HasChild()
     return ::waitpid(-1, nullptr, WNOHANG) >= 0 || errno != ECHILD;
 }
 
-// For the body of a ChildProcess, which answers with its exit code.
+// For the body of a ChildProcess, which reports by its exit code.
 void Require(bool fact)
 {
     if (!fact) throw std::runtime_error("not so");
@@ -98,7 +98,7 @@ TEST_F(OrvaCoreTest, TheOutputIsReadToItsEnd)
               (Outcome{std::string(1'000'000, '\0'), 0}));
 }
 
-TEST_F(OrvaCoreTest, ArgumentsArriveAsTheyStand)
+TEST_F(OrvaCoreTest, PassesArgumentsUnchanged)
 {
     EXPECT_EQ(
         RunToEnd("/usr/bin/printf", "[%s]", "$HOME;*", "", "a  b", "`id`", "'\"\\", ">x", "\n"),
@@ -111,7 +111,7 @@ TEST_F(OrvaCoreTest, TheFirstArgumentIsThePath)
     EXPECT_EQ(RunToEnd("/bin/cat", "/proc/self/cmdline"), (Outcome{{text, sizeof text}, 0}));
 }
 
-TEST_F(OrvaCoreTest, FifteenArgumentsAreTheMost)
+TEST_F(OrvaCoreTest, RefusesMoreThanFifteenArguments)
 {
     EXPECT_EQ(RunToEnd("/bin/echo", "1", "2", "3", "4", "5", "6", "7", "8", "9", "10", "11", "12",
                        "13", "14", "15"),
@@ -123,7 +123,7 @@ TEST_F(OrvaCoreTest, FifteenArgumentsAreTheMost)
     EXPECT_EQ(errno, EINVAL);
 }
 
-TEST_F(OrvaCoreTest, AnotherModeThanReadingIsRefused)
+TEST_F(OrvaCoreTest, RefusesOtherModesThanReading)
 {
     for (const char* mode : {"", "w", "re", "r+", "R", "rw"}) {
         errno = 0;
@@ -132,7 +132,7 @@ TEST_F(OrvaCoreTest, AnotherModeThanReadingIsRefused)
     }
 }
 
-TEST_F(OrvaCoreTest, AProgramThatCannotBeStartedGivesNoStream)
+TEST_F(OrvaCoreTest, AProgramThatCannotBeStartedHasNoStream)
 {
     const TempDir directory;
     const std::string notExecutable = directory.File("plain");
@@ -145,7 +145,7 @@ TEST_F(OrvaCoreTest, AProgramThatCannotBeStartedGivesNoStream)
     const std::vector<Row> rows{
         {"/no/such/program", ENOENT},
         {"", ENOENT},
-        {"echo", ENOENT},  // a file's name is not searched for
+        {"echo", ENOENT},  // no search in PATH
         {"/", EACCES},
         {notExecutable.c_str(), EACCES},
         {nullptr, EINVAL},
@@ -176,7 +176,7 @@ TEST_F(OrvaCoreTest, WithoutFreeDescriptorsThereIsNoStream)
     }
 }
 
-TEST_F(OrvaCoreTest, TheEnvironmentIsPassedOn)
+TEST_F(OrvaCoreTest, PassesTheEnvironment)
 {
     EXPECT_EQ(RunToEnd("/usr/bin/printenv", "ORVACORE_TEST"), (Outcome{"", -1}));
     ChildProcess child([](ChildProcess::Link&) {
@@ -187,7 +187,7 @@ TEST_F(OrvaCoreTest, TheEnvironmentIsPassedOn)
     EXPECT_EQ(child.Join(), 0);
 }
 
-TEST_F(OrvaCoreTest, NoDescriptorAboveTwoIsPassedOn)
+TEST_F(OrvaCoreTest, PassesNoDescriptorAboveTwo)
 {
     std::array<int, 2> pipe{};
     ASSERT_EQ(::pipe(pipe.data()), 0);
@@ -197,7 +197,7 @@ TEST_F(OrvaCoreTest, NoDescriptorAboveTwoIsPassedOn)
     ASSERT_NE(other, nullptr);
 
     const Outcome outcome = RunToEnd("/bin/ls", "/proc/self/fd");
-    // The program's own directory takes the lowest free number, which is 3 when none was inherited.
+    // ls opens its directory as the lowest free descriptor, which is 3 if none was inherited.
     EXPECT_EQ(outcome, (Outcome{"0\n1\n2\n3\n", 0}));
 
     EXPECT_EQ(ReadAll(other), "other\n");
@@ -238,7 +238,7 @@ TEST_F(OrvaCoreTest, ACallerMayHaveClosedItsStandardDescriptors)
     }
 }
 
-TEST_F(OrvaCoreTest, AProgramThatFailsIsToldByClosing)
+TEST_F(OrvaCoreTest, ClosingReportsAProgramThatFailed)
 {
     EXPECT_EQ(RunToEnd("/bin/false"), (Outcome{"", -1}));
     EXPECT_EQ(RunToEnd("/bin/sh", "-c", "echo text; exit 3"), (Outcome{"text\n", -1}));
@@ -253,7 +253,7 @@ TEST_F(OrvaCoreTest, AStreamMayBeClosedBeforeItsEnd)
     EXPECT_EQ(CoreLibPclose(stream), -1);  // the broken pipe ended it
 }
 
-TEST_F(OrvaCoreTest, AnOutputMayEndBeforeItsProgram)
+TEST_F(OrvaCoreTest, TheOutputMayEndBeforeTheProgram)
 {
     EXPECT_EQ(RunToEnd("/bin/sh", "-c", "echo text; exec 1>&-; exit 3"), (Outcome{"text\n", -1}));
 }
@@ -283,10 +283,10 @@ TEST_F(OrvaCoreTest, ACallerMayIgnoreItsChildren)
 
 volatile sig_atomic_t signalsSeen = 0;
 
-TEST_F(OrvaCoreTest, SignalsBreakNeitherReadingNorClosing)
+TEST_F(OrvaCoreTest, SignalsInterruptNeitherReadingNorClosing)
 {
     struct sigaction action {};
-    action.sa_handler = [](int) { signalsSeen = signalsSeen + 1; };  // and no SA_RESTART
+    action.sa_handler = [](int) { signalsSeen = signalsSeen + 1; };  // without SA_RESTART
     struct sigaction before {};
     ASSERT_EQ(::sigaction(SIGUSR1, &action, &before), 0);
     constexpr const char* Script =
@@ -305,7 +305,7 @@ struct Trimming {
     const char* trimmed;
 };
 
-TEST(OrvaCoreTrimTest, BothEndsAreCut)
+TEST(OrvaCoreTrimTest, CutsBothEnds)
 {
     const std::vector<Trimming> rows{
         {"abc", nullptr, nullptr, "abc"},
@@ -335,7 +335,7 @@ TEST(OrvaCoreTrimTest, BothEndsAreCut)
     }
 }
 
-TEST(OrvaCoreTrimTest, ANullTextIsGivenBack)
+TEST(OrvaCoreTrimTest, ReturnsANullText)
 {
     EXPECT_EQ(CoreLibStrTrim(nullptr, nullptr, nullptr), nullptr);
     EXPECT_EQ(CoreLibStrTrim(nullptr, "x", "y"), nullptr);

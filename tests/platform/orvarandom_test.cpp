@@ -17,7 +17,7 @@ namespace {
 using ORVA::RANDOM::ORVARandom;
 using ORVA::RANDOM::ORVARandomBase;
 
-TEST(OrvaRandomTest, EveryNumberBetweenTheBoundsIsDrawnAndNoOther)
+TEST(OrvaRandomTest, DrawsEveryNumberBetweenTheBoundsAndNoOther)
 {
     ORVARandom random;
     std::set<unsigned int> drawn;
@@ -29,7 +29,7 @@ TEST(OrvaRandomTest, EveryNumberBetweenTheBoundsIsDrawnAndNoOther)
     EXPECT_EQ(drawn, (std::set<unsigned int>{UINT_MAX - 1, UINT_MAX}));
 }
 
-TEST(OrvaRandomTest, BoundsWithoutAChoiceGiveTheLowerOne)
+TEST(OrvaRandomTest, BoundsThatLeaveNoChoiceGiveTheLowerOne)
 {
     struct Row {
         unsigned int min;
@@ -58,8 +58,8 @@ TEST(OrvaRandomTest, TheFullRangeUsesEveryBit)
     EXPECT_EQ(unset, UINT_MAX);
 }
 
-// Pearson's sum over equally large buckets. With up to 16 buckets a fair source exceeds the bound
-// once in seventy thousand billion runs; one that leaves out or favours a number exceeds it always.
+// Pearson's chi-squared sum over buckets of the same size. With up to 16 buckets a fair source exceeds
+// the bound once in 7 * 10^13 runs; one that omits or favours a number always does.
 TEST(OrvaRandomTest, NumbersAreEquallyLikely)
 {
     struct Row {
@@ -73,7 +73,7 @@ TEST(OrvaRandomTest, NumbersAreEquallyLikely)
         {0, 1, 1},
         {10, 19, 1},
         {500, 1000, 167},                   // 167 numbers for each of three buckets
-        {0, 2'999'999'999, 1'000'000'000},  // a remainder of 32 bits would favour the first
+        {0, 2'999'999'999, 1'000'000'000},  // the remainder of 32 bits would favour the first
         {0, UINT_MAX, 0x1000'0000},
     };
     ORVARandom random;
@@ -94,7 +94,7 @@ TEST(OrvaRandomTest, NumbersAreEquallyLikely)
     }
 }
 
-// Enough bits that two draws are never the same by chance.
+// Enough bits that two sequences are never equal by chance.
 using Sample = std::array<unsigned int, 8>;
 
 Sample Draw(ORVARandomBase& random)

@@ -12,8 +12,8 @@
 
 namespace {
 
-// When this process was started, in clock ticks since boot: field 22 of what the kernel says. The
-// name before the 3rd field may hold anything.
+// The start time of this process in clock ticks since boot: field 22 of /proc/self/stat. The name,
+// before the third field, may hold anything.
 unsigned long long OwnStart()
 {
     const std::string status = Content("/proc/self/stat");
@@ -32,7 +32,7 @@ std::string OwnText()
 
 class PidFileTest : public ::testing::Test {
   protected:
-    // In the process that calls.
+    // Of the calling process.
     int Create() const { return CoreLibProcPidFileCreate(path.c_str()); }
     pid_t Read() const { return CoreLibReadPidFile(path.c_str()); }
 
@@ -71,7 +71,7 @@ TEST_F(PidFileTest, HoldsIdAndStart)
     EXPECT_EQ(Names(), std::set<std::string>{"x.pid"});
 }
 
-TEST_F(PidFileTest, NamesTheProcessThatCallsWhateverItsName)
+TEST_F(PidFileTest, NamesTheCallingProcessWhateverItsName)
 {
     for (const char* name : {"name", ") Z (", ") S 1 2 3", ")", "", "a b\n1 2", "((((("}) {
         SCOPED_TRACE(name);
@@ -89,7 +89,7 @@ TEST_F(PidFileTest, NamesTheProcessThatCallsWhateverItsName)
     }
 }
 
-TEST_F(PidFileTest, NamesTheDetachedChildThatCalls)
+TEST_F(PidFileTest, NamesADetachedChildThatCalls)
 {
     InProcess([this] {
         Pipe done;
@@ -104,7 +104,7 @@ TEST_F(PidFileTest, NamesTheDetachedChildThatCalls)
     });
 }
 
-TEST_F(PidFileTest, MayBeReadByEveryoneWhateverTheUmask)
+TEST_F(PidFileTest, IsReadableByAllWhateverTheUmask)
 {
     for (const mode_t mask : {0000U, 0022U, 0077U, 0777U}) {
         InProcess([&] {
@@ -115,7 +115,7 @@ TEST_F(PidFileTest, MayBeReadByEveryoneWhateverTheUmask)
     }
 }
 
-TEST_F(PidFileTest, AnotherUserReadsIt)
+TEST_F(PidFileTest, IsReadByAnotherUser)
 {
     EXPECT_EQ(Create(), 0);
     EXPECT_EQ(::chmod(dir.Path().c_str(), 0711), 0);
@@ -127,7 +127,7 @@ TEST_F(PidFileTest, AnotherUserReadsIt)
     });
 }
 
-TEST_F(PidFileTest, IsReplacedWhole)
+TEST_F(PidFileTest, IsReplacedAsAWhole)
 {
     SetContent(path, "1\n2\n");
     const std::string other = dir.File("other name");
@@ -136,11 +136,11 @@ TEST_F(PidFileTest, IsReplacedWhole)
     EXPECT_EQ(Create(), 0);
     EXPECT_EQ(Content(path), OwnText());
     EXPECT_EQ(Status().st_mode, S_IFREG | 0644U);
-    EXPECT_EQ(Content(other), "1\n2\n");  // the old file, which is not written to
+    EXPECT_EQ(Content(other), "1\n2\n");  // the old file is not written to
     EXPECT_EQ(Names(), (std::set<std::string>{"other name", "x.pid"}));
 }
 
-TEST_F(PidFileTest, WhatADeadProcessLeftIsReplaced)
+TEST_F(PidFileTest, ReplacesWhatADeadProcessLeft)
 {
     InProcess([&] { EXPECT_EQ(Create(), 0); });
     EXPECT_EQ(CoreLibProcAlive(Read()), 0);
@@ -148,7 +148,7 @@ TEST_F(PidFileTest, WhatADeadProcessLeftIsReplaced)
     EXPECT_EQ(Read(), ::getpid());
 }
 
-TEST_F(PidFileTest, NothingIsWrittenThroughASymbolicLink)
+TEST_F(PidFileTest, IsNotWrittenThroughASymbolicLink)
 {
     const std::string precious = dir.File("precious");
     SetContent(precious, "precious");
@@ -159,7 +159,7 @@ TEST_F(PidFileTest, NothingIsWrittenThroughASymbolicLink)
     EXPECT_EQ(Content(precious), "precious");
 }
 
-TEST_F(PidFileTest, NothingIsMadeThroughADanglingLink)
+TEST_F(PidFileTest, IsNotMadeThroughADanglingLink)
 {
     std::filesystem::create_symlink(dir.File("target"), path);
     EXPECT_EQ(Create(), 0);
@@ -167,7 +167,7 @@ TEST_F(PidFileTest, NothingIsMadeThroughADanglingLink)
     EXPECT_EQ(Names(), std::set<std::string>{"x.pid"});
 }
 
-TEST_F(PidFileTest, IsNotCreatedWhereThatCannotBe)
+TEST_F(PidFileTest, IsNotMadeWhereNoFileCanBe)
 {
     SetContent(dir.File("file"), "");
     path = dir.File("missing/x.pid");
@@ -208,7 +208,7 @@ TEST_F(PidFileTest, AFailureToWriteIsAnErrorAndTheOldFileStays)
     EXPECT_EQ(Names(), std::set<std::string>{"x.pid"});
 }
 
-TEST_F(PidFileTest, OfManyWritersOneWins)
+TEST_F(PidFileTest, OneOfManyWritersWins)
 {
     std::array<std::thread, 4> threads;
     for (std::thread& thread : threads) {
@@ -233,7 +233,7 @@ TEST_F(PidFileTest, AMissingFileHoldsNoId)
     EXPECT_EQ(Read(), 0);
 }
 
-TEST_F(PidFileTest, OnlyALineThatIsAnIdIsRead)
+TEST_F(PidFileTest, ReadsOnlyALineThatIsAnId)
 {
     const std::string own = std::to_string(::getpid());
     const std::string start = std::to_string(OwnStart());
@@ -251,7 +251,7 @@ TEST_F(PidFileTest, OnlyALineThatIsAnIdIsRead)
         {"-5", 0},
         {"-" + own, 0},
         {"+" + own, 0},
-        {"4294967297", 0},  // 1 for whoever reads 32 bits
+        {"4294967297", 0},  // 1 in 32 bits
         {"2147483648", 0},
         {"-2147483649", 0},
         {"99999999999999999999", 0},
@@ -276,7 +276,7 @@ TEST_F(PidFileTest, OnlyALineThatIsAnIdIsRead)
         {own + "\n1", 0},
         {own + "\n18446744073709551615\n", 0},
         {own + "\n" + std::string(15, '0') + "1\n", 0},
-        {"2147483647", INT_MAX},  // nobody's
+        {"2147483647", INT_MAX},  // of no process
         {"2147483647\n", INT_MAX},
         {"2147483647\n1\n", INT_MAX},
     };
@@ -286,7 +286,7 @@ TEST_F(PidFileTest, OnlyALineThatIsAnIdIsRead)
     }
 }
 
-TEST_F(PidFileTest, TheIdOfAZombieIsReadUntilItIsUsedAgain)
+TEST_F(PidFileTest, ReadsTheIdOfAZombieUntilItIsUsedAgain)
 {
     ChildProcess process([this](ChildProcess::Link&) { Create(); });
     const pid_t pid = process.Pid();
@@ -299,7 +299,7 @@ TEST_F(PidFileTest, TheIdOfAZombieIsReadUntilItIsUsedAgain)
     EXPECT_EQ(CoreLibProcAlive(pid), 0);
 }
 
-TEST_F(PidFileTest, WhatCannotBeReadHoldsNoId)
+TEST_F(PidFileTest, AFileThatCannotBeReadHoldsNoId)
 {
     SetContent(path, std::to_string(::getpid()));
     EXPECT_EQ(::chmod(dir.Path().c_str(), 0711), 0);
@@ -312,7 +312,7 @@ TEST_F(PidFileTest, WhatCannotBeReadHoldsNoId)
     });
 }
 
-TEST_F(PidFileTest, APipeHoldsNoIdAndIsNotWaitedFor)
+TEST_F(PidFileTest, APipeHoldsNoIdWithoutWaiting)
 {
     EXPECT_EQ(::mkfifo(path.c_str(), 0600), 0);
     InProcess([this] { EXPECT_EQ(Read(), 0); });
@@ -323,7 +323,7 @@ TEST_F(PidFileTest, APipeHoldsNoIdAndIsNotWaitedFor)
     ::close(writer);
 }
 
-TEST_F(PidFileTest, NoMoreIsReadThanAPidFileHolds)
+TEST_F(PidFileTest, ReadsNoMoreThanAPidFileHolds)
 {
     constexpr long SizeKiB = 512L * 1024;
     SetContent(path, std::to_string(::getpid()) + "\n");
@@ -340,7 +340,7 @@ TEST_F(PidFileTest, NoMoreIsReadThanAPidFileHolds)
     });
 }
 
-TEST_F(PidFileTest, CreatingAndReadingLeavesNoDescriptor)
+TEST_F(PidFileTest, MakingAndReadingLeavesNoDescriptor)
 {
     const std::set<int> before = Descriptors();
     EXPECT_EQ(Create(), 0);

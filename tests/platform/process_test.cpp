@@ -1,5 +1,4 @@
-// Detached children, CoreLibProcForkEx(), and the question whether a process lives,
-// CoreLibProcAlive().
+// CoreLibProcForkEx() and CoreLibProcAlive().
 #include <orvacore/orvacore.h>
 
 #include <dlfcn.h>
@@ -23,15 +22,15 @@
 
 namespace {
 
-// Something that happens in place of a fork. Forks are counted down to it in this process and,
-// from its copy of the count on, in every child.
+// What happens instead of the fork at which the countdown reaches 0. Every child counts on from its
+// copy of the countdown.
 struct ForkFault {
     int forksUntil;
     void (*action)();
 };
 ForkFault forkFault{0, nullptr};
 
-// A lock of the C library that so many intermediate processes wait for, each in this way.
+// A lock of the C library that a number of intermediate processes wait for, in this way.
 struct LibraryLock {
     std::atomic<int> waits;
     void (*wait)();
@@ -41,7 +40,7 @@ LibraryLock* libraryLock = nullptr;
 
 }  // namespace
 
-// Takes the C library's place in the test program.
+// Replaces that of the C library in the test program.
 extern "C" pid_t fork() noexcept
 {
     if (forkFault.forksUntil > 0 && --forkFault.forksUntil == 0) {
@@ -52,7 +51,7 @@ extern "C" pid_t fork() noexcept
     return real();
 }
 
-// Takes the C library's place, too: it stands for all functions that take such a lock.
+// Likewise. It stands for all functions that take such a lock.
 extern "C" int setlogmask(int mask) noexcept
 {
     if (libraryLock != nullptr && libraryLock->caller != ::getpid() && libraryLock->waits > 0) {
@@ -65,7 +64,7 @@ extern "C" int setlogmask(int mask) noexcept
 
 namespace {
 
-// Forks a detached child that runs `body` and ends. Gives its process id.
+// Forks a detached child that runs `body` and exits. Returns its process id.
 pid_t Detach(const std::function<void()>& body)
 {
     const pid_t pid = CoreLibProcForkEx(CORELIB_FORK_DETACHED);
@@ -96,7 +95,7 @@ TEST(ForkTest, TheFlagsValueIsFixed)
     EXPECT_EQ(CORELIB_FORK_DETACHED, 0x40);
 }
 
-TEST(ForkTest, WithoutFlagsTheChildIsTheCallers)
+TEST(ForkTest, WithoutFlagsTheCallerMustWaitForTheChild)
 {
     InProcess([] {
         const pid_t caller = ::getpid();
@@ -108,7 +107,7 @@ TEST(ForkTest, WithoutFlagsTheChildIsTheCallers)
     });
 }
 
-TEST(ForkTest, WithoutFlagsAFailureIsTold)
+TEST(ForkTest, WithoutFlagsAFailureIsReturned)
 {
     InProcess([] {
         forkFault = {1, [] { errno = ENOMEM; }};
@@ -117,7 +116,7 @@ TEST(ForkTest, WithoutFlagsAFailureIsTold)
     });
 }
 
-TEST(DetachedForkTest, TheCallerGetsTheIdOfTheProcessThatRunsTheChildsCode)
+TEST(DetachedForkTest, ReturnsTheIdOfTheProcessThatRunsTheChildsCode)
 {
     InProcess([] {
         Pipe report;
@@ -127,7 +126,7 @@ TEST(DetachedForkTest, TheCallerGetsTheIdOfTheProcessThatRunsTheChildsCode)
     });
 }
 
-TEST(DetachedForkTest, TheChildIsNoChildOfTheCaller)
+TEST(DetachedForkTest, TheCallerHasNoChildToWaitFor)
 {
     InProcess([] {
         Pipe forked;
@@ -144,7 +143,7 @@ TEST(DetachedForkTest, TheChildIsNoChildOfTheCaller)
     });
 }
 
-TEST(DetachedForkTest, TheCallersOtherChildrenAreLeftToIt)
+TEST(DetachedForkTest, DoesNotReapOtherChildrenOfTheCaller)
 {
     InProcess([] {
         const pid_t other = ::fork();
@@ -159,7 +158,7 @@ TEST(DetachedForkTest, TheCallersOtherChildrenAreLeftToIt)
     });
 }
 
-TEST(DetachedForkTest, WorksWhateverTheCallerDoesWithItsChildrensSignal)
+TEST(DetachedForkTest, WorksWhateverTheCallerDoesWithSigchld)
 {
     for (const ChildSignal& row : ChildSignals) {
         SCOPED_TRACE(row.name);
@@ -175,7 +174,7 @@ TEST(DetachedForkTest, WorksWhateverTheCallerDoesWithItsChildrensSignal)
     }
 }
 
-// What a detached child keeps of its caller.
+// What a detached child inherits.
 std::string Settings()
 {
     const mode_t mask = ::umask(0);
@@ -184,7 +183,7 @@ std::string Settings()
            SignalSettings();
 }
 
-TEST(DetachedForkTest, DirectoryUmaskAndSignalsAreKept)
+TEST(DetachedForkTest, KeepsDirectoryUmaskAndSignals)
 {
     const TempDir dir;
     InProcess([&] {
@@ -201,7 +200,7 @@ TEST(DetachedForkTest, DirectoryUmaskAndSignalsAreKept)
     });
 }
 
-// What a descriptor leads to, as far as it can be told apart from others.
+// Identifies the file of a descriptor.
 std::string Target(const struct stat& status)
 {
     return std::to_string(status.st_dev) + ' ' + std::to_string(status.st_ino) + ' ' +
@@ -221,7 +220,7 @@ std::string Target(const std::string& path)
     return Target(status);
 }
 
-// In place of a terminal, which not every system can give.
+// Instead of a terminal, which not every system provides.
 int OpenDevice(const std::string&)
 {
     return ::open("/dev/zero", O_RDWR);
@@ -252,7 +251,7 @@ int OpenFile(const std::string& path)
     return ::open(path.c_str(), O_RDWR | O_CREAT, 0600);
 }
 
-TEST(DetachedForkTest, StandardStreamsThatLeadToSomebodyBecomeTheNullDevice)
+TEST(DetachedForkTest, StandardPipesAndSocketsBecomeTheNullDevice)
 {
     struct Row {
         const char* name;
@@ -286,7 +285,7 @@ TEST(DetachedForkTest, StandardStreamsThatLeadToSomebodyBecomeTheNullDevice)
     }
 }
 
-TEST(DetachedForkTest, TheNullDeviceCanBeReadWrittenAndHandedOn)
+TEST(DetachedForkTest, TheNullDeviceCanBeReadWrittenAndInherited)
 {
     InProcess([] {
         const Pipe streams;
@@ -304,7 +303,7 @@ TEST(DetachedForkTest, TheNullDeviceCanBeReadWrittenAndHandedOn)
     });
 }
 
-TEST(DetachedForkTest, StandardStreamsThatAreClosedStayClosed)
+TEST(DetachedForkTest, ClosedStandardStreamsStayClosed)
 {
     for (const std::string open : {"", "0", "1", "2", "01", "02", "12"}) {
         SCOPED_TRACE("open: " + open);
@@ -328,7 +327,7 @@ TEST(DetachedForkTest, StandardStreamsThatAreClosedStayClosed)
     }
 }
 
-TEST(DetachedForkTest, OtherDescriptorsStayOpenAndNoneIsAdded)
+TEST(DetachedForkTest, KeepsOtherDescriptorsAndAddsNone)
 {
     InProcess([] {
         Pipe report;
@@ -340,7 +339,7 @@ TEST(DetachedForkTest, OtherDescriptorsStayOpenAndNoneIsAdded)
     });
 }
 
-TEST(DetachedForkTest, AReaderOfTheCallersOutputMeetsItsEndWhenTheCallerEnds)
+TEST(DetachedForkTest, TheCallersOutputEndsWithTheCaller)
 {
     Pipe output;
     Pipe never;
@@ -355,7 +354,7 @@ TEST(DetachedForkTest, AReaderOfTheCallersOutputMeetsItsEndWhenTheCallerEnds)
     EXPECT_EQ(CoreLibProcAlive(child.pid), 1);
 }
 
-TEST(DetachedForkTest, AFailureOfTheFirstForkIsTold)
+TEST(DetachedForkTest, AFailureOfTheFirstForkIsReturned)
 {
     InProcess([] {
         forkFault = {1, [] { errno = EAGAIN; }};
@@ -363,7 +362,7 @@ TEST(DetachedForkTest, AFailureOfTheFirstForkIsTold)
     });
 }
 
-TEST(DetachedForkTest, AFailureOfTheSecondForkIsTold)
+TEST(DetachedForkTest, AFailureOfTheSecondForkIsReturned)
 {
     InProcess([] {
         forkFault = {2, [] { errno = ENOMEM; }};
@@ -371,7 +370,7 @@ TEST(DetachedForkTest, AFailureOfTheSecondForkIsTold)
     });
 }
 
-TEST(DetachedForkTest, AnIntermediateProcessThatIsKilledIsAFailure)
+TEST(DetachedForkTest, FailsWhenTheIntermediateProcessIsKilled)
 {
     InProcess([] {
         forkFault = {2, [] { ::kill(::getpid(), SIGKILL); }};
@@ -379,13 +378,13 @@ TEST(DetachedForkTest, AnIntermediateProcessThatIsKilledIsAFailure)
     });
 }
 
-// Its end does not show in the pipe then, and where the caller ignores SIGCHLD nobody can ask for its
-// result either.
-TEST(DetachedForkTest, AnIntermediateProcessThatIsKilledIsNoticedThoughSomebodyHoldsItsPipe)
+// The end of the pipe does not show that it has ended. A caller that ignores SIGCHLD has no result
+// to wait for either.
+TEST(DetachedForkTest, NoticesAKilledIntermediateProcessWhosePipeIsStillOpen)
 {
     for (auto* const disposition : {SIG_DFL, SIG_IGN}) {
         InProcess([disposition] {
-            static Pipe life;  // of the caller: closed when that ends
+            static Pipe life;  // closed at the end of the caller
             EXPECT_NE(std::signal(SIGCHLD, disposition), SIG_ERR);
             forkFault = {2, [] {
                              if (::fork() == 0) {
@@ -399,7 +398,7 @@ TEST(DetachedForkTest, AnIntermediateProcessThatIsKilledIsNoticedThoughSomebodyH
     }
 }
 
-// As a mutex waits, and as a spin lock does.
+// As with a mutex, and as with a spin lock.
 [[noreturn]] void WaitForEver()
 {
     while (true) ::pause();
@@ -419,8 +418,8 @@ void WorkForAWhile()
 
 class LockedLibraryTest : public ::testing::Test {
   protected:
-    // Lets so many intermediate processes meet the lock. They have it when `wait` returns. The
-    // caller has a second thread from now on: otherwise nobody could hold a lock.
+    // Makes the next intermediate processes find the lock taken; they get it if `wait` returns.
+    // Starts a second thread: without one nobody could hold the lock.
     void Lock(int waits, void (*wait)())
     {
         std::thread([] { ::pause(); }).detach();
@@ -457,7 +456,7 @@ TEST_F(LockedLibraryTest, TheCallerForksAgainUntilTheLockIsFree)
     }
 }
 
-TEST_F(LockedLibraryTest, AProcessThatIsSlowIsNotTakenForOneThatWaits)
+TEST_F(LockedLibraryTest, ASlowProcessIsNotTakenForOneThatWaits)
 {
     InProcess([this] {
         Lock(INT_MAX, WorkForAWhile);
@@ -465,10 +464,10 @@ TEST_F(LockedLibraryTest, AProcessThatIsSlowIsNotTakenForOneThatWaits)
     });
 }
 
-TEST_F(LockedLibraryTest, WithoutOtherThreadsNoLockIsTried)
+TEST_F(LockedLibraryTest, WithoutOtherThreadsNoLockIsTested)
 {
     InProcess([this] {
-        __libc_single_threaded = 1;  // other cases of this program have had threads
+        __libc_single_threaded = 1;  // other tests of this program had threads
         LockForOneThread(INT_MAX, WaitForEver);
         ExpectForked();
         EXPECT_EQ(lock->waits, INT_MAX);
@@ -518,10 +517,10 @@ TEST(DetachedForkTest, ThreadsForkAtOnce)
     constexpr int Forks = 10;
     InProcess([] {
         Pipe report;
-        std::array<std::set<pid_t>, Threads> told;
+        std::array<std::set<pid_t>, Threads> returned;
         std::vector<std::thread> threads;
         threads.reserve(Threads);
-        for (std::set<pid_t>& children : told) {
+        for (std::set<pid_t>& children : returned) {
             threads.emplace_back([&] {
                 for (int i = 0; i < Forks; ++i) {
                     children.insert(
@@ -531,7 +530,7 @@ TEST(DetachedForkTest, ThreadsForkAtOnce)
         }
         for (std::thread& thread : threads) thread.join();
         std::set<pid_t> all;
-        for (std::set<pid_t>& children : told) all.merge(children);
+        for (std::set<pid_t>& children : returned) all.merge(children);
         std::set<pid_t> seen;
         std::istringstream lines(report.ReadToEnd());
         for (pid_t pid = 0; lines >> pid;) seen.insert(pid);
@@ -541,18 +540,18 @@ TEST(DetachedForkTest, ThreadsForkAtOnce)
     });
 }
 
-TEST(AliveTest, ThisProcessLives)
+TEST(AliveTest, ThisProcessIsAlive)
 {
     EXPECT_EQ(CoreLibProcAlive(::getpid()), 1);
 }
 
-TEST(AliveTest, NumbersThatAreNoProcessDoNotLive)
+TEST(AliveTest, NumbersOfNoProcessAreNotAlive)
 {
     for (const pid_t pid : {0, -1, -2, INT_MIN, INT_MAX}) EXPECT_EQ(CoreLibProcAlive(pid), 0);
-    EXPECT_EQ(CoreLibProcAlive(-::getpgrp()), 0);  // a group of processes is none, either
+    EXPECT_EQ(CoreLibProcAlive(-::getpgrp()), 0);  // nor is a process group
 }
 
-TEST(AliveTest, AProcessOfAnotherUserLives)
+TEST(AliveTest, AProcessOfAnotherUserIsAlive)
 {
     InProcess([] {
         BecomeOrdinary();
@@ -560,7 +559,7 @@ TEST(AliveTest, AProcessOfAnotherUserLives)
     });
 }
 
-TEST(AliveTest, AStoppedProcessLives)
+TEST(AliveTest, AStoppedProcessIsAlive)
 {
     ChildProcess process([](ChildProcess::Link& link) { link.Await(); });
     process.Kill(SIGSTOP);
@@ -573,7 +572,7 @@ TEST(AliveTest, AStoppedProcessLives)
     EXPECT_EQ(process.Join(), 0);
 }
 
-TEST(AliveTest, NeitherAZombieNorAnEndedProcessLivesWhateverItsName)
+TEST(AliveTest, ZombiesAndEndedProcessesAreNotAliveWhateverTheirName)
 {
     for (const char* name : {"name", ") Z (", ") S (", ")", "", "a b\n1 2", "0123456789abcdef"}) {
         SCOPED_TRACE(name);
@@ -597,7 +596,7 @@ TEST(AliveTest, NeitherAZombieNorAnEndedProcessLivesWhateverItsName)
     }
 }
 
-TEST(AliveTest, TheIdOfAThreadIsNoProcess)
+TEST(AliveTest, TheIdOfAThreadIsNotAlive)
 {
     pid_t thread = 0;
     int alive = -1;
@@ -609,14 +608,14 @@ TEST(AliveTest, TheIdOfAThreadIsNoProcess)
     EXPECT_EQ(alive, 0);
 }
 
-// The letter in /proc/PID/stat that says what the process's first thread does.
+// The state of the first thread: a letter in /proc/PID/stat.
 char State(pid_t pid)
 {
     const std::string status = Content("/proc/" + std::to_string(pid) + "/stat");
     return status[status.rfind(')') + 2];
 }
 
-TEST(AliveTest, AProcessLivesAsLongAsOneOfItsThreads)
+TEST(AliveTest, AProcessIsAliveAsLongAsOneOfItsThreads)
 {
     ChildProcess process([](ChildProcess::Link& link) {
         std::thread([&link] {
@@ -625,7 +624,7 @@ TEST(AliveTest, AProcessLivesAsLongAsOneOfItsThreads)
             link.Await();
             ::_exit(0);
         }).detach();
-        ::syscall(SYS_exit, 0);  // of the first thread alone
+        ::syscall(SYS_exit, 0);  // ends the first thread only
     });
     EXPECT_TRUE(process.Await());
     EXPECT_EQ(CoreLibProcAlive(process.Pid()), 1);

@@ -1,4 +1,4 @@
-// Programs that are run to their end: CoreLibExec().
+// CoreLibExec().
 #include <orvacore/orvacore.h>
 
 #include <dlfcn.h>
@@ -17,12 +17,12 @@
 
 namespace {
 
-// What happens in place of the start of a program, in the process that would start it.
+// What happens instead of a posix_spawn(), in the process that calls it.
 void (*insteadOfStarting)() = nullptr;
 
 }  // namespace
 
-// Takes the C library's place in the test program.
+// Replaces that of the C library in the test program.
 extern "C" int posix_spawn(pid_t* pid, const char* path, const posix_spawn_file_actions_t* files,
                            const posix_spawnattr_t* attributes, char* const* arguments,
                            char* const* environment)
@@ -35,8 +35,8 @@ extern "C" int posix_spawn(pid_t* pid, const char* path, const posix_spawn_file_
 
 namespace {
 
-// Runs `body` in a caller whose programs are its children, and in one whose programs have a
-// companion, because it ignores the signal of its children.
+// Runs `body` in a caller whose programs are its children, and in one that ignores SIGCHLD, whose
+// programs therefore have a companion.
 void InBothKinds(const std::function<void()>& body)
 {
     for (void (*handler)(int) : {SIG_DFL, SIG_IGN}) {
@@ -66,7 +66,7 @@ void ExpectNotStarted(const std::string& path, int error)
     EXPECT_EQ(errno, error) << path;
 }
 
-// Success and the kinds of failure are told apart.
+// Success, and all kinds of failure.
 void ExpectTrueResults()
 {
     EXPECT_EQ(Shell("exit 0"), 0);
@@ -103,18 +103,18 @@ class ProgramTest : public ::testing::Test {
     TempDir dir;
 };
 
-TEST_F(ProgramTest, TheResultIsTheExitCode)
+TEST_F(ProgramTest, ReturnsTheExitCode)
 {
     for (const int code : {0, 1, 2, 126, 127, 128, 137, 255}) {
         EXPECT_EQ(Shell("exit $0", std::to_string(code)), code);
     }
 }
 
-TEST_F(ProgramTest, AProgramThatASignalEndsHasFailed)
+TEST_F(ProgramTest, AProgramEndedByASignalHasFailed)
 {
     InBothKinds([] {
         for (const int signal : {SIGHUP, SIGINT, SIGTERM, SIGSEGV, SIGRTMIN}) {
-            SetSignal(signal, SIG_DFL);  // whoever runs the tests may have it ignored
+            SetSignal(signal, SIG_DFL);  // it may be ignored from outside
             EXPECT_EQ(Shell("ulimit -c 0; kill -$0 $$", std::to_string(signal)), -1) << signal;
         }
         errno = 0;
@@ -134,21 +134,21 @@ TEST_F(ProgramTest, AProgramThatCannotBeStartedIsAnError)
     ExpectNotStarted(std::string(5000, 'x'), ENAMETOOLONG);
 }
 
-TEST_F(ProgramTest, NoProgramIsAnError)
+TEST_F(ProgramTest, ANullPathIsAnError)
 {
     errno = 0;
     EXPECT_EQ(CoreLibExec(nullptr, "argument", nullptr, nullptr, nullptr), -1);
     EXPECT_EQ(errno, EINVAL);
 }
 
-TEST_F(ProgramTest, ThereIsNoShell)
+TEST_F(ProgramTest, RunsNoShell)
 {
     ExpectNotStarted("/bin/true; exit 0", ENOENT);
     ExpectNotStarted("true", ENOENT);  // no search in PATH either
     ExpectNotStarted(Script("commands", "exit 0\n", 0755), ENOEXEC);
 }
 
-TEST_F(ProgramTest, ArgumentsArriveAsTheyStand)
+TEST_F(ProgramTest, PassesArgumentsUnchanged)
 {
     const std::string path = Script("show", "#!/bin/sh\nprintf '[%s]' \"$@\" >\"$0.out\"\n", 0755);
     struct Row {
@@ -171,7 +171,7 @@ TEST_F(ProgramTest, ArgumentsArriveAsTheyStand)
     }
 }
 
-TEST_F(ProgramTest, EnvironmentAndDirectoryAreTheCallers)
+TEST_F(ProgramTest, KeepsEnvironmentAndDirectory)
 {
     InBothKinds([&] {
         EXPECT_EQ(::chdir(dir.Path().c_str()), 0);
@@ -183,7 +183,7 @@ TEST_F(ProgramTest, EnvironmentAndDirectoryAreTheCallers)
     });
 }
 
-// Runs a program that lists the descriptors that it has got, and gives the list.
+// The descriptors that a program inherits, listed by itself.
 std::string InheritedDescriptors(const TempDir& dir)
 {
     const int file = ::open(dir.File("out").c_str(), O_RDWR | O_CREAT | O_TRUNC, 0600);
@@ -194,12 +194,12 @@ std::string InheritedDescriptors(const TempDir& dir)
 
 constexpr const char* StandardDescriptors = "0\n1\n2\n3\n";  // 3 is the directory that ls reads
 
-TEST_F(ProgramTest, OnlyTheStandardDescriptorsAreInherited)
+TEST_F(ProgramTest, InheritsOnlyTheStandardDescriptors)
 {
     InBothKinds([&] { EXPECT_EQ(InheritedDescriptors(dir), StandardDescriptors); });
 }
 
-TEST_F(ProgramTest, OnOldKernelsNoOtherDescriptorsAreInheritedEither)
+TEST_F(ProgramTest, InheritsOnlyTheStandardDescriptorsOnOldKernels)
 {
     for (const OldKernel& kernel : OldKernels) {
         SCOPED_TRACE(kernel.name);
@@ -211,7 +211,7 @@ TEST_F(ProgramTest, OnOldKernelsNoOtherDescriptorsAreInheritedEither)
     }
 }
 
-TEST_F(ProgramTest, StandardDescriptorsThatAreClosedStayClosed)
+TEST_F(ProgramTest, ClosedStandardDescriptorsStayClosed)
 {
     for (const std::string open : {"", "0", "1", "2", "01", "02", "12", "012"}) {
         InBothKinds([&] {
@@ -229,7 +229,7 @@ TEST_F(ProgramTest, StandardDescriptorsThatAreClosedStayClosed)
     }
 }
 
-TEST_F(ProgramTest, ALockIsFreeWhenItsHolderEndsAlthoughAProgramItStartedLivesOn)
+TEST_F(ProgramTest, ALockEndsWithItsHolderAlthoughAProgramItStartedLivesOn)
 {
     const std::string lock = dir.File("lock");
     const std::string background = dir.File("background");
@@ -243,7 +243,7 @@ TEST_F(ProgramTest, ALockIsFreeWhenItsHolderEndsAlthoughAProgramItStartedLivesOn
     EXPECT_TRUE(CanLock(lock));
 }
 
-TEST_F(ProgramTest, ACallerCanBeEndedWhileItWaitsAndItsLockIsFreeThen)
+TEST_F(ProgramTest, AKilledCallerFreesItsLockWhileTheProgramRuns)
 {
     const std::string lock = dir.File("lock");
     Pipe output;
@@ -260,7 +260,7 @@ TEST_F(ProgramTest, ACallerCanBeEndedWhileItWaitsAndItsLockIsFreeThen)
     EXPECT_TRUE(CanLock(lock));
 }
 
-TEST_F(ProgramTest, ResultsAreTrueWhateverTheCallerDoesWithItsChildrensSignal)
+TEST_F(ProgramTest, ReturnsTheResultWhateverTheCallerDoesWithSigchld)
 {
     for (const ChildSignal& row : ChildSignals) {
         SCOPED_TRACE(row.name);
@@ -272,7 +272,7 @@ TEST_F(ProgramTest, ResultsAreTrueWhateverTheCallerDoesWithItsChildrensSignal)
     }
 }
 
-// A thread that waits for every child there is, as long as this object lives.
+// A thread that waits for all children as long as this object lives.
 class Reaper {
   public:
     Reaper()
@@ -297,7 +297,7 @@ class Reaper {
     std::thread thread;
 };
 
-TEST_F(ProgramTest, ACompanionKeepsTheResultFromAThreadThatReapsAllChildren)
+TEST_F(ProgramTest, ACompanionHidesTheResultFromAThreadThatReapsAllChildren)
 {
     InProcess([] {
         SetSignal(SIGCHLD, ReapAll, SA_RESTART);
@@ -306,7 +306,7 @@ TEST_F(ProgramTest, ACompanionKeepsTheResultFromAThreadThatReapsAllChildren)
     });
 }
 
-TEST_F(ProgramTest, AResultThatAnotherThreadHasFetchedIsNotKnown)
+TEST_F(ProgramTest, AResultThatAnotherThreadGotIsNotKnown)
 {
     InProcess([] {
         SetSignal(SIGCHLD, SIG_DFL);
@@ -331,12 +331,12 @@ TEST_F(ProgramTest, ACompanionSendsNoSignalToTheCaller)
     });
 }
 
-// That the companion has ended does not show in the pipe, whose other end somebody else holds.
-TEST_F(ProgramTest, ACompanionThatIsKilledIsAFailure)
+// The end of the pipe does not show that the companion has ended: somebody else holds it open.
+TEST_F(ProgramTest, FailsWhenTheCompanionIsKilled)
 {
     InProcess([] {
         SetSignal(SIGCHLD, SIG_IGN);
-        static Pipe life;  // of the caller: closed when that ends
+        static Pipe life;  // closed at the end of the caller
         insteadOfStarting = [] {
             if (::fork() == 0) {
                 life.ReadToEnd();
@@ -349,7 +349,7 @@ TEST_F(ProgramTest, ACompanionThatIsKilledIsAFailure)
     });
 }
 
-TEST_F(ProgramTest, TheCallersOtherChildrenAreLeftToIt)
+TEST_F(ProgramTest, DoesNotReapOtherChildrenOfTheCaller)
 {
     InProcess([] {
         const pid_t child = ::fork();
@@ -363,7 +363,7 @@ TEST_F(ProgramTest, TheCallersOtherChildrenAreLeftToIt)
     });
 }
 
-TEST_F(ProgramTest, TheCallersSignalSettingsAreUnchanged)
+TEST_F(ProgramTest, KeepsTheCallersSignalSettings)
 {
     InProcess([] {
         SetSignal(SIGUSR1, ReapAll, SA_RESTART | SA_NODEFER);
@@ -418,7 +418,7 @@ void CountSignal(int)
 TEST_F(ProgramTest, TheCallersHandlersRunWhileItWaits)
 {
     InBothKinds([] {
-        SetSignal(SIGUSR1, CountSignal);  // no SA_RESTART: the wait is interrupted
+        SetSignal(SIGUSR1, CountSignal);  // without SA_RESTART it interrupts the wait
         for (int run = 1; run <= 10; ++run) {
             EXPECT_EQ(Shell("kill -USR1 $0; exit 7", std::to_string(::getpid())), 7);
             EXPECT_EQ(signalsSeen, run);
@@ -436,7 +436,7 @@ TEST_F(ProgramTest, ASignalForTheWholeGroupDoesNotLoseTheResult)
     });
 }
 
-TEST_F(ProgramTest, WhoReadsTheOutputWaitsForTheProgramAlone)
+TEST_F(ProgramTest, TheOutputEndsWithTheProgramAlone)
 {
     InBothKinds([] {
         Pipe input;
@@ -509,7 +509,7 @@ TEST_F(ProgramTest, WithoutDescriptorsForACompanionNoProgramIsStarted)
     }
 }
 
-TEST_F(ProgramTest, WithoutRoomForAProcessNoProgramIsStarted)
+TEST_F(ProgramTest, WhenNoProcessCanBeMadeNoProgramIsStarted)
 {
     InBothKinds([] {
         BecomeOrdinary();
@@ -536,7 +536,7 @@ TEST_F(ProgramTest, RunsLeaveNothingBehind)
         const std::size_t allocatedBefore = ::mallinfo2().uordblks;
         const long pagesBefore = pages();
         run(300);
-        // Less than the smallest piece of memory, and less than one page, for each run.
+        // For each run, less than the smallest allocation, and less than one page.
         EXPECT_LT(::mallinfo2().uordblks, allocatedBefore + std::size_t{300} * 16);
         EXPECT_LT(pages(), pagesBefore + 200);
         EXPECT_EQ(Descriptors(), descriptors);

@@ -7,7 +7,7 @@ namespace {
 using OrvaDRCore::PreserveErrno;
 using OrvaDRCore::RetryOnEintr;
 
-TEST(PreserveErrnoTest, GivesBackWhatErrnoWas)
+TEST(PreserveErrnoTest, RestoresErrnoAtTheEndOfTheScope)
 {
     errno = ENOENT;
     {
@@ -17,7 +17,7 @@ TEST(PreserveErrnoTest, GivesBackWhatErrnoWas)
     EXPECT_EQ(errno, ENOENT);
 }
 
-TEST(RetryOnEintrTest, RepeatsACallUntilNoSignalInterruptsIt)
+TEST(RetryOnEintrTest, RepeatsACallThatSignalsInterrupt)
 {
     int calls = 0;
     const long result = RetryOnEintr([&] {
@@ -28,7 +28,7 @@ TEST(RetryOnEintrTest, RepeatsACallUntilNoSignalInterruptsIt)
     EXPECT_EQ(calls, 3);
 }
 
-TEST(RetryOnEintrTest, RepeatsNoOtherFailureAndNoSuccess)
+TEST(RetryOnEintrTest, RepeatsNeitherOtherFailuresNorSuccesses)
 {
     int calls = 0;
     const auto call = [&](int result, int error) {

@@ -1,4 +1,4 @@
-// Extraction, held against the streams and against File::toType.
+// Extraction, compared with the streams and with File::toType.
 #include "base/extraction.h"
 
 #include <gmock/gmock.h>
@@ -45,7 +45,7 @@ Value FromExtraction(Extraction& extraction, const std::string& text, Value valu
     return value;
 }
 
-// Also the sign of zero counts.
+// The sign of zero counts, too.
 template <class Value>
 bool Same(const Value& left, const Value& right)
 {
@@ -71,7 +71,7 @@ void ExpectSameOfAllKinds(Extraction& extraction, const std::string& text)
     ExpectSame(extraction, text, 42.5);
 }
 
-// Texts of the pieces that numbers are made of, and of some that they are not.
+// Random texts of pieces that occur in numbers, and of some that do not.
 std::string MakeText(std::mt19937& random)
 {
     static const std::vector<std::string> Pieces = {
@@ -91,7 +91,7 @@ std::string MakeText(std::mt19937& random)
 
 void ExpectSameOfManyTexts()
 {
-    std::mt19937 random(20'211);  // the same texts each time
+    std::mt19937 random(20'211);  // the same texts in each run
     Extraction extraction;
     for (int count = 0; count < Texts && !::testing::Test::HasFailure(); ++count) {
         ExpectSameOfAllKinds(extraction, MakeText(random));
@@ -116,24 +116,24 @@ class OtherBlanks : public std::ctype<char> {
     }
 };
 
-TEST(ExtractionTest, ManyTextsAreReadAsStreamsReadThem)
+TEST(ExtractionTest, ReadsManyTextsAsStreamsDo)
 {
     ExpectSameOfManyTexts();
 }
 
-TEST(ExtractionTest, WhereNumbersHaveCommasManyTextsAreReadAsStreamsReadThem)
+TEST(ExtractionTest, ReadsManyTextsAsStreamsDoWithADecimalComma)
 {
     const GlobalLocale locale(new CommaDecimals);
     ExpectSameOfManyTexts();
 }
 
-TEST(ExtractionTest, WhereOtherCharactersAreBlanksManyTextsAreReadAsStreamsReadThem)
+TEST(ExtractionTest, ReadsManyTextsAsStreamsDoWithOtherBlanks)
 {
     const GlobalLocale locale(new OtherBlanks);
     ExpectSameOfManyTexts();
 }
 
-TEST(ExtractionTest, EveryByteIsReadAsStreamsReadIt)
+TEST(ExtractionTest, ReadsEveryByteAsStreamsDo)
 {
     Extraction extraction;
     for (int byte = 0; byte < 256; ++byte) {
@@ -144,7 +144,7 @@ TEST(ExtractionTest, EveryByteIsReadAsStreamsReadIt)
     }
 }
 
-TEST(ExtractionTest, NumbersOfAllSizesAreReadToTheLastBit)
+TEST(ExtractionTest, ReadsNumbersOfAllSizesToTheLastBit)
 {
     std::mt19937_64 random(20'211);
     Extraction extraction;
@@ -165,7 +165,7 @@ TEST(ExtractionTest, NumbersOfAllSizesAreReadToTheLastBit)
     ExpectSame(extraction, std::string(1000, '0') + "1", 42);
 }
 
-TEST(ExtractionTest, TheRoundingIsTheProgramsOwn)
+TEST(ExtractionTest, RoundsAsTheProgramHasSet)
 {
     for (const int rounding : {FE_UPWARD, FE_DOWNWARD, FE_TOWARDZERO, FE_TONEAREST}) {
         ASSERT_EQ(std::fesetround(rounding), 0);
@@ -177,7 +177,7 @@ TEST(ExtractionTest, TheRoundingIsTheProgramsOwn)
     EXPECT_EQ(std::fegetround(), FE_TONEAREST);
 }
 
-TEST(ExtractionTest, OfATextWithoutAWordNothingIsRead)
+TEST(ExtractionTest, ATextWithoutAWordLeavesTheValue)
 {
     Extraction extraction;
     for (const std::string text : {"", " ", " \t\n\v\f\r"}) {
@@ -187,7 +187,7 @@ TEST(ExtractionTest, OfATextWithoutAWordNothingIsRead)
     }
 }
 
-TEST(ExtractionTest, TheLocaleIsThatOfTheBeginning)
+TEST(ExtractionTest, UsesTheLocaleOfItsConstruction)
 {
     Extraction classic;
     const GlobalLocale locale(new CommaDecimals);

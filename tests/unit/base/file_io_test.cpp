@@ -27,7 +27,7 @@ using OrvaDRCore::ReadAll;
 using OrvaDRCore::ReadRegularFile;
 using OrvaDRCore::WriteAll;
 
-// Nothing here logs: the fixture fails on every line.
+// Nothing here logs: the fixture fails on any line.
 class FileIoTest : public LoggedTest {
   protected:
     FileIoTest() : LoggedTest("file_io.cpp") {}
@@ -50,14 +50,14 @@ ssize_t WriteThreeBytes(int fd, const void* buffer, std::size_t size)
 
 // --------------------------------------------------------------------------------- FileDescriptor
 
-TEST_F(FileDescriptorTest, IsNoneByDefault)
+TEST_F(FileDescriptorTest, IsNotOpenByDefault)
 {
     const FileDescriptor owner;
     EXPECT_FALSE(owner.IsOpen());
     EXPECT_EQ(owner.Get(), -1);
 }
 
-TEST_F(FileDescriptorTest, IsClosedAtTheEndOfItsOwnersLife)
+TEST_F(FileDescriptorTest, IsClosedByItsOwner)
 {
     int fd = -1;
     {
@@ -69,13 +69,13 @@ TEST_F(FileDescriptorTest, IsClosedAtTheEndOfItsOwnersLife)
     EXPECT_FALSE(IsDescriptorOpen(fd));
 }
 
-TEST_F(FileDescriptorTest, ProgramsDoNotInheritIt)
+TEST_F(FileDescriptorTest, IsNotInheritedByPrograms)
 {
     const FileDescriptor owner(path, O_WRONLY | O_CREAT, 0600);
     EXPECT_EQ(::fcntl(owner.Get(), F_GETFD), FD_CLOEXEC);
 }
 
-TEST_F(FileDescriptorTest, FlagsAndModeAreTheCallers)
+TEST_F(FileDescriptorTest, IsOpenedWithTheCallersFlagsAndMode)
 {
     const Umask mask(0);
     const FileDescriptor owner(path, O_RDWR | O_CREAT | O_APPEND, 0640);
@@ -83,7 +83,7 @@ TEST_F(FileDescriptorTest, FlagsAndModeAreTheCallers)
     EXPECT_EQ(ModeOf(path), 0640U);
 }
 
-TEST_F(FileDescriptorTest, IsNoneWithErrnoWhenTheFileCannotBeOpened)
+TEST_F(FileDescriptorTest, IsNotOpenAndSetsErrnoWhenTheFileCannotBeOpened)
 {
     errno = 0;
     const FileDescriptor owner(dir.File("missing/doc"), O_WRONLY | O_CREAT, 0600);
@@ -91,7 +91,7 @@ TEST_F(FileDescriptorTest, IsNoneWithErrnoWhenTheFileCannotBeOpened)
     EXPECT_FALSE(owner.IsOpen());
 }
 
-TEST_F(FileDescriptorTest, MovingHandsItOver)
+TEST_F(FileDescriptorTest, IsHandedOverByAMove)
 {
     const std::size_t before = CountDescriptors();
     {
@@ -106,11 +106,11 @@ TEST_F(FileDescriptorTest, MovingHandsItOver)
     EXPECT_EQ(CountDescriptors(), before);
 }
 
-TEST_F(FileDescriptorTest, ClosingKeepsErrno)
+TEST_F(FileDescriptorTest, KeepsErrnoWhenItIsClosed)
 {
     {
         const FileDescriptor owner(path, O_WRONLY | O_CREAT, 0600);
-        ::close(owner.Get());  // the close behind it fails
+        ::close(owner.Get());  // so the destructor's close fails
         errno = ENOSPC;
     }
     EXPECT_EQ(errno, ENOSPC);
@@ -131,7 +131,7 @@ TEST_F(ReadAllTest, ReadsFilesOfAnySize)
     }
 }
 
-TEST_F(ReadAllTest, AppendsFromWhereTheDescriptorStands)
+TEST_F(ReadAllTest, AppendsFromTheOffsetOfTheDescriptor)
 {
     WriteFile(path, "0123456789");
     const FileDescriptor owner(path, O_RDONLY);
@@ -141,7 +141,7 @@ TEST_F(ReadAllTest, AppendsFromWhereTheDescriptorStands)
     EXPECT_EQ(text, "before 789");
 }
 
-TEST_F(ReadAllTest, ReadsOnAfterAnInterruptionAndAShortRead)
+TEST_F(ReadAllTest, ContinuesAfterInterruptionsAndShortReads)
 {
     WriteFile(path, "0123456789");
     int calls = 0;
@@ -153,7 +153,7 @@ TEST_F(ReadAllTest, ReadsOnAfterAnInterruptionAndAShortRead)
     std::string text;
     EXPECT_TRUE(ReadAll(owner.Get(), text));
     EXPECT_EQ(text, "0123456789");
-    EXPECT_EQ(calls, 7);  // three parts and the end, an interruption before each but the first
+    EXPECT_EQ(calls, 7);  // three parts and the end, and an interruption before all but the first
 }
 
 TEST_F(ReadAllTest, KeepsWhatWasReadBeforeAFailure)
@@ -181,7 +181,7 @@ TEST_F(ReadAllTest, RefusesADirectory)
     EXPECT_EQ(text, "");
 }
 
-TEST_F(ReadAllTest, ReadsNoMoreThanItIsToldTo)
+TEST_F(ReadAllTest, ReadsNoMoreThanTheLimit)
 {
     WriteFile(path, "0123456789");
     for (const std::size_t most : {0U, 1U, 7U, 10U, 11U}) {
@@ -201,7 +201,7 @@ TEST_F(ReadAllTest, ReadsNoMoreThanItIsToldTo)
 
 // -------------------------------------------------------------------------------- ReadRegularFile
 
-TEST_F(ReadRegularFileTest, AppendsTheFileOrItsBeginning)
+TEST_F(ReadRegularFileTest, AppendsTheFileUpToTheLimit)
 {
     WriteFile(path, Bytes("a\0b\n"));
     std::string text = "before ";
@@ -214,7 +214,7 @@ TEST_F(ReadRegularFileTest, AppendsTheFileOrItsBeginning)
     EXPECT_TRUE(ReadRegularFile(dir.File("link"), text));
 }
 
-TEST_F(ReadRegularFileTest, FailsWithTheErrnoOfWhatFails)
+TEST_F(ReadRegularFileTest, FailsWithTheErrnoOfTheCallThatFails)
 {
     std::string text;
     errno = 0;
@@ -231,7 +231,7 @@ TEST_F(ReadRegularFileTest, FailsWithTheErrnoOfWhatFails)
     EXPECT_EQ(text, "");
 }
 
-TEST_F(ReadRegularFileTest, WhatIsNoRegularFileIsNeitherReadNorWaitedFor)
+TEST_F(ReadRegularFileTest, NeitherReadsNorWaitsForWhatIsNoRegularFile)
 {
     faults.read = [](int /*fd*/, void* /*buffer*/, std::size_t /*size*/) -> ssize_t {
         ADD_FAILURE() << "it is read from";
@@ -246,14 +246,14 @@ TEST_F(ReadRegularFileTest, WhatIsNoRegularFileIsNeitherReadNorWaitedFor)
     }
 }
 
-TEST_F(ReadRegularFileTest, NoTerminalBecomesTheProcesssOwn)
+TEST_F(ReadRegularFileTest, ATerminalDoesNotBecomeTheControllingOne)
 {
     const int master = ::posix_openpt(O_RDWR | O_NOCTTY | O_CLOEXEC);
     std::array<char, 100> terminal{};
     ASSERT_TRUE(::grantpt(master) == 0 && ::unlockpt(master) == 0);
     ASSERT_EQ(::ptsname_r(master, terminal.data(), terminal.size()), 0);
     CheckInChild([&] {
-        ASSERT_GT(::setsid(), 0);  // a session that has none yet
+        ASSERT_GT(::setsid(), 0);  // a session without a controlling terminal
         std::string text;
         EXPECT_FALSE(ReadRegularFile(terminal.data(), text));
         EXPECT_EQ(::open("/dev/tty", O_RDWR | O_CLOEXEC), -1);
@@ -263,7 +263,7 @@ TEST_F(ReadRegularFileTest, NoTerminalBecomesTheProcesssOwn)
 
 // --------------------------------------------------------------------------------------- WriteAll
 
-TEST_F(WriteAllTest, WritesOnAfterShortWritesAndInterruptions)
+TEST_F(WriteAllTest, ContinuesAfterInterruptionsAndShortWrites)
 {
     int calls = 0;
     faults.write = [&](int fd, const void* buffer, std::size_t size) -> ssize_t {
@@ -276,17 +276,17 @@ TEST_F(WriteAllTest, WritesOnAfterShortWritesAndInterruptions)
     EXPECT_EQ(calls, 8);
 }
 
-TEST_F(WriteAllTest, AnEmptyTextNeedsNoWrite)
+TEST_F(WriteAllTest, AnEmptyTextTakesNoWrite)
 {
     faults.write = Failing(EIO);
     EXPECT_TRUE(WriteAll(-1, ""));
 }
 
-TEST_F(WriteAllTest, AWriteThatTakesNothingIsNotRepeated)
+TEST_F(WriteAllTest, AWriteOfZeroBytesIsAFailure)
 {
     int calls = 0;
     faults.write = [&](int /*fd*/, const void* /*buffer*/, std::size_t /*size*/) -> ssize_t {
-        errno = EINTR;  // of an earlier call
+        errno = EINTR;  // left by an earlier call
         return ++calls == 1 ? 0 : 4;
     };
     EXPECT_FALSE(WriteAll(-1, "text"));

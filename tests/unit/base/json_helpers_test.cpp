@@ -85,21 +85,21 @@ std::string EveryByte()
     return bytes;
 }
 
-// Every two bytes that can follow one another, and longer sequences that are no UTF-8.
+// All pairs of bytes, and longer sequences that are no UTF-8.
 std::vector<std::string> ByteStrings()
 {
     std::vector<std::string> strings{
         "",
         EveryByte(),
-        "\xe2\x82",          // broken off
-        "\xf0\x9f\x98",      // broken off
-        "\xe2\x28\xa1",      // not followed as its first byte says
-        "\xc0\x80",          // longer than needed
-        "\xf0\x80\x80\xaf",  // longer than needed
-        "\xed\xa0\x80",      // half of a pair
+        "\xe2\x82",          // truncated
+        "\xf0\x9f\x98",      // truncated
+        "\xe2\x28\xa1",      // without the bytes that the first one announces
+        "\xc0\x80",          // overlong
+        "\xf0\x80\x80\xaf",  // overlong
+        "\xed\xa0\x80",      // half of a surrogate pair
         "\xf4\x90\x80\x80",  // beyond the last character
         "\xff\xff\xff\xff",
-        "\xe2\x82\xac \xf0\x9f\x98\x80",  // and proper UTF-8
+        "\xe2\x82\xac \xf0\x9f\x98\x80",  // valid UTF-8
     };
     for (const char first : EveryByte()) {
         for (const char second : EveryByte()) strings.push_back(std::string{first, second});
@@ -109,31 +109,31 @@ std::vector<std::string> ByteStrings()
 
 // ------------------------------------------------------------------------------------- fromString
 
-TEST(FromStringTest, ADocumentMayBeOfEveryKind)
+TEST(FromStringTest, ReadsADocumentOfAnyType)
 {
     for (const JsonKind& kind : JsonKinds()) ExpectRead(kind.text, kind.value);
     ExpectRead(Document, ParseJson(Document));
 }
 
-TEST(FromStringTest, WhiteSpaceMayStandAroundTheDocument)
+TEST(FromStringTest, AllowsWhiteSpaceAroundTheDocument)
 {
     for (const JsonKind& kind : JsonKinds()) {
         ExpectRead(" \t\r\n" + kind.text + " \t\r\n", kind.value);
     }
 }
 
-TEST(FromStringTest, EscapesBecomeTheBytesThatTheyStandFor)
+TEST(FromStringTest, ReplacesEscapesByTheirBytes)
 {
     ExpectRead(R"("\u0000\u0041\u00e9\u20ac\ud83d\ude00\"\\\/\b\f\n\r\t")",
                Json::Value("\0A\xc3\xa9\xe2\x82\xac\xf0\x9f\x98\x80\"\\/\b\f\n\r\t"s));
 }
 
-TEST(FromStringTest, WhatIsNoDocumentLeavesTheValueAsItWas)
+TEST(FromStringTest, ATextThatIsNoDocumentLeavesTheValue)
 {
     for (const std::string& text : NoJsonTexts()) ExpectRefused(text);
 }
 
-TEST(FromStringTest, NoBeginningOfAnObjectOrArrayIsADocument)
+TEST(FromStringTest, RefusesEveryPrefixOfAnObjectOrArray)
 {
     const std::string object = Document;
     for (const std::string& document : {object, "[" + object + "]"}) {
@@ -145,7 +145,7 @@ TEST(FromStringTest, NoBeginningOfAnObjectOrArrayIsADocument)
     }
 }
 
-TEST(FromStringTest, NothingMayFollowTheDocument)
+TEST(FromStringTest, RefusesTextAfterTheDocument)
 {
     const std::vector<std::string> tails{
         " x",    " nul", "]",    "}",      ",",     ":",       " 1",    " -",
@@ -157,20 +157,20 @@ TEST(FromStringTest, NothingMayFollowTheDocument)
     }
 }
 
-TEST(FromStringTest, ACommentBehindTheDocumentIsTextBehindIt)
+TEST(FromStringTest, RefusesACommentAfterTheDocument)
 {
     ExpectRefused("{} // comment");
     ExpectRefused("{} /* comment */");
     ExpectRefused("[1]/**/\n");
 }
 
-TEST(FromStringTest, ACommaBehindTheLastMemberIsRefused)
+TEST(FromStringTest, RefusesACommaAfterTheLastMember)
 {
     ExpectRefused("[1,]");
     ExpectRefused(R"({"a":1,})");
 }
 
-TEST(FromStringTest, AZeroByteIsRefusedWhereverItStands)
+TEST(FromStringTest, RefusesAZeroByteAnywhere)
 {
     const std::string document = Document;
     for (std::size_t at = 0; at <= document.size(); ++at) {
@@ -180,17 +180,18 @@ TEST(FromStringTest, AZeroByteIsRefusedWhereverItStands)
     }
 }
 
-TEST(FromStringTest, NestingEndsAtTheReadersLimit)
+TEST(FromStringTest, RefusesNestingBeyondTheLimit)
 {
     struct Nest {
         const char* open;
         const char* close;
-        std::size_t levels;  // that one repetition adds
+        std::size_t levels;  // added by one repetition
     };
     for (const Nest& nest : {Nest{"[", "]", 1}, Nest{R"({"a":)", "}", 1},
                              Nest{R"([{"a":)", "}]", 2}, Nest{"[0,", "]", 1}}) {
         const auto text = [&](std::size_t depth) {
-            const std::size_t times = (depth - 1) / nest.levels;  // the innermost is one level more
+            const std::size_t times =
+                (depth - 1) / nest.levels;  // the innermost value is one more level
             return Repeat(nest.open, times) + "[]" + Repeat(nest.close, times);
         };
         for (const std::size_t depth : {std::size_t{999}, std::size_t{1}}) {
@@ -207,7 +208,7 @@ TEST(FromStringTest, NestingEndsAtTheReadersLimit)
 
 // --------------------------------------------------------------------------------------- toString
 
-TEST(ToStringTest, GivesOneLineWithoutBlanksAndWithoutANewline)
+TEST(ToStringTest, WritesOneLineWithoutBlanksOrANewline)
 {
     struct Row {
         const char* text;
@@ -228,7 +229,7 @@ TEST(ToStringTest, GivesOneLineWithoutBlanksAndWithoutANewline)
     }
 }
 
-TEST(ToStringTest, ALongDocumentIsOneLineToo)
+TEST(ToStringTest, WritesALongDocumentOnOneLine)
 {
     Json::Value list(Json::arrayValue);
     std::string expected;
@@ -243,7 +244,7 @@ TEST(ToStringTest, ALongDocumentIsOneLineToo)
     EXPECT_EQ(toString(list), "[" + expected + "]");
 }
 
-TEST(ToStringTest, CommentsOfAValueAreLeftOut)
+TEST(ToStringTest, OmitsCommentsOfAValue)
 {
     Json::Value value(1);
     value.setComment(std::string("// before"), Json::commentBefore);
@@ -251,7 +252,7 @@ TEST(ToStringTest, CommentsOfAValueAreLeftOut)
     EXPECT_EQ(toString(value), "1");
 }
 
-TEST(ToStringTest, BytesAbove0x7fStandAsTheyAre)
+TEST(ToStringTest, DoesNotEscapeBytesAbove0x7f)
 {
     const std::string high = EveryByte().substr(0x80);
     Json::Value value;
@@ -259,7 +260,7 @@ TEST(ToStringTest, BytesAbove0x7fStandAsTheyAre)
     EXPECT_EQ(toString(value), "{\"" + high + "\":\"" + high + "\"}");
 }
 
-TEST(ToStringTest, NoControlCharacterIsWritten)
+TEST(ToStringTest, WritesNoControlCharacter)
 {
     Json::Value value;
     value[EveryByte()] = EveryByte();
@@ -268,7 +269,7 @@ TEST(ToStringTest, NoControlCharacterIsWritten)
 
 // ------------------------------------------------------------------------------------- round trip
 
-TEST(JsonRoundTripTest, EveryKindComesBack)
+TEST(JsonRoundTripTest, PreservesEveryType)
 {
     for (const JsonKind& kind : JsonKinds()) {
         EXPECT_TRUE(Same(ThereAndBack(kind.value), kind.value)) << kind.text;
@@ -276,7 +277,7 @@ TEST(JsonRoundTripTest, EveryKindComesBack)
     EXPECT_TRUE(Same(ThereAndBack(ParseJson(Document)), ParseJson(Document)));
 }
 
-TEST(JsonRoundTripTest, EveryByteStringComesBackAsAText)
+TEST(JsonRoundTripTest, PreservesEveryByteStringAsAText)
 {
     const std::vector<std::string> strings = ByteStrings();
     Json::Value value(Json::arrayValue);
@@ -286,7 +287,7 @@ TEST(JsonRoundTripTest, EveryByteStringComesBackAsAText)
     for (Json::ArrayIndex i = 0; i < back.size(); ++i) EXPECT_EQ(back[i].asString(), strings[i]);
 }
 
-TEST(JsonRoundTripTest, EveryByteStringComesBackAsAKey)
+TEST(JsonRoundTripTest, PreservesEveryByteStringAsAKey)
 {
     const std::vector<std::string> strings = ByteStrings();
     Json::Value value;
@@ -296,7 +297,7 @@ TEST(JsonRoundTripTest, EveryByteStringComesBackAsAKey)
     for (const std::string& bytes : strings) EXPECT_TRUE(Same(back[bytes], Json::Value(bytes)));
 }
 
-TEST(JsonRoundTripTest, IntegersComeBackAtTheirLimits)
+TEST(JsonRoundTripTest, PreservesIntegersAtTheirLimits)
 {
     using Int64Limits = std::numeric_limits<std::int64_t>;
     using IntLimits = std::numeric_limits<int>;
@@ -324,7 +325,7 @@ TEST(JsonRoundTripTest, IntegersComeBackAtTheirLimits)
     }
 }
 
-// Numbers of every size, the same on every run.
+// Numbers of all sizes, the same in each run.
 std::vector<double> RealNumbers()
 {
     using Limits = std::numeric_limits<double>;
@@ -369,19 +370,19 @@ void ExpectRealNumbersBack()
     }
 }
 
-TEST(JsonRoundTripTest, RealNumbersComeBackToTheLastBit)
+TEST(JsonRoundTripTest, PreservesRealNumbersToTheLastBit)
 {
     ExpectRealNumbersBack();
 }
 
-TEST(JsonRoundTripTest, RealNumbersComeBackWhereTheDecimalPointIsAComma)
+TEST(JsonRoundTripTest, PreservesRealNumbersWithADecimalComma)
 {
     const GlobalLocale locale(new CommaDecimals);
     ExpectRealNumbersBack();
 }
 
-// A locale changes nothing of what is a document, and nothing of what it holds.
-TEST(FromStringTest, ALocaleMakesNoDifference)
+// A locale changes neither what is a document nor what it holds.
+TEST(FromStringTest, ReadsTheSameInEveryLocale)
 {
     std::vector<std::string> texts = {
         "1.5",
@@ -459,14 +460,14 @@ TEST(FromStringTest, ALocaleMakesNoDifference)
 
 // ---------------------------------------------------------------------------- members, conversion
 
-// Whether the value is read back, found out by doing it.
+// Whether the value can be read again: tries it.
 bool ComesBack(const Json::Value& value)
 {
     Json::Value back;
     return fromString(back, toString(value));
 }
 
-TEST(IsReadableTest, WhatNestsTooDeepIsNot)
+TEST(IsReadableTest, RefusesWhatNestsTooDeep)
 {
     for (const Json::Value& innermost :
          {Json::Value(Json::arrayValue), Json::Value(Json::objectValue), Json::Value(1)}) {
@@ -482,7 +483,7 @@ TEST(IsReadableTest, WhatNestsTooDeepIsNot)
     }
 }
 
-TEST(IsReadableTest, ADeepMemberCountsWhereverItStands)
+TEST(IsReadableTest, RefusesADeepMemberAtAnyPlace)
 {
     for (const int levels : {MaxLevels - 1, MaxLevels}) {
         Json::Value list;
@@ -500,7 +501,7 @@ TEST(IsReadableTest, ADeepMemberCountsWhereverItStands)
     }
 }
 
-TEST(IsReadableTest, AnInfinityIsNotAndEveryOtherNumberIs)
+TEST(IsReadableTest, RefusesInfinitiesAndAcceptsAllOtherNumbers)
 {
     using Limits = std::numeric_limits<double>;
     const std::vector<double> numbers = {0.0,
@@ -527,7 +528,7 @@ TEST(IsReadableTest, AnInfinityIsNotAndEveryOtherNumberIs)
     EXPECT_EQ(toString(Limits::quiet_NaN()), "null");
 }
 
-TEST(IsReadableTest, EveryOtherKindIs)
+TEST(IsReadableTest, AcceptsAllOtherTypes)
 {
     for (const JsonKind& kind : JsonKinds()) EXPECT_TRUE(IsReadable(kind.value)) << kind.text;
     EXPECT_TRUE(IsReadable("Infinity"));
@@ -550,8 +551,8 @@ TEST(NestsAtMostTest, CountsTheLevelsOfTheDeepestMember)
     }
 }
 
-// The limits are jsoncpp's own; tests/huge has texts of that length.
-TEST(JsonLengthTest, TextsAndNamesFitUpToTheirLimits)
+// The limits are those of jsoncpp; tests/huge has texts of that length.
+TEST(JsonLengthTest, AcceptsTextsAndNamesUpToTheirLimits)
 {
     EXPECT_TRUE(OrvaDRCore::FitsJsonText(0) && OrvaDRCore::FitsJsonText(2'147'483'642));
     EXPECT_FALSE(OrvaDRCore::FitsJsonText(2'147'483'643) || OrvaDRCore::FitsJsonText(1ULL << 32U));
@@ -559,7 +560,7 @@ TEST(JsonLengthTest, TextsAndNamesFitUpToTheirLimits)
     EXPECT_FALSE(OrvaDRCore::FitsJsonName(1U << 30U) || OrvaDRCore::FitsJsonName(1ULL << 32U));
 }
 
-TEST(JsonLengthTest, ATextBecomesAValueByteForByte)
+TEST(JsonLengthTest, KeepsEveryByteOfAText)
 {
     using namespace std::string_view_literals;
     for (const std::string_view text : {""sv, "abc"sv, "a\0b"sv, "\xff"sv}) {
@@ -567,7 +568,7 @@ TEST(JsonLengthTest, ATextBecomesAValueByteForByte)
     }
 }
 
-TEST(FindMemberTest, ValuesThatAreNoObjectsHaveNoMembers)
+TEST(FindMemberTest, FindsNothingInAValueThatIsNoObject)
 {
     for (const JsonKind& kind : JsonKinds()) {
         if (kind.value.isObject()) continue;
@@ -579,7 +580,7 @@ TEST(FindMemberTest, ValuesThatAreNoObjectsHaveNoMembers)
     }
 }
 
-TEST(FindMemberTest, GivesTheMemberItselfWhateverItsKind)
+TEST(FindMemberTest, FindsTheMemberItselfWhateverItsType)
 {
     for (const JsonKind& kind : JsonKinds()) {
         Json::Value object;
@@ -594,7 +595,7 @@ TEST(FindMemberTest, GivesTheMemberItselfWhateverItsKind)
     }
 }
 
-TEST(FindMemberTest, NullIsNoKey)
+TEST(FindMemberTest, FindsNothingForANullKey)
 {
     for (const JsonKind& kind : JsonKinds()) {
         EXPECT_EQ(FindMember(kind.value, nullptr), nullptr) << kind.text;
@@ -602,15 +603,15 @@ TEST(FindMemberTest, NullIsNoKey)
     EXPECT_EQ(FindMember(ParseJson(R"({"":1})"), nullptr), nullptr);
 }
 
-TEST(FindMemberTest, AKeyThatGoesOnBehindAZeroByteIsAnother)
+TEST(FindMemberTest, IgnoresAKeyThatGoesOnAfterAZeroByte)
 {
     const Json::Value object = ParseJson(R"({"key\u0000":1,"\u0000":2})");
     EXPECT_EQ(FindMember(object, "key"), nullptr);
     EXPECT_EQ(FindMember(object, ""), nullptr);
 }
 
-// The rows that all sweeps over kinds rely on, held against the JSON library.
-TEST(JsonKindsTest, TheRowsSayWhatTheLibrarySays)
+// The rows of JsonKinds(), which many tests use, compared with jsoncpp.
+TEST(JsonKindsTest, TheRowsAgreeWithJsoncpp)
 {
     for (const JsonKind& kind : JsonKinds()) {
         SCOPED_TRACE(kind.text);
@@ -636,7 +637,7 @@ TEST(JsonKindsTest, TheRowsSayWhatTheLibrarySays)
     }
 }
 
-TEST(AsBoolTest, IsTheLibrarysConversionAndFalseWhereItHasNone)
+TEST(AsBoolTest, ConvertsAsJsoncppDoesOrToFalse)
 {
     for (const JsonKind& kind : JsonKinds()) {
         bool answer = !kind.asBool;
@@ -649,7 +650,7 @@ TEST(AsBoolTest, IsTheLibrarysConversionAndFalseWhereItHasNone)
     EXPECT_FALSE(AsBool(Json::Value(-0.0)));
 }
 
-TEST(AsStringTest, IsTheLibrarysConversionAndEmptyWhereItHasNone)
+TEST(AsStringTest, ConvertsAsJsoncppDoesOrToTheEmptyText)
 {
     for (const JsonKind& kind : JsonKinds()) {
         std::string answer = "earlier";
@@ -661,7 +662,7 @@ TEST(AsStringTest, IsTheLibrarysConversionAndEmptyWhereItHasNone)
     EXPECT_EQ(AsString(Json::Value(infinity)), Json::Value(infinity).asString());
 }
 
-TEST(ClearTest, EmptiesObjectsAndArraysAndMakesAllElseNull)
+TEST(ClearTest, EmptiesObjectsAndArraysAndSetsAllElseToNull)
 {
     for (const JsonKind& kind : JsonKinds()) {
         Json::Value expected;

@@ -1,4 +1,4 @@
-// The log line itself; the lines of the library's operations stand with the operations.
+// The log line itself. The tests of each operation check its lines.
 #include "base/log.h"
 
 #include <syslog.h>
@@ -14,7 +14,7 @@ class LogTest : public LoggedTest {
     LogTest() : LoggedTest("log_test.cpp") {}
 };
 
-TEST_F(LogTest, LevelsHaveTheirWordAndTheirPriority)
+TEST_F(LogTest, ALevelHasAWordAndAPriority)
 {
     DR_LOG(Err, "one");
     DR_LOG(Warn, "two");
@@ -25,7 +25,7 @@ TEST_F(LogTest, LevelsHaveTheirWordAndTheirPriority)
                  Info("TestBody", "four"), Debug("TestBody", "five")});
 }
 
-TEST_F(LogTest, ThePrefixIsFileLineFunctionLevelAndProcess)
+TEST_F(LogTest, ThePrefixHasFileLineFunctionLevelAndProcess)
 {
     DR_LOG(Warn, "%s and %d", "text", 42);
     const std::string line = std::to_string(__LINE__ - 1);
@@ -36,13 +36,13 @@ TEST_F(LogTest, ThePrefixIsFileLineFunctionLevelAndProcess)
                                  std::to_string(::getpid()) + "]: text and 42");
 }
 
-TEST_F(LogTest, AnotherFunctionsNameCanBeGiven)
+TEST_F(LogTest, CanBeWrittenUnderTheNameOfAnotherFunction)
 {
     DR_LOG_AS("GetValue<int>", Info, "here");
     ExpectLines({Info("GetValue<int>", "here")});
 }
 
-TEST_F(LogTest, PercentMIsTheErrnoThatTheCallerMetAndStays)
+TEST_F(LogTest, PrintsTheCallersErrnoAndKeepsIt)
 {
     errno = ENOENT;
     DR_LOG(Err, "errno=%m");
@@ -56,7 +56,7 @@ TEST_F(LogTest, DataIsNeverTheFormat)
     ExpectLines({Err("TestBody", "[%s%n%d]")});
 }
 
-TEST(LogBaseNameTest, IsWhatFollowsTheLastSlash)
+TEST(LogBaseNameTest, IsThePartAfterTheLastSlash)
 {
     EXPECT_STREQ(OrvaDRCore::Log::BaseName("/a/b/file.cpp"), "file.cpp");
     EXPECT_STREQ(OrvaDRCore::Log::BaseName("file.cpp"), "file.cpp");

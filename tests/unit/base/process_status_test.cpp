@@ -1,5 +1,4 @@
-// ReadProcessStatus and IsProcessAlive; what CoreLibProcAlive makes of them is in
-// platform/process_test.cpp.
+// ReadProcessStatus and IsProcessAlive. platform/process_test.cpp tests CoreLibProcAlive.
 #include "base/process_status.h"
 
 #include <gtest/gtest.h>
@@ -43,7 +42,7 @@ TEST_F(ProcessStatusTest, AProcessReadsItsOwnStatus)
     EXPECT_GT(status->start, 0U);
 }
 
-TEST_F(ProcessStatusTest, AnIdOfNobodyHasNoStatusAndIsNotAlive)
+TEST_F(ProcessStatusTest, AnUnusedIdHasNoStatusAndIsNotAlive)
 {
     for (const pid_t pid : {Nobodys, 0, -1}) {
         EXPECT_FALSE(ReadProcessStatus(pid));
@@ -52,7 +51,7 @@ TEST_F(ProcessStatusTest, AnIdOfNobodyHasNoStatusAndIsNotAlive)
     }
 }
 
-TEST_F(ProcessStatusTest, AStatusThatCannotBeReadToItsEndIsNone)
+TEST_F(ProcessStatusTest, AStatusThatCannotBeReadToItsEndCountsAsNone)
 {
     faults.read = [calls = 0](int fd, void* buffer, std::size_t size) mutable -> ssize_t {
         return ++calls == 1 ? RealRead(fd, buffer, size) : Failing(EIO)();
@@ -60,7 +59,7 @@ TEST_F(ProcessStatusTest, AStatusThatCannotBeReadToItsEndIsNone)
     EXPECT_FALSE(ReadProcessStatus(::getpid()));
 }
 
-TEST_F(ProcessStatusTest, AProcessIsToldFromALaterOneByItsStart)
+TEST_F(ProcessStatusTest, TheStartTimeTellsAProcessFromALaterOne)
 {
     const unsigned long long start = ReadProcessStatus(::getpid())->start;
     EXPECT_TRUE(IsProcessAlive(::getpid()));
@@ -81,7 +80,7 @@ TEST_F(ProcessStatusTest, AZombieIsNotAlive)
     EXPECT_FALSE(IsProcessAlive(child.Pid(), status->start));
 }
 
-TEST_F(ProcessStatusTest, WhereProcShowsNobodyAnIdThatIsInUseIsAlive)
+TEST_F(ProcessStatusTest, WithoutProcAnIdInUseIsAlive)
 {
     HideProcesses();
     EXPECT_FALSE(ReadProcessStatus(::getpid()));

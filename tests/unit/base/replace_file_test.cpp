@@ -1,4 +1,4 @@
-// ReplaceFile; what stands on it is in json_file_test.cpp.
+// ReplaceFile. json_file_test.cpp tests toFile, which uses it.
 #include "base/replace_file.h"
 
 #include <fcntl.h>
@@ -41,13 +41,13 @@ using ::testing::MatchesRegex;
 
 constexpr const char* Name = "doc";
 
-// A temporary file of it, whoever writes it.
+// Any temporary file of it.
 constexpr const char* TemporaryName = "doc\\.orvadr-tmp[0-9a-f]{8}\\.[0-9]+\\.[0-9]+\\.[0-9]+";
 
-constexpr pid_t Nobodys = INT_MAX;  // the id of no process
+constexpr pid_t Nobodys = INT_MAX;  // no process has this id
 constexpr std::time_t Hour = 3600;
 
-// Who writes a temporary file, as its name tells.
+// The writer of a temporary file, according to its name.
 struct Writer {
     unsigned int domain;
     pid_t pid;
@@ -68,12 +68,12 @@ unsigned long long StartOf(pid_t pid)
     return status ? status->start : 0;
 }
 
-// Nothing here logs: the fixture fails on every line.
+// Nothing here logs: the fixture fails on any line.
 class ReplaceFileTest : public LoggedTest {
   protected:
     ReplaceFileTest() : LoggedTest("replace_file.cpp") {}
 
-    // Replaces the file. The temporary file that it went through.
+    // Replaces the file and returns the path of the temporary file.
     std::string ReplaceAndTell()
     {
         std::string used;
@@ -87,7 +87,7 @@ class ReplaceFileTest : public LoggedTest {
         return used;
     }
 
-    // This process, as its temporary files tell.
+    // This process as a writer.
     Writer Self()
     {
         const std::string used = ReplaceAndTell();
@@ -113,7 +113,7 @@ ssize_t WriteThreeBytes(int fd, const void* buffer, std::size_t size)
     return RealWrite(fd, buffer, std::min<std::size_t>(size, 3));
 }
 
-// Answers the first call with an error and leaves all others to `rest`.
+// The first call fails with an error, the others are left to `rest`.
 template <class Function>
 auto FailingOnce(int error, Function rest)
 {
@@ -135,7 +135,7 @@ TEST_F(ReplaceFileTest, WritesTheTextByteForByte)
     }
 }
 
-TEST_F(ReplaceFileTest, TheOldFileIsReplacedWholeAndNotWrittenTo)
+TEST_F(ReplaceFileTest, ReplacesTheOldFileWithoutWritingToIt)
 {
     WriteFile(path, "the old text");
     const std::string secondName = dir.File("second name");
@@ -150,7 +150,7 @@ TEST_F(ReplaceFileTest, TheOldFileIsReplacedWholeAndNotWrittenTo)
     EXPECT_EQ(ReadFile(secondName), "the old text");
 }
 
-TEST_F(ReplaceFileTest, TheOldFileStandsUntilTheNewOneIsOnDisk)
+TEST_F(ReplaceFileTest, KeepsTheOldFileUntilTheNewOneIsOnDisk)
 {
     WriteFile(path, "old");
     std::vector<std::string> steps;
@@ -176,7 +176,7 @@ TEST_F(ReplaceFileTest, TheOldFileStandsUntilTheNewOneIsOnDisk)
     EXPECT_EQ(InodeOf(path), flushed);
 }
 
-TEST_F(ReplaceFileTest, ShortWritesAndInterruptionsAreGoneOnFrom)
+TEST_F(ReplaceFileTest, ContinuesAfterShortWritesAndInterruptions)
 {
     WriteFile(path, "old");
     faults.write = FailingOnce(EINTR, WriteThreeBytes);
@@ -184,7 +184,7 @@ TEST_F(ReplaceFileTest, ShortWritesAndInterruptionsAreGoneOnFrom)
     EXPECT_EQ(ReadFile(path), "0123456789");
 }
 
-TEST_F(ReplaceFileTest, ANewFileGetsReadAndWriteForAllLessTheUmask)
+TEST_F(ReplaceFileTest, ANewFileGetsMode0666LessTheUmask)
 {
     for (const mode_t mask : {0U, 0022U, 0077U, 0777U}) {
         const Umask umask(mask);
@@ -194,9 +194,9 @@ TEST_F(ReplaceFileTest, ANewFileGetsReadAndWriteForAllLessTheUmask)
     }
 }
 
-TEST_F(ReplaceFileTest, TheBitsOfTheOldFileStayWhateverTheUmask)
+TEST_F(ReplaceFileTest, KeepsTheBitsOfTheOldFileWhateverTheUmask)
 {
-    // As an ordinary user, too: the kernel then takes the set-user-id bit off what is written to.
+    // Also for an ordinary user, for whom the kernel clears the set-user-id bit of a written file.
     const auto check = [&] {
         for (const mode_t mask : {0U, 0022U, 0077U, 0777U}) {
             for (const mode_t mode : {0600U, 0644U, 0444U, 0666U, 0777U, 01640U, 04755U, 0U}) {
@@ -215,11 +215,11 @@ TEST_F(ReplaceFileTest, TheBitsOfTheOldFileStayWhateverTheUmask)
     CheckAsOrdinaryUser(dir, check);
 }
 
-TEST_F(ReplaceFileTest, OnlyARegularFileHandsItsBitsDown)
+TEST_F(ReplaceFileTest, KeepsOnlyTheBitsOfARegularFile)
 {
     const Umask umask(0022);
     for (const SpecialFile::Kind kind : SpecialFile::Kinds()) {
-        if (kind == SpecialFile::Kind::Directory) continue;  // which no file can replace
+        if (kind == SpecialFile::Kind::Directory) continue;  // a file cannot replace it
         const SpecialFile special(kind, path, "text");
         EXPECT_TRUE(ReplaceFile(path, "new")) << kind;
         EXPECT_EQ(ReadFile(path), "new");
@@ -227,7 +227,7 @@ TEST_F(ReplaceFileTest, OnlyARegularFileHandsItsBitsDown)
     }
 }
 
-TEST_F(ReplaceFileTest, AModeThatIsGivenIsExactAndGoesBeforeTheOldOne)
+TEST_F(ReplaceFileTest, AGivenModeOverridesTheUmaskAndTheOldBits)
 {
     for (const mode_t mask : {0U, 0077U}) {
         for (const mode_t mode : {0600U, 0644U, 0666U, 04755U, 0U}) {
@@ -242,7 +242,7 @@ TEST_F(ReplaceFileTest, AModeThatIsGivenIsExactAndGoesBeforeTheOldOne)
     }
 }
 
-TEST_F(ReplaceFileTest, ASecretIsAtNoTimeReadableByOthers)
+TEST_F(ReplaceFileTest, ASecretIsNeverReadableByOthers)
 {
     WriteFile(path, "old secret");
     ASSERT_EQ(::chmod(path.c_str(), 0600), 0);
@@ -266,7 +266,7 @@ TEST_F(ReplaceFileTest, ASecretIsAtNoTimeReadableByOthers)
     EXPECT_THAT(modes, ElementsAre(0600, 0600));
 }
 
-TEST_F(ReplaceFileTest, AFileThatCannotBeWrittenIsReplaced)
+TEST_F(ReplaceFileTest, ReplacesAFileWithoutWritePermission)
 {
     CheckAsOrdinaryUser(dir, [&] {
         WriteFile(path, "old");
@@ -276,7 +276,7 @@ TEST_F(ReplaceFileTest, AFileThatCannotBeWrittenIsReplaced)
     });
 }
 
-TEST_F(ReplaceFileTest, ALinkInThePlaceOfTheFileIsReplacedAndNotFollowed)
+TEST_F(ReplaceFileTest, ReplacesASymbolicLinkWithoutFollowingIt)
 {
     const std::string target = dir.File("target");
     const auto check = [&] {
@@ -313,7 +313,7 @@ struct Planted {
     std::function<void(const std::string& name)> plant;
 };
 
-TEST_F(ReplaceFileTest, NothingPlantedUnderTheTemporarysNameIsWrittenThrough)
+TEST_F(ReplaceFileTest, NeverWritesThroughWhatHasTheTemporaryName)
 {
     const std::string target = dir.File("target");
     const std::vector<Planted> table = {
@@ -342,23 +342,23 @@ TEST_F(ReplaceFileTest, NothingPlantedUnderTheTemporarysNameIsWrittenThrough)
     }
 }
 
-TEST_F(ReplaceFileTest, WhereEveryNameIsTakenNothingIsReplaced)
+TEST_F(ReplaceFileTest, FailsWhenEveryTemporaryNameIsTaken)
 {
     WriteFile(path, "old");
-    std::size_t tries = 0;
+    std::size_t attempts = 0;
     faults.open = [&](const char* name, int flags, mode_t mode) {
         if ((flags & O_CREAT) == 0) return RealOpen(name, flags, mode);
-        ++tries;
+        ++attempts;
         return Failing(EEXIST)();
     };
     errno = 0;
     EXPECT_FALSE(ReplaceFile(path, "new"));
     EXPECT_EQ(errno, EEXIST);
-    EXPECT_EQ(tries, 10'000U);
+    EXPECT_EQ(attempts, 10'000U);
     EXPECT_EQ(ReadFile(path), "old");
 }
 
-TEST_F(ReplaceFileTest, ThreadsReplaceOneFileAtTheSameTime)
+TEST_F(ReplaceFileTest, ManyThreadsMayReplaceOneFile)
 {
     constexpr int Rounds = 50;
     const std::array<std::string, 8> texts = {"a", "bb", "ccc", "d", "ee", "fff", "g", "hh"};
@@ -374,8 +374,8 @@ TEST_F(ReplaceFileTest, ThreadsReplaceOneFileAtTheSameTime)
     EXPECT_THAT(NamesIn(dir.Path()), ElementsAre(Name));
 }
 
-// Locks fail on some file systems, and on others each machine has its own.
-TEST_F(ReplaceFileTest, NoLockIsTaken)
+// Locks fail on some file systems, and on others each machine has locks of its own.
+TEST_F(ReplaceFileTest, TakesNoLock)
 {
     faults.flock = [](int /*fd*/, int /*operation*/) {
         ADD_FAILURE();
@@ -391,7 +391,7 @@ TEST_F(ReplaceFileTest, NoLockIsTaken)
 
 // ------------------------------------------------------------------------- ReplaceFile: left-overs
 
-TEST_F(ReplaceFileTest, AWriterThatIsKilledAtAnyStepLeavesAFileThatTheNextOneRemoves)
+TEST_F(ReplaceFileTest, TheNextWriterRemovesTheFileOfOneKilledAtAnyStep)
 {
     struct Step {
         const char* name;
@@ -401,7 +401,7 @@ TEST_F(ReplaceFileTest, AWriterThatIsKilledAtAnyStepLeavesAFileThatTheNextOneRem
         {"write",
          [&](auto& halt) {
              faults.write = [&](int fd, const void* buffer, std::size_t size) {
-                 if (size == 8) halt();  // three of the eleven bytes are written
+                 if (size == 8) halt();  // after three of eleven bytes
                  return WriteThreeBytes(fd, buffer, size);
              };
          }},
@@ -450,7 +450,7 @@ TEST_F(ReplaceFileTest, AWriterThatIsKilledAtAnyStepLeavesAFileThatTheNextOneRem
     }
 }
 
-TEST_F(ReplaceFileTest, AWriterThatIsStoppedKeepsItsFileAndCompletesLater)
+TEST_F(ReplaceFileTest, AStoppedWriterKeepsItsFileAndCompletesLater)
 {
     ChildProcess first([&](ChildProcess::Link& link) {
         faults.fsync = [&](int fd) {
@@ -478,7 +478,7 @@ TEST_F(ReplaceFileTest, AWriterThatIsStoppedKeepsItsFileAndCompletesLater)
 
 class LeftOverTest : public ReplaceFileTest {
   protected:
-    // Whether a file of that name goes when its path is replaced.
+    // Whether replacing the path removes a file of that name.
     bool Goes(const std::string& name, std::time_t age = 0)
     {
         WriteFile(name, "left over");
@@ -495,7 +495,7 @@ class LeftOverTest : public ReplaceFileTest {
     const unsigned int otherDomain = domain ^ 1;
 };
 
-TEST_F(LeftOverTest, AFileOfAProcessThatIsGoneGoesAndThatOfALivingOneStays)
+TEST_F(LeftOverTest, AFileOfADeadProcessIsRemovedAndOfALivingOneKept)
 {
     const ChildProcess living([](ChildProcess::Link& link) { link.Await(); });
     ChildProcess zombie([](ChildProcess::Link& /*link*/) {});
@@ -506,7 +506,7 @@ TEST_F(LeftOverTest, AFileOfAProcessThatIsGoneGoesAndThatOfALivingOneStays)
     EXPECT_TRUE(GoesOf({domain, Nobodys, 1}));
     EXPECT_TRUE(GoesOf({domain, Nobodys, 0}));
     EXPECT_TRUE(GoesOf({domain, zombie.Pid(), StartOf(zombie.Pid())}));
-    EXPECT_TRUE(GoesOf({domain, living.Pid(), start + 1}));  // of an earlier process with the id
+    EXPECT_TRUE(GoesOf({domain, living.Pid(), start + 1}));  // an earlier process had the id
     for (const std::time_t age : {0L, 100 * Hour}) {
         EXPECT_FALSE(GoesOf({domain, living.Pid(), start}, age));
         EXPECT_FALSE(GoesOf({domain, living.Pid(), 0}, age));
@@ -514,8 +514,8 @@ TEST_F(LeftOverTest, AFileOfAProcessThatIsGoneGoesAndThatOfALivingOneStays)
     }
 }
 
-// On a network file system, or a volume that containers share, ids say nothing of each other.
-TEST_F(LeftOverTest, AFileOfAnotherMachineOrContainerGoesAfterAnHour)
+// On a network file system, or a volume that containers share, process ids are not unique.
+TEST_F(LeftOverTest, AFileOfAnotherMachineOrContainerIsRemovedAfterAnHour)
 {
     for (const pid_t pid : {Nobodys, ::getpid()}) {
         for (const unsigned int other : {otherDomain, 0U}) {
@@ -523,12 +523,12 @@ TEST_F(LeftOverTest, AFileOfAnotherMachineOrContainerGoesAfterAnHour)
             EXPECT_FALSE(GoesOf(writer));
             EXPECT_FALSE(GoesOf(writer, Hour - 10));
             EXPECT_TRUE(GoesOf(writer, Hour + 10));
-            EXPECT_FALSE(GoesOf(writer, -Hour - 10));  // from the future
+            EXPECT_FALSE(GoesOf(writer, -Hour - 10));  // in the future
         }
     }
 }
 
-TEST_F(LeftOverTest, WhereProcShowsNobodyAnIdThatIsInUseIsAlive)
+TEST_F(LeftOverTest, WithoutProcAnIdInUseIsAlive)
 {
     faults.open = [](const char* name, int flags, mode_t mode) {
         const bool isHidden = std::string(name).rfind("/proc/", 0) == 0;
@@ -539,7 +539,7 @@ TEST_F(LeftOverTest, WhereProcShowsNobodyAnIdThatIsInUseIsAlive)
     EXPECT_FALSE(GoesOf({domain, ::getppid(), 1}));
 }
 
-TEST_F(LeftOverTest, WhereTheDomainCannotBeToldOnlyTheHourCounts)
+TEST_F(LeftOverTest, WithAnUnknownDomainOnlyTheHourCounts)
 {
     faults.readlink = Failing(ENOENT);
     const Writer self{0, ::getpid(), StartOf(::getpid())};
@@ -550,7 +550,7 @@ TEST_F(LeftOverTest, WhereTheDomainCannotBeToldOnlyTheHourCounts)
     }
 }
 
-TEST_F(LeftOverTest, AFileThatIsNotNamedAsOursStays)
+TEST_F(LeftOverTest, AFileWithAnotherKindOfNameStays)
 {
     const std::string dead = TextOf({domain, Nobodys, 1});
     const std::string hex = dead.substr(0, 9);
@@ -594,7 +594,7 @@ TEST_F(LeftOverTest, AFileBesideAnotherPathStays)
     EXPECT_TRUE(Goes(dir.File(Name + ending)));
 }
 
-TEST_F(LeftOverTest, WhatIsNoRegularFileStays)
+TEST_F(LeftOverTest, AnythingButARegularFileStays)
 {
     const std::string target = dir.File("target");
     const std::string name = Temporary({domain, Nobodys, 1});
@@ -614,7 +614,7 @@ TEST_F(LeftOverTest, WhatIsNoRegularFileStays)
     }
 }
 
-TEST_F(LeftOverTest, InTheWorkingDirectoryTheyGoToo)
+TEST_F(LeftOverTest, IsRemovedInTheWorkingDirectoryToo)
 {
     CheckInChild([&] {
         ASSERT_EQ(::chdir(dir.Path().c_str()), 0);
@@ -624,7 +624,7 @@ TEST_F(LeftOverTest, InTheWorkingDirectoryTheyGoToo)
     });
 }
 
-TEST_F(LeftOverTest, WhereTheDirectoryCannotBeListedTheyStayAndTheFileIsReplaced)
+TEST_F(LeftOverTest, StaysInADirectoryThatCannotBeListed)
 {
     const std::string name = Temporary({domain, Nobodys, 1});
     WriteFile(name, "left over");
@@ -637,7 +637,7 @@ TEST_F(LeftOverTest, WhereTheDirectoryCannotBeListedTheyStayAndTheFileIsReplaced
     });
 }
 
-TEST_F(LeftOverTest, ALargeDirectoryIsListedToItsEndOnceASecond)
+TEST_F(LeftOverTest, ALargeDirectoryIsListedCompletelyOnceASecond)
 {
     constexpr unsigned int Looked = 4000;
     constexpr unsigned int More = 100;
@@ -645,7 +645,7 @@ TEST_F(LeftOverTest, ALargeDirectoryIsListedToItsEndOnceASecond)
     for (unsigned int number = 0; number < Looked + More; ++number) {
         WriteFile(Temporary({domain, Nobodys, 1}, number), "");
     }
-    // The names of the directory itself, of its parent and of the file may be among the first.
+    // Among the first names may be those of the directory, its parent and the file.
     const auto left = [this] { return NamesIn(dir.Path()).size() - 1; };
     SetModifyTime(path, std::time(nullptr));
     processes.time = [now = std::time(nullptr)] { return now; };
@@ -657,8 +657,8 @@ TEST_F(LeftOverTest, ALargeDirectoryIsListedToItsEndOnceASecond)
     EXPECT_EQ(left(), 0U);
 }
 
-// It may be taken for a left-over on another machine when it has written for more than an hour.
-TEST_F(LeftOverTest, AWriterWhoseFileWasRemovedPublishesNothingAndTells)
+// Another machine may take it for a left-over after it has written for more than an hour.
+TEST_F(LeftOverTest, AWriterWhoseFileWasRemovedFails)
 {
     WriteFile(path, "old");
     faults.fsync = [&](int fd) {
@@ -676,7 +676,7 @@ TEST_F(LeftOverTest, AWriterWhoseFileWasRemovedPublishesNothingAndTells)
 
 // ----------------------------------------------------------------------- ReplaceFile: the new file
 
-TEST_F(ReplaceFileTest, WhatIsToldOfTheNewFileIsTrueOfItAlsoWhenItsNameIsAnothersByNow)
+TEST_F(ReplaceFileTest, ReturnsTheStatusOfItsOwnFileEvenIfThatWasReplaced)
 {
     struct stat made {};
     ino_t inode = 0;
@@ -719,7 +719,7 @@ std::vector<Fault> Faults()
     };
 }
 
-TEST_F(ReplaceFileTest, AFailureLeavesTheOldFileAndNoTemporary)
+TEST_F(ReplaceFileTest, AFailureLeavesTheOldFileAndNoTemporaryOne)
 {
     WriteFile(path, "old");
     ASSERT_EQ(::chmod(path.c_str(), 0640), 0);
@@ -745,7 +745,7 @@ TEST_F(ReplaceFileTest, AFailureLeavesTheOldFileAndNoTemporary)
     EXPECT_EQ(ReadFile(path), "the new text");
 }
 
-TEST_F(LeftOverTest, ANameOfFullLengthIsReplacedAndItsLeftOversGo)
+TEST_F(LeftOverTest, AFileWithTheLongestNameIsReplacedAndItsLeftOversRemoved)
 {
     path = dir.File(std::string(NAME_MAX, 'n'));
     const std::string beginning = dir.File(std::string(NAME_MAX - 56, 'n'));
@@ -759,8 +759,8 @@ TEST_F(LeftOverTest, ANameOfFullLengthIsReplacedAndItsLeftOversGo)
     EXPECT_EQ(NamesIn(dir.Path()).size(), 1U);
 }
 
-// Each begins while the one before it writes.
-TEST_F(ReplaceFileTest, ANameOfFullLengthServesManyWritersAtOnce)
+// Each writer begins while the one before it writes.
+TEST_F(ReplaceFileTest, ManyThreadsMayReplaceAFileWithTheLongestName)
 {
     constexpr std::size_t Writers = 100;
     const std::string longest = dir.File(std::string(NAME_MAX, 'n'));
@@ -790,7 +790,7 @@ TEST_F(ReplaceFileTest, AFailureMakesNoFileWhereNoneWas)
     EXPECT_THAT(NamesIn(dir.Path()), ElementsAre());
 }
 
-TEST_F(ReplaceFileTest, ErrnoIsTheFailuresAlsoWhenCleaningUpFails)
+TEST_F(ReplaceFileTest, ErrnoIsOfTheFailureEvenIfTheCleanupFails)
 {
     faults.rename = [](const char* from, const char* /*to*/) {
         EXPECT_EQ(::unlink(from), 0);
@@ -801,7 +801,7 @@ TEST_F(ReplaceFileTest, ErrnoIsTheFailuresAlsoWhenCleaningUpFails)
     EXPECT_EQ(errno, EROFS);
 }
 
-TEST_F(ReplaceFileTest, PlacesWhereNoFileCanBeAreRefused)
+TEST_F(ReplaceFileTest, RefusesAPathWhereNoFileCanBe)
 {
     std::filesystem::create_directory(dir.File("dir"));
     WriteFile(dir.File("file"), "a file");
@@ -828,7 +828,7 @@ TEST_F(ReplaceFileTest, PlacesWhereNoFileCanBeAreRefused)
     EXPECT_EQ(ReadFile(dir.File(std::string(250, 'n'))), "old");
 }
 
-TEST_F(ReplaceFileTest, AnEmptyPathIsRefused)
+TEST_F(ReplaceFileTest, RefusesAnEmptyPath)
 {
     CheckInChild([&] {
         ASSERT_EQ(::chdir(dir.Path().c_str()), 0);
@@ -839,7 +839,7 @@ TEST_F(ReplaceFileTest, AnEmptyPathIsRefused)
     });
 }
 
-TEST_F(ReplaceFileTest, ADirectoryThatCannotBeWrittenIsRefused)
+TEST_F(ReplaceFileTest, FailsInADirectoryThatCannotBeWritten)
 {
     CheckAsOrdinaryUser(dir, [&] {
         WriteFile(path, "old");

@@ -8,7 +8,7 @@ namespace {
 
 using OrvaDRCore::Retry;
 
-TEST(RetryTest, ASuccessAtOnceTakesNoPause)
+TEST(RetryTest, AnImmediateSuccessTakesNoPause)
 {
     int pauses = 0;
     const auto outcome = Retry(
@@ -18,45 +18,45 @@ TEST(RetryTest, ASuccessAtOnceTakesNoPause)
     EXPECT_EQ(pauses, 0);
 }
 
-TEST(RetryTest, PausesStandBetweenTriesAndNeverAfterTheLast)
+TEST(RetryTest, PausesBetweenAttemptsAndNotAfterTheLast)
 {
-    int tries = 0;
+    int attempts = 0;
     int pauses = 0;
     const auto outcome = Retry(
-        3, [&] { return ++tries < 0; }, [&] { ++pauses; });
+        3, [&] { return ++attempts < 0; }, [&] { ++pauses; });
     EXPECT_FALSE(outcome.succeeded);
     EXPECT_EQ(outcome.failures, 4U);
-    EXPECT_EQ(tries, 4);
+    EXPECT_EQ(attempts, 4);
     EXPECT_EQ(pauses, 3);
 }
 
-TEST(RetryTest, ALaterSuccessTellsHowManyTriesFailed)
+TEST(RetryTest, ALaterSuccessCountsTheFailures)
 {
-    int tries = 0;
+    int attempts = 0;
     const auto outcome = Retry(
-        5, [&] { return ++tries == 3; }, [] {});
+        5, [&] { return ++attempts == 3; }, [] {});
     EXPECT_TRUE(outcome.succeeded);
     EXPECT_EQ(outcome.failures, 2U);
 }
 
-TEST(RetryTest, ALimitOfZeroTriesOnce)
+TEST(RetryTest, ALimitOfZeroMeansOneAttempt)
 {
-    int tries = 0;
+    int attempts = 0;
     EXPECT_FALSE(Retry(
-                     0, [&] { return ++tries < 0; }, [] {})
+                     0, [&] { return ++attempts < 0; }, [] {})
                      .succeeded);
-    EXPECT_EQ(tries, 1);
+    EXPECT_EQ(attempts, 1);
 }
 
-TEST(RetryTest, TheLargestLimitOfACallerDoesNotWrap)
+TEST(RetryTest, TheLargestLimitDoesNotOverflow)
 {
     constexpr unsigned int Limit = std::numeric_limits<unsigned int>::max();
-    int tries = 0;
+    int attempts = 0;
     const auto outcome = Retry(
-        Limit, [&] { return ++tries == 3; }, [] {});
+        Limit, [&] { return ++attempts == 3; }, [] {});
     EXPECT_TRUE(outcome.succeeded);
     EXPECT_EQ(outcome.failures, 2U);
-    // One try more than the limit can be counted, so that the loop ends and reports the truth.
+    // One attempt more than the limit must still fit the counter, or the loop would not end.
     static_assert(std::numeric_limits<decltype(outcome.failures)>::max() > Limit);
 }
 

@@ -1,5 +1,5 @@
-// The reading side: where a cache lies, when it is stale, what it gives. Refreshing is tested in
-// cache_update_test.cpp.
+// Reading: where a cache lies, when it is stale, what it returns. cache_update_test.cpp tests
+// refreshing.
 #include <orvadrcore/cache.h>
 
 #include <gmock/gmock.h>
@@ -9,6 +9,7 @@
 #include <filesystem>
 #include <limits>
 #include <type_traits>
+#include <utility>
 
 #include "support/fakes/global_locale.h"
 #include "support/fixtures/cache_fixture.h"
@@ -38,7 +39,7 @@ class CacheTest : public CacheFixture {
 
 // ------------------------------------------------------------------------------------------ names
 
-TEST_F(CacheTest, TheCacheFileIsDirectorySlashNameAndSuffix)
+TEST_F(CacheTest, ThePathIsDirectorySlashNameAndSuffix)
 {
     struct Row {
         std::string dir;
@@ -57,7 +58,7 @@ TEST_F(CacheTest, TheCacheFileIsDirectorySlashNameAndSuffix)
     }
 }
 
-TEST_F(CacheTest, ConstructionOpensAndMakesNoFile)
+TEST_F(CacheTest, ConstructionNeitherOpensNorMakesAFile)
 {
     WriteCache("old");
     ForgetOpened();
@@ -67,7 +68,7 @@ TEST_F(CacheTest, ConstructionOpensAndMakesNoFile)
     EXPECT_THAT(NamesIn(dir.Path()), ElementsAre("status.cached"));
 }
 
-TEST_F(CacheTest, AMissingDirectoryIsMadeWithItsParents)
+TEST_F(CacheTest, MakesAMissingDirectoryWithItsParents)
 {
     const Umask umask(0077);
     const TestCache made(dir.File("a/b"), "c", Timeout, false, 0);
@@ -75,7 +76,7 @@ TEST_F(CacheTest, AMissingDirectoryIsMadeWithItsParents)
     EXPECT_THAT(NamesIn(dir.File("a/b")), IsEmpty());
 }
 
-TEST_F(CacheTest, ADirectoryThatIsThereIsLeftAsItIs)
+TEST_F(CacheTest, LeavesAnExistingDirectoryAsItIs)
 {
     ASSERT_EQ(ModeOf(dir.Path()), 0700U);
     EXPECT_FALSE(cache.Load());
@@ -83,7 +84,7 @@ TEST_F(CacheTest, ADirectoryThatIsThereIsLeftAsItIs)
     EXPECT_EQ(ModeOf(dir.Path()), 0700U);
 }
 
-TEST_F(CacheTest, WithoutDirectoryOrNameTheDefaultPathIsUsed)
+TEST_F(CacheTest, WithoutADirectoryOrANameItUsesTheDefaultPath)
 {
     struct Row {
         std::string dir;
@@ -99,7 +100,7 @@ TEST_F(CacheTest, WithoutDirectoryOrNameTheDefaultPathIsUsed)
     EXPECT_FALSE(std::filesystem::exists(dir.File("a")));
 }
 
-TEST_F(CacheTest, WithADirectoryThatCannotBeMadeTheDefaultPathIsUsed)
+TEST_F(CacheTest, WithADirectoryThatCannotBeMadeItUsesTheDefaultPath)
 {
     faults.spawn = FailingToStart(EACCES);
     const TestCache homeless(dir.File("a"), "b", Timeout, false, 0);
@@ -110,7 +111,7 @@ TEST_F(CacheTest, WithADirectoryThatCannotBeMadeTheDefaultPathIsUsed)
                  Debug("Load", "no data is cached in [/tmp/default_dr_cache]")});
 }
 
-TEST_F(CacheTest, AFileInPlaceOfTheDirectoryIsNoDirectory)
+TEST_F(CacheTest, AFileInPlaceOfTheDirectoryIsAFailure)
 {
     WriteFile(dir.File("a"), "");
     const TestCache homeless(dir.File("a"), "b", Timeout, false, 0);
@@ -119,8 +120,8 @@ TEST_F(CacheTest, AFileInPlaceOfTheDirectoryIsNoDirectory)
                  Err("GetCachedPath", "Failed to create [" + dir.File("a") + "]")});
 }
 
-// On purpose, with its lock and its pid file.
-TEST_F(CacheTest, AllCachesWithoutAPathOfTheirOwnShareOneFile)
+// The contract: they share the lock and the pid file, too.
+TEST_F(CacheTest, AllCachesWithTheDefaultPathShareOneFile)
 {
     const std::string lock = "/tmp/.orvadr_lock//tmp/default_dr_cache.lock";
     std::filesystem::create_directories(std::filesystem::path(Place(lock)).parent_path());
@@ -134,16 +135,55 @@ TEST_F(CacheTest, AllCachesWithoutAPathOfTheirOwnShareOneFile)
     for (TestCache* each : {&nameless, &homeless}) {
         EXPECT_EQ(each->GetCachedData(), "shared");
         ForgetOpened();
-        EXPECT_TRUE(each->Update());  // somebody is at it
+        EXPECT_TRUE(each->Update());  // somebody refreshes
         EXPECT_EQ(CountOpened(lock), 1U);
         EXPECT_EQ(CountOpened("/tmp/default_dr_cache.pid"), 1U);
         EXPECT_EQ(each->CountCalls("GetUpdatedData"), 0U);
     }
 }
 
+// ----------------------------------------------------------------------------------------- copies
+
+TEST_F(CacheTest, ACopySharesTheFileAndHasItsOwnMemory)
+{
+    WriteCache("first", Now);
+    EXPECT_EQ(cache.GetCachedData(), "first");
+    const TestCache copy = cache;
+    ForgetOpened();
+    EXPECT_EQ(copy.GetCachedData(), "first");
+    EXPECT_EQ(CountOpened(path), 0U);
+
+    EXPECT_TRUE(cache.UpdateWithData("second"));
+    SetModifyTime(path, Now);
+    EXPECT_EQ(copy.GetCachedData(), "first");
+    SetModifyTime(path, Now + 1);
+    EXPECT_EQ(copy.GetCachedData(), "second");
+}
+
+TEST_F(CacheTest, AssignmentTakesFileAndSettingsOfTheOther)
+{
+    WriteCache("data", Now);
+    TestCache other(dir.Path(), "other", 1, true, 0);
+    EXPECT_FALSE(other.Load());
+    ExpectLines({Debug("Load", "no data is cached in [" + dir.File("other.cached") + "]")});
+    other = cache;
+    EXPECT_TRUE(other.Load());
+    EXPECT_EQ(other.GetCachedData(), "data");
+    EXPECT_FALSE(other.IsUpdatedDataRequired());
+}
+
+TEST_F(CacheTest, ACacheThatWasMovedFromStillWorks)
+{
+    WriteCache("data", Now);
+    EXPECT_EQ(cache.GetCachedData(), "data");
+    const TestCache moved = std::move(cache);
+    EXPECT_EQ(moved.GetCachedData(), "data");
+    EXPECT_EQ(cache.GetCachedData(), "data");  // NOLINT(bugprone-use-after-move): the promise
+}
+
 // -------------------------------------------------------------------------------------- IsTimeout
 
-TEST_F(CacheTest, AFileIsStaleWhenItIsOlderThanTheTimeout)
+TEST_F(CacheTest, AFileOlderThanTheTimeoutIsStale)
 {
     struct Row {
         long timeout;
@@ -155,7 +195,7 @@ TEST_F(CacheTest, AFileIsStaleWhenItIsOlderThanTheTimeout)
         {60, 59, false},
         {60, 60, false},
         {60, 61, true},
-        {60, -1000, false},  // a file from the future
+        {60, -1000, false},  // modified in the future
         {0, 0, false},
         {0, 1, true},
         {-1, 0, true},
@@ -186,7 +226,7 @@ TEST_F(CacheTest, FractionsOfASecondDoNotCount)
     EXPECT_TRUE(cache.IsTimeout());
 }
 
-// A missing file has the time -1: its age is one second more than the clock shows.
+// A missing file has the time -1, so its age is the time of day plus one second.
 TEST_F(CacheTest, AMissingFileIsStale)
 {
     StopClock();
@@ -215,7 +255,7 @@ TEST_F(CacheTest, TimesInTheFileDoNotCount)
     EXPECT_TRUE(cache.IsTimeout());
 }
 
-TEST_F(CacheTest, ADirectoryInPlaceOfTheFileHasAnAgeToo)
+TEST_F(CacheTest, ADirectoryInPlaceOfTheFileHasAnAge)
 {
     StopClock();
     std::filesystem::create_directory(path);
@@ -242,7 +282,7 @@ TEST_F(CacheTest, AFileThatIsNoJsonDocumentCannotBeLoaded)
     }
 }
 
-TEST_F(CacheTest, WhatCannotBeReadCannotBeLoaded)
+TEST_F(CacheTest, AFileThatCannotBeReadCannotBeLoaded)
 {
     std::filesystem::create_directory(path);
     EXPECT_FALSE(cache.Load());
@@ -261,8 +301,8 @@ TEST_F(CacheTest, WhatCannotBeReadCannotBeLoaded)
     ExpectLines({Unreadable()});
 }
 
-// The default path lies in /tmp, where anybody can put one.
-TEST_F(CacheTest, WhatIsNoRegularFileCannotBeLoadedAndIsNotWaitedFor)
+// The default path lies in /tmp, where anybody can put such a thing.
+TEST_F(CacheTest, WhatIsNoRegularFileIsNotLoadedOrWaitedFor)
 {
     for (const SpecialFile::Kind kind : SpecialFile::Kinds()) {
         const SpecialFile special(kind, path, R"({"cached_data":1,"max_updated_time":7})");
@@ -277,8 +317,8 @@ TEST_F(CacheTest, WhatIsNoRegularFileCannotBeLoadedAndIsNotWaitedFor)
     }
 }
 
-// The document holds a real number in any case: how long the refresh took.
-TEST_F(CacheTest, WhatWasWrittenIsLoadedWhereTheDecimalPointIsAComma)
+// Every document holds a real number: the duration of the refresh.
+TEST_F(CacheTest, LoadsWhatItHasWrittenInALocaleWithADecimalComma)
 {
     const GlobalLocale locale(new CommaDecimals);
     EXPECT_TRUE(cache.UpdateWithData(1.234, 100, 103));
@@ -288,7 +328,7 @@ TEST_F(CacheTest, WhatWasWrittenIsLoadedWhereTheDecimalPointIsAComma)
     EXPECT_EQ(another.GetMaxUpdateTime(), 3);
 }
 
-TEST_F(CacheTest, DataOfEveryKindIsLoaded)
+TEST_F(CacheTest, LoadsDataOfEveryType)
 {
     std::time_t modifyTime = Now;
     for (const JsonKind& kind : JsonKinds()) {
@@ -299,7 +339,7 @@ TEST_F(CacheTest, DataOfEveryKindIsLoaded)
     }
 }
 
-// On purpose.
+// The contract.
 TEST_F(CacheTest, ADocumentWithoutDataCountsAsLoadedAndLeavesTheDataInMemory)
 {
     WriteCache("old", Now);
@@ -318,14 +358,14 @@ TEST_F(CacheTest, ADocumentWithoutDataCountsAsLoadedAndLeavesTheDataInMemory)
     EXPECT_EQ(cache.CountCalls("GetDefaultValue"), 0U);
 }
 
-TEST_F(CacheTest, ADocumentWithoutDataLeavesTheNullOfTheBeginning)
+TEST_F(CacheTest, ADocumentWithoutDataLeavesTheInitialNull)
 {
     WriteFile(path, "{}");
     cache.defaultValue = [] { return "default"; };
     EXPECT_EQ(cache.GetCachedData(), Json::Value());
 }
 
-TEST_F(CacheTest, AFailedLoadLeavesDataAndTimeInMemory)
+TEST_F(CacheTest, AFailedLoadKeepsDataAndTime)
 {
     WriteCache("old", Now);
     EXPECT_TRUE(cache.Load());
@@ -344,7 +384,7 @@ TEST_F(CacheTest, AFailedLoadLeavesDataAndTimeInMemory)
     EXPECT_EQ(cache.GetCachedData(), "old");
 }
 
-// The time that counts is the one before the reading: a write in between is noticed.
+// Load() takes the time before it reads, so that a write in between is noticed.
 TEST_F(CacheTest, AFileThatIsReplacedWhileItIsReadIsReadAgain)
 {
     WriteCache("old", Now);
@@ -361,7 +401,7 @@ TEST_F(CacheTest, AFileThatIsReplacedWhileItIsReadIsReadAgain)
 
 // ---------------------------------------------------------------------------------- GetCachedData
 
-TEST_F(CacheTest, WithoutAFileTheDefaultValueIsGiven)
+TEST_F(CacheTest, ReturnsTheDefaultValueWithoutAFile)
 {
     EXPECT_EQ(cache.GetCachedData(), Json::Value());
     ExpectLines({NoData(), UsesDefault()});
@@ -371,7 +411,7 @@ TEST_F(CacheTest, WithoutAFileTheDefaultValueIsGiven)
     EXPECT_THAT(cache.TakeCalls(), ElementsAre("GetDefaultValue", "GetDefaultValue"));
 }
 
-TEST_F(CacheTest, OfAFileThatCannotBeReadTheDefaultValueIsGivenAndReadingIsTriedAgain)
+TEST_F(CacheTest, ReturnsTheDefaultValueForAnUnreadableFileAndReadsItAgain)
 {
     cache.defaultValue = [] { return "default"; };
     WriteFile(path, "{");
@@ -391,7 +431,7 @@ TEST_F(CacheTest, AnUnchangedFileIsReadOnce)
     EXPECT_THAT(cache.TakeCalls(), IsEmpty());
 }
 
-TEST_F(CacheTest, AnotherModificationTimeLaterOrEarlierHasTheFileReadAgain)
+TEST_F(CacheTest, ReadsTheFileAgainWhenItsModificationTimeHasChanged)
 {
     WriteCache("first", Now);
     EXPECT_EQ(cache.GetCachedData(), "first");
@@ -401,8 +441,8 @@ TEST_F(CacheTest, AnotherModificationTimeLaterOrEarlierHasTheFileReadAgain)
     EXPECT_EQ(cache.GetCachedData(), "third");
 }
 
-// On purpose: what counts is the modification time, in whole seconds.
-TEST_F(CacheTest, AnotherContentWithTheSameModificationTimeIsNotNoticed)
+// The contract: only the modification time counts, in whole seconds.
+TEST_F(CacheTest, DoesNotNoticeAChangeWithTheSameModificationTime)
 {
     WriteCache("data", Now);
     EXPECT_EQ(cache.GetCachedData(), "data");
@@ -414,7 +454,7 @@ TEST_F(CacheTest, AnotherContentWithTheSameModificationTimeIsNotNoticed)
     EXPECT_EQ(CountOpened(path), 1U);
 }
 
-TEST_F(CacheTest, WhatIsGivenIsACopy)
+TEST_F(CacheTest, ReturnsACopy)
 {
     WriteCache("data");
     cache.GetCachedData() = "changed";
@@ -423,8 +463,8 @@ TEST_F(CacheTest, WhatIsGivenIsACopy)
     EXPECT_EQ(cache.GetCachedData(), "data");
 }
 
-// On purpose: what is in memory belongs to the time of the last load.
-TEST_F(CacheTest, TheDefaultValueTakesThePlaceOfTheDataInMemory)
+// The contract: the default value goes with the time of the last load.
+TEST_F(CacheTest, TheDefaultValueReplacesTheDataInMemory)
 {
     cache.defaultValue = [] { return "default"; };
     WriteCache("data", Now);
@@ -453,7 +493,7 @@ TEST_F(CacheTest, TheLongestRefreshIsAnIntegerInTheFileOrZero)
         {R"({"max_updated_time":2147483647})", 2147483647},
         {R"({"max_updated_time":2147483648})", 0},
         {R"({"max_updated_time":9223372036854775807})", 0},
-        {R"({"max_updated_time":3.0})", 0},  // on purpose: a real number
+        {R"({"max_updated_time":3.0})", 0},  // a real number: the contract
         {R"({"max_updated_time":3.5})", 0},
         {R"({"max_updated_time":"3"})", 0},
         {R"({"max_updated_time":true})", 0},
@@ -490,28 +530,28 @@ TEST_F(CacheTest, TheLongestRefreshIsReadFromTheFileEachTime)
     WriteFile(path, R"({"cached_data":"other","max_updated_time":8})");
     SetModifyTime(path, Now);
     EXPECT_EQ(cache.GetMaxUpdateTime(), 8);
-    EXPECT_EQ(cache.GetCachedData(), "other");  // nothing was loaded until here
+    EXPECT_EQ(cache.GetCachedData(), "other");  // nothing was loaded before
 }
 
 // -------------------------------------------------------------------------- IsUpdatedDataRequired
 
-TEST_F(CacheTest, UpdatedDataIsRequiredWhenTheConstructorWasToldOrTheDataIsNotValid)
+TEST_F(CacheTest, FreshDataIsRequiredByTheConstructorOrByInvalidData)
 {
     WriteCache("data");
-    for (const bool told : {false, true}) {
+    for (const bool updatedRequired : {false, true}) {
         for (const bool valid : {false, true}) {
-            TestCache each = Another(told);
+            TestCache each = Another(updatedRequired);
             each.isValid = [valid](const Json::Value& data) {
                 EXPECT_EQ(data, "data");
                 return valid;
             };
-            EXPECT_EQ(each.IsUpdatedDataRequired(), told || !valid);
-            EXPECT_EQ(each.CountCalls("IsValidData"), told ? 0U : 1U);
+            EXPECT_EQ(each.IsUpdatedDataRequired(), updatedRequired || !valid);
+            EXPECT_EQ(each.CountCalls("IsValidData"), updatedRequired ? 0U : 1U);
         }
     }
 }
 
-TEST_F(CacheTest, WithoutAFileTheDefaultValueTellsWhetherUpdatedDataIsRequired)
+TEST_F(CacheTest, WithoutAFileFreshDataIsRequiredUnlessTheDefaultIsValid)
 {
     EXPECT_TRUE(cache.IsUpdatedDataRequired());
     ExpectLines({NoData(), UsesDefault()});
@@ -522,11 +562,12 @@ TEST_F(CacheTest, WithoutAFileTheDefaultValueTellsWhetherUpdatedDataIsRequired)
 
 // ------------------------------------------------------------------------------------------- Read
 
-TEST_F(CacheTest, FreshDataIsGivenWithoutARefresh)
+TEST_F(CacheTest, ReturnsFreshDataWithoutARefresh)
 {
     WriteCache("data");
-    for (const bool told : {false, true}) {  // what the constructor was told does not make it stale
-        TestCache each = Another(told);
+    for (const bool updatedRequired :
+         {false, true}) {  // the constructor's flag does not make it stale
+        TestCache each = Another(updatedRequired);
         each.isValid = [](const Json::Value& data) {
             EXPECT_EQ(data, "data");
             return true;
@@ -542,7 +583,7 @@ TEST_F(CacheTest, FreshDataIsGivenWithoutARefresh)
     EXPECT_EQ(CountOpened(pidPath), 0U);
 }
 
-TEST_F(CacheTest, ADefaultValueIsNotFreshBecauseItIsValid)
+TEST_F(CacheTest, AValidDefaultValueIsStillTooOld)
 {
     FailForks(EAGAIN);
     cache.defaultValue = [] { return "default"; };
@@ -552,9 +593,9 @@ TEST_F(CacheTest, ADefaultValueIsNotFreshBecauseItIsValid)
                  UsesOldData()});
 }
 
-// Time-out, validity and need are asked in this order, and no more once one says no. Whether a
-// caller has to wait is another question, asked when the answer is settled.
-TEST_F(CacheTest, TheFirstThingAmissSettlesThatDataIsStale)
+// Age, validity and need are checked in this order, up to the first that says stale. Only then is it
+// asked whether the caller must wait.
+TEST_F(CacheTest, TheFirstReasonForARefreshEndsTheChecks)
 {
     struct Row {
         const char* what;
@@ -597,7 +638,7 @@ TEST_F(CacheTest, TheFirstThingAmissSettlesThatDataIsStale)
     }
 }
 
-TEST_F(CacheTest, ReadGivesTheDataOfTheBeginningWhenTheRefreshFails)
+TEST_F(CacheTest, ReadReturnsTheDataFromBeforeAFailedRefresh)
 {
     TestCache waiting = Another(true);
     waiting.info = [] { return ParseJson(R"({"node":["%s",3.0]})"); };
@@ -617,7 +658,7 @@ TEST_F(CacheTest, ReadGivesTheDataOfTheBeginningWhenTheRefreshFails)
     EXPECT_EQ(waiting.GetCachedData(), "by somebody else");
 }
 
-TEST_F(CacheTest, ReadGivesWhatIsThereAfterTheRefresh)
+TEST_F(CacheTest, ReadReturnsTheDataFromAfterTheRefresh)
 {
     WriteStale("old");
     cache.isRequired = [] { return true; };
@@ -629,7 +670,7 @@ TEST_F(CacheTest, ReadGivesWhatIsThereAfterTheRefresh)
     ExpectLines({Start(), Finish()});
 }
 
-TEST_F(CacheTest, FreshDataInMemoryTakesOneLookAtTheFile)
+TEST_F(CacheTest, FreshDataInMemoryTakesOneStat)
 {
     WriteCache("data");
     EXPECT_EQ(cache.Read(), "data");
@@ -674,7 +715,7 @@ TEST_F(CacheTest, AViewCopiesNothing)
     EXPECT_EQ(seen, given);
 }
 
-TEST_F(CacheTest, AViewOfAChangedFileIsOfTheNewData)
+TEST_F(CacheTest, AViewOfAChangedFileShowsTheNewData)
 {
     StopClock();
     WriteCache("first", Now);
@@ -711,7 +752,7 @@ TEST_F(CacheTest, AViewDecidesAsReadDoes)
     }
 }
 
-TEST_F(CacheTest, ADefaultValueLivesInTheObject)
+TEST_F(CacheTest, AViewMayShowTheDefaultValue)
 {
     FailForks(EAGAIN);
     cache.defaultValue = [] { return "default"; };
@@ -724,7 +765,7 @@ TEST_F(CacheTest, ADefaultValueLivesInTheObject)
     EXPECT_EQ(data, "default");
 }
 
-TEST_F(CacheTest, AViewIsOfWhatIsThereAfterTheRefresh)
+TEST_F(CacheTest, AViewShowsTheDataFromAfterTheRefresh)
 {
     WriteStale("old");
     cache.isRequired = [] { return true; };
@@ -732,7 +773,7 @@ TEST_F(CacheTest, AViewIsOfWhatIsThereAfterTheRefresh)
     ExpectLines({Start(), Finish()});
 }
 
-TEST_F(CacheTest, AViewIsOfTheDataInMemoryWhenTheRefreshFails)
+TEST_F(CacheTest, AViewShowsTheDataInMemoryWhenTheRefreshFails)
 {
     TestCache waiting = Another(true);
     WriteStale("old");
@@ -764,7 +805,7 @@ TEST_F(CacheTest, RemoveDeletesTheCacheFileAndNothingElse)
     EXPECT_THAT(NamesIn(dir.Path()), ElementsAre("status.cached.pid"));
     EXPECT_TRUE(std::filesystem::exists(lockFile));
 
-    WriteFile(path, "garbage");  // the data in memory stays, with its time
+    WriteFile(path, "garbage");  // data and time in memory stay
     SetModifyTime(path, Now);
     EXPECT_EQ(cache.GetCachedData(), "data");
 }
@@ -776,7 +817,7 @@ TEST_F(CacheTest, RemoveOfAMissingFileFails)
     EXPECT_EQ(errno, ENOENT);
 }
 
-TEST_F(CacheTest, AfterRemoveTheDefaultValueIsGiven)
+TEST_F(CacheTest, AfterRemoveTheDefaultValueIsReturned)
 {
     WriteCache("data");
     EXPECT_EQ(cache.GetCachedData(), "data");

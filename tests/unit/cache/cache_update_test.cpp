@@ -1,5 +1,5 @@
-// How a cache gets fresh data: producing and writing, the marking of the updater, refreshes in the
-// background, waiting; and what docs/cache.md says about the files.
+// How a cache gets fresh data: producing, writing, marking the updater, background refreshes,
+// waiting; and what docs/cache.md says about the files.
 #include <orvadrcore/cache.h>
 
 #include <gmock/gmock.h>
@@ -53,7 +53,7 @@ class CacheUpdateTest : public CacheFixture {
 
     bool IsMarked() const { return std::filesystem::exists(pidPath); }
 
-    // The lines of a refresh whose producing failed.
+    // The line of a refresh that could not produce data.
     LogLine ProducedNothing(int limit = 0) const
     {
         return Debug("DoUpdate",
@@ -68,8 +68,8 @@ class CacheUpdateTest : public CacheFixture {
                                            "]");
     }
 
-    // Calls `action` before the flock that is the n-th of the lock file, from 1. Its answer stands
-    // in place of the flock's own, if it gives one.
+    // Calls `action` before the n-th flock() of the lock file, from 1, and before all later ones. Its
+    // result, if any, replaces the call.
     void OnLocking(std::size_t number, const std::function<std::optional<int>()>& action)
     {
         faults.flock = [=](int fd, int operation) {
@@ -80,7 +80,7 @@ class CacheUpdateTest : public CacheFixture {
         };
     }
 
-    // From the n-th opening of the lock file on, from 1, it cannot be opened.
+    // The lock file cannot be opened from the n-th time on, from 1.
     void FailOpeningLock(std::size_t number)
     {
         faults.open = [=, openings = std::size_t{0}](const char* name, int flags,
@@ -110,62 +110,62 @@ std::vector<LogLine> Joined(const std::vector<std::vector<LogLine>>& parts)
 
 // ---------------------------------------------------------------------------- DoUpdate: producing
 
-struct Tries {
+struct Attempts {
     int limit;
-    std::size_t tries;
+    std::size_t attempts;
 };
 
-// One try more than the limit says, and then one more; a single one when it is negative.
-constexpr std::array<Tries, 5> TriesByLimit{{{0, 2}, {1, 3}, {3, 5}, {-1, 1}, {MinInt, 1}}};
+// The contract: the limit plus two attempts, or a single one if it is negative.
+constexpr std::array<Attempts, 5> AttemptsByLimit{{{0, 2}, {1, 3}, {3, 5}, {-1, 1}, {MinInt, 1}}};
 
-TEST_F(CacheUpdateTest, ProducingIsTriedUntilTheLimitIsReached)
+TEST_F(CacheUpdateTest, ProducingIsRetriedUpToTheLimit)
 {
     WriteCache("old");
     const std::string before = ReadFile(path);
-    for (const Tries& row : TriesByLimit) {
+    for (const Attempts& row : AttemptsByLimit) {
         SCOPED_TRACE(row.limit);
         TestCache each = Another(false, row.limit);
         each.produce = [](Json::Value& data) {
-            EXPECT_EQ(data, Json::Value());  // anew for each try
+            EXPECT_EQ(data, Json::Value());  // for each attempt
             data["left"] = "behind";
             return false;
         };
         EXPECT_FALSE(each.DoUpdate());
-        EXPECT_EQ(each.CountCalls("GetUpdatedData"), row.tries);
-        ExpectPauses(row.tries - 1, ShortestProducePause);
+        EXPECT_EQ(each.CountCalls("GetUpdatedData"), row.attempts);
+        ExpectPauses(row.attempts - 1, ShortestProducePause);
         ExpectLines({ProducedNothing(row.limit)});
     }
     EXPECT_EQ(ReadFile(path), before);
 }
 
-TEST_F(CacheUpdateTest, AProducingThatSucceedsLaterTakesNoFurtherTriesAndIsSilent)
+TEST_F(CacheUpdateTest, AProductionThatSucceedsLaterEndsTheRetriesWithoutALogLine)
 {
     for (const int limit : {1, 3, MaxInt}) {
         TestCache each = Another(false, limit);
-        int tries = 0;
+        int attempts = 0;
         each.produce = [&](Json::Value& data) {
             EXPECT_EQ(data, Json::Value());
-            data = ++tries;
-            return tries == 3;
+            data = ++attempts;
+            return attempts == 3;
         };
         EXPECT_TRUE(each.DoUpdate());
-        EXPECT_EQ(tries, 3);
+        EXPECT_EQ(attempts, 3);
         ExpectPauses(2, ShortestProducePause);
         EXPECT_EQ(Document()["cached_data"], 3);
     }
 }
 
-TEST_F(CacheUpdateTest, TheRecordedTimesCoverAllTriesAndPauses)
+TEST_F(CacheUpdateTest, TheRecordedTimesIncludeAllAttemptsAndPauses)
 {
     std::time_t now = 5'000'000'000;
     processes.time = [&] { return now; };
     pauses.OnPause([&](std::size_t /*number*/) { now += 10; });
     TestCache each = Another(false, 2);
-    int tries = 0;
+    int attempts = 0;
     each.produce = [&](Json::Value& data) {
         now += 1;
         data = "new";
-        return ++tries == 3;
+        return ++attempts == 3;
     };
     EXPECT_TRUE(each.DoUpdate());
     EXPECT_TRUE(Same(Document()["begin_time_to_update"], Json::Int64{5'000'000'000}));
@@ -191,7 +191,7 @@ TEST_F(CacheUpdateTest, InvalidDataIsNotProducedAgain)
     EXPECT_EQ(ReadFile(path), before);
 }
 
-TEST_F(CacheUpdateTest, DoUpdateByItselfTakesNoLockAndMarksNothing)
+TEST_F(CacheUpdateTest, DoUpdateTakesNoLockAndSetsNoMark)
 {
     cache.produce = [this](Json::Value& data) {
         EXPECT_FALSE(IsMarked());
@@ -263,7 +263,7 @@ TEST_F(CacheUpdateTest, WithoutTimesZerosAreWrittenAndTheLongestRefreshStays)
               R"("info":"test cache","max_updated_time":12,"timeout":60,"updated_time":0.0})");
 }
 
-TEST_F(CacheUpdateTest, TheLongestRefreshIsKeptAndRaised)
+TEST_F(CacheUpdateTest, TheLongestRefreshOnlyIncreases)
 {
     struct Row {
         const char* before;
@@ -276,7 +276,7 @@ TEST_F(CacheUpdateTest, TheLongestRefreshIsKeptAndRaised)
         {R"({"max_updated_time":7})", 8, 8},
         {R"({"max_updated_time":7})", -8, 7},
         {R"({"max_updated_time":-5})", 0, 0},
-        {R"({"max_updated_time":7.0})", 3, 3},  // on purpose: a real number counts as 0
+        {R"({"max_updated_time":7.0})", 3, 3},  // a real number counts as 0: the contract
         {R"({"max_updated_time":"7"})", 3, 3},
         {"{}", 3, 3},
         {"{}", -3, 0},
@@ -294,7 +294,7 @@ TEST_F(CacheUpdateTest, TheLongestRefreshIsKeptAndRaised)
     }
 }
 
-TEST_F(CacheUpdateTest, TheLongestRefreshOfTheFileThatTheObjectHasLoadedOrWrittenStays)
+TEST_F(CacheUpdateTest, KeepsTheLongestRefreshOfAFileItHasLoadedOrWritten)
 {
     WriteFile(path, R"({"cached_data":"data","max_updated_time":7})");
     EXPECT_TRUE(cache.Load());
@@ -306,8 +306,8 @@ TEST_F(CacheUpdateTest, TheLongestRefreshOfTheFileThatTheObjectHasLoadedOrWritte
     EXPECT_EQ(cache.GetMaxUpdateTime(), 9);
 }
 
-// As on a file system whose clock goes on in large steps.
-TEST_F(CacheUpdateTest, AnEditInPlaceThatNoTimeShowsIsSeen)
+// As on a file system with a coarse clock.
+TEST_F(CacheUpdateTest, NoticesAnEditThatLeavesTheModificationTime)
 {
     std::vector<std::function<bool()>> ways = {
         [&] { return cache.UpdateWithData("data", 100, 105); }, [&] { return cache.Load(); }};
@@ -332,7 +332,7 @@ TEST_F(CacheUpdateTest, AnEditInPlaceThatNoTimeShowsIsSeen)
     }
 }
 
-TEST_F(CacheUpdateTest, TheLongestRefreshIsTakenFromWhateverElseTheFileIsByNow)
+TEST_F(CacheUpdateTest, TakesTheLongestRefreshFromAFileChangedBySomebodyElse)
 {
     struct Row {
         const char* what;
@@ -372,7 +372,7 @@ TEST_F(CacheUpdateTest, TheLongestRefreshIsTakenFromWhateverElseTheFileIsByNow)
     }
 }
 
-TEST_F(CacheUpdateTest, AWriteThatFailsIsNotTheFileThatIsKnown)
+TEST_F(CacheUpdateTest, AFailedWriteDoesNotChangeTheLongestRefresh)
 {
     EXPECT_TRUE(cache.UpdateWithData("data", 100, 105));
     faults.rename = Failing(EROFS);
@@ -383,7 +383,7 @@ TEST_F(CacheUpdateTest, AWriteThatFailsIsNotTheFileThatIsKnown)
     EXPECT_EQ(Document()["max_updated_time"], 5);
 }
 
-TEST_F(CacheUpdateTest, InvalidDataIsRefusedAndLeavesTheFile)
+TEST_F(CacheUpdateTest, RefusesInvalidDataAndLeavesTheFile)
 {
     cache.isValid = [](const Json::Value& data) { return data.isString(); };
     cache.info = [] { return ParseJson(R"({"%d":["ä"]})"); };
@@ -405,7 +405,7 @@ TEST_F(CacheUpdateTest, InvalidDataIsRefusedAndLeavesTheFile)
     ExpectPauses(0, 0);
 }
 
-TEST_F(CacheUpdateTest, WhatWasWrittenIsInMemory)
+TEST_F(CacheUpdateTest, KeepsWhatItHasWrittenInMemory)
 {
     WriteStale("old");
     EXPECT_EQ(cache.GetCachedData(), "old");
@@ -419,26 +419,26 @@ TEST_F(CacheUpdateTest, WhatWasWrittenIsInMemory)
     EXPECT_EQ(cache.GetCachedData(), "by somebody else");
 }
 
-TEST_F(CacheUpdateTest, WritingIsTriedUntilTheLimitIsReached)
+TEST_F(CacheUpdateTest, WritingIsRetriedUpToTheLimit)
 {
     WriteCache("old", 1'000'000);
     const std::string before = ReadFile(path);
-    std::size_t tries = 0;
+    std::size_t attempts = 0;
     faults.fsync = [&](int /*fd*/) {
-        ++tries;
+        ++attempts;
         return Failing(EIO)();
     };
-    for (const Tries& row : TriesByLimit) {
+    for (const Attempts& row : AttemptsByLimit) {
         SCOPED_TRACE(row.limit);
         TestCache each = Another(false, row.limit);
         EXPECT_EQ(each.GetCachedData(), "old");
-        tries = 0;
+        attempts = 0;
         EXPECT_FALSE(each.UpdateWithData("new"));
-        EXPECT_EQ(tries, row.tries);
-        ExpectPauses(row.tries - 1, ShortestWritePause);
+        EXPECT_EQ(attempts, row.attempts);
+        ExpectPauses(row.attempts - 1, ShortestWritePause);
         ExpectLines({WroteNothing(row.limit)});
         ForgetOpened();
-        EXPECT_EQ(each.GetCachedData(), "old");  // the memory is as the file
+        EXPECT_EQ(each.GetCachedData(), "old");  // as in the file
         EXPECT_EQ(CountOpened(path), 0U);
         EXPECT_EQ(each.CountCalls("IsValidData"), 1U);
     }
@@ -446,16 +446,16 @@ TEST_F(CacheUpdateTest, WritingIsTriedUntilTheLimitIsReached)
     EXPECT_THAT(NamesIn(dir.Path()), ElementsAre("status.cached"));
 }
 
-TEST_F(CacheUpdateTest, AWriteThatSucceedsLaterTakesNoFurtherTriesAndIsSilent)
+TEST_F(CacheUpdateTest, AWriteThatSucceedsLaterEndsTheRetriesWithoutALogLine)
 {
     for (const int limit : {1, 3, MaxInt}) {
-        int tries = 0;
+        int attempts = 0;
         faults.rename = [&](const char* from, const char* to) {
-            return ++tries == 3 ? RealRename(from, to) : Failing(EIO)();
+            return ++attempts == 3 ? RealRename(from, to) : Failing(EIO)();
         };
         const TestCache each = Another(false, limit);
         EXPECT_TRUE(each.UpdateWithData(limit));
-        EXPECT_EQ(tries, 3);
+        EXPECT_EQ(attempts, 3);
         ExpectPauses(2, ShortestWritePause);
         EXPECT_EQ(each.GetCachedData(), limit);
     }
@@ -470,7 +470,7 @@ TEST_F(CacheUpdateTest, ADirectoryInPlaceOfTheFileCannotBeReplaced)
     EXPECT_THAT(NamesIn(dir.Path()), ElementsAre("status.cached"));
 }
 
-TEST_F(CacheUpdateTest, WhatIsNoRegularFileIsReplacedByOneThatIs)
+TEST_F(CacheUpdateTest, ReplacesWhatIsNoRegularFileByOne)
 {
     const Umask umask(0022);
     for (const SpecialFile::Kind kind : SpecialFile::Kinds()) {
@@ -493,7 +493,7 @@ class UnreadableDataTest : public CacheUpdateTest {
   protected:
     UnreadableDataTest() { WriteCache("old", std::time(nullptr) - 10); }
 
-    // Whether the data is written, and loaded by another object. Otherwise all is as it was before.
+    // Whether the data is written and can be loaded by another object. If not, nothing has changed.
     bool IsWritten(const Json::Value& data)
     {
         const std::string before = ReadFile(path);
@@ -517,8 +517,8 @@ class UnreadableDataTest : public CacheUpdateTest {
     }
 };
 
-// The document around them is a level of its own.
-TEST_F(UnreadableDataTest, WhatNestsTooDeepIsRefused)
+// The document around the value is one level.
+TEST_F(UnreadableDataTest, NestingTooDeepIsRefused)
 {
     for (const Json::Value& innermost : {Json::Value(Json::arrayValue), Json::Value(1)}) {
         EXPECT_TRUE(IsWritten(Nested(998, innermost)));
@@ -559,7 +559,7 @@ TEST_F(UnreadableDataTest, NotANumberIsWrittenAsNull)
     EXPECT_TRUE(Same(Another(false).GetCachedData(), ParseJson(R"({"a":null})")));
 }
 
-TEST_F(UnreadableDataTest, WhatIsProducedIsRefusedLikewiseAndNotProducedAgain)
+TEST_F(UnreadableDataTest, ProducedDataThatIsRefusedIsNotProducedAgain)
 {
     TestCache each = Another(true, 3);
     each.produce = [](Json::Value& data) {
@@ -577,11 +577,11 @@ TEST_F(UnreadableDataTest, WhatIsProducedIsRefusedLikewiseAndNotProducedAgain)
     EXPECT_EQ(ReadFile(path), before);
 }
 
-// Neither a copy of it nor its text could be made: the stack would not do.
-TEST_F(UnreadableDataTest, OfWhatNestsMonstrouslyNoTextIsMade)
+// Copying it, or making its text, would overflow the stack.
+TEST_F(UnreadableDataTest, AValueThatWouldOverflowTheStackIsLoggedWithoutItsText)
 {
     CheckInChild([this] {
-        // Nor could it be destroyed.
+        // Destroying it would, too.
         static const Json::Value& data = *new Json::Value(Nested(1'000'000));
         const auto refused = Debug("UpdateWithData",
                                    "[(nested too deep)] is not valid to update "
@@ -595,11 +595,12 @@ TEST_F(UnreadableDataTest, OfWhatNestsMonstrouslyNoTextIsMade)
     });
 }
 
-// ----------------------------------------------------------------------------------- three pauses
+// ----------------------------------------------------------------------------------------- pauses
 
-TEST_F(CacheUpdateTest, PausesAreSpreadOverTheWholeOfTheirRange)
+TEST_F(CacheUpdateTest, PausesAreSpreadOverTheirWholeRange)
 {
-    constexpr std::size_t Count = 200;  // so many miss a tenth of a second of it once in 10^13 runs
+    constexpr std::size_t Count =
+        200;  // with so many, a tenth of a second stays empty once in 10^13 runs
     std::size_t from = 0;
     const auto expectSpread = [&](unsigned int shortest) {
         const std::vector<unsigned int> taken(pauses.Taken().begin() + static_cast<long>(from),
@@ -681,7 +682,7 @@ TEST_F(CacheUpdateTest, DuringARefreshTheCacheIsMarkedAndNoLockIsHeld)
     ExpectSleeps(0);
 }
 
-// A program that another thread starts at that moment inherits the descriptor.
+// A program that another thread starts meanwhile inherits the descriptor.
 TEST_F(CacheUpdateTest, EveryLockIsUnlockedBeforeItsFileIsClosed)
 {
     std::set<int> held;
@@ -732,8 +733,8 @@ TEST_F(CacheUpdateTest, ALockOnDescriptorZeroIsUnlockedToo)
     });
 }
 
-// The shared locks are those of others who look, and shut out nobody who looks.
-TEST_F(CacheUpdateTest, LookingExcludesNobodyWhoLooks)
+// Readers of the mark take the lock shared.
+TEST_F(CacheUpdateTest, ReadingTheMarkExcludesNoOtherReader)
 {
     std::optional<HeldLock> look;
     waiting.produce = [&](Json::Value& data) {
@@ -747,7 +748,7 @@ TEST_F(CacheUpdateTest, LookingExcludesNobodyWhoLooks)
     ExpectSleeps(0);
 }
 
-TEST_F(CacheUpdateTest, ARefreshThatFailsIsToldAndUnmarked)
+TEST_F(CacheUpdateTest, AFailedRefreshIsLoggedAndUnmarked)
 {
     struct Row {
         const char* what;
@@ -784,7 +785,7 @@ TEST_F(CacheUpdateTest, ARefreshThatFailsIsToldAndUnmarked)
     }
 }
 
-TEST_F(CacheUpdateTest, AnExceptionGoesToTheCallerBehindTheRemovalOfThePidFile)
+TEST_F(CacheUpdateTest, TheCallerGetsAnExceptionAfterThePidFileIsRemoved)
 {
     WriteStale("old");
     waiting.produce = [this](Json::Value& /*data*/) -> bool {
@@ -813,7 +814,7 @@ TEST_F(CacheUpdateTest, WithoutTheMarkingLockThereIsNoRefresh)
 {
     WriteStale("old");
     NoteLocking();
-    const HeldLock look(lockFile, LOCK_SH);  // lets others look, but not mark
+    const HeldLock look(lockFile, LOCK_SH);  // others can read the mark, but not set it
     EXPECT_EQ(waiting.Read(), "old");
     EXPECT_THAT(locking, ElementsAre(Probe, Probe, Mark, Mark, Mark, Mark, Mark, Mark));
     ExpectSleeps(5);
@@ -822,11 +823,11 @@ TEST_F(CacheUpdateTest, WithoutTheMarkingLockThereIsNoRefresh)
     EXPECT_FALSE(IsMarked());
 }
 
-TEST_F(CacheUpdateTest, AMarkingLockThatBecomesFreeIsTakenByTheNextTry)
+TEST_F(CacheUpdateTest, TheNextAttemptTakesAMarkingLockThatHasBecomeFree)
 {
     std::optional<HeldLock> look;
     look.emplace(lockFile, LOCK_SH);
-    OnLocking(5, [&] {  // the third try to mark
+    OnLocking(5, [&] {  // the third attempt to mark
         look.reset();
         return std::nullopt;
     });
@@ -836,7 +837,7 @@ TEST_F(CacheUpdateTest, AMarkingLockThatBecomesFreeIsTakenByTheNextTry)
     ExpectLines({Start(), Finish()});
 }
 
-TEST_F(CacheUpdateTest, AMarkingLockThatCannotBeOpenedIsToldByTheLockToo)
+TEST_F(CacheUpdateTest, AMarkingLockThatCannotBeOpenedIsLoggedByTheLockToo)
 {
     FailOpeningLock(3);
     EXPECT_FALSE(waiting.Update());
@@ -846,7 +847,7 @@ TEST_F(CacheUpdateTest, AMarkingLockThatCannotBeOpenedIsToldByTheLockToo)
     EXPECT_FALSE(IsMarked());
 }
 
-TEST_F(CacheUpdateTest, WhoeverGetsThereFirstBetweenLookingAndLookingAgainIsLeftAlone)
+TEST_F(CacheUpdateTest, AnUpdaterThatAppearsBetweenTheTwoChecksIsLeftAlone)
 {
     ChildProcess updater = Updater();
     ASSERT_TRUE(updater.Await());
@@ -856,13 +857,13 @@ TEST_F(CacheUpdateTest, WhoeverGetsThereFirstBetweenLookingAndLookingAgainIsLeft
         WriteFile(pidPath, marked);
         return std::nullopt;
     });
-    EXPECT_FALSE(waiting.Update());  // without a line
+    EXPECT_FALSE(waiting.Update());  // without a log line
     EXPECT_THAT(locking, ElementsAre(Probe, Probe));
     EXPECT_EQ(waiting.CountCalls("GetUpdatedData"), 0U);
     EXPECT_EQ(ReadFile(pidPath), marked);
 }
 
-TEST_F(CacheUpdateTest, WhoeverGetsThereFirstBetweenLookingAndMarkingIsLeftAlone)
+TEST_F(CacheUpdateTest, AnUpdaterThatAppearsBeforeTheMarkingIsLeftAlone)
 {
     ChildProcess updater = Updater();
     ASSERT_TRUE(updater.Await());
@@ -885,7 +886,7 @@ TEST_F(CacheUpdateTest, WhoeverGetsThereFirstBetweenLookingAndMarkingIsLeftAlone
 TEST_F(CacheUpdateTest, WithoutAPidFileThereIsNoRefresh)
 {
     WriteStale("old");
-    std::filesystem::create_directory(pidPath);  // nothing can take its place
+    std::filesystem::create_directory(pidPath);  // no file can replace it
     EXPECT_EQ(waiting.Read(), "old");
     ExpectLines(
         {Debug("SetUpdating", "Failed to set cache [" + path + "] updating"), UsesOldData()});
@@ -896,7 +897,7 @@ TEST_F(CacheUpdateTest, WithoutAPidFileThereIsNoRefresh)
 
 // -------------------------------------------------------------------------------------- unmarking
 
-TEST_F(CacheUpdateTest, APidFileThatIsByNowAnotherLivingProcessesStays)
+TEST_F(CacheUpdateTest, KeepsTheMarkOfAnotherLivingProcess)
 {
     ChildProcess updater = Updater();
     ASSERT_TRUE(updater.Await());
@@ -916,17 +917,17 @@ TEST_F(CacheUpdateTest, APidFileThatIsByNowAnotherLivingProcessesStays)
     EXPECT_EQ(Document()["cached_data"], "new");
 }
 
-TEST_F(CacheUpdateTest, TheFirstProcessOfAllIsAnUpdaterLikeAnyOther)
+TEST_F(CacheUpdateTest, ProcessOneIsAnUpdaterLikeAnyOther)
 {
-    WriteStale();  // with data that is there nobody waits
+    WriteStale();  // with cached data nobody waits
     WriteFile(pidPath, "1");
-    FailForks(EAGAIN);  // no refresh of its own could begin
+    FailForks(EAGAIN);  // it could not refresh by itself
     EXPECT_TRUE(cache.Update());
     EXPECT_TRUE(IsMarked());
     ExpectLines({});
 }
 
-TEST_F(CacheUpdateTest, AFileThatADefaultValueBringsAlongIsAsYoungAsItIs)
+TEST_F(CacheUpdateTest, AFileWrittenByGetDefaultValueCountsAsFresh)
 {
     cache.defaultValue = [&] {
         WriteCache("written meanwhile");
@@ -939,7 +940,7 @@ TEST_F(CacheUpdateTest, AFileThatADefaultValueBringsAlongIsAsYoungAsItIs)
          Debug("GetCachedData", "Failed to load cache [" + path + "], use default cache data")});
 }
 
-TEST_F(CacheUpdateTest, APidFileThatIsByNowNobodysIsRemoved)
+TEST_F(CacheUpdateTest, RemovesAMarkThatNamesNoLivingProcess)
 {
     const ChildProcess somebody([](ChildProcess::Link& link) { link.Await(); });
     const std::string reused = std::to_string(somebody.Pid()) + "\n1\n";
@@ -962,8 +963,8 @@ TEST_F(CacheUpdateTest, APidFileThatIsByNowNobodysIsRemoved)
     ExpectLines({Start(), Finish()});
 }
 
-// On purpose: to all others, and to itself, this process is updating for as long as it lives.
-TEST_F(CacheUpdateTest, WithoutTheLockThePidFileStaysWithoutALine)
+// The contract: for all others, and for itself, this process is the updater as long as it lives.
+TEST_F(CacheUpdateTest, WithoutTheLockTheMarkStaysAndNothingIsLogged)
 {
     NoteLocking();
     std::optional<HeldLock> other;
@@ -987,7 +988,7 @@ TEST_F(CacheUpdateTest, WithoutTheLockThePidFileStaysWithoutALine)
     EXPECT_EQ(waiting.CountCalls("GetUpdatedData"), 0U);
 }
 
-TEST_F(CacheUpdateTest, ALockThatCannotBeOpenedAnyMoreLeavesThePidFileToo)
+TEST_F(CacheUpdateTest, ALockThatCanNoLongerBeOpenedLeavesTheMark)
 {
     FailOpeningLock(4);
     EXPECT_TRUE(waiting.Update());
@@ -995,7 +996,7 @@ TEST_F(CacheUpdateTest, ALockThatCannotBeOpenedAnyMoreLeavesThePidFileToo)
     EXPECT_TRUE(IsMarked());
 }
 
-TEST_F(CacheUpdateTest, WhereThePidCannotBeLookedAtForTheLockAPidFileThatIsGoneIsAnothers)
+TEST_F(CacheUpdateTest, WithoutTheSecondLockAMissingMarkCountsAsAnothers)
 {
     OnLocking(5, [] { return Failing(EWOULDBLOCK)(); });
     waiting.produce = [&](Json::Value& data) {
@@ -1014,12 +1015,12 @@ TEST_F(CacheUpdateTest, WhereThePidCannotBeLookedAtForTheLockAPidFileThatIsGoneI
     };
     locking.clear();
     EXPECT_TRUE(waiting.Update());
-    ExpectLines({Start(), Finish()});  // the pid file is this process's own
+    ExpectLines({Start(), Finish()});  // the pid file names this process
     EXPECT_FALSE(IsMarked());
     ExpectSleeps(5);
 }
 
-// --------------------------------------------------------------------------- is somebody updating?
+// ------------------------------------------------------------------------------ is there an updater
 
 TEST_F(CacheUpdateTest, APidFileOfNoLivingProcessCountsAsNone)
 {
@@ -1050,7 +1051,7 @@ TEST_F(CacheUpdateTest, APidFileOfNoLivingProcessCountsAsNone)
 TEST_F(CacheUpdateTest, APidFileThatIsNoRegularFileCountsAsNone)
 {
     for (const SpecialFile::Kind kind : SpecialFile::Kinds()) {
-        if (kind == SpecialFile::Kind::Directory) continue;  // which none of its own can replace
+        if (kind == SpecialFile::Kind::Directory) continue;  // a pid file cannot replace it
         WriteStale("old");
         const SpecialFile special(kind, pidPath, std::to_string(::getppid()) + "\n");
         CheckInChild([&] {
@@ -1070,7 +1071,7 @@ TEST_F(CacheUpdateTest, APidFileThatCannotBeReadToItsEndCountsAsNone)
     for (const std::size_t readable : {std::size_t{0}, std::size_t{1}, size}) {
         bool failed = false;
         faults.read = [&](int fd, void* buffer, std::size_t most) -> ssize_t {
-            if (most > 64) return RealRead(fd, buffer, most);  // not of a pid file
+            if (most > 64) return RealRead(fd, buffer, most);  // of another file
             if (std::exchange(failed, true) || readable == 0) return Failing(EIO)();
             return RealRead(fd, buffer, readable);
         };
@@ -1078,7 +1079,7 @@ TEST_F(CacheUpdateTest, APidFileThatCannotBeReadToItsEndCountsAsNone)
     }
 }
 
-TEST_F(CacheUpdateTest, APidFileThatIsReadByteByByteIsReadWhole)
+TEST_F(CacheUpdateTest, APidFileIsReadWholeByteByByte)
 {
     WriteStale("old");
     ChildProcess updater = Updater();
@@ -1088,11 +1089,11 @@ TEST_F(CacheUpdateTest, APidFileThatIsReadByteByByteIsReadWhole)
         return RealRead(fd, buffer, std::min<std::size_t>(size, 1));
     };
     FailForks(EAGAIN);
-    EXPECT_EQ(cache.Read(), "old");  // somebody is at it
+    EXPECT_EQ(cache.Read(), "old");  // somebody refreshes
     EXPECT_EQ(ReadFile(pidPath), marked);
 }
 
-TEST_F(CacheUpdateTest, AZombieUpdatesNothing)
+TEST_F(CacheUpdateTest, AZombieIsNoUpdater)
 {
     WriteStale("old");
     ChildProcess updater = Updater();
@@ -1104,7 +1105,7 @@ TEST_F(CacheUpdateTest, AZombieUpdatesNothing)
     ExpectLines({Start(), Finish()});
 }
 
-TEST_F(CacheUpdateTest, WhileALivingProcessUpdatesOldDataIsGivenAndNothingIsStarted)
+TEST_F(CacheUpdateTest, ReturnsOldDataWhileALivingProcessUpdates)
 {
     WriteStale("old");
     NoteLocking();
@@ -1137,7 +1138,7 @@ TEST_F(CacheUpdateTest, ALockThatCannotBeTakenLooksLikeAnUpdater)
     EXPECT_EQ(CountOpened(pidPath), 0U);
 }
 
-TEST_F(CacheUpdateTest, ALockThatBecomesFreeIsLookedThrough)
+TEST_F(CacheUpdateTest, ReadsTheMarkOnceTheLockBecomesFree)
 {
     std::optional<HeldLock> other;
     other.emplace(lockFile, LOCK_EX);
@@ -1179,7 +1180,7 @@ TEST_F(CacheUpdateTest, ALockDirectoryThatCannotBeMadeLooksLikeAnUpdater)
 
 // --------------------------------------------------------------------- a refresh in the background
 
-TEST_F(CacheUpdateTest, ABackgroundReadGivesTheOldDataAtOnceAndAChildWritesTheNew)
+TEST_F(CacheUpdateTest, ABackgroundReadReturnsOldDataAndAChildWritesTheNew)
 {
     CheckInBackground([this] {
         WriteStale("old");
@@ -1199,7 +1200,7 @@ TEST_F(CacheUpdateTest, ABackgroundReadGivesTheOldDataAtOnceAndAChildWritesTheNe
     });
 }
 
-TEST_F(CacheUpdateTest, ASecondReaderMeanwhileStartsNothing)
+TEST_F(CacheUpdateTest, ASecondReaderStartsNoRefresh)
 {
     CheckInBackground([this] {
         WriteStale("old");
@@ -1224,7 +1225,7 @@ TEST_F(CacheUpdateTest, ASecondReaderMeanwhileStartsNothing)
     });
 }
 
-TEST_F(CacheUpdateTest, TheChildLooksAgainBeforeItRefreshes)
+TEST_F(CacheUpdateTest, TheChildChecksForAnUpdaterAgain)
 {
     CheckInBackground([this] {
         WriteStale("old");
@@ -1232,7 +1233,7 @@ TEST_F(CacheUpdateTest, TheChildLooksAgainBeforeItRefreshes)
         ASSERT_TRUE(updater.Await());
         const std::string marked = ReadFile(pidPath);
         std::filesystem::remove(pidPath);
-        processes.fork = [&] {  // between the caller's look and the child's
+        processes.fork = [&] {  // between the caller's check and the child's
             WriteFile(pidPath, marked);
             return RealFork();
         };
@@ -1243,21 +1244,21 @@ TEST_F(CacheUpdateTest, TheChildLooksAgainBeforeItRefreshes)
     });
 }
 
-// Time-outs, validity and flags decide whether a caller refreshes; this decides where.
-TEST_F(CacheUpdateTest, WhetherUpdatedDataIsRequiredDecidesWhereTheRefreshRuns)
+// Age, validity and need decide whether there is a refresh; this decides where.
+TEST_F(CacheUpdateTest, IsUpdatedDataRequiredDecidesWhereTheRefreshRuns)
 {
     struct Row {
         const char* what;
-        bool told;
+        bool byConstructor;
         bool valid;
-        std::optional<bool> required;  // by an operation of the subclass's own
+        std::optional<bool> required;  // overridden
         bool inCaller;
     };
     const std::vector<Row> table = {
         {"valid", false, true, {}, false},
         {"not valid", false, false, {}, true},
-        {"told", true, true, {}, true},
-        {"told but not required", true, true, false, false},
+        {"by the constructor", true, true, {}, true},
+        {"by the constructor but not required", true, true, false, false},
         {"not valid but not required", false, false, false, false},
         {"required", false, true, true, true},
     };
@@ -1265,7 +1266,7 @@ TEST_F(CacheUpdateTest, WhetherUpdatedDataIsRequiredDecidesWhereTheRefreshRuns)
         CheckInBackground([&] {
             SCOPED_TRACE(row.what);
             WriteStale("old");
-            TestCache each = Another(row.told);
+            TestCache each = Another(row.byConstructor);
             each.isValid = [&](const Json::Value& data) { return row.valid || data == "new"; };
             if (row.required) each.isRequired = [&] { return *row.required; };
             EXPECT_EQ(each.Read(), row.inCaller ? "new" : "old");
@@ -1280,7 +1281,7 @@ TEST_F(CacheUpdateTest, WhetherUpdatedDataIsRequiredDecidesWhereTheRefreshRuns)
     }
 }
 
-TEST_F(CacheUpdateTest, UnwantedDataIsRefreshedInTheBackground)
+TEST_F(CacheUpdateTest, DataThatNeedsAnUpdateIsRefreshedInTheBackground)
 {
     CheckInBackground([this] {
         WriteCache("old");
@@ -1291,7 +1292,7 @@ TEST_F(CacheUpdateTest, UnwantedDataIsRefreshedInTheBackground)
     });
 }
 
-TEST_F(CacheUpdateTest, AChildThatFailsEndsQuietlyAndLeavesTheFile)
+TEST_F(CacheUpdateTest, AChildThatFailsPrintsNothingAndLeavesTheFile)
 {
     CheckInBackground([this] {
         WriteStale("old");
@@ -1320,7 +1321,7 @@ TEST_F(CacheUpdateTest, AChildThatFailsEndsQuietlyAndLeavesTheFile)
     });
 }
 
-// Notes in a file that its end was reached in another process than its owner's.
+// Makes a file if it is destroyed in another process than its owner's.
 class Witness {
   public:
     explicit Witness(std::string note) : file(std::move(note)) {}
@@ -1338,7 +1339,7 @@ class Witness {
     pid_t owner = ::getpid();
 };
 
-TEST_F(CacheUpdateTest, NothingOfTheCallersRunsAtTheChildsEnd)
+TEST_F(CacheUpdateTest, TheChildRunsNoDestructorOrExitHandler)
 {
     CheckInBackground([this] {
         static const Witness exitHandler(dir.File("exit handler"));
@@ -1360,11 +1361,11 @@ TEST_F(CacheUpdateTest, NothingOfTheCallersRunsAtTheChildsEnd)
     });
 }
 
-TEST_F(CacheUpdateTest, AFailedForkIsTold)
+TEST_F(CacheUpdateTest, AFailedForkIsLogged)
 {
     WriteStale("old");
     const auto fail = Failing(EAGAIN);
-    // The child is forked by a process that the caller has forked.
+    // An intermediate process forks the child.
     const auto failTheSecond = [&, forks = 0]() mutable {
         return ++forks == 1 ? RealFork() : fail();
     };
@@ -1408,7 +1409,7 @@ TEST_F(CacheUpdateTest, TheChildInheritsNoLock)
 
 // ---------------------------------------------------------------------------------------- waiting
 
-TEST_F(CacheUpdateTest, WhoMustWaitWaitsUntilTheFileIsFresh)
+TEST_F(CacheUpdateTest, WaitingEndsWhenTheFileIsFresh)
 {
     WriteStale("old");
     ChildProcess updater = Updater();
@@ -1440,7 +1441,7 @@ TEST_F(CacheUpdateTest, WaitingEndsWhenTheUpdaterDies)
     ExpectLines({StartWait(), FinishWait()});
     EXPECT_EQ(waiting.CountCalls("GetUpdatedData"), 0U);
     EXPECT_TRUE(IsMarked());
-    EXPECT_EQ(waiting.Read(), "new");  // the next one finds it dead at once
+    EXPECT_EQ(waiting.Read(), "new");  // the next read finds it dead
     ExpectLines({Start(), Finish()});
 }
 
@@ -1458,7 +1459,7 @@ TEST_F(CacheUpdateTest, WaitingEndsWhenThePidFileIsGone)
     EXPECT_EQ(waiting.GetCachedData(), "old");
 }
 
-// Only its age counts here: fresh data that is invalid or unwanted is not waited for.
+// Only the age counts here, neither validity nor need.
 TEST_F(CacheUpdateTest, WaitingTakesOnePauseWhenTheFileIsNotTooOld)
 {
     WriteCache("old");
@@ -1473,7 +1474,7 @@ TEST_F(CacheUpdateTest, WaitingTakesOnePauseWhenTheFileIsNotTooOld)
     }
 }
 
-TEST_F(CacheUpdateTest, TheFirstReadersWaitForAFileThatIsNotThereYet)
+TEST_F(CacheUpdateTest, TheFirstReadersWaitForTheMissingFile)
 {
     ChildProcess updater = Updater();
     ASSERT_TRUE(updater.Await());
@@ -1485,7 +1486,7 @@ TEST_F(CacheUpdateTest, TheFirstReadersWaitForAFileThatIsNotThereYet)
     ExpectLines({NoData(), UsesDefault(), NoData(), UsesDefault(), StartWait(), FinishWait()});
 }
 
-TEST_F(CacheUpdateTest, WaitingGoesOnWhileTheLockCannotBeTaken)
+TEST_F(CacheUpdateTest, WaitingContinuesWhileTheLockCannotBeTaken)
 {
     WriteStale("old");
     NoteLocking();
@@ -1496,7 +1497,7 @@ TEST_F(CacheUpdateTest, WaitingGoesOnWhileTheLockCannotBeTaken)
     });
     EXPECT_TRUE(waiting.Update());
     ExpectPauses(3, ShortestWaitPause);
-    ExpectSleeps(15);  // the first look, and those behind two pauses
+    ExpectSleeps(15);  // of the first check, and of those after two pauses
     EXPECT_EQ(locking, std::vector<int>(19, Probe));
     ExpectLines({StartWait(), FinishWait()});
     EXPECT_EQ(waiting.CountCalls("GetUpdatedData"), 0U);
@@ -1517,7 +1518,7 @@ TEST_F(CacheUpdateTest, WaitingForALockEndsWhenTheFileIsFresh)
 
 // --------------------------------------------------------------------------------- killed updaters
 
-TEST_F(CacheUpdateTest, AnUpdaterThatIsKilledWhileItProducesIsReplacedByTheNextReader)
+TEST_F(CacheUpdateTest, TheNextReaderReplacesAnUpdaterKilledWhileProducing)
 {
     WriteStale("old");
     ChildProcess updater([this](ChildProcess::Link& link) {
@@ -1528,7 +1529,7 @@ TEST_F(CacheUpdateTest, AnUpdaterThatIsKilledWhileItProducesIsReplacedByTheNextR
         waiting.Read();
     });
     ASSERT_TRUE(updater.Await());
-    EXPECT_EQ(cache.Read(), "old");  // somebody is at it
+    EXPECT_EQ(cache.Read(), "old");  // somebody refreshes
     updater.Kill(SIGKILL);
     EXPECT_EQ(updater.Join(), 128 + SIGKILL);
     EXPECT_THAT(NamesIn(dir.Path()), ElementsAre("status.cached", "status.cached.pid"));
@@ -1539,7 +1540,7 @@ TEST_F(CacheUpdateTest, AnUpdaterThatIsKilledWhileItProducesIsReplacedByTheNextR
     EXPECT_THAT(NamesIn(dir.Path()), ElementsAre("status.cached"));
 }
 
-TEST_F(CacheUpdateTest, WhatAnUpdaterKilledWhileItWritesLeavesIsCleanedUpByTheNextOne)
+TEST_F(CacheUpdateTest, TheNextUpdaterRemovesWhatOneKilledWhileWritingLeft)
 {
     WriteStale("old");
     ChildProcess updater([this](ChildProcess::Link& link) {
@@ -1565,10 +1566,10 @@ TEST_F(CacheUpdateTest, WhatAnUpdaterKilledWhileItWritesLeavesIsCleanedUpByTheNe
 
 // ---------------------------------------------------------------------------------- docs/cache.md
 
-// The page that tells engineers what the files look like.
+// The page that describes the files.
 class CachePageTest : public CacheUpdateTest {
   protected:
-    // The fenced block of a language.
+    // The first fenced block of a language.
     std::string Block(const std::string& language) const
     {
         const std::string fence = "\n```" + language + "\n";
@@ -1578,8 +1579,8 @@ class CachePageTest : public CacheUpdateTest {
         return page.substr(begin + fence.size(), end + 1 - begin - fence.size());
     }
 
-    // The rows of the table whose header begins with this cell: their cells, without blanks and
-    // backquotes at both ends.
+    // The cells of the table whose header begins with this cell, without the blanks and backquotes
+    // around them.
     std::vector<std::vector<std::string>> Table(const std::string& firstCell) const
     {
         std::istringstream lines(page.substr(page.find("\n| " + firstCell + " |") + 1));
@@ -1598,7 +1599,7 @@ class CachePageTest : public CacheUpdateTest {
         return rows;
     }
 
-    // A path of the page, of this test's cache.
+    // A path of the page, for the cache of this test.
     std::string Filled(std::string text) const
     {
         text = std::regex_replace(text, std::regex("/DIR/"), "/" + dir.Path() + "/");
@@ -1621,7 +1622,7 @@ TEST_F(CachePageTest, TheExampleIsAFileThatTheLibraryWrites)
     EXPECT_EQ(ReadFile(path), toString(example));
     EXPECT_EQ(each.GetCachedData(), example["cached_data"]);
 
-    // As it stands on the page, spread out, it has its keys in the file's order.
+    // On the page, spread out, it has the keys in the order of the file.
     std::string spread = Block("json");
     spread.erase(std::remove(spread.begin(), spread.end(), '\n'), spread.end());
     std::size_t at = 0;
@@ -1633,7 +1634,7 @@ TEST_F(CachePageTest, TheExampleIsAFileThatTheLibraryWrites)
     }
 }
 
-TEST_F(CachePageTest, TheTableHasTheKeysOfTheFileWithTheirTypes)
+TEST_F(CachePageTest, TheTableHasAllKeysAndTheirTypes)
 {
     EXPECT_TRUE(cache.UpdateWithData("data", 100, 103));
     const Json::Value document = Document();
@@ -1657,7 +1658,7 @@ TEST_F(CachePageTest, TheTableHasTheKeysOfTheFileWithTheirTypes)
     EXPECT_EQ(document.size(), keys.size());
 }
 
-TEST_F(CachePageTest, TheFilesHaveThePathsOfThePage)
+TEST_F(CachePageTest, ThePageHasThePathsOfTheFiles)
 {
     const auto rows = Table("file");
     ASSERT_EQ(rows.size(), 3U);
@@ -1669,7 +1670,7 @@ TEST_F(CachePageTest, TheFilesHaveThePathsOfThePage)
     for (const auto& row : rows) EXPECT_GT(CountOpened(Filled(row[1])), 0U) << row[1];
 }
 
-TEST_F(CachePageTest, ThePidFileHasTheFormOfThePage)
+TEST_F(CachePageTest, ThePageShowsTheFormOfThePidFile)
 {
     const std::regex form("([0-9]+)\n([0-9]+)\n");
     EXPECT_TRUE(std::regex_match(Block("text"), form)) << Block("text");
@@ -1679,7 +1680,7 @@ TEST_F(CachePageTest, ThePidFileHasTheFormOfThePage)
         std::smatch numbers;
         EXPECT_TRUE(std::regex_match(written, numbers, form)) << written;
         EXPECT_EQ(numbers[1], std::to_string(::getpid()));
-        // Behind the name in brackets the third field follows; the start is the 22nd.
+        // The third field follows the name in brackets; the start time is field 22.
         const std::string status = ReadFile("/proc/self/stat");
         std::istringstream fields(status.substr(status.rfind(')') + 1));
         std::string start;
@@ -1693,10 +1694,10 @@ TEST_F(CachePageTest, ThePidFileHasTheFormOfThePage)
     ExpectLines({Start(), Finish()});
 }
 
-TEST_F(CachePageTest, TheLockFileIsEmptyAndHasTheBitsOfThePage)
+TEST_F(CachePageTest, ThePageHasTheModeOfTheLockFile)
 {
     WriteStale("old");
-    FailForks(EAGAIN);  // an ordinary user can open it once
+    FailForks(EAGAIN);  // an ordinary user could open the lock only once
     for (const mode_t mask : {0U, 0077U}) {
         std::filesystem::remove(lockFile);
         const Umask umask(mask);

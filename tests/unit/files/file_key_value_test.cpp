@@ -30,7 +30,7 @@ using ::testing::Pair;
 template <class Value>
 using Pairs = std::map<std::string, Value>;
 
-// What the standard extraction makes of a text, under the locale of the moment.
+// What a stream reads from a text in the current locale.
 template <class Value>
 Value Extracted(const std::string& text)
 {
@@ -43,7 +43,7 @@ class FileKeyValueTest : public LoggedTest {
   protected:
     FileKeyValueTest() : LoggedTest("file.cpp") {}
 
-    // Reads a file of that content into a map that holds something already.
+    // Reads a file of this content into a map that is not empty.
     template <class Value>
     Pairs<Value> Read(const std::string& content)
     {
@@ -69,7 +69,7 @@ class FileKeyValueTest : public LoggedTest {
     std::string path = dir.File("limits.conf");
 };
 
-// Numbers are read from the beginning of the text as the standard extraction does it.
+// Numbers are read from the beginning of the text, as streams do.
 template <class Value>
 struct NumberRow {
     const char* text;
@@ -78,14 +78,14 @@ struct NumberRow {
 
 // ------------------------------------------------------------------------------------------- lines
 
-TEST_F(FileKeyValueTest, OfTwoLinesWithOneKeyTheFirstCounts)
+TEST_F(FileKeyValueTest, TheFirstLineWithAKeyCounts)
 {
     EXPECT_THAT(Read<std::string>("a=1\nb=2\na=3\n"), ElementsAre(Pair("a", "1"), Pair("b", "2")));
     EXPECT_THAT(Read<int>("a=1\nb=2\na=3\n"), ElementsAre(Pair("a", 1), Pair("b", 2)));
     EXPECT_THAT(Read<double>("a=1\nb=2\na=3\n"), ElementsAre(Pair("a", 1.0), Pair("b", 2.0)));
 }
 
-TEST_F(FileKeyValueTest, OfKeyAndValueTheFirstWordCounts)
+TEST_F(FileKeyValueTest, TheFirstWordOfKeyAndValueCounts)
 {
     struct Row {
         std::string line;
@@ -106,7 +106,7 @@ TEST_F(FileKeyValueTest, OfKeyAndValueTheFirstWordCounts)
         {"# a=1", "#", "1"},
         {";a=1", ";a", "1"},
         {"[a]=1", "[a]", "1"},
-        // Blanks are no empty text: the line counts, on purpose.
+        // Blanks are not empty: the line counts.
         {"k=   ", "k", ""},
         {"k=\t", "k", ""},
         {"  =v", "", "v"},
@@ -130,7 +130,7 @@ TEST_F(FileKeyValueTest, TheLastLineNeedsNoNewline)
     EXPECT_THAT(Read<int>("a=1\nb=2"), ElementsAre(Pair("a", 1), Pair("b", 2)));
 }
 
-TEST_F(FileKeyValueTest, ALineWithoutKeyOrValueIsPassedOver)
+TEST_F(FileKeyValueTest, ALineWithoutKeyOrValueIsIgnored)
 {
     EXPECT_THAT(Read<std::string>("=5\nk=\n=\na=1\n"), ElementsAre(Pair("a", "1")));
     ExpectLines({NotParsed("=5"), NotParsed("k="), NotParsed("=")});
@@ -140,21 +140,21 @@ TEST_F(FileKeyValueTest, ALineWithoutKeyOrValueIsPassedOver)
     ExpectLines({NotParsed("=5"), NotParsed("k="), NotParsed("=")});
 }
 
-TEST_F(FileKeyValueTest, AnEmptyLineIsPassedOver)
+TEST_F(FileKeyValueTest, AnEmptyLineIsIgnored)
 {
     EXPECT_THAT(Read<std::string>("\na=1\n\nb=2\n"), ElementsAre(Pair("a", "1"), Pair("b", "2")));
     const LogLine bad = Warn("parseLineKeyValue", "Bad Parameter.");
     ExpectLines({bad, NotParsed(""), bad, NotParsed("")});
 }
 
-TEST_F(FileKeyValueTest, ALineWithoutSeparatorIsPassedOver)
+TEST_F(FileKeyValueTest, ALineWithoutSeparatorIsIgnored)
 {
     EXPECT_THAT(Read<std::string>("# comment\na=1\n \n%s%n"), ElementsAre(Pair("a", "1")));
     ExpectLines({NoSeparator("# comment"), NotParsed("# comment"), NoSeparator(" "), NotParsed(" "),
                  NoSeparator("%s%n"), NotParsed("%s%n")});
 }
 
-TEST_F(FileKeyValueTest, ALogLineEndsAtAZeroByteOfTheData)
+TEST_F(FileKeyValueTest, TheLogLineEndsAtAZeroByteOfTheData)
 {
     EXPECT_THAT(Read<std::string>(Bytes("ab\0cd\na=1\n")), ElementsAre(Pair("a", "1")));
     ExpectLines({NoSeparator("ab"), NotParsed("ab")});
@@ -189,8 +189,8 @@ TEST_F(FileKeyValueTest, AnIntegerIsReadFromTheBeginningOfTheText)
         {"5=6", 5},
         {"2147483647", INT_MAX},
         {"-2147483648", INT_MIN},
-        // A text that is no number is 0, blanks are too, and the nearest number stands for one that
-        // does not fit. All of these lines count, on purpose.
+        // A text without a number is 0, blanks are 0, and what does not fit is the nearest number.
+        // All of these lines count.
         {"abc", 0},
         {"-", 0},
         {"- 5", 0},
@@ -228,7 +228,7 @@ TEST_F(FileKeyValueTest, AFloatingPointNumberIsReadFromTheBeginningOfTheText)
     }
 }
 
-TEST_F(FileKeyValueTest, NumbersAreThoseOfTheProgramsLocale)
+TEST_F(FileKeyValueTest, NumbersAreReadInTheProgramsLocale)
 {
     const std::vector<const char*> texts = {"1,5",   "1.5",    "1.234", "1.234,5",      "1234",
                                             "12.34", "1,5,5",  "-0,25", "1e3",          "abc",
@@ -244,12 +244,12 @@ TEST_F(FileKeyValueTest, NumbersAreThoseOfTheProgramsLocale)
     }
 }
 
-// Keys in any order, twice, odd and not at all: the map is that of one toType after the other.
-TEST_F(FileKeyValueTest, ManyLinesGiveWhatToTypeMakesOfEach)
+// Keys in any order, repeated, odd or missing: the map is what toType gives line by line.
+TEST_F(FileKeyValueTest, ManyLinesAreReadAsToTypeReadsEach)
 {
     const std::vector<std::string> pieces = {"a", "b",  "key_1", "key_10", "=",     "=",  "=5",
                                              " ", "\t", "-",     "1.5e3",  "12abc", "1,5"};
-    std::mt19937 random(20'211);  // the same lines each time
+    std::mt19937 random(20'211);  // the same lines in each run
     std::uniform_int_distribution<std::size_t> piece(0, pieces.size() - 1);
     std::string content;
     Pairs<double> expected;
@@ -278,7 +278,7 @@ TEST_F(FileKeyValueTest, ManyLinesGiveWhatToTypeMakesOfEach)
 
 // ------------------------------------------------------------------------------------------- files
 
-TEST_F(FileKeyValueTest, AMissingFileIsNoErrorAndKeepsTheMap)
+TEST_F(FileKeyValueTest, AMissingFileIsASuccessAndKeepsTheMap)
 {
     Pairs<std::string> texts{{"old", "kept"}};
     Pairs<int> integers{{"old", 1}};
@@ -301,14 +301,14 @@ TEST_F(FileKeyValueTest, AnExistingFileEmptiesTheMapFirst)
     EXPECT_THAT(Read<int>("new=3"), ElementsAre(Pair("new", 3)));
 }
 
-TEST_F(FileKeyValueTest, ADirectoryIsAFileWithoutLines)
+TEST_F(FileKeyValueTest, ADirectoryReadsAsAnEmptyFile)
 {
     Pairs<int> pairs{{"old", 1}};
     EXPECT_EQ(File::Read(dir.Path(), pairs), 0);
     EXPECT_THAT(pairs, IsEmpty());
 }
 
-TEST_F(FileKeyValueTest, AFileThatMayNotBeReadKeepsTheMap)
+TEST_F(FileKeyValueTest, AFileWithoutReadPermissionKeepsTheMap)
 {
     CheckAsOrdinaryUser(dir, [&] {
         WriteFile(path, "a=1");
@@ -337,7 +337,7 @@ TEST_F(FileKeyValueTest, AFileThatCannotBeOpenedKeepsTheMap)
     ExpectLines({line, line, line});
 }
 
-TEST_F(FileKeyValueTest, ALineThatAFailedReadCutsOffIsNoLine)
+TEST_F(FileKeyValueTest, ALineCutOffByAFailedReadIsIgnored)
 {
     const std::string text = "port=5001\ntimeout=30000\nlast=1\n";
     const std::size_t second = text.find('\n') + 1;
@@ -357,7 +357,7 @@ TEST_F(FileKeyValueTest, ALineThatAFailedReadCutsOffIsNoLine)
     }
 }
 
-TEST_F(FileKeyValueTest, NoDescriptorIsLeftOpen)
+TEST_F(FileKeyValueTest, LeavesNoDescriptorOpen)
 {
     const std::size_t before = CountDescriptors();
     EXPECT_EQ(Read<int>("a=1").size(), 1U);
@@ -382,7 +382,7 @@ TEST_F(FileKeyValueTest, AnEmptyTextGivesTheFallback)
     EXPECT_EQ(number, 7.5);
 }
 
-TEST_F(FileKeyValueTest, ATextOfBlanksGivesNothingAndSucceeds)
+TEST_F(FileKeyValueTest, BlanksLeaveTheValueAndSucceed)
 {
     const std::string blanks = " \t\r\n";
     std::string text = "old";
@@ -396,7 +396,7 @@ TEST_F(FileKeyValueTest, ATextOfBlanksGivesNothingAndSucceeds)
     EXPECT_EQ(number, 1.5);
 }
 
-TEST_F(FileKeyValueTest, ATextThatIsNoNumberGivesZeroAndSucceeds)
+TEST_F(FileKeyValueTest, ATextWithoutANumberGivesZeroAndSucceeds)
 {
     const std::string word = " word s";
     std::string text = "old";
@@ -410,7 +410,7 @@ TEST_F(FileKeyValueTest, ATextThatIsNoNumberGivesZeroAndSucceeds)
     EXPECT_EQ(number, 0.0);
 }
 
-TEST_F(FileKeyValueTest, WhateverAStreamTakesAndGivesIsConverted)
+TEST_F(FileKeyValueTest, ConvertsEveryTypeThatStreamsWriteAndRead)
 {
     long large = 0;
     EXPECT_TRUE(File::toType(std::string("4294967297"), large, 0L));

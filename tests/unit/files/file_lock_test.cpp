@@ -33,7 +33,7 @@ constexpr int Exclusive = LOCK_EX | LOCK_NB;
 
 constexpr std::string_view LockDir = "/tmp/.orvadr_lock";
 
-// The lock directory, which may be another user's, lies in a directory of the test's own: for the
+// Moves the lock directory, which may belong to another user, into a directory of the test: for the
 // library in this process, for its children, and for the mkdir that they run.
 class FileLockTest : public LoggedTest {
   protected:
@@ -67,14 +67,14 @@ class FileLockTest : public LoggedTest {
         };
     }
 
-    // Where a path of the lock directory lies.
+    // Where a path in the lock directory is moved.
     std::string Place(const std::string& path) const
     {
         const bool below = path.compare(0, LockDir.size(), LockDir) == 0;
         return below ? dir.Path() + path.substr(LockDir.size()) : path;
     }
 
-    // A lock file that every user of the test can open, unlike one that the library makes.
+    // A lock file that an ordinary user can open, too, unlike one that the library makes.
     std::string MakeLockFile(const std::string& name) const
     {
         WriteFile(dir.File(name), "");
@@ -118,7 +118,7 @@ ChildProcess Holder(const std::string& name, int operation = Exclusive)
 
 // ------------------------------------------------------------------------------------------- names
 
-TEST_F(FileLockTest, ALockFileIsTheNameAsItStandsBelowTheLockDirectory)
+TEST_F(FileLockTest, TheLockFileIsTheNameInTheLockDirectory)
 {
     EXPECT_EQ(FileLock::getLockFilePath("a"), "/tmp/.orvadr_lock/a");
     EXPECT_EQ(FileLock::getLockFilePath("a/b"), "/tmp/.orvadr_lock/a/b");
@@ -127,7 +127,7 @@ TEST_F(FileLockTest, ALockFileIsTheNameAsItStandsBelowTheLockDirectory)
     EXPECT_EQ(FileLock::getLockFilePath("/"), "/tmp/.orvadr_lock//");
 }
 
-TEST_F(FileLockTest, AnEmptyNameIsNone)
+TEST_F(FileLockTest, AnEmptyNameHasNoLockFile)
 {
     EXPECT_EQ(FileLock::getLockFilePath(""), "");
     ExpectLines({Err("getLockFilePath", "Bad lock file[]")});
@@ -157,7 +157,7 @@ TEST_F(FileLockTest, WithoutANameNothingCanBeLocked)
 
 // --------------------------------------------------------------------------- directory and file
 
-TEST_F(FileLockTest, NothingIsMadeBeforeTheFirstUse)
+TEST_F(FileLockTest, MakesNothingBeforeTheFirstUse)
 {
     FileLock lock("a/b");
     EXPECT_TRUE(lock.setLockFile("c/d"));
@@ -175,7 +175,7 @@ TEST_F(FileLockTest, TheFirstLockMakesDirectoryAndFile)
     EXPECT_THAT(NamesIn(dir.File("a")), ElementsAre("b"));
 }
 
-TEST_F(FileLockTest, AnAbsoluteNameMakesItsDirectoriesToo)
+TEST_F(FileLockTest, AnAbsoluteNameMakesItsDirectories)
 {
     FileLock lock("/a/b/c");
     EXPECT_TRUE(lock.lock(Exclusive, 0));
@@ -184,7 +184,7 @@ TEST_F(FileLockTest, AnAbsoluteNameMakesItsDirectoriesToo)
     EXPECT_EQ(opened[0].path, "/tmp/.orvadr_lock//a/b/c");
 }
 
-TEST_F(FileLockTest, TheLockDirectoryItselfIsMade)
+TEST_F(FileLockTest, MakesTheLockDirectory)
 {
     std::filesystem::remove(dir.Path());
     FileLock lock("a");
@@ -203,7 +203,7 @@ TEST_F(FileLockTest, TheFileStaysAfterUse)
     EXPECT_THAT(NamesIn(dir.Path()), ElementsAre("a"));
 }
 
-// 644 is a decimal number, on purpose.
+// The contract: 644 is a decimal number.
 TEST_F(FileLockTest, ANewFileHasTheBitsOfDecimal644LessTheUmask)
 {
     for (const mode_t mask : {0U, 0022U, 0077U}) {
@@ -225,7 +225,7 @@ TEST_F(FileLockTest, TheFileIsOpenedForReading)
     EXPECT_THAT(attempts, IsEmpty());
 }
 
-TEST_F(FileLockTest, AnOrdinaryUserCannotOpenASecondTimeWhatItHasMade)
+TEST_F(FileLockTest, AnOrdinaryUserCannotOpenItsOwnLockFileAgain)
 {
     CheckAsOrdinaryUser(dir, [&] {
         FileLock first("a");
@@ -238,7 +238,7 @@ TEST_F(FileLockTest, AnOrdinaryUserCannotOpenASecondTimeWhatItHasMade)
     });
 }
 
-TEST_F(FileLockTest, AFileThatCannotBeOpenedIsTold)
+TEST_F(FileLockTest, AFileThatCannotBeOpenedIsLogged)
 {
     struct Row {
         std::string name;
@@ -264,7 +264,7 @@ TEST_F(FileLockTest, AFileThatCannotBeOpenedIsTold)
     EXPECT_THAT(sleeps, IsEmpty());
 }
 
-TEST_F(FileLockTest, APipeInPlaceOfTheFileIsToldAndNotWaitedFor)
+TEST_F(FileLockTest, ANamedPipeIsRefusedWithoutWaiting)
 {
     ASSERT_EQ(::mkfifo(dir.File("pipe").c_str(), 0600), 0);
     std::filesystem::create_symlink("pipe", dir.File("link"));
@@ -279,7 +279,7 @@ TEST_F(FileLockTest, APipeInPlaceOfTheFileIsToldAndNotWaitedFor)
             EXPECT_THAT(opened, IsEmpty());
             EXPECT_THAT(sleeps, IsEmpty());
 
-            // The object is of use once the pipe is gone.
+            // The object works once the pipe is gone.
             std::filesystem::remove(dir.File("pipe"));
             MakeLockFile("pipe");
             EXPECT_TRUE(lock.lock(Exclusive, 0));
@@ -289,7 +289,7 @@ TEST_F(FileLockTest, APipeInPlaceOfTheFileIsToldAndNotWaitedFor)
     }
 }
 
-TEST_F(FileLockTest, ADirectoryThatCannotBeMadeIsTold)
+TEST_F(FileLockTest, ADirectoryThatCannotBeMadeIsLogged)
 {
     WriteFile(dir.File("a"), "in the way");
     FileLock lock("a/b/c");
@@ -324,7 +324,7 @@ TEST_F(FileLockTest, TheFileIsOpenedOnce)
     EXPECT_EQ(opened.size(), 1U);
 }
 
-TEST_F(FileLockTest, WhatIsNoRegularFileIsOpenedAnewEachTime)
+TEST_F(FileLockTest, ReopensWhatIsNoRegularFileEachTime)
 {
     std::filesystem::create_symlink("/dev/null", dir.File("a"));
     const std::size_t before = CountDescriptors();
@@ -335,8 +335,8 @@ TEST_F(FileLockTest, WhatIsNoRegularFileIsOpenedAnewEachTime)
     EXPECT_EQ(CountDescriptors(), before + 1);
 }
 
-// The directory is looked for on every lock, also when the file is open.
-TEST_F(FileLockTest, AnOpenFileWhoseDirectoryCannotBeMadeAgainIsRefused)
+// Every lock checks for the directory, even when the file is open.
+TEST_F(FileLockTest, FailsWhenTheDirectoryOfAnOpenFileCannotBeMadeAgain)
 {
     FileLock lock("a/b");
     EXPECT_TRUE(lock.lock(Exclusive, 0));
@@ -368,7 +368,7 @@ TEST_F(FileLockTest, TwoObjectsOfOneProcessExcludeEachOther)
     EXPECT_FALSE(first.lock(Exclusive, 0));
 }
 
-TEST_F(FileLockTest, LocksOfDifferentNamesDoNotMeet)
+TEST_F(FileLockTest, LocksWithDifferentNamesAreIndependent)
 {
     FileLock first("a");
     FileLock second("b");
@@ -376,7 +376,7 @@ TEST_F(FileLockTest, LocksOfDifferentNamesDoNotMeet)
     EXPECT_TRUE(second.lock(Exclusive, 0));
 }
 
-TEST_F(FileLockTest, ASharedLockAdmitsOthersAndNoExclusiveOne)
+TEST_F(FileLockTest, ASharedLockExcludesOnlyExclusiveOnes)
 {
     MakeLockFile("a");
     FileLock first("a");
@@ -397,12 +397,12 @@ TEST_F(FileLockTest, TheSameObjectMayLockAgain)
     FileLock lock("a");
     EXPECT_TRUE(lock.lock(Exclusive, 0));
     EXPECT_TRUE(lock.lock(Exclusive, 0));
-    EXPECT_TRUE(lock.lock(Shared, 0));  // turns the one into the other
+    EXPECT_TRUE(lock.lock(Shared, 0));  // changes the kind
     EXPECT_TRUE(CanTake("a", Shared));
     EXPECT_FALSE(CanTake("a", Exclusive));
 }
 
-TEST_F(FileLockTest, AnotherProcessExcludes)
+TEST_F(FileLockTest, AnotherProcessExcludesThisOne)
 {
     MakeLockFile("a");
     ChildProcess holder = Holder("a");
@@ -415,7 +415,7 @@ TEST_F(FileLockTest, AnotherProcessExcludes)
     EXPECT_TRUE(lock.lock(Exclusive, 0));
 }
 
-TEST_F(FileLockTest, AProcessThatIsKilledLeavesNoLock)
+TEST_F(FileLockTest, AKilledProcessLeavesNoLock)
 {
     MakeLockFile("a");
     ChildProcess holder = Holder("a");
@@ -426,7 +426,7 @@ TEST_F(FileLockTest, AProcessThatIsKilledLeavesNoLock)
     EXPECT_TRUE(CanTake("a"));
 }
 
-TEST_F(FileLockTest, AChildOfForkSharesTheLock)
+TEST_F(FileLockTest, AForkedChildSharesTheLock)
 {
     MakeLockFile("a");
     FileLock lock("a");
@@ -435,7 +435,7 @@ TEST_F(FileLockTest, AChildOfForkSharesTheLock)
         EXPECT_FALSE(CanTake("a"));
         EXPECT_TRUE(lock.lock(Exclusive, 0));
     });
-    EXPECT_FALSE(CanTake("a"));  // the child's end freed nothing
+    EXPECT_FALSE(CanTake("a"));  // the end of the child freed nothing
     CheckInChild([&] { lock.unlock(); });
     EXPECT_TRUE(CanTake("a"));
 }
@@ -454,7 +454,7 @@ TEST_F(FileLockTest, ALockEndsOnlyWhenParentAndChildHaveClosedIt)
     EXPECT_TRUE(CanTake("a"));
 }
 
-TEST_F(FileLockTest, TheFlockProgramIsExcluded)
+TEST_F(FileLockTest, ExcludesTheFlockProgram)
 {
     const std::string lockFile = MakeLockFile("a");
     const auto flockCanTake = [&] {
@@ -467,7 +467,7 @@ TEST_F(FileLockTest, TheFlockProgramIsExcluded)
     EXPECT_TRUE(flockCanTake());
 }
 
-TEST_F(FileLockTest, TheFlockProgramExcludes)
+TEST_F(FileLockTest, IsExcludedByTheFlockProgram)
 {
     const std::string lockFile = MakeLockFile("a");
     const std::string end = dir.File("end");
@@ -487,7 +487,7 @@ TEST_F(FileLockTest, TheFlockProgramExcludes)
 
 // ---------------------------------------------------------------------------------- lock, tryLock
 
-TEST_F(FileLockTest, TheOperationIsHandedToFlockAsItIs)
+TEST_F(FileLockTest, PassesTheOperationToFlockUnchanged)
 {
     FileLock lock("a");
     std::vector<int> operations;
@@ -504,7 +504,7 @@ TEST_F(FileLockTest, TheOperationIsHandedToFlockAsItIs)
                 ElementsAre(LOCK_SH, LOCK_EX | LOCK_NB, 1234, LOCK_EX, LOCK_UN, LOCK_UN));
 }
 
-TEST_F(FileLockTest, RetriesAreASecondApartAndNoneFollowsTheLast)
+TEST_F(FileLockTest, PausesASecondBetweenAttemptsAndNotAfterTheLast)
 {
     MakeLockFile("a");
     ChildProcess holder = Holder("a");
@@ -518,7 +518,7 @@ TEST_F(FileLockTest, RetriesAreASecondApartAndNoneFollowsTheLast)
     }
 }
 
-TEST_F(FileLockTest, ALockThatBecomesFreeIsTakenByTheNextTry)
+TEST_F(FileLockTest, TheNextAttemptTakesALockThatHasBecomeFree)
 {
     MakeLockFile("a");
     ChildProcess holder = Holder("a");
@@ -538,14 +538,14 @@ TEST_F(FileLockTest, ALockThatBecomesFreeIsTakenByTheNextTry)
     EXPECT_FALSE(CanTake("a"));
 }
 
-TEST_F(FileLockTest, WithoutNonblockingOneTryWaits)
+TEST_F(FileLockTest, WithoutLockNbOneAttemptWaits)
 {
     const std::string lockFile = MakeLockFile("a");
     ChildProcess holder([&](ChildProcess::Link& link) {
         FileLock lock("a");
         if (lock.lock(Exclusive, 0)) link.Tell();
         link.Await();
-        WriteFile(lockFile, "was here");  // before the lock is free
+        WriteFile(lockFile, "was here");  // before the lock becomes free
     });
     ASSERT_TRUE(holder.Await());
     faults.flock = [&](int fd, int operation) {
@@ -560,7 +560,7 @@ TEST_F(FileLockTest, WithoutNonblockingOneTryWaits)
     EXPECT_EQ(holder.Join(), 0);
 }
 
-TEST_F(FileLockTest, AnInterruptedTryCountsAsATry)
+TEST_F(FileLockTest, AnInterruptedWaitCountsAsAFailedAttempt)
 {
     faults.flock = [&](int fd, int operation) {
         attempts.push_back({fd, operation});
@@ -582,8 +582,8 @@ TEST_F(FileLockTest, TryLockLeavesTheLockFree)
     EXPECT_TRUE(CanTake("a"));
 }
 
-// On purpose: it is a probe and never leaves the lock held.
-TEST_F(FileLockTest, TryLockFreesAlsoALockThatWasHeldBefore)
+// It is a probe, which never leaves the lock held.
+TEST_F(FileLockTest, TryLockFreesALockThatWasHeldBefore)
 {
     MakeLockFile("a");
     FileLock lock("a");
@@ -592,7 +592,7 @@ TEST_F(FileLockTest, TryLockFreesAlsoALockThatWasHeldBefore)
     EXPECT_TRUE(CanTake("a"));
 }
 
-TEST_F(FileLockTest, TryLockTriesOnceWithoutAPause)
+TEST_F(FileLockTest, TryLockMakesOneAttemptWithoutAPause)
 {
     MakeLockFile("a");
     ChildProcess holder = Holder("a");
@@ -624,7 +624,7 @@ TEST_F(FileLockTest, UnlockFreesTheLockAndKeepsTheFileOpen)
     lock.unlock();
     EXPECT_TRUE(CanTake("a"));
     EXPECT_EQ(CountDescriptors(), before + 1);
-    lock.unlock();  // of a lock that is free: no failure
+    lock.unlock();  // no failure, though the lock is free
 }
 
 TEST_F(FileLockTest, UnlockBeforeTheFirstUseDoesNothing)
@@ -635,7 +635,7 @@ TEST_F(FileLockTest, UnlockBeforeTheFirstUseDoesNothing)
     EXPECT_THAT(opened, IsEmpty());
 }
 
-TEST_F(FileLockTest, AFailedUnlockIsTold)
+TEST_F(FileLockTest, AFailedUnlockIsLogged)
 {
     FileLock lock("a");
     EXPECT_TRUE(lock.lock(Exclusive, 0));
@@ -647,7 +647,7 @@ TEST_F(FileLockTest, AFailedUnlockIsTold)
                            std::to_string(attempts[0].fd) + "], errno=[No locks available]")});
 }
 
-TEST_F(FileLockTest, TryLockSucceedsAlsoWhenTheLockCannotBeFreed)
+TEST_F(FileLockTest, TryLockSucceedsEvenIfTheLockCannotBeFreed)
 {
     FileLock lock("a");
     int held = -1;
@@ -660,7 +660,7 @@ TEST_F(FileLockTest, TryLockSucceedsAlsoWhenTheLockCannotBeFreed)
                                    std::to_string(held) + "], errno=[Invalid argument]")});
 }
 
-TEST_F(FileLockTest, TheEndOfTheObjectFreesTheLockAndClosesTheFile)
+TEST_F(FileLockTest, DestructionFreesTheLockAndClosesTheFile)
 {
     MakeLockFile("a");
     const std::size_t before = CountDescriptors();
@@ -669,12 +669,12 @@ TEST_F(FileLockTest, TheEndOfTheObjectFreesTheLockAndClosesTheFile)
         EXPECT_TRUE(lock.lock(Exclusive, 0));
         attempts.clear();
     }
-    EXPECT_THAT(attempts, IsEmpty());  // closing does it
+    EXPECT_THAT(attempts, IsEmpty());  // closing frees it
     EXPECT_EQ(CountDescriptors(), before);
     EXPECT_TRUE(CanTake("a"));
 }
 
-// Elsewhere 0 is a descriptor as any other; for unlock it counts as not open, on purpose.
+// The contract: unlock() ignores descriptor 0, all others do not.
 TEST_F(FileLockTest, UnlockOfDescriptorZeroDoesNothing)
 {
     MakeLockFile("a");
@@ -690,7 +690,7 @@ TEST_F(FileLockTest, UnlockOfDescriptorZeroDoesNothing)
             EXPECT_FALSE(CanTake("a"));
 
             EXPECT_TRUE(lock.lock(Exclusive, 0));
-            EXPECT_EQ(opened.size(), 2U);  // by CanTake and by the first lock
+            EXPECT_EQ(opened.size(), 2U);  // by CanTake() and by the first lock()
             EXPECT_FALSE(lock.setLockFile("b"));
         }
         EXPECT_FALSE(IsDescriptorOpen(STDIN_FILENO));
@@ -701,7 +701,7 @@ TEST_F(FileLockTest, UnlockOfDescriptorZeroDoesNothing)
     });
 }
 
-TEST_F(FileLockTest, AFileThatWasClosedBehindTheObjectsBackIsOpenedAnew)
+TEST_F(FileLockTest, ReopensAFileThatSomebodyElseHasClosed)
 {
     MakeLockFile("a");
     CheckInChild([&] {
@@ -732,7 +732,7 @@ TEST_F(FileLockTest, TheNameMayChangeUntilTheFileIsOpen)
     ExpectLines({Err("setLockFile",
                      "File [/tmp/.orvadr_lock/b] has been open, can not set file "
                      "path to [/tmp/.orvadr_lock/c]")});
-    EXPECT_FALSE(lock.setLockFile("/b"));  // the same file by another name
+    EXPECT_FALSE(lock.setLockFile("/b"));  // another name of the same file
     ExpectLines({Err("setLockFile",
                      "File [/tmp/.orvadr_lock/b] has been open, can not set file "
                      "path to [/tmp/.orvadr_lock//b]")});

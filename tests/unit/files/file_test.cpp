@@ -29,13 +29,13 @@ using OrvaDRCore::toString;
 using ::testing::ElementsAre;
 using ::testing::IsEmpty;
 
-// A text, and the document that it is; null where it is none, which leaves the value as it was.
+// A text and its document; null if it is no document, which leaves the value as it was.
 struct Parsed {
     std::string text;
     const char* document;
 };
 
-// A text that nests deeper than a document may.
+// Nests deeper than a document may.
 std::string DeepText()
 {
     return std::string(100'000, '[') + std::string(100'000, ']');
@@ -52,7 +52,7 @@ class FileTest : public LoggedTest {
   protected:
     FileTest() : LoggedTest("file.cpp") {}
 
-    // Notes the programs that are started, with their arguments.
+    // Records the programs that are started, with their arguments.
     void NotePrograms()
     {
         faults.spawn = [&](const SpawnCall& call) {
@@ -61,7 +61,7 @@ class FileTest : public LoggedTest {
         };
     }
 
-    // From now on another thread fetches the results of all children.
+    // From now on another thread gets the results of all children.
     void LoseResults()
     {
         faults.waitpid = [](pid_t pid, int* status, int options) {
@@ -70,7 +70,7 @@ class FileTest : public LoggedTest {
         };
     }
 
-    // Reads the file, whose text is `row.text`, with `read`, which answers for itself.
+    // Reads a file of `row.text` by `read` and checks the result.
     template <class Read>
     void ExpectParsed(const Parsed& row, Read read)
     {
@@ -108,14 +108,14 @@ TEST_F(FileReadPathTest, AMissingFileIsASuccessThatReadsNothing)
     EXPECT_THAT(NamesIn(dir.Path()), ElementsAre("link"));
 }
 
-TEST_F(FileReadPathTest, ADirectoryIsNoDocumentAndNoLine)
+TEST_F(FileReadPathTest, ADirectoryIsRefusedWithoutALogLine)
 {
     Json::Value value("old");
     EXPECT_FALSE(File::Read(dir.Path(), value));
     EXPECT_EQ(value, "old");
 }
 
-TEST_F(FileReadPathTest, AFileThatMayNotBeReadIsRefused)
+TEST_F(FileReadPathTest, AFileWithoutReadPermissionIsRefused)
 {
     CheckAsOrdinaryUser(dir, [&] {
         WriteFile(path, "1");
@@ -137,7 +137,7 @@ TEST_F(FileReadPathTest, AFileThatCannotBeOpenedIsRefused)
     ExpectLines({Err("Read", "File[" + path + "] is not opened.")});
 }
 
-TEST_F(FileReadPathTest, AFileIsOneDocumentOfAnyKind)
+TEST_F(FileReadPathTest, AFileHoldsOneDocumentOfAnyType)
 {
     const std::vector<Parsed> table = {
         {R"({"a":1})", R"({"a":1})"},
@@ -148,7 +148,7 @@ TEST_F(FileReadPathTest, AFileIsOneDocumentOfAnyKind)
         {"null", "null"},
         {"-1.5\n", "-1.5"},
         {"\"\xc3\xa4 \xff\"", "\"\xc3\xa4 \xff\""},
-        // Nothing stands where lines are joined, on purpose.
+        // The contract: lines are joined with nothing between them.
         {"1\n2\n3", "123"},
         {"\"one\ntext\"", "\"onetext\""},
         {"tr\nue\n", "true"},
@@ -173,7 +173,7 @@ TEST_F(FileReadPathTest, AFileIsOneDocumentOfAnyKind)
     }
 }
 
-TEST_F(FileReadPathTest, NoProperPrefixOfADocumentIsOne)
+TEST_F(FileReadPathTest, APrefixOfADocumentIsRefused)
 {
     const std::string text = "{\"a\":[1,{\"b\":\"c d\"},\nnull],\n\"e\":{\"f\":-1.5,\"g\":true}}";
     for (std::size_t size = 0; size < text.size(); ++size) {
@@ -205,7 +205,7 @@ TEST_F(FileReadPathTest, APipeIsReadToItsEnd)
     EXPECT_EQ(writer.Join(), 0);
 }
 
-// A text, what of it can be read before reading fails, and the document that the lines make.
+// What can be read before a failure, what follows, and the document of the complete lines.
 struct Torn {
     std::string readable;
     std::string rest;
@@ -217,12 +217,12 @@ std::vector<Torn> TornTexts()
     const std::string blanks(2000, ' ');
     return {
         {"12345", "678", nullptr},
-        {"12345", "\n", nullptr},  // it is not known whether more follows
+        {"12345", "\n", nullptr},  // more digits may follow
         {"[1]\n", "]]]", "[1]"},
         {"[1]\n2", "3", "[1]"},
         {"[1]\n\n", "2", "[1]"},
         {"{\"a\":1}\n12345", "678\n", R"({"a":1})"},
-        {"[1]" + blanks, ",2]", nullptr},  // more than a piece of a line
+        {"[1]" + blanks, ",2]", nullptr},  // longer than a chunk
         {"[1]\n" + blanks + "2", "3", "[1]"},
         {"[\n1,\n2]", "\n", nullptr},
         {"\n", "1", nullptr},
@@ -230,7 +230,7 @@ std::vector<Torn> TornTexts()
     };
 }
 
-TEST_F(FileReadPathTest, ALineThatAFailedReadCutsOffIsNoLine)
+TEST_F(FileReadPathTest, ALineCutOffByAFailedReadIsIgnored)
 {
     for (const Torn& row : TornTexts()) {
         bool failed = false;
@@ -245,7 +245,7 @@ TEST_F(FileReadPathTest, ALineThatAFailedReadCutsOffIsNoLine)
     }
 }
 
-TEST_F(FileReadPathTest, NoDescriptorIsLeftOpen)
+TEST_F(FileReadPathTest, LeavesNoDescriptorOpen)
 {
     const std::size_t before = CountDescriptors();
     Json::Value value;
@@ -259,14 +259,14 @@ TEST_F(FileReadPathTest, NoDescriptorIsLeftOpen)
 
 // ---------------------------------------------------------------------------------------- Read(fd)
 
-TEST_F(FileReadDescriptorTest, AFileIsOneDocumentOfAnyKind)
+TEST_F(FileReadDescriptorTest, AFileHoldsOneDocumentOfAnyType)
 {
     const std::string chunk(1023, ' ');
     const std::vector<Parsed> table = {
         {"{\"a\":\n1}\n", R"({"a":1})"},
         {"[\r\n1]\r\n", "[1]"},
         {"null", "null"},
-        // Newlines stay.
+        // Newlines are kept.
         {"\"one\ntext\"", R"("one\ntext")"},
         {"1\n2", nullptr},
         {"tr\nue", nullptr},
@@ -274,7 +274,7 @@ TEST_F(FileReadDescriptorTest, AFileIsOneDocumentOfAnyKind)
         {"{\"a\":1", nullptr},
         {"{}}", nullptr},
         {DeepText(), nullptr},
-        // Of each piece of 1023 bytes, or up to a newline, what follows a zero byte is passed over.
+        // In each chunk, of 1023 bytes or up to a newline, what follows a zero byte is ignored.
         {Bytes("[1\0 and more\n]"), "[1]"},
         {Bytes("[1]\0 and more"), "[1]"},
         {Bytes("\0nothing\n1"), "1"},
@@ -294,7 +294,7 @@ TEST_F(FileReadDescriptorTest, AFileIsOneDocumentOfAnyKind)
     }
 }
 
-TEST_F(FileReadDescriptorTest, NoProperPrefixOfADocumentIsOne)
+TEST_F(FileReadDescriptorTest, APrefixOfADocumentIsRefused)
 {
     const std::string text = "{\"a\":[1,{\"b\":\"c d\"},\nnull],\n\"e\":{\"f\":-1.5,\"g\":true}}";
     for (std::size_t size = 0; size < text.size(); ++size) {
@@ -304,7 +304,7 @@ TEST_F(FileReadDescriptorTest, NoProperPrefixOfADocumentIsOne)
     }
 }
 
-TEST_F(FileReadDescriptorTest, ReadingBeginsWhereTheDescriptorStands)
+TEST_F(FileReadDescriptorTest, ReadsFromTheOffsetOfTheDescriptor)
 {
     WriteFile(path, "not this [1,2]");
     const int fd = OpenFile(path, O_RDWR);
@@ -335,8 +335,8 @@ TEST_F(FileReadDescriptorTest, APipeIsReadToItsEnd)
     EXPECT_FALSE(IsDescriptorOpen(pipe[0]));
 }
 
-// Memory is a file, too: reading it fails where nothing is mapped.
-TEST_F(FileReadDescriptorTest, ALineThatAFailedReadCutsOffIsNoLine)
+// /proc/self/mem: reading fails where nothing is mapped.
+TEST_F(FileReadDescriptorTest, ALineCutOffByAFailedReadIsIgnored)
 {
     constexpr std::size_t PageSize = 4096;
     void* const pages =
@@ -358,8 +358,8 @@ TEST_F(FileReadDescriptorTest, ALineThatAFailedReadCutsOffIsNoLine)
     ::munmap(pages, PageSize);
 }
 
-// Nothing is lost where reading only had to be tried again.
-TEST_F(FileReadDescriptorTest, APipeThatWasEmptyForAMomentIsReadToItsEnd)
+// An interruption is no failure: nothing is lost.
+TEST_F(FileReadDescriptorTest, APipeThatIsEmptyForAMomentIsReadToItsEnd)
 {
     std::array<int, 2> pipe{};
     ASSERT_EQ(::pipe2(pipe.data(), O_CLOEXEC | O_NONBLOCK), 0);
@@ -378,7 +378,7 @@ TEST_F(FileReadDescriptorTest, APipeThatWasEmptyForAMomentIsReadToItsEnd)
     EXPECT_EQ(toString(value), "[2]");
 }
 
-TEST_F(FileReadDescriptorTest, ADirectoryIsNoDocumentAndNoLine)
+TEST_F(FileReadDescriptorTest, ADirectoryIsRefusedWithoutALogLine)
 {
     const int fd = OpenFile(dir.Path(), O_RDONLY);
     Json::Value value("old");
@@ -387,7 +387,7 @@ TEST_F(FileReadDescriptorTest, ADirectoryIsNoDocumentAndNoLine)
     EXPECT_FALSE(IsDescriptorOpen(fd));
 }
 
-TEST_F(FileReadDescriptorTest, ADescriptorThatCannotBeReadStaysTheCallers)
+TEST_F(FileReadDescriptorTest, ADescriptorThatCannotBeReadStaysOpen)
 {
     const int fd = OpenFile(path, O_WRONLY | O_CREAT);
     Json::Value value("old");
@@ -410,7 +410,7 @@ TEST_F(FileReadDescriptorTest, ADescriptorThatIsNotOpenIsRefused)
     }
 }
 
-TEST_F(FileReadDescriptorTest, ALockHeldThroughTheDescriptorEnds)
+TEST_F(FileReadDescriptorTest, EndsALockThatIsHeldThroughTheDescriptor)
 {
     WriteFile(path, "1");
     const int fd = OpenFile(path, O_RDONLY);
@@ -433,7 +433,7 @@ Json::Value SomeDocument()
 }
 constexpr const char* SomeText = "{\"list\":[1,\"\xc3\xa4\"],\"percent\":\"%s %n %m\"}";
 
-TEST_F(FileWritePathTest, AFileIsTheTextAndANewline)
+TEST_F(FileWritePathTest, WritesTheTextAndANewline)
 {
     EXPECT_TRUE(File::Write(path, SomeDocument()));
     EXPECT_EQ(ReadFile(path), std::string(SomeText) + "\n");
@@ -443,7 +443,7 @@ TEST_F(FileWritePathTest, AFileIsTheTextAndANewline)
     EXPECT_EQ(ReadFile(path), "\"two\\nlines\"\n");
 }
 
-TEST_F(FileWritePathTest, ADocumentIsReadBackAsItWasWritten)
+TEST_F(FileWritePathTest, ADocumentCanBeReadAsItWasWritten)
 {
     for (const Json::Value& document : {SomeDocument(), DocumentOfTenMegabytes()}) {
         EXPECT_TRUE(File::Write(path, document));
@@ -453,7 +453,7 @@ TEST_F(FileWritePathTest, ADocumentIsReadBackAsItWasWritten)
     }
 }
 
-TEST_F(FileWritePathTest, AnOldFileIsEmptiedAndWrittenInPlace)
+TEST_F(FileWritePathTest, TruncatesAnOldFileAndWritesInPlace)
 {
     WriteFile(path, std::string(1000, 'x'));
     ASSERT_EQ(::chmod(path.c_str(), 0640), 0);
@@ -465,7 +465,7 @@ TEST_F(FileWritePathTest, AnOldFileIsEmptiedAndWrittenInPlace)
     EXPECT_THAT(NamesIn(dir.Path()), ElementsAre("doc.json"));
 }
 
-TEST_F(FileWritePathTest, ALinkIsFollowed)
+TEST_F(FileWritePathTest, FollowsASymbolicLink)
 {
     std::filesystem::create_symlink(dir.File("target"), path);
     EXPECT_TRUE(File::Write(path, 1));
@@ -473,7 +473,7 @@ TEST_F(FileWritePathTest, ALinkIsFollowed)
     EXPECT_TRUE(std::filesystem::is_symlink(path));
 }
 
-TEST_F(FileWritePathTest, ANewFileGetsReadAndWriteForAllLessTheUmask)
+TEST_F(FileWritePathTest, ANewFileGetsMode0666LessTheUmask)
 {
     for (const mode_t mask : {0U, 0022U, 0077U}) {
         const Umask umask(mask);
@@ -483,7 +483,7 @@ TEST_F(FileWritePathTest, ANewFileGetsReadAndWriteForAllLessTheUmask)
     }
 }
 
-TEST_F(FileWritePathTest, AnEmptyPathIsRefused)
+TEST_F(FileWritePathTest, RefusesAnEmptyPath)
 {
     EXPECT_FALSE(File::Write("", 1));
     ExpectLines({Err("Write", "Empty path to write.")});
@@ -498,7 +498,7 @@ TEST_F(FileWritePathTest, AFileThatCannotBeOpenedIsRefused)
     EXPECT_THAT(NamesIn(dir.Path()), IsEmpty());
 }
 
-TEST_F(FileWritePathTest, AFileThatMayNotBeWrittenIsRefused)
+TEST_F(FileWritePathTest, AFileWithoutWritePermissionIsRefused)
 {
     CheckAsOrdinaryUser(dir, [&] {
         WriteFile(path, "old");
@@ -509,13 +509,13 @@ TEST_F(FileWritePathTest, AFileThatMayNotBeWrittenIsRefused)
     });
 }
 
-TEST_F(FileWritePathTest, AFullDiskIsTold)
+TEST_F(FileWritePathTest, AFullDiskIsLogged)
 {
     EXPECT_FALSE(File::Write("/dev/full", SomeDocument()));
     ExpectLines({Err("Write", std::string("Failed to write [") + SomeText + "] to [/dev/full].")});
 }
 
-TEST_F(FileWritePathTest, AFailureHalfwayLeavesAPartBehind)
+TEST_F(FileWritePathTest, AFailureHalfwayLeavesAPartOfTheDocument)
 {
     WriteFile(path, "the old text");
     bool full = false;
@@ -528,7 +528,7 @@ TEST_F(FileWritePathTest, AFailureHalfwayLeavesAPartBehind)
     EXPECT_EQ(ReadFile(path), std::string(SomeText, 4));
 }
 
-TEST_F(FileWritePathTest, ShortWritesAndInterruptionsAreGoneOnFrom)
+TEST_F(FileWritePathTest, ContinuesAfterShortWritesAndInterruptions)
 {
     int calls = 0;
     faults.write = [&](int fd, const void* buffer, std::size_t /*size*/) -> ssize_t {
@@ -538,7 +538,7 @@ TEST_F(FileWritePathTest, ShortWritesAndInterruptionsAreGoneOnFrom)
     EXPECT_EQ(ReadFile(path), std::string(SomeText) + "\n");
 }
 
-TEST_F(FileWritePathTest, NoDescriptorIsLeftOpen)
+TEST_F(FileWritePathTest, LeavesNoDescriptorOpen)
 {
     const std::size_t before = CountDescriptors();
     EXPECT_TRUE(File::Write(path, 1));
@@ -549,7 +549,7 @@ TEST_F(FileWritePathTest, NoDescriptorIsLeftOpen)
 
 // --------------------------------------------------------------------------------------- Write(fd)
 
-TEST_F(FileWriteDescriptorTest, AFileIsTheTextWithoutANewline)
+TEST_F(FileWriteDescriptorTest, WritesTheTextWithoutANewline)
 {
     const int fd = OpenFile(path, O_WRONLY | O_CREAT);
     EXPECT_TRUE(File::Write(fd, SomeDocument()));
@@ -557,7 +557,7 @@ TEST_F(FileWriteDescriptorTest, AFileIsTheTextWithoutANewline)
     EXPECT_FALSE(IsDescriptorOpen(fd));
 }
 
-TEST_F(FileWriteDescriptorTest, WritingBeginsWhereTheDescriptorStandsAndCutsNothingOff)
+TEST_F(FileWriteDescriptorTest, WritesAtTheOffsetOfTheDescriptorWithoutTruncating)
 {
     WriteFile(path, "0123456789");
     const int fd = OpenFile(path, O_RDWR);
@@ -566,7 +566,7 @@ TEST_F(FileWriteDescriptorTest, WritingBeginsWhereTheDescriptorStandsAndCutsNoth
     EXPECT_EQ(ReadFile(path), "012\"ab\"789");
 }
 
-TEST_F(FileWriteDescriptorTest, ADocumentIsReadBackAsItWasWritten)
+TEST_F(FileWriteDescriptorTest, ADocumentCanBeReadAsItWasWritten)
 {
     const Json::Value document = DocumentOfTenMegabytes();
     EXPECT_TRUE(File::Write(OpenFile(path, O_WRONLY | O_CREAT), document));
@@ -575,8 +575,8 @@ TEST_F(FileWriteDescriptorTest, ADocumentIsReadBackAsItWasWritten)
     EXPECT_TRUE(value == document);
 }
 
-// Short documents, too: with a buffered stream only the close would meet the full disk.
-TEST_F(FileWriteDescriptorTest, AFullDiskIsToldForDocumentsOfAnySize)
+// Short documents, too: with a buffered stream only the close would fail.
+TEST_F(FileWriteDescriptorTest, AFullDiskIsLoggedForDocumentsOfAnySize)
 {
     for (const std::size_t size : {1U, 10U, 1024U, 4096U, 100'000U}) {
         const Json::Value document(std::string(size - 1, 'x') + "y");
@@ -588,7 +588,7 @@ TEST_F(FileWriteDescriptorTest, AFullDiskIsToldForDocumentsOfAnySize)
     }
 }
 
-TEST_F(FileWriteDescriptorTest, APipeThatNobodyReadsIsTold)
+TEST_F(FileWriteDescriptorTest, APipeWithoutAReaderIsLogged)
 {
     CheckInChild([&] {
         std::array<int, 2> pipe{};
@@ -600,7 +600,7 @@ TEST_F(FileWriteDescriptorTest, APipeThatNobodyReadsIsTold)
     });
 }
 
-TEST_F(FileWriteDescriptorTest, ADescriptorThatCannotBeWrittenStaysTheCallers)
+TEST_F(FileWriteDescriptorTest, ADescriptorThatCannotBeWrittenStaysOpen)
 {
     WriteFile(path, "old");
     const int fd = OpenFile(path, O_RDONLY);
@@ -621,7 +621,7 @@ TEST_F(FileWriteDescriptorTest, ADescriptorThatIsNotOpenIsRefused)
     }
 }
 
-TEST_F(FileWriteDescriptorTest, ALockHeldThroughTheDescriptorEnds)
+TEST_F(FileWriteDescriptorTest, EndsALockThatIsHeldThroughTheDescriptor)
 {
     const int fd = OpenFile(path, O_WRONLY | O_CREAT);
     ASSERT_EQ(::flock(fd, LOCK_EX | LOCK_NB), 0);
@@ -632,7 +632,7 @@ TEST_F(FileWriteDescriptorTest, ALockHeldThroughTheDescriptorEnds)
 
 // --------------------------------------------------------------------------------------- CreateDir
 
-TEST_F(FileCreateDirTest, TheModeIsExactWhateverTheUmask)
+TEST_F(FileCreateDirTest, MakesADirectoryOfTheModeWhateverTheUmask)
 {
     for (const mode_t mask : {0U, 0022U, 0077U}) {
         for (const int mode : {0, 01, 0700, 0750, 0755, 0777}) {
@@ -655,7 +655,7 @@ TEST_F(FileCreateDirTest, RunsMkdirWithTheModeInOctal)
     ASSERT_EQ(::rmdir(dir.File("b").c_str()), 0);
 }
 
-TEST_F(FileCreateDirTest, ParentsAreMadeWithTheUsualMode)
+TEST_F(FileCreateDirTest, MakesParentsWithTheUsualMode)
 {
     const Umask umask(0022);
     EXPECT_TRUE(File::CreateDir(dir.File("a/b/c"), 0700));
@@ -664,7 +664,7 @@ TEST_F(FileCreateDirTest, ParentsAreMadeWithTheUsualMode)
     EXPECT_EQ(ModeOf(dir.File("a/b/c")), 0700U);
 }
 
-TEST_F(FileCreateDirTest, ADirectoryThatIsThereStaysAsItIs)
+TEST_F(FileCreateDirTest, AnExistingDirectoryStaysAsItIs)
 {
     const std::string there = dir.File("there");
     std::filesystem::create_directory(there);
@@ -679,14 +679,14 @@ TEST_F(FileCreateDirTest, ADirectoryThatIsThereStaysAsItIs)
     EXPECT_THAT(programs, IsEmpty());
 }
 
-TEST_F(FileCreateDirTest, AnEmptyPathIsRefusedWithoutALine)
+TEST_F(FileCreateDirTest, RefusesAnEmptyPathWithoutALogLine)
 {
     NotePrograms();
     for (const int mode : {0755, 01000, -1}) EXPECT_FALSE(File::CreateDir("", mode));
     EXPECT_THAT(programs, IsEmpty());
 }
 
-TEST_F(FileCreateDirTest, ModesThatAreNoneAreRefused)
+TEST_F(FileCreateDirTest, RefusesInvalidModes)
 {
     struct Row {
         int mode;
@@ -710,7 +710,7 @@ TEST_F(FileCreateDirTest, ModesThatAreNoneAreRefused)
     EXPECT_THAT(NamesIn(dir.Path()), IsEmpty());
 }
 
-TEST_F(FileCreateDirTest, AFileInTheWayIsTold)
+TEST_F(FileCreateDirTest, AFileInTheWayIsLogged)
 {
     WriteFile(dir.File("file"), "stays");
     for (const std::string& place : {dir.File("file"), dir.File("file/below")}) {
@@ -720,14 +720,14 @@ TEST_F(FileCreateDirTest, AFileInTheWayIsTold)
     EXPECT_EQ(ReadFile(dir.File("file")), "stays");
 }
 
-TEST_F(FileCreateDirTest, AProgramThatCannotBeStartedIsTold)
+TEST_F(FileCreateDirTest, AProgramThatCannotBeStartedIsLogged)
 {
     faults.spawn = FailingToStart(ENOENT);
     EXPECT_FALSE(File::CreateDir(dir.File("new"), 0));
     ExpectLines({Err("CreateDir", "Failed to create dir [" + dir.File("new") + "] with mode [0]")});
 }
 
-TEST_F(FileCreateDirTest, WhereTheResultIsLostTheDirectoryTellsWhetherItWasMade)
+TEST_F(FileCreateDirTest, IfTheResultIsLostTheDirectoryTellsWhetherItWasMade)
 {
     LoseResults();
     EXPECT_TRUE(File::CreateDir(dir.File("new"), 0755));
@@ -737,7 +737,7 @@ TEST_F(FileCreateDirTest, WhereTheResultIsLostTheDirectoryTellsWhetherItWasMade)
         {Err("CreateDir", "Failed to create dir [" + dir.File("file") + "] with mode [755]")});
 }
 
-TEST_F(FileCreateDirTest, APathIsTakenAsItStands)
+TEST_F(FileCreateDirTest, PassesThePathUnchanged)
 {
     for (const char* name : {"a b", "$HOME", "a;b", "*", "'", "\"", "\\", "a\nb", "\xff"}) {
         EXPECT_TRUE(File::CreateDir(dir.File(name), 0755));
@@ -749,7 +749,7 @@ TEST_F(FileCreateDirTest, APathIsTakenAsItStands)
 
 // --------------------------------------------------------------------------------------- RemoveDir
 
-TEST_F(FileRemoveDirTest, ATreeIsRemovedWithRm)
+TEST_F(FileRemoveDirTest, RemovesATreeByRm)
 {
     std::filesystem::create_directories(dir.File("tree/a/b"));
     WriteFile(dir.File("tree/a/file"), "text");
@@ -760,7 +760,7 @@ TEST_F(FileRemoveDirTest, ATreeIsRemovedWithRm)
     EXPECT_THAT(NamesIn(dir.Path()), ElementsAre("other"));
 }
 
-TEST_F(FileRemoveDirTest, WhatIsNoDirectoryIsASuccessThatRemovesNothing)
+TEST_F(FileRemoveDirTest, LeavesWhatIsNoDirectoryAndSucceeds)
 {
     WriteFile(path, "text");
     NotePrograms();
@@ -771,7 +771,7 @@ TEST_F(FileRemoveDirTest, WhatIsNoDirectoryIsASuccessThatRemovesNothing)
     EXPECT_EQ(ReadFile(path), "text");
 }
 
-TEST_F(FileRemoveDirTest, OfALinkTheLinkIsRemoved)
+TEST_F(FileRemoveDirTest, RemovesASymbolicLinkAndNotItsTarget)
 {
     std::filesystem::create_directory(dir.File("target"));
     WriteFile(dir.File("target/file"), "text");
@@ -781,7 +781,7 @@ TEST_F(FileRemoveDirTest, OfALinkTheLinkIsRemoved)
     EXPECT_EQ(ReadFile(dir.File("target/file")), "text");
 }
 
-TEST_F(FileRemoveDirTest, WhereTheResultIsLostTheDirectoryTellsWhetherItIsGone)
+TEST_F(FileRemoveDirTest, IfTheResultIsLostTheDirectoryTellsWhetherItIsGone)
 {
     LoseResults();
     std::filesystem::create_directories(dir.File("tree/below"));
@@ -794,7 +794,7 @@ TEST_F(FileRemoveDirTest, WhereTheResultIsLostTheDirectoryTellsWhetherItIsGone)
     EXPECT_FALSE(File::RemoveDir(dir.File("tree")));
 }
 
-TEST_F(FileRemoveDirTest, AFailureIsToldByTheResultAlone)
+TEST_F(FileRemoveDirTest, AFailureIsNotLogged)
 {
     CheckAsOrdinaryUser(dir, [&] {
         std::filesystem::create_directories(dir.File("locked/below"));
@@ -824,7 +824,7 @@ TEST_F(FileTest, TheParentDirectoryIsTheTextBeforeTheLastSlash)
     for (const Row& row : table) EXPECT_EQ(File::GetParentDir(row.path), row.parent) << row.path;
 }
 
-TEST_F(FileTest, OnlyADescriptorOfARegularFileIsOne)
+TEST_F(FileTest, IsRegularFileOnlyForARegularFile)
 {
     struct Row {
         std::string name;

@@ -1,4 +1,4 @@
-// Files of one JSON document: fromFile and toFile of json_helpers.cpp.
+// fromFile and toFile of json_helpers.cpp.
 #include "base/json_helpers.h"
 
 #include <gmock/gmock.h>
@@ -30,7 +30,7 @@ using ::testing::UnorderedElementsAre;
 
 constexpr const char* Name = "doc";
 
-// Nothing here logs: the fixture fails on every line.
+// Nothing here logs: the fixture fails on any line.
 class JsonFileTest : public LoggedTest {
   protected:
     JsonFileTest() : LoggedTest("json_helpers.cpp") {}
@@ -58,7 +58,7 @@ bool HoldsADocument(const std::string& path)
            document == Document(document["writer"].asInt(), document["round"].asInt());
 }
 
-TEST_F(JsonFileTest, ADocumentIsReadBackAsItWasWritten)
+TEST_F(JsonFileTest, ADocumentCanBeReadAsItWasWritten)
 {
     Json::Value object;
     object["text"] = Bytes("zero \0, \xc3\xa4, \xff, \n \" \\ /");
@@ -76,7 +76,7 @@ TEST_F(JsonFileTest, ADocumentIsReadBackAsItWasWritten)
     }
 }
 
-TEST_F(JsonFileTest, AFileIsTheCompactTextWithoutANewline)
+TEST_F(JsonFileTest, WritesTheCompactTextWithoutANewline)
 {
     Json::Value document;
     document["b"].append(1);
@@ -85,7 +85,7 @@ TEST_F(JsonFileTest, AFileIsTheCompactTextWithoutANewline)
     EXPECT_EQ(ReadFile(path), "{\"a\":\"\xc3\xa4\",\"b\":[1]}");
 }
 
-TEST_F(JsonFileTest, WritingReplacesTheFileAndKeepsItsBits)
+TEST_F(JsonFileTest, WritingReplacesTheFileAndKeepsItsMode)
 {
     const Umask umask(0077);
     WriteFile(path, std::string(1000, ' '));
@@ -113,7 +113,7 @@ TEST_F(JsonFileTest, AFailedWriteLeavesTheOldDocument)
     }
 }
 
-TEST_F(JsonFileTest, WhatIsNoDocumentIsNotReadAndLeavesTheValue)
+TEST_F(JsonFileTest, ATextThatIsNoDocumentLeavesTheValue)
 {
     const std::string deep = std::string(100'000, '[') + std::string(100'000, ']');
     const std::vector<std::string> texts = {
@@ -126,7 +126,7 @@ TEST_F(JsonFileTest, WhatIsNoDocumentIsNotReadAndLeavesTheValue)
     }
 }
 
-TEST_F(JsonFileTest, NoProperPrefixOfADocumentIsOne)
+TEST_F(JsonFileTest, APrefixOfADocumentIsRefused)
 {
     const std::string text = R"({"a":[1,{"b":"c d"},null],"e":{"f":-1.5e3,"g":true}})";
     for (std::size_t size = 0; size < text.size(); ++size) {
@@ -141,7 +141,7 @@ TEST_F(JsonFileTest, NoProperPrefixOfADocumentIsOne)
     EXPECT_EQ(value["e"]["g"], true);
 }
 
-TEST_F(JsonFileTest, BlanksAndNewlinesBelongToNoDocument)
+TEST_F(JsonFileTest, AllowsBlanksAndNewlinesAroundTheDocument)
 {
     for (const char* text : {"[1,\n 2]\n", "\r\n[1,\r\n2]\r\n", "\t[1,2] \n\n\n"}) {
         WriteFile(path, text);
@@ -151,7 +151,7 @@ TEST_F(JsonFileTest, BlanksAndNewlinesBelongToNoDocument)
     }
 }
 
-TEST_F(JsonFileTest, WhatCannotBeReadLeavesTheValue)
+TEST_F(JsonFileTest, AFileThatCannotBeReadLeavesTheValue)
 {
     Json::Value value("old");
     EXPECT_FALSE(fromFile(value, path));
@@ -163,7 +163,7 @@ TEST_F(JsonFileTest, WhatCannotBeReadLeavesTheValue)
     EXPECT_FALSE(fromFile(value, path));
     faults.open = nullptr;
 
-    // What comes before a failed read may look like a document.
+    // What was read before a failure may look like a document.
     int calls = 0;
     faults.read = [&](int fd, void* buffer, std::size_t /*size*/) -> ssize_t {
         return ++calls == 1 ? RealRead(fd, buffer, 1) : Failing(EIO)();
@@ -173,7 +173,7 @@ TEST_F(JsonFileTest, WhatCannotBeReadLeavesTheValue)
     EXPECT_EQ(value, "old");
 }
 
-TEST_F(JsonFileTest, WhatIsNoRegularFileHoldsNoDocumentAndIsNotWaitedFor)
+TEST_F(JsonFileTest, RefusesWhatIsNoRegularFileWithoutWaiting)
 {
     for (const SpecialFile::Kind kind : SpecialFile::Kinds()) {
         const SpecialFile special(kind, path, "1");
@@ -185,7 +185,7 @@ TEST_F(JsonFileTest, WhatIsNoRegularFileHoldsNoDocumentAndIsNotWaitedFor)
     }
 }
 
-TEST_F(JsonFileTest, NoDescriptorIsLeftOpen)
+TEST_F(JsonFileTest, LeavesNoDescriptorOpen)
 {
     const std::size_t before = CountDescriptors();
     Json::Value value;
@@ -197,7 +197,7 @@ TEST_F(JsonFileTest, NoDescriptorIsLeftOpen)
     EXPECT_EQ(CountDescriptors(), before);
 }
 
-// What the locks of a file system may be like.
+// How the locks of a file system may behave.
 struct Locks {
     const char* name;
     std::function<int(int, int, void*)> fcntl;
@@ -257,7 +257,7 @@ TEST_P(ManyWritersTest, ReadersSeeWholeDocuments)
     EXPECT_THAT(NamesIn(dir.Path()), UnorderedElementsAre(Name, "stop"));
 }
 
-TEST_F(JsonFileTest, AWriterThatIsKilledLeavesAWholeDocument)
+TEST_F(JsonFileTest, AKilledWriterLeavesAWholeDocument)
 {
     constexpr int Kills = 20;
     for (int kill = 0; kill < Kills; ++kill) {
