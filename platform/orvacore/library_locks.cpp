@@ -102,7 +102,8 @@ void TakeLibraryLocks()
     std::tm parts{};
     ::localtime_r(&time, &parts);  // as syslog() does for its time stamp
     const std::locale copy;        // as each stream makes one
-    ::setlogmask(0);               // reads the mask, under the lock of syslog()
+    // Reads the mask, under the lock of syslog().
+    ::setlogmask(0);  // NOLINT(concurrency-mt-unsafe)
 }
 
 void TakeLibraryLocksOr(void (*whenStuck)())
@@ -116,13 +117,13 @@ void TakeLibraryLocksOr(void (*whenStuck)())
     ::sigemptyset(&alarm);
     ::sigaddset(&alarm, SIGALRM);
     sigset_t mask;
-    ::sigprocmask(SIG_UNBLOCK, &alarm, &mask);
+    ::sigprocmask(SIG_UNBLOCK, &alarm, &mask);  // NOLINT(concurrency-mt-unsafe): a single thread
 
     SetTicks(TickUSec);
     TakeAllocatorLocks();
     TakeLibraryLocks();
     SetTicks(0);
 
-    ::sigprocmask(SIG_SETMASK, &mask, nullptr);
+    ::sigprocmask(SIG_SETMASK, &mask, nullptr);  // NOLINT(concurrency-mt-unsafe): likewise
     ::sigaction(SIGALRM, &action, nullptr);
 }
