@@ -30,7 +30,6 @@
 #ifndef ORVADRCORE_SQLITE_DB_H
 #define ORVADRCORE_SQLITE_DB_H
 
-#include <cstdint>
 #include <memory>
 #include <string>
 #include <vector>
@@ -41,12 +40,9 @@
 #include <orvadrcore/sqlite_command.h>
 #include <orvadrcore/sqlite_value.h>
 
-struct sqlite3;
-
 namespace OrvaDRCore {
 
-struct ConnectionState;
-class SqliteTransaction;
+class SqliteConnection;
 
 /// A connection to an SQLite file. The head of sqlite_db.h tells what holds for retries, errors,
 /// threads and forks.
@@ -72,7 +68,7 @@ class ORVADRCORE_API SqliteDB {
     /// Takes the connection over, with error code and record. `other` is closed then, without an
     /// error, and still names its file.
     /// \param other  the connection to take
-    /// \note Copies the file's name: without memory for that the program ends.
+    /// \note Makes a connection, closed, for `other`: without memory for that the program ends.
     /// \note A transaction that is open moves along, but not the SqliteTransaction that began it,
     ///       which has nothing to commit or to roll back any more: end the transaction by Exec().
     SqliteDB(SqliteDB&& other) noexcept;
@@ -264,12 +260,12 @@ class ORVADRCORE_API SqliteDB {
 
     /// The error code of the last operation.
     /// \return 0 after a success, otherwise an ERR::Code
-    int GetErrCode() const { return errCode; }
+    int GetErrCode() const;
 
     /// The error record of the last operation.
     /// \return null after a success and where SQLite was not asked, otherwise the record; good
     ///         until the next operation
-    const Json::Value& GetErr() const { return errRecord; }
+    const Json::Value& GetErr() const;
 
     /// Records a failure of SQLite: code 404 and an error object.
     /// \param command     the statement; left out of the object when empty, and when it has 2 GiB or
@@ -298,46 +294,13 @@ class ORVADRCORE_API SqliteDB {
     /// \return as above
     bool DoSelectSqliteRecords(const std::string& command, std::vector<SqliteValueList>& records);
 
+    /// \cond INTERNAL
+    /// For the library's own sources, which alone know the type.
+    ORVADRCORE_LOCAL SqliteConnection& Connection() const;
+    /// \endcond
+
   private:
-    friend class SqliteTransaction;  // owns the connection's transaction, see `transaction`
-
-    struct Tries;
-    struct Operation;
-
-    ORVADRCORE_LOCAL void SetErr(int code) const;
-    template <class Attempt>
-    Tries TryRepeatedly(Attempt attempt);
-    template <class TakeRow>
-    bool SelectRows(const std::string& command, TakeRow takeRow);
-    template <class TakeRow>
-    bool DoSelect(const std::string& command, TakeRow takeRow);
-
-    ORVADRCORE_LOCAL ConnectionState& State();
-    ORVADRCORE_LOCAL bool IsInTransaction() const;
-    ORVADRCORE_LOCAL std::uint64_t CountTransactions() const;
-    ORVADRCORE_LOCAL bool InsertRows(const std::string& table,
-                                     const std::vector<SqliteValueList>& records, bool replacable);
-    template <class Work>
-    bool DoWhole(bool isNested, Work work);
-
-    ORVADRCORE_LOCAL bool OpenFor(const char* function);
-    ORVADRCORE_LOCAL bool OpenWithTable(const char* function, const SqliteTableHandler& table);
-    ORVADRCORE_LOCAL bool Prepare(const Operation& operation, const SqliteCommand& command);
-    ORVADRCORE_LOCAL bool ExecCommand(const Operation& operation, const SqliteCommand& command);
-    template <class Output>
-    bool SelectCommandInto(const Operation& operation, const SelectCommand& command,
-                           Output& output);
-
-    mutable int errCode = 0;
-    mutable Json::Value errRecord;
-    sqlite3* handle = nullptr;
-    std::string path;
-    unsigned int retryLimit;
-    std::unique_ptr<ConnectionState> state;  // made when it is needed first
-
-    // The object that began the transaction of this connection last and was not told yet that it
-    // is over. While there is one, nothing is retried.
-    const SqliteTransaction* transaction = nullptr;
+    std::unique_ptr<SqliteConnection> connection_;
 };
 
 }  // namespace OrvaDRCore

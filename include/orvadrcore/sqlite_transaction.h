@@ -41,8 +41,8 @@ namespace OrvaDRCore {
 class ORVADRCORE_API SqliteTransaction {
   public:
     /// Nothing is opened or begun yet.
-    /// \param connection  the connection, referred to
-    explicit SqliteTransaction(SqliteDB& connection);
+    /// \param db  the connection, referred to
+    explicit SqliteTransaction(SqliteDB& db);
 
     SqliteTransaction(const SqliteTransaction&) = delete;
     SqliteTransaction& operator=(const SqliteTransaction&) = delete;
@@ -87,9 +87,9 @@ class ORVADRCORE_API SqliteTransaction {
     ORVADRCORE_LOCAL void ClaimWhatIsOpen();
     ORVADRCORE_LOCAL void Release();
 
-    SqliteDB& db;
-    bool begun = false;        // and not yet told that it is over
-    std::uint64_t number = 0;  // of the transaction, among all that were begun on the connection
+    SqliteDB& db_;
+    bool hasBegun_ = false;     // and has not been told that the transaction is over
+    std::uint64_t number_ = 0;  // of the transaction, among all that were begun on the connection
 };
 
 }  // namespace OrvaDRCore

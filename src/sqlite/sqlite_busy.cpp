@@ -64,11 +64,10 @@ void Sleep(microseconds time)
 
 }  // namespace
 
-BusyWait::BusyWait() : random(Seed()) {}
-
 void BusyWait::Install(sqlite3* connection)
 {
     handle = connection;
+    random.seed(Seed());
     TakeBack();
 }
 

@@ -32,7 +32,7 @@ inline constexpr int BusyTimeoutMSec = 1000;
 // connection is closed.
 class BusyWait {
   public:
-    BusyWait();
+    BusyWait() = default;
     BusyWait(const BusyWait&) = delete;
     BusyWait& operator=(const BusyWait&) = delete;
     ~BusyWait() = default;

@@ -1,43 +1,46 @@
 #include <orvadrcore/sqlite_transaction.h>
 
+#include <utility>
+
 #include <orvadrcore/errors.h>
 
 #include "base/log.h"
+#include "base/scope_guard.h"
+#include "sqlite/sqlite_connection.h"
 
 namespace OrvaDRCore {
 
-SqliteTransaction::SqliteTransaction(SqliteDB& connection) : db(connection) {}
+SqliteTransaction::SqliteTransaction(SqliteDB& db) : db_(db) {}
 
 SqliteTransaction::~SqliteTransaction()
 {
-    if (!begun) return;
-    const int errCode = db.errCode;
-    Json::Value errRecord;
-    errRecord.swap(db.errRecord);
+    if (!hasBegun_) return;
+    SqliteError& error = db_.Connection().Error();
+    SqliteError kept = std::exchange(error, SqliteError());
     try {
         Rollback();
     } catch (...) {
-        // Ran out of memory. The connection is closed, which has rolled back, too.
+        // Memory has run out. Rollback() has closed the connection, which also rolls back.
     }
-    db.errCode = errCode;
-    db.errRecord.swap(errRecord);
+    error = std::move(kept);
 }
 
 bool SqliteTransaction::Begin()
 {
-    if (db.IsInTransaction()) {
-        db.SetErr(ERR::BAD_PARAMETER);
-        DR_LOG(Err, "transaction is already open in db[%s]", db.path.c_str());
+    SqliteConnection& connection = db_.Connection();
+    if (connection.IsInTransaction()) {
+        connection.Error().Set(ERR::BAD_PARAMETER);
+        DR_LOG(Err, "transaction is already open in db[%s]", connection.GetPath().c_str());
         return false;
     }
-    Release();  // one that SQLite has ended
-    db.SetErr(ERR::ERR_DATABASE_OPERATION);
-    if (!db.Open()) {
-        DR_LOG(Err, "Failed to open db [%s]", db.path.c_str());
+    Release();  // a transaction that SQLite has ended
+    connection.Error().Set(ERR::ERR_DATABASE_OPERATION);
+    if (!db_.Open()) {
+        DR_LOG(Err, "Failed to open db [%s]", connection.GetPath().c_str());
         return false;
     }
     if (!Exec("BEGIN IMMEDIATE")) {
-        DR_LOG(Err, "Failed to begin transaction in db[%s]", db.path.c_str());
+        DR_LOG(Err, "Failed to begin transaction in db[%s]", connection.GetPath().c_str());
         return false;
     }
     return true;
@@ -45,19 +48,20 @@ bool SqliteTransaction::Begin()
 
 bool SqliteTransaction::Commit()
 {
-    if (!begun) {
-        db.SetErr(ERR::BAD_PARAMETER);
-        DR_LOG(Err, "no transaction to commit in db[%s]", db.path.c_str());
+    SqliteConnection& connection = db_.Connection();
+    if (!hasBegun_) {
+        connection.Error().Set(ERR::BAD_PARAMETER);
+        DR_LOG(Err, "no transaction to commit in db[%s]", connection.GetPath().c_str());
         return false;
     }
     if (!IsOpen()) {
         Release();
-        db.SetErr(ERR::ERR_DATABASE_OPERATION);
-        DR_LOG(Err, "transaction in db[%s] was rolled back", db.path.c_str());
+        connection.Error().Set(ERR::ERR_DATABASE_OPERATION);
+        DR_LOG(Err, "transaction in db[%s] was rolled back", connection.GetPath().c_str());
         return false;
     }
     if (!Exec("COMMIT")) {
-        DR_LOG(Err, "Failed to commit transaction in db[%s]", db.path.c_str());
+        DR_LOG(Err, "Failed to commit transaction in db[%s]", connection.GetPath().c_str());
         return false;
     }
     return true;
@@ -65,55 +69,51 @@ bool SqliteTransaction::Commit()
 
 bool SqliteTransaction::Rollback()
 {
+    SqliteConnection& connection = db_.Connection();
     const bool isOpen = IsOpen();
     Release();
-    db.SetErr(0);
-    bool isDone = true;
-    try {
-        isDone = !isOpen || db.DoExecSqliteCommand("ROLLBACK");
-    } catch (...) {  // ran out of memory
-        db.Close();
-        throw;
-    }
-    if (!isDone) {
-        db.Close();
-        DR_LOG(Err, "Failed to roll back transaction in db[%s]", db.path.c_str());
+    connection.Error().Set(0);
+    if (!isOpen) return true;
+    ScopeGuard close([&] { connection.Close(); });  // which also rolls back
+    if (!connection.Execute("ROLLBACK")) {
+        DR_LOG(Err, "Failed to roll back transaction in db[%s]", connection.GetPath().c_str());
         return false;
     }
+    close.Dismiss();
     return true;
 }
 
 // Whether the transaction that this object began is the one that is open on the connection.
 bool SqliteTransaction::IsOpen() const
 {
-    return db.transaction == this && db.IsInTransaction() && db.CountTransactions() == number;
+    const SqliteConnection& connection = db_.Connection();
+    return connection.GetOwner() == this && connection.IsInTransaction() &&
+           connection.CountTransactions() == number_;
 }
 
-// Begins or commits, with the retries of the connection. What is open afterwards is this object's,
-// also where memory runs out.
+// Runs BEGIN or COMMIT, with the retries of the connection. A transaction that is open afterwards
+// belongs to this object, even when memory has run out.
 bool SqliteTransaction::Exec(const char* statement)
 {
-    struct Claim {
-        SqliteTransaction& transaction;
-        ~Claim() { transaction.ClaimWhatIsOpen(); }
-    };
-    const Claim claim{*this};
-    db.transaction = nullptr;
-    return db.Exec(statement);
+    const ScopeGuard claim([this] { ClaimWhatIsOpen(); });
+    db_.Connection().SetOwner(nullptr);
+    return db_.Exec(statement);
 }
 
 void SqliteTransaction::ClaimWhatIsOpen()
 {
-    begun = db.IsInTransaction();
-    if (!begun) return;
-    db.transaction = this;
-    number = db.CountTransactions();
+    SqliteConnection& connection = db_.Connection();
+    hasBegun_ = connection.IsInTransaction();
+    if (!hasBegun_) return;
+    connection.SetOwner(this);
+    number_ = connection.CountTransactions();
 }
 
 void SqliteTransaction::Release()
 {
-    begun = false;
-    if (db.transaction == this) db.transaction = nullptr;
+    hasBegun_ = false;
+    SqliteConnection& connection = db_.Connection();
+    if (connection.GetOwner() == this) connection.SetOwner(nullptr);
 }
 
 }  // namespace OrvaDRCore

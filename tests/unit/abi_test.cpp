@@ -151,19 +151,17 @@ TEST(MemberTest, CommandsKeepTheirOrder)
                    offsetof(SelectCommand, condition)});
 }
 
-TEST(MemberTest, ConnectionsKeepTheirOrder)
+TEST(MemberTest, AConnectionIsOnePointer)
 {
-    ExpectInOrder(
-        0, {offsetof(SqliteDB, errCode), offsetof(SqliteDB, errRecord), offsetof(SqliteDB, handle),
-            offsetof(SqliteDB, path), offsetof(SqliteDB, retryLimit), offsetof(SqliteDB, state),
-            offsetof(SqliteDB, transaction)});
+    ExpectInOrder(0, {offsetof(SqliteDB, connection_)});
+    EXPECT_EQ(sizeof(SqliteDB), sizeof(void*));
 }
 
 TEST(MemberTest, TransactionsKeepTheirOrder)
 {
     // The connection is a reference, which has no offset.
     ExpectInOrder(sizeof(void*),
-                  {offsetof(SqliteTransaction, begun), offsetof(SqliteTransaction, number)});
+                  {offsetof(SqliteTransaction, hasBegun_), offsetof(SqliteTransaction, number_)});
 }
 
 TEST(MemberTest, LocksAndCachesKeepTheirOrder)

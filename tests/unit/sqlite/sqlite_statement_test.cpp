@@ -1,282 +1,81 @@
-// The selects that a connection caches: nothing but the time they take may tell of it.
 #include "sqlite/sqlite_statement.h"
 
-#include <orvadrcore/sqlite_db.h>
+#include <gtest/gtest.h>
 
-#include <algorithm>
-
-#include "support/fixtures/sqlite_fixture.h"
+#include "support/fixtures/plain_db.h"
 
 namespace {
 
-using OrvaDRCore::InsertCommand;
-using OrvaDRCore::SelectCommand;
-using OrvaDRCore::SqliteDB;
-using OrvaDRCore::SqliteTableHandler;
-using OrvaDRCore::SqliteValueList;
+using OrvaDRCore::EndBeforeLastRow;
+using OrvaDRCore::IsTooLong;
+using OrvaDRCore::PrepareStatement;
+using OrvaDRCore::Statement;
 
-class SqliteStatementTest : public SqliteFixture {
+class SqliteStatementTest : public ::testing::Test {
   protected:
-    // Counts the statements that are prepared from here on.
-    SqliteStatementTest()
+    SqliteStatementTest() { db.Run("CREATE TABLE jobs (id)"); }
+
+    int Prepare(const std::string& command)
     {
-        faults.prepare = [this](sqlite3* handle, const char* sql, sqlite3_stmt** statement) {
-            prepared.emplace_back(sql);
-            return RealPrepare(handle, sql, statement);
-        };
+        return PrepareStatement(db.Handle(), command, statement);
     }
 
-    // One by one: where preparing is counted, SQLite sees the first of several only.
-    void RunEach(const std::vector<std::string>& statements)
-    {
-        for (const std::string& statement : statements) Run(statement);
-    }
-
-    // The first row of a statement, and whether SQLite had to prepare it.
-    std::string Select(const std::string& statement)
-    {
-        prepared.clear();
-        SqliteValueList record;
-        EXPECT_TRUE(db.SelectByCommand(statement, record)) << statement;
-        // SQLite prepares statements of its own, too, when the tables have changed.
-        const bool isCached = std::count(prepared.begin(), prepared.end(), statement) == 0;
-        return record.ToStr() + (isCached ? "; cached" : "; prepared");
-    }
-
-    // Attaches another file that holds a table `nodes` with one row.
-    void AttachNodes(const std::string& name)
-    {
-        const std::string attached = dir.File(name + ".db");
-        PlainDb other(attached);
-        for (const std::string& statement : {std::string("CREATE TABLE nodes (id)"),
-                                             "INSERT INTO nodes VALUES ('" + name + "')"}) {
-            other.Run(statement);
-        }
-        ASSERT_TRUE(db.Open());
-        ASSERT_TRUE(db.Exec("ATTACH '" + attached + "' AS " + name));
-    }
-
-    const std::string ids = "SELECT id FROM jobs";
-    const std::string nodeIds = "SELECT id FROM nodes";
-    SqliteFaults faults;
-    std::vector<std::string> prepared;
+    PlainDb db{":memory:"};
+    Statement statement;
 };
 
-TEST_F(SqliteStatementTest, ASelectIsPreparedOnce)
+TEST_F(SqliteStatementTest, PreparesTheFirstStatementOfAText)
 {
-    RunEach({"CREATE TABLE jobs (id)", "INSERT INTO jobs VALUES (1), (2)"});
-    ASSERT_TRUE(db.Open());
-    EXPECT_EQ(Select(ids), "id:1; prepared");
-    EXPECT_EQ(Select(ids), "id:1; cached");
-
-    std::vector<SqliteValueList> records;
-    EXPECT_TRUE(db.SelectByCommand(ids, records));
-    EXPECT_EQ(records.size(), 2U);
-    EXPECT_EQ(Select(ids), "id:1; cached");
+    EXPECT_EQ(Prepare("SELECT 1; BAD"), SQLITE_OK);
+    ASSERT_NE(statement, nullptr);
+    EXPECT_STREQ(sqlite3_sql(statement.get()), "SELECT 1;");
 }
 
-TEST_F(SqliteStatementTest, TheTableLookupIsPreparedOnce)
+TEST_F(SqliteStatementTest, AFailureOrATextWithoutAStatementGivesNull)
 {
-    const SqliteTableHandler jobs("jobs", "id INTEGER");
-    ASSERT_TRUE(db.Open());
-    ASSERT_TRUE(db.CreateTable(jobs));
-    SelectCommand command;
-    command.SetTable(jobs);
-    command.SelectAll();
-    std::vector<SqliteValueList> records;
-    EXPECT_TRUE(db.SelectRecords(command, records));
-    prepared.clear();
-    EXPECT_TRUE(db.SelectRecords(command, records));
-    EXPECT_TRUE(db.DeleteAllRecords(jobs));
-    EXPECT_EQ(prepared, std::vector<std::string>{"DELETE FROM jobs;"});
+    EXPECT_EQ(Prepare("SELECT 1"), SQLITE_OK);
+    EXPECT_EQ(Prepare("BAD"), SQLITE_ERROR);
+    EXPECT_EQ(statement, nullptr);
+    EXPECT_EQ(Prepare("SELECT 1"), SQLITE_OK);
+    EXPECT_EQ(Prepare(" -- nothing"), SQLITE_OK);
+    EXPECT_EQ(statement, nullptr);
 }
 
-TEST_F(SqliteStatementTest, ACachedSelectSeesNewRowsAndColumns)
+TEST_F(SqliteStatementTest, PreparingOnAClosedConnectionFails)
 {
-    const std::string all = "SELECT * FROM jobs";
-    RunEach({"CREATE TABLE jobs (id)", "INSERT INTO jobs VALUES (1)"});
-    ASSERT_TRUE(db.Open());
-    EXPECT_EQ(Select(all), "id:1; prepared");
-    Run("UPDATE jobs SET id = 2");
-    EXPECT_EQ(Select(all), "id:2; cached");
-    Run("ALTER TABLE jobs ADD COLUMN size DEFAULT 7");
-    EXPECT_EQ(Select(all), "id:2, size:7; cached");
-    RunEach({"DROP TABLE jobs", "CREATE TABLE jobs (name)", "INSERT INTO jobs VALUES ('new')"});
-    EXPECT_EQ(Select(all), "name:'new'; cached");
+    EXPECT_EQ(PrepareStatement(nullptr, "SELECT 1", statement), SQLITE_MISUSE);
+    EXPECT_EQ(statement, nullptr);
 }
 
-TEST_F(SqliteStatementTest, ACachedSelectOfATableThatIsGoneFailsAsANewOneDoes)
+TEST_F(SqliteStatementTest, AnOrdinaryStatementIsNotTooLong)
 {
-    const Failure noTable{ids, SQLITE_ERROR, "no such table: jobs"};
-    Run("CREATE TABLE jobs (id)");
-    ASSERT_TRUE(retrying.Open());
-    SqliteValueList record;
-    EXPECT_TRUE(retrying.SelectByCommand(ids, record));
-    Run("DROP TABLE jobs");
-    EXPECT_FALSE(retrying.SelectByCommand(ids, record));
-    ExpectErr(retrying, 404, TriesText(noTable, 4));
-    ExpectLines({OneRowGaveUp(noTable, 4)});
-    ExpectPauses(3);
+    EXPECT_FALSE(IsTooLong(""));
+    EXPECT_FALSE(IsTooLong("SELECT 1"));
 }
 
-TEST_F(SqliteStatementTest, ACachedSelectWaitsForNobodyAndKeepsNobodyOut)
+TEST_F(SqliteStatementTest, EndingASelectBeforeItsLastRowSucceeds)
 {
-    RunEach({"CREATE TABLE jobs (id)", "INSERT INTO jobs VALUES (1), (2)"});
-    ASSERT_TRUE(db.Open());
-    EXPECT_EQ(Select(ids), "id:1; prepared");  // leaves the second row unread
-    PlainDb other(path);
-    other.Run("BEGIN EXCLUSIVE");
-    other.Run("INSERT INTO jobs VALUES (3)");
-    other.Run("COMMIT");
-    EXPECT_TRUE(db.Exec("DROP TABLE jobs"));
-    EXPECT_TRUE(db.Exec("VACUUM"));
+    ASSERT_EQ(Prepare("SELECT 1 UNION SELECT 2"), SQLITE_OK);
+    ASSERT_EQ(sqlite3_step(statement.get()), SQLITE_ROW);
+    EXPECT_EQ(EndBeforeLastRow(statement.get()), SQLITE_OK);
 }
 
-TEST_F(SqliteStatementTest, TheSelectsUsedLastAreCached)
+TEST_F(SqliteStatementTest, EndingAnInsertBeforeItsLastRowCommitsIt)
 {
-    ASSERT_TRUE(db.Open());
-    const auto number = [](int value) { return "SELECT " + std::to_string(value) + " AS x"; };
-    for (int value = 1; value <= 8; ++value) Select(number(value));
-    EXPECT_EQ(Select(number(1)), "x:1; cached");  // now that of 2 is the oldest
-    EXPECT_EQ(Select(number(9)), "x:9; prepared");
-    EXPECT_EQ(Select(number(1)), "x:1; cached");
-    EXPECT_EQ(Select(number(3)), "x:3; cached");
-    EXPECT_EQ(Select(number(2)), "x:2; prepared");
+    ASSERT_EQ(Prepare("INSERT INTO jobs VALUES (1), (2) RETURNING id"), SQLITE_OK);
+    ASSERT_EQ(sqlite3_step(statement.get()), SQLITE_ROW);
+    EXPECT_EQ(EndBeforeLastRow(statement.get()), SQLITE_OK);
+    EXPECT_EQ(db.Run("SELECT id FROM jobs"), "1;2");
 }
 
-TEST_F(SqliteStatementTest, WhatIsNoSelectOrVeryLongIsPreparedEachTime)
+TEST_F(SqliteStatementTest, EndingAnInsertReportsACommitThatFails)
 {
-    Run("CREATE TABLE jobs (id)");
-    ASSERT_TRUE(db.Open());
-    const std::string longest = "SELECT 1 AS x " + std::string(1024 - 14, ' ');
-    for (const std::string& statement :
-         {std::string("PRAGMA user_version"), std::string("INSERT INTO jobs VALUES (1)"),
-          std::string("VALUES (1)"), std::string(" SELECT 1"), longest + " "}) {
-        Select(statement);
-        Select(statement);
-        EXPECT_EQ(prepared, std::vector<std::string>{statement});
-    }
-    Select(longest);
-    EXPECT_EQ(Select(longest), "x:1; cached");
-    EXPECT_EQ(Run("SELECT count(*) FROM jobs"), "2");
-}
-
-TEST_F(SqliteStatementTest, ClosingDropsTheCachedSelects)
-{
-    ASSERT_TRUE(db.Open());
-    Select("SELECT 1 AS x");
-    db.Close();
-    EXPECT_EQ(Closed(), 1);
-    ASSERT_TRUE(db.Open());
-    EXPECT_EQ(Select("SELECT 1 AS x"), "x:1; prepared");
-}
-
-TEST_F(SqliteStatementTest, AMoveTakesTheCachedSelects)
-{
-    ASSERT_TRUE(db.Open());
-    Select("SELECT 1 AS x");
-    SqliteDB other("", 0);
-    other = std::move(db);
-    db = std::move(other);
-    EXPECT_EQ(Select("SELECT 1 AS x"), "x:1; cached");
-    EXPECT_EQ(Closed(), 0);
-}
-
-// ------------------------------------------------------------------------------ attached databases
-
-TEST_F(SqliteStatementTest, ATableMadeInMainIsReadInsteadOfTheAttachedOne)
-{
-    AttachNodes("old");
-    SelectCommand select;
-    select.SetTable(SqliteTableHandler("nodes", ""));
-    select.AddField("id");
-    SqliteValueList record;
-    ASSERT_TRUE(db.SelectRecord(select, record));
-    EXPECT_EQ(record.ToStr(), "id:'old'");
-
-    InsertCommand insert;
-    insert.SetTable(SqliteTableHandler("nodes", "id"));
-    insert.AddFieldValue("id", 1);
-    ASSERT_TRUE(db.InsertRecord(insert));  // makes main.nodes
-    ASSERT_TRUE(db.SelectRecord(select, record));
-    EXPECT_EQ(record.ToStr(), "id:1");
-}
-
-TEST_F(SqliteStatementTest, WhateverComesToBeFoundEarlierIsReadInsteadOfTheAttachedTable)
-{
-    AttachNodes("old");
-    AttachNodes("older");
-    EXPECT_EQ(Select(nodeIds), "id:'old'; prepared");
-    ASSERT_TRUE(db.Exec("CREATE VIEW nodes AS SELECT 'view' AS id"));
-    EXPECT_EQ(Select(nodeIds), "id:'view'; prepared");
-    ASSERT_TRUE(db.Exec("CREATE TEMP TABLE nodes (id)"));
-    ASSERT_TRUE(db.Exec("INSERT INTO temp.nodes VALUES ('temp')"));
-    EXPECT_EQ(Select(nodeIds), "id:'temp'; prepared");
-}
-
-TEST_F(SqliteStatementTest, ATableMadeInTheFirstOfTwoAttachedDatabasesIsRead)
-{
-    PlainDb(dir.File("empty.db")).Run("CREATE TABLE others (id)");
-    ASSERT_TRUE(db.Open());
-    ASSERT_TRUE(db.Exec("ATTACH '" + dir.File("empty.db") + "' AS empty"));
-    AttachNodes("old");
-    EXPECT_EQ(Select(nodeIds), "id:'old'; prepared");
-    ASSERT_TRUE(db.Exec("CREATE TABLE empty.nodes (id)"));
-    ASSERT_TRUE(db.Exec("INSERT INTO empty.nodes VALUES (2)"));
-    EXPECT_EQ(Select(nodeIds), "id:2; prepared");
-}
-
-TEST_F(SqliteStatementTest, ATableMadeInMainByAnotherProcessIsRead)
-{
-    AttachNodes("old");
-    EXPECT_EQ(Select(nodeIds), "id:'old'; prepared");
-    ChildProcess other([&](ChildProcess::Link&) {
-        RunEach({"CREATE TABLE nodes (id)", "INSERT INTO nodes VALUES (3)"});
-    });
-    ASSERT_EQ(other.Join(), 0);
-    // SQLite itself notices a changed schema only when it reads that database.
-    EXPECT_EQ(Select("SELECT name FROM main.sqlite_master"), "name:'nodes'; prepared");
-    EXPECT_EQ(Select(nodeIds), "id:3; prepared");
-}
-
-TEST_F(SqliteStatementTest, ASelectThatWasCachedBeforeAnAttachIsNotUsedAfterIt)
-{
-    RunEach({"CREATE TABLE nodes (id)", "INSERT INTO nodes VALUES (1)"});
-    ASSERT_TRUE(db.Open());
-    EXPECT_EQ(Select(nodeIds), "id:1; prepared");
-    EXPECT_EQ(Select(nodeIds), "id:1; cached");
-    AttachNodes("old");
-    ASSERT_TRUE(db.Exec("DROP TABLE main.nodes"));
-    EXPECT_EQ(Select(nodeIds), "id:'old'; prepared");
-    ASSERT_TRUE(db.Exec("CREATE TABLE nodes (id)"));
-    ASSERT_TRUE(db.Exec("INSERT INTO main.nodes VALUES (4)"));
-    EXPECT_EQ(Select(nodeIds), "id:4; prepared");
-}
-
-TEST_F(SqliteStatementTest, CachingResumesAfterADetachThatNoStatementBlocks)
-{
-    RunEach({"CREATE TABLE jobs (id)", "INSERT INTO jobs VALUES (1)"});
-    ASSERT_TRUE(db.Open());
-    Select(ids);
-    AttachNodes("old");
-    EXPECT_EQ(Select("SELECT id FROM old.nodes"), "id:'old'; prepared");
-    EXPECT_EQ(Select(ids), "id:1; prepared");
-    EXPECT_TRUE(db.Exec("DETACH old"));
-    EXPECT_EQ(Select(ids), "id:1; prepared");
-    EXPECT_EQ(Select(ids), "id:1; cached");
-}
-
-TEST_F(SqliteStatementTest, ATempTableIsReadInsteadOfTheTableOfACachedSelect)
-{
-    RunEach({"CREATE TABLE nodes (id)", "INSERT INTO nodes VALUES (1)"});
-    ASSERT_TRUE(db.Open());
-    Select(nodeIds);
-    EXPECT_EQ(Select(nodeIds), "id:1; cached");
-    ASSERT_TRUE(db.Exec("CREATE TEMP TABLE nodes (id)"));
-    ASSERT_TRUE(db.Exec("INSERT INTO temp.nodes VALUES (5)"));
-    EXPECT_EQ(Select(nodeIds), "id:5; cached");  // prepared again by SQLite itself
-    ASSERT_TRUE(db.Exec("DROP TABLE temp.nodes"));
-    EXPECT_EQ(Select(nodeIds), "id:1; cached");
+    db.Run(
+        "PRAGMA foreign_keys = ON; CREATE TABLE parents (id PRIMARY KEY);"
+        "CREATE TABLE children (id REFERENCES parents DEFERRABLE INITIALLY DEFERRED)");
+    ASSERT_EQ(Prepare("INSERT INTO children VALUES (1) RETURNING id"), SQLITE_OK);
+    ASSERT_EQ(sqlite3_step(statement.get()), SQLITE_ROW);
+    EXPECT_EQ(EndBeforeLastRow(statement.get()) & 0xff, SQLITE_CONSTRAINT);
 }
 
 }  // namespace

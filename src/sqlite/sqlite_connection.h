@@ -1,0 +1,86 @@
+// What a SqliteDB holds: the connection to its file, and the error of the last operation.
+#ifndef ORVADRCORE_SRC_SQLITE_SQLITE_CONNECTION_H
+#define ORVADRCORE_SRC_SQLITE_SQLITE_CONNECTION_H
+
+#include <sqlite3.h>
+
+#include <cstdint>
+#include <functional>
+#include <string>
+
+#include "sqlite/sqlite_busy.h"
+#include "sqlite/sqlite_error.h"
+#include "sqlite/sqlite_retry.h"
+#include "sqlite/sqlite_row_reader.h"
+#include "sqlite/sqlite_statement_cache.h"
+#include "sqlite/sqlite_watch.h"
+
+namespace OrvaDRCore {
+
+class SqliteTransaction;
+
+// Runs statements and logs nothing: SqliteDB and SqliteTransaction do that. It stays where it is when
+// its SqliteDB is moved, because SQLite holds pointers to its members.
+class SqliteConnection {
+  public:
+    SqliteConnection(const std::string& path, unsigned int retryLimit);
+    SqliteConnection(const SqliteConnection&) = delete;
+    SqliteConnection& operator=(const SqliteConnection&) = delete;
+    ~SqliteConnection();
+
+    const std::string& GetPath() const { return path_; }
+    unsigned int GetRetryLimit() const { return retryLimit_; }
+    sqlite3* GetHandle() const { return handle_; }
+
+    SqliteError& Error() { return error_; }
+
+    // Sets the error to a failure of SQLite. Without a message it is SQLite's last one.
+    void SetFailure(const std::string& command, int sqliteCode, const char* message);
+
+    // The two steps of opening a connection that is closed. When the second fails, the connection is
+    // open and waits for no lock. Neither changes the error.
+    bool Open();
+    bool InstallBusyWait();
+
+    bool IsOpen() const { return handle_ != nullptr; }
+    void Close();
+
+    // One attempt to run the statements of a text. Success leaves the error as it was.
+    bool Execute(const std::string& command);
+
+    // One attempt to run a statement that has rows. Each row is given to `takeRow`, which returns
+    // whether it wants another.
+    using TakeRow = std::function<bool(const RowReader&)>;
+    bool Select(const std::string& command, const TakeRow& takeRow);
+
+    // One attempt to do work in a transaction of its own or, nested, in a savepoint of the open
+    // transaction. When the work or the commit fails, all of it is rolled back.
+    bool RunAtomically(bool isNested, const std::function<bool()>& work);
+
+    // While a transaction has an owner, nothing is retried: SQLite may have rolled it back by
+    // itself, and a second attempt would run outside of it.
+    Attempts Retry(const std::function<bool()>& attempt);
+
+    bool IsInTransaction() const;
+
+    // How many transactions were begun: while a transaction is open, its number.
+    std::uint64_t CountTransactions() const { return watch_.CountTransactions(); }
+
+    // The SqliteTransaction that began the last transaction and has not been told that it is over.
+    const SqliteTransaction* GetOwner() const { return owner_; }
+    void SetOwner(const SqliteTransaction* owner) { owner_ = owner; }
+
+  private:
+    const std::string path_;
+    const unsigned int retryLimit_;
+    SqliteError error_;
+    sqlite3* handle_ = nullptr;
+    StatementWatch watch_;
+    BusyWait wait_;
+    StatementCache cache_;
+    const SqliteTransaction* owner_ = nullptr;
+};
+
+}  // namespace OrvaDRCore
+
+#endif

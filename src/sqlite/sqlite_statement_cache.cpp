@@ -1,0 +1,60 @@
+#include "sqlite/sqlite_statement_cache.h"
+
+#include <algorithm>
+#include <utility>
+
+namespace OrvaDRCore {
+
+namespace {
+
+// Room for the table lookup and the selects in a program's loops.
+constexpr std::size_t MaxCached = 8;
+
+// A list of thousands of values seldom comes twice, and its statement takes much memory.
+constexpr std::size_t MaxCachedLength = 1024;
+
+// Whether the connection has main and temp alone. Before SQLite 3.39 there is no way to ask.
+bool HasNothingAttached([[maybe_unused]] sqlite3* handle)
+{
+#if SQLITE_VERSION_NUMBER >= 3039000
+    return handle != nullptr && sqlite3_db_name(handle, 2) == nullptr;
+#else
+    return false;
+#endif
+}
+
+// Only selects: a PRAGMA may do its work while it is prepared.
+bool IsWorthCaching(const std::string& command, sqlite3_stmt* statement)
+{
+    return command.size() <= MaxCachedLength && command.compare(0, 7, "SELECT ") == 0 &&
+           sqlite3_stmt_readonly(statement) != 0 &&
+           HasNothingAttached(sqlite3_db_handle(statement));
+}
+
+}  // namespace
+
+int StatementCache::Take(sqlite3* handle, const std::string& command, Statement& statement)
+{
+    if (!HasNothingAttached(handle)) selects_.clear();
+    const auto cached = std::find_if(selects_.begin(), selects_.end(), [&](const Select& select) {
+        return select.command == command;
+    });
+    if (cached == selects_.end()) return PrepareStatement(handle, command, statement);
+    std::rotate(cached, cached + 1, selects_.end());
+    statement = std::move(selects_.back().statement);
+    if (statement == nullptr) return PrepareStatement(handle, command, statement);
+    return SQLITE_OK;
+}
+
+void StatementCache::Keep(const std::string& command, Statement statement)
+{
+    if (!IsWorthCaching(command, statement.get())) return;
+    sqlite3_reset(statement.get());
+    if (selects_.empty() || selects_.back().command != command) {
+        if (selects_.size() == MaxCached) selects_.erase(selects_.begin());
+        selects_.push_back({command, nullptr});
+    }
+    selects_.back().statement = std::move(statement);
+}
+
+}  // namespace OrvaDRCore

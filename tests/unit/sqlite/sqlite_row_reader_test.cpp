@@ -1,0 +1,68 @@
+// One row as a record. What the connection logs about it is tested in sqlite_db_select_test.cpp.
+#include "sqlite/sqlite_row_reader.h"
+
+#include <gtest/gtest.h>
+
+#include "sqlite/sqlite_statement.h"
+#include "support/fixtures/plain_db.h"
+
+namespace {
+
+using OrvaDRCore::PrepareStatement;
+using OrvaDRCore::RowReader;
+using OrvaDRCore::Statement;
+
+class SqliteRowReaderTest : public ::testing::Test {
+  protected:
+    SqliteRowReaderTest() { leftOut.clear(); }
+
+    // The first row of a select.
+    std::string Read(const std::string& select)
+    {
+        Statement statement;
+        EXPECT_EQ(PrepareStatement(db.Handle(), select, statement), SQLITE_OK);
+        EXPECT_EQ(sqlite3_step(statement.get()), SQLITE_ROW);
+        return RowReader(statement.get()).Read(NoteLeftOut).ToStr();
+    }
+
+    static void NoteLeftOut(const std::string& name, int type)
+    {
+        leftOut += name + ":" + std::to_string(type) + " ";
+    }
+
+    PlainDb db{":memory:"};
+    static std::string leftOut;
+};
+
+std::string SqliteRowReaderTest::leftOut;
+
+TEST_F(SqliteRowReaderTest, IntegersAndTextsBecomeFields)
+{
+    EXPECT_EQ(Read("SELECT 7 AS id, 'seven' AS name"), "id:7, name:'seven'");
+    EXPECT_EQ(leftOut, "");
+}
+
+TEST_F(SqliteRowReaderTest, OtherColumnsAreLeftOutAndReportedInTheirOrder)
+{
+    EXPECT_EQ(Read("SELECT NULL AS a, 1 AS b, x'00' AS c, 0.5 AS d"), "b:1");
+    EXPECT_EQ(leftOut, "a:5 c:4 d:2 ");
+}
+
+TEST_F(SqliteRowReaderTest, EachRowIsReadWithTheSameNames)
+{
+    Statement statement;
+    ASSERT_EQ(PrepareStatement(db.Handle(), "SELECT 1 AS id UNION SELECT 2", statement), SQLITE_OK);
+    ASSERT_EQ(sqlite3_step(statement.get()), SQLITE_ROW);
+    const RowReader row(statement.get());
+    EXPECT_TRUE(row.HasStatement());
+    EXPECT_EQ(row.Read(NoteLeftOut).ToStr(), "id:1");
+    ASSERT_EQ(sqlite3_step(statement.get()), SQLITE_ROW);
+    EXPECT_EQ(row.Read(NoteLeftOut).ToStr(), "id:2");
+}
+
+TEST_F(SqliteRowReaderTest, WithoutAStatementThereIsNoRow)
+{
+    EXPECT_FALSE(RowReader(nullptr).HasStatement());
+}
+
+}  // namespace
