@@ -37,10 +37,10 @@ class ORVADRCORE_API SqliteTableHandler {
     SqliteTableHandler() = default;
 
     /// A table of that name.
-    /// \param tableName    the table's name
-    /// \param tableSchema  what stands between the parentheses of CREATE TABLE; with an empty text
+    /// \param name    the table's name
+    /// \param schema  what stands between the parentheses of CREATE TABLE; with an empty text
     ///                     the table is never created
-    SqliteTableHandler(const std::string& tableName, const std::string& tableSchema);
+    SqliteTableHandler(const std::string& name, const std::string& schema);
 
     SqliteTableHandler(const SqliteTableHandler&) = default;             ///< A copy of both.
     SqliteTableHandler& operator=(const SqliteTableHandler&) = default;  ///< \return this, a copy
@@ -48,15 +48,15 @@ class ORVADRCORE_API SqliteTableHandler {
 
     /// The table's name.
     /// \return the name as it was given
-    const std::string& GetName() const { return name; }
+    const std::string& GetName() const { return name_; }
 
     /// The definition of its columns.
     /// \return the schema as it was given; empty for a table that is never created
-    const std::string& GetSchema() const { return schema; }
+    const std::string& GetSchema() const { return schema_; }
 
   private:
-    std::string name;
-    std::string schema;
+    std::string name_;
+    std::string schema_;
 };
 
 /// What SqliteDB asks of every statement. The order of the virtual operations is part of the binary
@@ -86,7 +86,7 @@ class ORVADRCORE_API SqliteCommand {
 
     /// The table.
     /// \return the table; without a name until SetTable() succeeded
-    const SqliteTableHandler& GetTable() const { return table; }
+    const SqliteTableHandler& GetTable() const { return table_; }
 
     /// The command for a reader of the log. Works on commands that are not valid, too.
     /// \return the table's name, "]" and the parameters; the bracket has no partner, on purpose
@@ -98,7 +98,7 @@ class ORVADRCORE_API SqliteCommand {
     SqliteCommand& operator=(const SqliteCommand&) = default;  ///< \return this, now such a copy
 
   private:
-    SqliteTableHandler table;
+    SqliteTableHandler table_;
 };
 
 /// An INSERT of one row. Columns stand in the byte order of their names.
@@ -114,8 +114,8 @@ class ORVADRCORE_API InsertCommand : public SqliteCommand {
     void SetFieldValues(const SqliteValueList& values);
 
     /// Decides what happens where a row with the same key is there.
-    /// \param allowed  true for INSERT OR REPLACE, false, the default, for INSERT
-    void SetReplacable(bool allowed);
+    /// \param replacable  true for INSERT OR REPLACE, false, the default, for INSERT
+    void SetReplacable(bool replacable);
 
     /// Adds a column; of two with the same name the later counts.
     /// \tparam T     `std::string`, `bool`, `int` or `unsigned int`
@@ -159,8 +159,8 @@ class ORVADRCORE_API InsertCommand : public SqliteCommand {
     void DumpParam(std::stringstream& out) const override;
 
   private:
-    bool replacable = false;
-    SqliteValueList fieldValues;
+    bool replacable_ = false;
+    SqliteValueList fieldValues_;
 };
 
 /// An UPDATE of all rows that meet a condition; without a condition it is not valid.
@@ -224,8 +224,8 @@ class ORVADRCORE_API UpdateCommand : public SqliteCommand {
     void DumpParam(std::stringstream& out) const override;
 
   private:
-    std::string condition;
-    SqliteValueList fieldValues;
+    std::string condition_;
+    SqliteValueList fieldValues_;
 };
 
 /// A SELECT of some or all columns of the rows that meet a condition, or of all rows.
@@ -269,9 +269,9 @@ class ORVADRCORE_API SelectCommand : public SqliteCommand {
     void DumpParam(std::stringstream& out) const override;
 
   private:
-    bool selectAll = false;
-    std::vector<std::string> fields;
-    std::string condition;
+    bool selectAll_ = false;
+    std::vector<std::string> fields_;
+    std::string condition_;
 };
 
 /// \cond SPECIALISATIONS

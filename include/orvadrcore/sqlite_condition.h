@@ -175,7 +175,7 @@ class ORVADRCORE_API SqliteInFamily : public SqliteCondition {
   private:
     ORVADRCORE_LOCAL bool CheckKeyword() const;
 
-    std::string keyword;
+    std::string keyword_;
 };
 
 /// A column whose value is one of many.

@@ -59,7 +59,7 @@ class ORVADRCORE_API SqliteTransaction {
     ///         - 404 and `Failed to open db [%s]`, behind the WARN line of SqliteDB::Open();
     ///         - 404 and `Failed to begin transaction in db[%s]`, behind the WARN line of
     ///           SqliteDB::Exec(); the error record holds the failed tries
-    bool Begin();
+    [[nodiscard]] bool Begin();
 
     /// Commits, through Exec(), which waits for readers.
     /// \return false, with the error code and a line at ERR:
@@ -70,7 +70,7 @@ class ORVADRCORE_API SqliteTransaction {
     ///         - 404 and `Failed to commit transaction in db[%s]`, behind the WARN line of
     ///           SqliteDB::Exec(). Unless SQLite has ended it by that, the transaction is still open
     ///           and can be committed or rolled back
-    bool Commit();
+    [[nodiscard]] bool Commit();
 
     /// Rolls back, in a single try. A failure closes the connection, which rolls back, too: the
     /// transaction is over in any case.

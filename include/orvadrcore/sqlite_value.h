@@ -116,8 +116,8 @@ class ORVADRCORE_API SqliteValue {
 
     ORVADRCORE_LOCAL SqliteValue(const char* text, std::size_t length);
 
-    bool valid = false;
-    Json::Value value;
+    bool valid_ = false;
+    Json::Value value_;
 };
 
 /// \cond SPECIALISATIONS
@@ -198,7 +198,7 @@ class ORVADRCORE_API SqliteValueList {
 
     /// All fields, for walking over a record whose columns are not known beforehand.
     /// \return values by name; a reference that is good until the record goes
-    const std::map<std::string, SqliteValue>& GetValues() const { return values; }
+    const std::map<std::string, SqliteValue>& GetValues() const { return values_; }
 
     /// The record for a reader.
     /// \return a text like "id:3, name:'abc'"; empty for a record without fields
@@ -211,8 +211,8 @@ class ORVADRCORE_API SqliteValueList {
     ORVADRCORE_LOCAL bool ReadField(const std::string& field, T& out) const;
 
     // Behind the reference that is given out for what is not there; never changes.
-    SqliteValue invalidValue;
-    std::map<std::string, SqliteValue> values;
+    SqliteValue invalidValue_;
+    std::map<std::string, SqliteValue> values_;
 };
 
 /// \cond SPECIALISATIONS

@@ -15,18 +15,18 @@ using std::chrono::microseconds;
 
 constexpr microseconds Patience = std::chrono::milliseconds(BusyTimeoutMSec);
 
-// An attempt costs some 20 us of processor time, a commit to a disk half a millisecond and more.
+// An attempt costs about 20 us of processor time, a commit to a disk half a millisecond and more.
 constexpr microseconds ShortestPause(500);
 constexpr microseconds LongestPause(2500);
 constexpr microseconds LongestPauseOfMany(15'000);
 constexpr microseconds LongestFirstPauseInCommit(50);
 constexpr microseconds TurnLength(6000);
 
-// A wait for the turn grows with the number of those that wait. Pauses that grow with it keep the
-// number of attempts in a second the same.
-constexpr int PausesInAWait = 32;
+// The more connections wait, the longer each waits for its turn. Pauses that grow with the wait keep
+// the number of attempts per second the same.
+constexpr int PausesPerWait = 32;
 
-// Whether the connection waits with changes of its own. Before SQLite 3.34 there is no way to ask.
+// Whether the waiting connection has changes to commit. Before SQLite 3.34 there is no way to ask.
 bool HasChanges([[maybe_unused]] sqlite3* handle)
 {
 #if SQLITE_VERSION_NUMBER >= 3034000
@@ -50,7 +50,7 @@ bool NamesBusyTimeout(std::string_view statement)
     return false;
 }
 
-// Processes that start together must not try at the same moments.
+// Processes that start together must not retry at the same moments.
 std::minstd_rand::result_type Seed()
 {
     const auto now = std::chrono::steady_clock::now().time_since_epoch().count();
@@ -64,46 +64,46 @@ void Sleep(microseconds time)
 
 }  // namespace
 
-void BusyWait::Install(sqlite3* connection)
+void BusyWait::Install(sqlite3* handle)
 {
-    handle = connection;
-    random.seed(Seed());
+    handle_ = handle;
+    random_.seed(Seed());
     TakeBack();
 }
 
 void BusyWait::LeaveToSqlite()
 {
-    sqlite3_busy_timeout(handle, BusyTimeoutMSec);
+    sqlite3_busy_timeout(handle_, BusyTimeoutMSec);
 }
 
 void BusyWait::TakeBack()
 {
-    sqlite3_busy_handler(handle, OnBusy, this);
+    sqlite3_busy_handler(handle_, OnBusy, this);
 }
 
-void BusyWait::GiveWay()
+void BusyWait::Yield()
 {
-    if (giveWayUntil == Clock::time_point()) return;
-    const auto left = std::chrono::duration_cast<Microseconds>(giveWayUntil - Clock::now());
-    giveWayUntil = Clock::time_point();
+    if (yieldUntil_ == Clock::time_point()) return;
+    const auto left = std::chrono::duration_cast<Microseconds>(yieldUntil_ - Clock::now());
+    yieldUntil_ = Clock::time_point();
     if (left > Microseconds::zero()) Sleep(left);
 }
 
-// For half as long as the turn was: then others get the lock, and the file is idle for a small part
-// of the time only, however long a commit takes.
-void BusyWait::NoteRelease()
+// The pause is half as long as the turn was: long enough for others to get the lock, and the file is
+// idle for a small part of the time only, however long a commit takes.
+void BusyWait::NoteUnlocked()
 {
-    if (!hasTurn) return;
+    if (!hasTurn_) return;
     const Clock::time_point now = Clock::now();
-    const Clock::duration turn = now - turnBegin;
+    const Clock::duration turn = now - turnBegin_;
     if (turn < TurnLength) return;
-    hasTurn = false;
-    lastWait = std::exchange(turnsWait, Microseconds::zero());
-    giveWayUntil = now + std::min<Clock::duration>(turn / 2, LongestPause);
+    hasTurn_ = false;
+    lastTurnWait_ = std::exchange(turnWait_, Microseconds::zero());
+    yieldUntil_ = now + std::min<Clock::duration>(turn / 2, LongestPause);
 }
 
-// SQLite calls this when it has met a lock, with the number of calls before, and tries again if the
-// answer is not 0.
+// SQLite calls this when it meets a lock, with the number of earlier calls for the same lock, and
+// retries unless the result is 0.
 int BusyWait::OnBusy(void* self, int count)
 {
     return static_cast<BusyWait*>(self)->Pause(count == 0) ? 1 : 0;
@@ -111,71 +111,67 @@ int BusyWait::OnBusy(void* self, int count)
 
 bool BusyWait::Pause(bool isFirst)
 {
-    if (isFirst) asked = slept = beforeCommit = Microseconds::zero();
+    if (isFirst) asked_ = slept_ = beforeCommit_ = Microseconds::zero();
     const Microseconds spent = Spent();
     if (spent >= Patience) {
-        hasTurn = false;  // which never came
+        hasTurn_ = false;  // it never came
         return false;
     }
 
     Microseconds longest = LongestPauseNow();
     Microseconds shortest = ShortestPause;
-    const bool isCommitting = HasChanges(handle);
+    const bool isCommitting = HasChanges(handle_);
     if (isCommitting) {
-        longest = std::clamp((spent - beforeCommit) / 8, LongestFirstPauseInCommit, LongestPause);
+        longest = std::clamp((spent - beforeCommit_) / 8, LongestFirstPauseInCommit, LongestPause);
         shortest = longest / 5;
     }
     const Microseconds pause = Between(shortest, longest);
     const Clock::time_point begin = Clock::now();
     Sleep(pause);
     const Clock::time_point end = Clock::now();
-    asked += pause;
-    slept += std::chrono::duration_cast<Microseconds>(end - begin);
+    asked_ += pause;
+    slept_ += std::chrono::duration_cast<Microseconds>(end - begin);
     if (isCommitting) return true;
-    beforeCommit = Spent();
-    turnsWait += Spent() - spent;
-    turnBegin = end;
-    hasTurn = true;
+    beforeCommit_ = Spent();
+    turnWait_ += Spent() - spent;
+    turnBegin_ = end;
+    hasTurn_ = true;
     return true;
 }
 
-// Of a connection that waits for its turn.
 BusyWait::Microseconds BusyWait::LongestPauseNow() const
 {
-    const Microseconds usual =
-        std::clamp(std::max(turnsWait, lastWait) / PausesInAWait, LongestPause, LongestPauseOfMany);
+    const Microseconds usual = std::clamp(std::max(turnWait_, lastTurnWait_) / PausesPerWait,
+                                          LongestPause, LongestPauseOfMany);
     return ShortestPause +
            (usual - ShortestPause) * (Patience - Spent()).count() / Patience.count();
 }
 
 BusyWait::Microseconds BusyWait::Spent() const
 {
-    return std::max(asked, slept);
+    return std::max(asked_, slept_);
 }
 
 BusyWait::Microseconds BusyWait::Between(Microseconds shortest, Microseconds longest)
 {
     std::uniform_int_distribution<Microseconds::rep> any(shortest.count(), longest.count());
-    return Microseconds(any(random));
+    return Microseconds(any(random_));
 }
 
-BusyTimeoutAccess::BusyTimeoutAccess(BusyWait& connectionsWait,
-                                     const StatementWatch& connectionsWatch,
+BusyTimeoutAccess::BusyTimeoutAccess(BusyWait& wait, const StatementWatch& watch,
                                      const std::string& statement)
-    : wait(connectionsWait),
-      watch(connectionsWatch),
-      isLeft(wait.IsInstalled() && NamesBusyTimeout(statement))
+    : wait_(wait), watch_(watch), isLeftToSqlite_(wait.IsInstalled() && NamesBusyTimeout(statement))
 {
-    if (isLeft) wait.LeaveToSqlite();
+    if (isLeftToSqlite_) wait_.LeaveToSqlite();
 }
 
 BusyTimeoutAccess::~BusyTimeoutAccess()
 {
-    if (!isLeft) return;
-    if (watch.IsBusyTimeoutSet()) {
-        wait.Forget();
+    if (!isLeftToSqlite_) return;
+    if (watch_.IsBusyTimeoutSet()) {
+        wait_.Forget();
     } else {
-        wait.TakeBack();
+        wait_.TakeBack();
     }
 }
 

@@ -1,17 +1,17 @@
-// How a connection waits for a lock that another one holds.
+// How a connection waits for a lock that another connection holds.
 //
-// SQLite's own waiting tries again ever more seldom, up to 100 ms apart, while the connection that
+// SQLite's own waiting retries less and less often, up to 100 ms apart, while the connection that
 // just wrote comes back at once: some processes write all the time and others starve. Here a waiting
-// connection tries again after 0.5 to 2.5 ms, at random. Where many wait, their attempts would keep
-// the processors busy, so whoever waits for long has longer pauses, up to 15 ms, and shorter ones
-// again as its second runs out.
+// connection retries after a random 0.5 to 2.5 ms. When many wait, their attempts would keep the
+// processors busy, so the pauses grow with the wait, up to 15 ms, and shrink again as its second runs
+// out.
 //
 // A connection that had to wait may then write for 6 ms, because passing the lock on costs as much as
-// a small write. Before it writes again after that, it pauses so that others get the lock.
+// a small write. Before its next write it pauses, so that others get the lock.
 //
-// Who commits to a file with a rollback journal waits for readers while nobody else can get a lock,
-// not even other readers. It tries again within 0.1 ms, and then ever more seldom: most readers that
-// it meets are waiting writers, which read for a moment at each of their attempts.
+// With a rollback journal, a commit that waits for readers keeps everybody else out, even new
+// readers. It retries within 0.1 ms, and then less and less often: most of the readers it meets are
+// waiting writers, which read for a moment at each of their attempts.
 #ifndef ORVADRCORE_SRC_SQLITE_SQLITE_BUSY_H
 #define ORVADRCORE_SRC_SQLITE_SQLITE_BUSY_H
 
@@ -25,11 +25,11 @@
 
 namespace OrvaDRCore {
 
-// How long a single try waits for another connection's lock.
+// How long one attempt waits for another connection's lock.
 inline constexpr int BusyTimeoutMSec = 1000;
 
-// A connection's busy handler. SQLite holds a pointer to it: it must stay where it is until the
-// connection is closed.
+// A connection's busy handler. SQLite holds a pointer to it, so it must not move while the connection
+// is open.
 class BusyWait {
   public:
     BusyWait() = default;
@@ -37,24 +37,24 @@ class BusyWait {
     BusyWait& operator=(const BusyWait&) = delete;
     ~BusyWait() = default;
 
-    // Waits in SQLite's place from now on.
-    void Install(sqlite3* connection);
+    // Waits instead of SQLite from now on.
+    void Install(sqlite3* handle);
 
-    // Forgets the connection, which was closed or waits in another way now.
-    void Forget() { handle = nullptr; }
+    // For a connection that was closed, or that SQLite waits for by itself now.
+    void Forget() { handle_ = nullptr; }
 
-    bool IsInstalled() const { return handle != nullptr; }
+    bool IsInstalled() const { return handle_ != nullptr; }
 
-    // Between these two SQLite waits by itself, with the time-out above.
+    // Between these two calls SQLite waits by itself, with the time-out above.
     void LeaveToSqlite();
     void TakeBack();
 
-    // To be called before a statement that may begin to write: pauses for 2.5 ms at most when this
-    // connection had to wait, has had its turn, and comes back too soon after it.
-    void GiveWay();
+    // To be called before a statement that may write. Pauses for 2.5 ms at most when this connection
+    // had to wait, has used up its turn and comes back too soon.
+    void Yield();
 
     // To be called after each statement that leaves no transaction open.
-    void NoteRelease();
+    void NoteUnlocked();
 
   private:
     using Clock = std::chrono::steady_clock;
@@ -66,40 +66,38 @@ class BusyWait {
     Microseconds Spent() const;
     Microseconds Between(Microseconds shortest, Microseconds longest);
 
-    sqlite3* handle = nullptr;
-    std::minstd_rand random;
+    sqlite3* handle_ = nullptr;
+    std::minstd_rand random_;
 
-    // Of the statement that waits, or has waited last: all of its pauses, as they were asked for and
-    // as they were, and those of them before it began to commit.
-    Microseconds asked{};
-    Microseconds slept{};
-    Microseconds beforeCommit{};
+    // All pauses of the statement that waits or has waited last: as they were asked for, as long as
+    // they took, and those before it began to commit.
+    Microseconds asked_{};
+    Microseconds slept_{};
+    Microseconds beforeCommit_{};
 
-    // Of this connection's turn: it begins when a wait is over and ends with the first statement
-    // that ends more than 6 ms after that.
-    bool hasTurn = false;
-    Clock::time_point turnBegin;
-    Microseconds turnsWait{};        // all pauses since the turn before, but those in commits
-    Microseconds lastWait{};         // the same for the turn before
-    Clock::time_point giveWayUntil;  // the clock's beginning when there is no need to
+    // A turn begins when a wait ends. It ends with the first statement that finishes more than 6 ms
+    // later.
+    bool hasTurn_ = false;
+    Clock::time_point turnBegin_;
+    Microseconds turnWait_{};       // all pauses since the previous turn, except those in commits
+    Microseconds lastTurnWait_{};   // the same for the previous turn
+    Clock::time_point yieldUntil_;  // the clock's epoch when there is no need to yield
 };
 
-// To be made before a statement runs and to live as long. `PRAGMA busy_timeout` would answer 0 where
-// SQLite does not wait by itself, so that it does while a statement runs that names the busy timeout.
-// After a statement that has set it SQLite goes on with what was set, until the connection is opened
-// anew.
+// Makes `PRAGMA busy_timeout` work as if SQLite waited by itself; it would answer 0 otherwise. While
+// this object lives, SQLite does wait by itself if the statement names the busy timeout. If the
+// statement has set it, that stays so until the connection is opened again.
 class BusyTimeoutAccess {
   public:
-    BusyTimeoutAccess(BusyWait& connectionsWait, const StatementWatch& connectionsWatch,
-                      const std::string& statement);
+    BusyTimeoutAccess(BusyWait& wait, const StatementWatch& watch, const std::string& statement);
     BusyTimeoutAccess(const BusyTimeoutAccess&) = delete;
     BusyTimeoutAccess& operator=(const BusyTimeoutAccess&) = delete;
     ~BusyTimeoutAccess();
 
   private:
-    BusyWait& wait;
-    const StatementWatch& watch;
-    bool isLeft;  // to SQLite
+    BusyWait& wait_;
+    const StatementWatch& watch_;
+    const bool isLeftToSqlite_;
 };
 
 }  // namespace OrvaDRCore

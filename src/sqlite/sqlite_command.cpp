@@ -63,8 +63,8 @@ std::string PairsForLog(const SqliteValueList& record)
 
 }  // namespace
 
-SqliteTableHandler::SqliteTableHandler(const std::string& tableName, const std::string& tableSchema)
-    : name(tableName), schema(tableSchema)
+SqliteTableHandler::SqliteTableHandler(const std::string& name, const std::string& schema)
+    : name_(name), schema_(schema)
 {
 }
 
@@ -78,14 +78,15 @@ bool SqliteCommand::SetTable(const SqliteTableHandler& handler)
         DR_LOG(Err, "Invalid table [%s]", handler.GetName().c_str());
         return false;
     }
-    table = handler;
+    table_ = handler;
     return true;
 }
 
 std::string SqliteCommand::ToStr() const
 {
     std::stringstream out;
-    Write(out, table.GetName() + "]");  // there is no opening bracket, because the contract says so
+    Write(out,
+          table_.GetName() + "]");  // there is no opening bracket, because the contract says so
     DumpParam(out);
     return out.str();
 }
@@ -94,52 +95,52 @@ InsertCommand::~InsertCommand() = default;
 
 void InsertCommand::SetFieldValues(const SqliteValueList& values)
 {
-    fieldValues = values;
+    fieldValues_ = values;
 }
 
-void InsertCommand::SetReplacable(bool allowed)
+void InsertCommand::SetReplacable(bool replacable)
 {
-    replacable = allowed;
+    replacable_ = replacable;
 }
 
 template <>
 bool InsertCommand::AddFieldValue(const std::string& field, const std::string& value)
 {
-    return OrvaDRCore::AddFieldValue(fieldValues, field, value);
+    return OrvaDRCore::AddFieldValue(fieldValues_, field, value);
 }
 
 template <>
 bool InsertCommand::AddFieldValue(const std::string& field, const bool& value)
 {
-    return OrvaDRCore::AddFieldValue(fieldValues, field, value);
+    return OrvaDRCore::AddFieldValue(fieldValues_, field, value);
 }
 
 template <>
 bool InsertCommand::AddFieldValue(const std::string& field, const int& value)
 {
-    return OrvaDRCore::AddFieldValue(fieldValues, field, value);
+    return OrvaDRCore::AddFieldValue(fieldValues_, field, value);
 }
 
 template <>
 bool InsertCommand::AddFieldValue(const std::string& field, const unsigned int& value)
 {
-    return OrvaDRCore::AddFieldValue(fieldValues, field, value);
+    return OrvaDRCore::AddFieldValue(fieldValues_, field, value);
 }
 
 bool InsertCommand::AddFieldValue(const std::string& field, const char* text)
 {
-    return OrvaDRCore::AddFieldValue(fieldValues, field, text);
+    return OrvaDRCore::AddFieldValue(fieldValues_, field, text);
 }
 
 bool InsertCommand::IsValid() const
 {
-    return !fieldValues.GetValues().empty() && !GetTable().GetName().empty();
+    return !fieldValues_.GetValues().empty() && !GetTable().GetName().empty();
 }
 
 std::string InsertCommand::ToFormatedInsertValues() const
 {
     std::string text;
-    AppendInsertValues(text, fieldValues);
+    AppendInsertValues(text, fieldValues_);
     return text;
 }
 
@@ -151,60 +152,60 @@ std::string InsertCommand::GetCommand() const
     }
     std::string text;
     text.reserve(UsualLength);
-    text += replacable ? "INSERT OR REPLACE INTO " : "INSERT INTO ";
+    text += replacable_ ? "INSERT OR REPLACE INTO " : "INSERT INTO ";
     text += GetTable().GetName();
     text += ' ';
-    AppendInsertValues(text, fieldValues);
+    AppendInsertValues(text, fieldValues_);
     text += ';';
     return text;
 }
 
 void InsertCommand::DumpParam(std::stringstream& out) const
 {
-    Write(out, PairsForLog(fieldValues));
+    Write(out, PairsForLog(fieldValues_));
 }
 
 UpdateCommand::~UpdateCommand() = default;
 
 void UpdateCommand::SetFieldValues(const SqliteValueList& values)
 {
-    fieldValues = values;
+    fieldValues_ = values;
 }
 
 template <>
 bool UpdateCommand::AddFieldValue(const std::string& field, const std::string& value)
 {
-    return OrvaDRCore::AddFieldValue(fieldValues, field, value);
+    return OrvaDRCore::AddFieldValue(fieldValues_, field, value);
 }
 
 template <>
 bool UpdateCommand::AddFieldValue(const std::string& field, const bool& value)
 {
-    return OrvaDRCore::AddFieldValue(fieldValues, field, value);
+    return OrvaDRCore::AddFieldValue(fieldValues_, field, value);
 }
 
 template <>
 bool UpdateCommand::AddFieldValue(const std::string& field, const int& value)
 {
-    return OrvaDRCore::AddFieldValue(fieldValues, field, value);
+    return OrvaDRCore::AddFieldValue(fieldValues_, field, value);
 }
 
 template <>
 bool UpdateCommand::AddFieldValue(const std::string& field, const unsigned int& value)
 {
-    return OrvaDRCore::AddFieldValue(fieldValues, field, value);
+    return OrvaDRCore::AddFieldValue(fieldValues_, field, value);
 }
 
 bool UpdateCommand::AddFieldValue(const std::string& field, const char* text)
 {
-    return OrvaDRCore::AddFieldValue(fieldValues, field, text);
+    return OrvaDRCore::AddFieldValue(fieldValues_, field, text);
 }
 
 // An empty text is refused without a line, on purpose; SelectCommand has one.
 bool UpdateCommand::SetCondition(const std::string& text)
 {
     if (text.empty()) return false;
-    condition = text;
+    condition_ = text;
     return true;
 }
 
@@ -216,7 +217,8 @@ bool UpdateCommand::SetCondition(const SqliteCondition& object)
 
 bool UpdateCommand::IsValid() const
 {
-    return !condition.empty() && !fieldValues.GetValues().empty() && !GetTable().GetName().empty();
+    return !condition_.empty() && !fieldValues_.GetValues().empty() &&
+           !GetTable().GetName().empty();
 }
 
 // No ";" at the end of updates and selects, unlike inserts, on purpose.
@@ -227,29 +229,29 @@ std::string UpdateCommand::GetCommand() const
         return {};
     }
     std::string text =
-        "UPDATE " + GetTable().GetName() + " SET " + JoinPairs(fieldValues, "=", ",");
-    if (!condition.empty()) text += " WHERE " + condition;
+        "UPDATE " + GetTable().GetName() + " SET " + JoinPairs(fieldValues_, "=", ",");
+    if (!condition_.empty()) text += " WHERE " + condition_;
     return text;
 }
 
 void UpdateCommand::DumpParam(std::stringstream& out) const
 {
-    Write(out, "condition:[" + condition + "]/" + PairsForLog(fieldValues));
+    Write(out, "condition:[" + condition_ + "]/" + PairsForLog(fieldValues_));
 }
 
 SelectCommand::~SelectCommand() = default;
 
 void SelectCommand::SelectAll()
 {
-    fields.clear();
-    selectAll = true;
+    fields_.clear();
+    selectAll_ = true;
 }
 
 bool SelectCommand::AddField(const std::string& field)
 {
     if (field.empty()) return false;
-    fields.push_back(field);
-    selectAll = false;
+    fields_.push_back(field);
+    selectAll_ = false;
     return true;
 }
 
@@ -259,7 +261,7 @@ bool SelectCommand::SetCondition(const std::string& text)
         DR_LOG(Err, "Empty condition");
         return false;
     }
-    condition = text;
+    condition_ = text;
     return true;
 }
 
@@ -271,7 +273,7 @@ bool SelectCommand::SetCondition(const SqliteCondition& object)
 
 bool SelectCommand::IsValid() const
 {
-    return !GetTable().GetName().empty() && (selectAll || !fields.empty());
+    return !GetTable().GetName().empty() && (selectAll_ || !fields_.empty());
 }
 
 std::string SelectCommand::GetCommand() const
@@ -281,20 +283,20 @@ std::string SelectCommand::GetCommand() const
         return {};
     }
     std::string text = "SELECT ";
-    if (!fields.empty()) {
-        text += Container::ToString(fields, ",") + " ";
-    } else if (selectAll) {
+    if (!fields_.empty()) {
+        text += Container::ToString(fields_, ",") + " ";
+    } else if (selectAll_) {
         text += " * ";  // the second blank before the star, on purpose
     }
     text += "FROM " + GetTable().GetName();
-    if (!condition.empty()) text += " WHERE " + condition;
+    if (!condition_.empty()) text += " WHERE " + condition_;
     return text;
 }
 
 void SelectCommand::DumpParam(std::stringstream& out) const
 {
-    Write(out, "condition:[" + condition + "]/fields:[" +
-                   (selectAll ? "all" : Container::ToString(fields, ", ")) + "]");
+    Write(out, "condition:[" + condition_ + "]/fields:[" +
+                   (selectAll_ ? "all" : Container::ToString(fields_, ", ")) + "]");
 }
 
 }  // namespace OrvaDRCore

@@ -86,18 +86,18 @@ bool SqliteOr::SetValue(const std::string& left, const std::string& right)
     return AppendJunction(condition, left, "OR", right);
 }
 
-SqliteInFamily::SqliteInFamily(const std::string& word) : keyword(word) {}
+SqliteInFamily::SqliteInFamily(const std::string& keyword) : keyword_(keyword) {}
 
-SqliteInFamily::SqliteInFamily(const std::string& word, const std::string& lvalue,
+SqliteInFamily::SqliteInFamily(const std::string& keyword, const std::string& lvalue,
                                const std::vector<SqliteValue>& values)
-    : keyword(word)
+    : keyword_(keyword)
 {
     SetValue(lvalue, values);
 }
 
-SqliteInFamily::SqliteInFamily(const std::string& word, const std::string& lvalue,
+SqliteInFamily::SqliteInFamily(const std::string& keyword, const std::string& lvalue,
                                const std::string& value)
-    : keyword(word)
+    : keyword_(keyword)
 {
     SetValue(lvalue, value);
 }
@@ -105,14 +105,14 @@ SqliteInFamily::SqliteInFamily(const std::string& word, const std::string& lvalu
 // The text is not asked, on purpose: a refused list leaves a condition that is empty yet valid.
 bool SqliteInFamily::IsValid() const
 {
-    return keyword == In || keyword == NotIn;
+    return keyword_ == In || keyword_ == NotIn;
 }
 
 bool SqliteInFamily::CheckKeyword() const
 {
     // The constructors ask this class's own, any other caller the object's.
     if (IsValid()) return true;  // NOLINT(clang-analyzer-optin.cplusplus.VirtualCall)
-    DR_LOG_AS(Setter, Err, "Bad keyword [%s]", keyword.c_str());
+    DR_LOG_AS(Setter, Err, "Bad keyword [%s]", keyword_.c_str());
     return false;
 }
 
@@ -123,7 +123,7 @@ bool SqliteInFamily::SetValue(const std::string& lvalue, const std::vector<Sqlit
         DR_LOG(Err, "Bad lvalue[%s]", lvalue.c_str());
         return false;
     }
-    condition = lvalue + " " + keyword + " ( ";
+    condition = lvalue + " " + keyword_ + " ( ";
     for (const SqliteValue& value : values) {
         if (!value.IsValid()) {
             condition.clear();
@@ -145,7 +145,7 @@ bool SqliteInFamily::SetValue(const std::string& lvalue, const std::string& valu
         DR_LOG(Err, "Bad lvalue[%s] or value[%s]", lvalue.c_str(), value.c_str());
         return false;
     }
-    condition = lvalue + " " + keyword + " ( " + value + " )";
+    condition = lvalue + " " + keyword_ + " ( " + value + " )";
     return true;
 }
 

@@ -73,14 +73,14 @@ void SqliteConnection::Close()
 bool SqliteConnection::Execute(const std::string& command)
 {
     const BusyTimeoutAccess access(wait_, watch_, command);
-    if (!IsInTransaction()) wait_.GiveWay();
+    if (!IsInTransaction()) wait_.Yield();
     char* text = nullptr;  // SQLite does not set it when the handle is null
     Statement refused;
     const int code = IsTooLong(command)
                          ? PrepareStatement(handle_, command, refused)
                          : sqlite3_exec(handle_, command.c_str(), nullptr, nullptr, &text);
     const std::unique_ptr<char, FreeText> message(text);
-    if (!IsInTransaction()) wait_.NoteRelease();
+    if (!IsInTransaction()) wait_.NoteUnlocked();
     if (code != SQLITE_OK) SetFailure(command, code, message.get());
     return code == SQLITE_OK;
 }
@@ -95,7 +95,7 @@ bool SqliteConnection::Select(const std::string& command, const TakeRow& takeRow
     const RowReader row(statement.get());
     while (code == SQLITE_ROW && takeRow(row)) code = sqlite3_step(statement.get());
     if (code == SQLITE_ROW) code = EndBeforeLastRow(statement.get());
-    if (!IsInTransaction()) wait_.NoteRelease();
+    if (!IsInTransaction()) wait_.NoteUnlocked();
     if (code != SQLITE_OK && code != SQLITE_DONE) {
         SetFailure(command, code, nullptr);
         return false;

@@ -33,14 +33,14 @@ bool MakesValue(Number /*number*/)
 // What the library's own sources see of values and records.
 struct SqliteInternals {
     // What a value holds: null, a number, a boolean or a text.
-    static const Json::Value& Payload(const SqliteValue& value) { return value.value; }
+    static const Json::Value& Payload(const SqliteValue& value) { return value.value_; }
 
     // Adds a field as AddValue() does, but makes its value in place, which takes half the time.
     template <class T>
     static void Add(SqliteValueList& record, const std::string& field, const T& value)
     {
         if (field.empty() || !MakesValue(value) ||
-            !record.values.try_emplace(field, value).second) {
+            !record.values_.try_emplace(field, value).second) {
             record.AddValue(field, SqliteValue(value));
         }
     }

@@ -9,11 +9,11 @@
 
 namespace OrvaDRCore {
 
-SqliteValue::SqliteValue(int number) : valid(true), value(number) {}
+SqliteValue::SqliteValue(int number) : valid_(true), value_(number) {}
 
-SqliteValue::SqliteValue(unsigned int number) : valid(true), value(number) {}
+SqliteValue::SqliteValue(unsigned int number) : valid_(true), value_(number) {}
 
-SqliteValue::SqliteValue(bool truth) : valid(true), value(truth) {}
+SqliteValue::SqliteValue(bool truth) : valid_(true), value_(truth) {}
 
 SqliteValue::SqliteValue(const std::string& text) : SqliteValue(text.data(), text.size()) {}
 
@@ -23,10 +23,10 @@ SqliteValue::SqliteValue(const char* text)
 }
 
 SqliteValue::SqliteValue(const char* text, std::size_t length)
-    : valid(text != nullptr && FitsJsonText(length)),
-      value(valid ? Json::Value(text, text + length) : Json::Value())
+    : valid_(text != nullptr && FitsJsonText(length)),
+      value_(valid_ ? Json::Value(text, text + length) : Json::Value())
 {
-    if (text != nullptr && !valid) {
+    if (text != nullptr && !valid_) {
         DR_LOG(Err, "text of [%zu] bytes is too long for a value", length);
     }
 }
@@ -34,61 +34,61 @@ SqliteValue::SqliteValue(const char* text, std::size_t length)
 // `valid` stays as it was, on purpose: only construction makes a value valid.
 SqliteValue& SqliteValue::operator=(const SqliteValue& other)
 {
-    value = other.value;
+    value_ = other.value_;
     return *this;
 }
 
 bool SqliteValue::IsValid() const
 {
     // The kinds that a value is built from; it may have lost its payload to another since.
-    const Json::ValueType kind = value.type();
-    return valid && (kind == Json::intValue || kind == Json::uintValue ||
-                     kind == Json::stringValue || kind == Json::booleanValue);
+    const Json::ValueType kind = value_.type();
+    return valid_ && (kind == Json::intValue || kind == Json::uintValue ||
+                      kind == Json::stringValue || kind == Json::booleanValue);
 }
 
 template <>
 bool SqliteValue::GetValue(std::string& out) const
 {
-    if (!value.isString()) {
+    if (!value_.isString()) {
         DR_LOG_AS("GetValue<std::basic_string<char> >", Warn, "[%s] is not string",
-                  toString(value).c_str());
+                  toString(value_).c_str());
         return false;
     }
-    out = value.asString();
+    out = value_.asString();
     return true;
 }
 
 template <>
 bool SqliteValue::GetValue(unsigned int& out) const
 {
-    if (!value.isUInt()) {
-        DR_LOG_AS("GetValue<unsigned int>", Warn, "[%s] is not int", toString(value).c_str());
+    if (!value_.isUInt()) {
+        DR_LOG_AS("GetValue<unsigned int>", Warn, "[%s] is not int", toString(value_).c_str());
         return false;
     }
-    out = value.asUInt();
+    out = value_.asUInt();
     return true;
 }
 
 template <>
 bool SqliteValue::GetValue(int& out) const
 {
-    if (!value.isInt()) {
-        DR_LOG_AS("GetValue<int>", Warn, "[%s] is not int", toString(value).c_str());
+    if (!value_.isInt()) {
+        DR_LOG_AS("GetValue<int>", Warn, "[%s] is not int", toString(value_).c_str());
         return false;
     }
-    out = value.asInt();
+    out = value_.asInt();
     return true;
 }
 
 template <>
 bool SqliteValue::GetValue(bool& out) const
 {
-    const bool isBit = value.isInt() && (value.asInt() == 0 || value.asInt() == 1);
-    if (!value.isBool() && !isBit) {
-        DR_LOG_AS("GetValue<bool>", Warn, "[%s] is not bool", toString(value).c_str());
+    const bool isBit = value_.isInt() && (value_.asInt() == 0 || value_.asInt() == 1);
+    if (!value_.isBool() && !isBit) {
+        DR_LOG_AS("GetValue<bool>", Warn, "[%s] is not bool", toString(value_).c_str());
         return false;
     }
-    out = value.asBool();
+    out = value_.asBool();
     return true;
 }
 
@@ -110,7 +110,8 @@ std::string SqliteValue::EscapeText(const std::string& text)
     return escaped;
 }
 
-SqliteValueList::SqliteValueList(SqliteValueList&& other) noexcept : values(std::move(other.values))
+SqliteValueList::SqliteValueList(SqliteValueList&& other) noexcept
+    : values_(std::move(other.values_))
 {
 }
 
@@ -119,13 +120,13 @@ SqliteValueList::~SqliteValueList() = default;
 SqliteValueList& SqliteValueList::operator=(const SqliteValueList& other)
 {
     // Through a copy made by construction: assigning value by value would lose `valid`.
-    if (this != &other) values = std::map<std::string, SqliteValue>(other.values);
+    if (this != &other) values_ = std::map<std::string, SqliteValue>(other.values_);
     return *this;
 }
 
 SqliteValueList& SqliteValueList::operator=(SqliteValueList&& other) noexcept
 {
-    values.swap(other.values);
+    values_.swap(other.values_);
     return *this;
 }
 
@@ -140,14 +141,14 @@ bool SqliteValueList::AddValue(const std::string& field, SqliteValue&& value)
         DR_LOG(Err, "Bad Field[%s] or value [%s]", field.c_str(), value.ToFormatedValue().c_str());
         return false;
     }
-    const auto [entry, added] = values.try_emplace(field, std::move(value));
+    const auto [entry, added] = values_.try_emplace(field, std::move(value));
     if (!added) entry->second = value;  // try_emplace has left it alone
     return true;
 }
 
 SqliteValueList& SqliteValueList::operator+=(const SqliteValueList& other)
 {
-    for (const auto& [field, value] : other.values) AddValue(field, value);
+    for (const auto& [field, value] : other.values_) AddValue(field, value);
     return *this;
 }
 
@@ -157,19 +158,19 @@ bool SqliteValueList::HasField(const std::string& field) const
         DR_LOG(Err, "Invalid field [%s]", field.c_str());
         return false;
     }
-    return values.count(field) > 0;
+    return values_.count(field) > 0;
 }
 
 const SqliteValue& SqliteValueList::GetValue(const std::string& field) const
 {
     if (field.empty()) {
         DR_LOG(Err, "Invalid field [%s]", field.c_str());
-        return invalidValue;
+        return invalidValue_;
     }
-    const auto entry = values.find(field);
-    if (entry == values.end()) {
+    const auto entry = values_.find(field);
+    if (entry == values_.end()) {
         DR_LOG(Warn, "Failed to find field [%s]", field.c_str());
-        return invalidValue;
+        return invalidValue_;
     }
     return entry->second;
 }
@@ -182,8 +183,8 @@ bool SqliteValueList::ReadField(const std::string& field, T& out) const
         DR_LOG_AS(Function, Err, "Invalid field [%s]", field.c_str());
         return false;
     }
-    const auto entry = values.find(field);
-    if (entry == values.end()) {
+    const auto entry = values_.find(field);
+    if (entry == values_.end()) {
         // A lower level than in the other GetValue, because asking this way is a test, too.
         DR_LOG_AS(Function, Debug, "field [%s] is not existed", field.c_str());
         return false;

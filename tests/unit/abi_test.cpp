@@ -131,24 +131,24 @@ constexpr std::size_t BehindCommand = sizeof(SqliteCommand);
 
 TEST(MemberTest, ValuesAndRecordsKeepTheirOrder)
 {
-    ExpectInOrder(0, {offsetof(SqliteValue, valid), offsetof(SqliteValue, value)});
+    ExpectInOrder(0, {offsetof(SqliteValue, valid_), offsetof(SqliteValue, value_)});
     ExpectInOrder(BehindTable,
-                  {offsetof(SqliteValueList, invalidValue), offsetof(SqliteValueList, values)});
+                  {offsetof(SqliteValueList, invalidValue_), offsetof(SqliteValueList, values_)});
     EXPECT_EQ(sizeof(SqliteRecord), BehindTable);
 }
 
 TEST(MemberTest, CommandsKeepTheirOrder)
 {
     ExpectInOrder(BehindTable,
-                  {offsetof(SqliteTableHandler, name), offsetof(SqliteTableHandler, schema)});
-    ExpectInOrder(BehindTable, {offsetof(SqliteCommand, table)});
+                  {offsetof(SqliteTableHandler, name_), offsetof(SqliteTableHandler, schema_)});
+    ExpectInOrder(BehindTable, {offsetof(SqliteCommand, table_)});
     ExpectInOrder(BehindCommand,
-                  {offsetof(InsertCommand, replacable), offsetof(InsertCommand, fieldValues)});
+                  {offsetof(InsertCommand, replacable_), offsetof(InsertCommand, fieldValues_)});
     ExpectInOrder(BehindCommand,
-                  {offsetof(UpdateCommand, condition), offsetof(UpdateCommand, fieldValues)});
+                  {offsetof(UpdateCommand, condition_), offsetof(UpdateCommand, fieldValues_)});
     ExpectInOrder(BehindCommand,
-                  {offsetof(SelectCommand, selectAll), offsetof(SelectCommand, fields),
-                   offsetof(SelectCommand, condition)});
+                  {offsetof(SelectCommand, selectAll_), offsetof(SelectCommand, fields_),
+                   offsetof(SelectCommand, condition_)});
 }
 
 TEST(MemberTest, AConnectionIsOnePointer)
