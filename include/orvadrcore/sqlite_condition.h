@@ -8,14 +8,12 @@
 ///     select.SetCondition(both);
 /// \endcode
 ///
-/// A condition is a plain value: copied, passed by reference, used by one thread at a time. It
-/// holds a text that is made when it is set and never parsed. A constructor with operands does what
-/// `SetValue` does and drops its answer: ask IsValid() or look at the text. Nothing throws unless
-/// memory runs out; what is refused is logged at ERR (file `sqlite_condition.cpp`, function
-/// `SetValue`).
+/// A condition is a plain value that holds a text; each is used by one thread at a time. SetValue()
+/// returns false for operands that it refuses, and logs them at ERR as `sqlite_condition.cpp`; a
+/// constructor only logs, so ask IsValid() or look at the text. Nothing throws unless memory runs out.
 ///
-/// \warning Column names and operand texts are taken as they stand, and a text value is quoted but
-///          not escaped: see SqliteValue::ToFormatedValue().
+/// \warning Column names and operand texts are written as they are, and text values are quoted but not
+///          escaped: see SqliteValue::ToFormatedValue().
 #ifndef ORVADRCORE_SQLITE_CONDITION_H
 #define ORVADRCORE_SQLITE_CONDITION_H
 
@@ -25,151 +23,88 @@
 #include <orvadrcore/export.h>
 #include <orvadrcore/sqlite_value.h>
 
-// Nobody owns a condition through a pointer to its base: a virtual destructor would serve no one,
-// and the binary interface has none. NOLINTBEGIN(cppcoreguidelines-virtual-class-destructor)
+// The binary interface has no virtual destructors here, and nobody owns a condition through a pointer
+// to its base. NOLINTBEGIN(cppcoreguidelines-virtual-class-destructor)
 #pragma GCC diagnostic push
 #pragma GCC diagnostic ignored "-Wnon-virtual-dtor"
 
 namespace OrvaDRCore {
 
-/// A condition's text, from whatever source.
-/// \warning There is no virtual destructor, on purpose: never delete a condition through a pointer
-///          to a base class.
+/// A condition with any text.
+/// \warning There is no virtual destructor: never delete a condition through a pointer to a base class.
 class ORVADRCORE_API SqliteCondition {
   public:
-    /// No condition.
     SqliteCondition() = default;
+    SqliteCondition(const std::string& text);  ///< The text without WHERE; nothing is checked.
 
-    /// A condition that is ready.
-    /// \param text  the condition without the word WHERE; nothing is checked
-    SqliteCondition(const std::string& text);
+    virtual bool IsValid() const;  ///< Whether there is a text.
 
-    /// Whether there is a condition.
-    /// \return true when the text is not empty
-    virtual bool IsValid() const;
-
-    /// The text, without the word WHERE.
-    /// \return a reference that is good until the condition changes; to an empty text when there is
-    ///         no condition
+    /// The text without WHERE, valid until the condition changes.
     const std::string& GetCondition() const { return condition; }
 
   protected:
-    std::string condition;  ///< The text that GetCondition() gives out.
+    std::string condition;  ///< What GetCondition() returns.
 };
 
 /// A column that equals a value: `id=3`.
 class ORVADRCORE_API SqliteEqual : public SqliteCondition {
   public:
     SqliteEqual() = default;
+    SqliteEqual(const std::string& lvalue, const SqliteValue& value);  ///< As SetValue().
 
-    /// As SetValue(), the answer dropped.
-    /// \param lvalue  the column
-    /// \param value   the value
-    SqliteEqual(const std::string& lvalue, const SqliteValue& value);
-
-    /// Replaces the text by `lvalue`, "=" and the value's literal.
-    /// \param lvalue  the column, written as it stands
-    /// \param value   the value; a text is quoted but not escaped
-    /// \return false when `lvalue` is empty or `value` not valid, with
-    ///         ERR `Bad lvalue[%s] or rvalue[%s]`; the text stays as it was then
+    /// Replaces the text. Refuses an empty column name and a value that is not valid; the text stays
+    /// as it was then.
     bool SetValue(const std::string& lvalue, const SqliteValue& value);
 };
 
-/// A column that differs from a value: `id!=3`.
+/// A column that differs from a value: `id!=3`. Otherwise as SqliteEqual.
 class ORVADRCORE_API SqliteNotEqual : public SqliteCondition {
   public:
     SqliteNotEqual() = default;
-
-    /// As SetValue(), the answer dropped.
-    /// \param lvalue  the column
-    /// \param value   the value
-    SqliteNotEqual(const std::string& lvalue, const SqliteValue& value);
-
-    /// Replaces the text by `lvalue`, "!=" and the value's literal.
-    /// \param lvalue  the column, written as it stands
-    /// \param value   the value; a text is quoted but not escaped
-    /// \return false as SqliteEqual::SetValue(), with the same line
-    bool SetValue(const std::string& lvalue, const SqliteValue& value);
+    SqliteNotEqual(const std::string& lvalue, const SqliteValue& value);  ///< As SetValue().
+    bool SetValue(const std::string& lvalue, const SqliteValue& value);   ///< As SqliteEqual.
 };
 
 /// Two conditions that both hold: `(id=3) AND (state!=0)`.
 class ORVADRCORE_API SqliteAnd : public SqliteCondition {
   public:
     SqliteAnd() = default;
+    SqliteAnd(const std::string& left, const std::string& right);  ///< As SetValue().
 
-    /// As SetValue(), the answer dropped.
-    /// \param left   the text of one condition
-    /// \param right  the text of the other
-    SqliteAnd(const std::string& left, const std::string& right);
-
-    /// Appends `(left) AND (right)`, the operands being the texts of two other conditions.
-    /// \param left   the text of one condition, written as it stands
-    /// \param right  the text of the other
-    /// \return false when an operand is empty, with ERR `Bad lvalue[%s] or rvalue[%s]`; the text
-    ///         stays as it was then
-    /// \warning The text is appended to, not replaced: a second call on the same object gives
-    ///          `(a) AND (b)(c) AND (d)`, which is no SQL. Use a new object for each condition.
+    /// Appends the texts of two conditions. Refuses an empty one; the text stays as it was then.
+    /// \warning A second call gives `(a) AND (b)(c) AND (d)`, which is not SQL. Use an object for each.
     bool SetValue(const std::string& left, const std::string& right);
 };
 
-/// Two conditions of which one holds: `(id=3) OR (state!=0)`.
+/// Two conditions of which at least one holds: `(id=3) OR (state!=0)`. Otherwise as SqliteAnd.
 class ORVADRCORE_API SqliteOr : public SqliteCondition {
   public:
     SqliteOr() = default;
-
-    /// As SetValue(), the answer dropped.
-    /// \param left   the text of one condition
-    /// \param right  the text of the other
-    SqliteOr(const std::string& left, const std::string& right);
-
-    /// Appends `(left) OR (right)`, the operands being the texts of two other conditions.
-    /// \param left   the text of one condition, written as it stands
-    /// \param right  the text of the other
-    /// \return false as SqliteAnd::SetValue(), with the same line
-    /// \warning The text is appended to, not replaced, as in SqliteAnd.
-    bool SetValue(const std::string& left, const std::string& right);
+    SqliteOr(const std::string& left, const std::string& right);       ///< As SetValue().
+    bool SetValue(const std::string& left, const std::string& right);  ///< As SqliteAnd: appends.
 };
 
-/// A column whose value is, or is not, one of many: what SqliteIn and SqliteNotIn share.
+/// What SqliteIn and SqliteNotIn share: a column whose value is, or is not, in a list.
 class ORVADRCORE_API SqliteInFamily : public SqliteCondition {
   public:
-    /// No text yet.
-    /// \param keyword  "IN" or "NOT IN", exactly; with any other the object refuses every value
+    /// With a keyword other than "IN" and "NOT IN" the object refuses every value.
     SqliteInFamily(const std::string& keyword);
-
-    /// As SetValue() with a list, the answer dropped.
-    /// \param keyword  "IN" or "NOT IN", exactly
-    /// \param lvalue   the column
-    /// \param values   the values
     SqliteInFamily(const std::string& keyword, const std::string& lvalue,
-                   const std::vector<SqliteValue>& values);
+                   const std::vector<SqliteValue>& values);  ///< As SetValue().
+    SqliteInFamily(const std::string& keyword, const std::string& lvalue,
+                   const std::string& value);  ///< As SetValue().
 
-    /// As SetValue() with a ready text, the answer dropped.
-    /// \param keyword  "IN" or "NOT IN", exactly
-    /// \param lvalue   the column
-    /// \param value    what stands between the parentheses
-    SqliteInFamily(const std::string& keyword, const std::string& lvalue, const std::string& value);
-
-    /// Whether the keyword is "IN" or "NOT IN".
-    /// \return true when it is
-    /// \warning The text is not looked at: a condition whose list was refused is empty and yet says
-    ///          that it is valid, and a SELECT that is given it keeps its previous condition, or
-    ///          none. Look at the answer of SetValue(), or at GetCondition().
+    /// Whether the keyword is one of the two.
+    /// \warning True also for an empty text. A SELECT that gets a refused list keeps its previous
+    ///          condition, or none: check what SetValue() returns.
     bool IsValid() const override;
 
-    /// Replaces the text by a list of literals: `id IN ( 1,2,3 )`.
-    /// \param lvalue  the column, written as it stands
-    /// \param values  the values; an empty list is accepted; texts are quoted but not escaped
-    /// \return false, with a line at ERR that says why: `Bad keyword [%s]` and `Bad lvalue[%s]`
-    ///         (empty), which leave the text as it was; `Invalid rvalue [%s]` for a value that is
-    ///         not valid, which leaves the text empty
+    /// Replaces the text by a list, which may be empty: `id IN ( 1,2,3 )`. A value that is not valid
+    /// leaves the text empty; an empty column name leaves it as it was.
     bool SetValue(const std::string& lvalue, const std::vector<SqliteValue>& values);
 
-    /// Replaces the text by a sub-select or list that is ready: `id IN ( SELECT id FROM jobs )`.
-    /// \param lvalue  the column, written as it stands
-    /// \param value   what stands between the parentheses, likewise
-    /// \return false for a bad keyword, with ERR `Bad keyword [%s]`, and when `lvalue` or `value`
-    ///         is empty, with ERR `Bad lvalue[%s] or value[%s]`; the text stays as it was then
+    /// Replaces the text by a subquery or a finished list: `id IN ( SELECT id FROM jobs )`. Refuses
+    /// an empty operand; the text stays as it was then.
     bool SetValue(const std::string& lvalue, const std::string& value);
 
   private:
@@ -178,38 +113,22 @@ class ORVADRCORE_API SqliteInFamily : public SqliteCondition {
     std::string keyword_;
 };
 
-/// A column whose value is one of many.
+/// A column whose value is in a list.
 class ORVADRCORE_API SqliteIn : public SqliteInFamily {
   public:
-    /// No text yet; valid all the same, see SqliteInFamily::IsValid().
-    SqliteIn();
-
-    /// As SqliteInFamily::SetValue() with a list, the answer dropped.
-    /// \param lvalue  the column
-    /// \param values  the values
-    SqliteIn(const std::string& lvalue, const std::vector<SqliteValue>& values);
-
-    /// As SqliteInFamily::SetValue() with a ready text, the answer dropped.
-    /// \param lvalue  the column
-    /// \param value   what stands between the parentheses
-    SqliteIn(const std::string& lvalue, const std::string& value);
+    SqliteIn();  ///< Has no text but is valid: see SqliteInFamily::IsValid().
+    SqliteIn(const std::string& lvalue,
+             const std::vector<SqliteValue>& values);               ///< As SetValue().
+    SqliteIn(const std::string& lvalue, const std::string& value);  ///< As SetValue().
 };
 
-/// A column whose value is none of many.
+/// A column whose value is not in a list.
 class ORVADRCORE_API SqliteNotIn : public SqliteInFamily {
   public:
-    /// No text yet; valid all the same, see SqliteInFamily::IsValid().
-    SqliteNotIn();
-
-    /// As SqliteInFamily::SetValue() with a list, the answer dropped.
-    /// \param lvalue  the column
-    /// \param values  the values
-    SqliteNotIn(const std::string& lvalue, const std::vector<SqliteValue>& values);
-
-    /// As SqliteInFamily::SetValue() with a ready text, the answer dropped.
-    /// \param lvalue  the column
-    /// \param value   what stands between the parentheses
-    SqliteNotIn(const std::string& lvalue, const std::string& value);
+    SqliteNotIn();  ///< Has no text but is valid: see SqliteInFamily::IsValid().
+    SqliteNotIn(const std::string& lvalue,
+                const std::vector<SqliteValue>& values);               ///< As SetValue().
+    SqliteNotIn(const std::string& lvalue, const std::string& value);  ///< As SetValue().
 };
 
 }  // namespace OrvaDRCore
