@@ -9,7 +9,7 @@ namespace OrvaDRCore {
 
 namespace {
 
-// Room for a statement from the beginning, so that it need not move as it grows.
+// Reserved for a statement, so that it is rarely reallocated while it grows.
 constexpr std::size_t UsualLength = 240;
 
 template <class T>
@@ -25,13 +25,13 @@ bool AddFieldValue(SqliteValueList& record, const std::string& field, const T& v
 }
 
 // Writes to the stream's buffer, which throws when memory runs out. The stream's operators would
-// swallow that and leave a text that is cut off.
+// swallow the exception and leave a truncated text.
 void Write(std::stringstream& out, const std::string& text)
 {
     out.rdbuf()->sputn(text.data(), static_cast<std::streamsize>(text.size()));
 }
 
-// The text of a condition object, for the caller's setter of texts; null when it is not valid.
+// Returns null, after a log line, when the condition is not valid.
 const std::string* TextOf(const SqliteCondition& condition)
 {
     if (!condition.IsValid()) {
@@ -41,7 +41,7 @@ const std::string* TextOf(const SqliteCondition& condition)
     return &condition.GetCondition();
 }
 
-// The names of the fields and their literals, each list in brackets.
+// Appends "(id,name) VALUES (1,'x')".
 void AppendInsertValues(std::string& text, const SqliteValueList& record)
 {
     text += '(';
@@ -86,7 +86,7 @@ std::string SqliteCommand::ToStr() const
 {
     std::stringstream out;
     Write(out,
-          table_.GetName() + "]");  // there is no opening bracket, because the contract says so
+          table_.GetName() + "]");  // the contract has no opening bracket
     DumpParam(out);
     return out.str();
 }
@@ -201,7 +201,7 @@ bool UpdateCommand::AddFieldValue(const std::string& field, const char* text)
     return OrvaDRCore::AddFieldValue(fieldValues_, field, text);
 }
 
-// An empty text is refused without a line, on purpose; SelectCommand has one.
+// The contract has no log line for an empty text here, but has one in SelectCommand.
 bool UpdateCommand::SetCondition(const std::string& text)
 {
     if (text.empty()) return false;
@@ -221,7 +221,7 @@ bool UpdateCommand::IsValid() const
            !GetTable().GetName().empty();
 }
 
-// No ";" at the end of updates and selects, unlike inserts, on purpose.
+// By contract updates and selects do not end with ";", but inserts do.
 std::string UpdateCommand::GetCommand() const
 {
     if (!IsValid()) {
@@ -286,7 +286,7 @@ std::string SelectCommand::GetCommand() const
     if (!fields_.empty()) {
         text += Container::ToString(fields_, ",") + " ";
     } else if (selectAll_) {
-        text += " * ";  // the second blank before the star, on purpose
+        text += " * ";  // the contract has two blanks before the star
     }
     text += "FROM " + GetTable().GetName();
     if (!condition_.empty()) text += " WHERE " + condition_;

@@ -10,7 +10,7 @@ namespace {
 constexpr const char* In = "IN";
 constexpr const char* NotIn = "NOT IN";
 
-// Every line of this file carries the name of the setter that the caller used.
+// All log lines of this file name the function that the caller used.
 constexpr const char* Setter = "SetValue";
 
 bool SetComparison(std::string& condition, const std::string& lvalue, const char* sign,
@@ -25,7 +25,7 @@ bool SetComparison(std::string& condition, const std::string& lvalue, const char
     return true;
 }
 
-// Appends, on purpose: a second call on the same condition puts the new text behind the old one.
+// By contract this appends: a second call on the same object adds its text after the first one.
 bool AppendJunction(std::string& condition, const std::string& left, const char* word,
                     const std::string& right)
 {
@@ -102,7 +102,7 @@ SqliteInFamily::SqliteInFamily(const std::string& keyword, const std::string& lv
     SetValue(lvalue, value);
 }
 
-// The text is not asked, on purpose: a refused list leaves a condition that is empty yet valid.
+// The contract looks at the keyword only: after a refused list the condition is empty but valid.
 bool SqliteInFamily::IsValid() const
 {
     return keyword_ == In || keyword_ == NotIn;
@@ -110,7 +110,7 @@ bool SqliteInFamily::IsValid() const
 
 bool SqliteInFamily::CheckKeyword() const
 {
-    // The constructors ask this class's own, any other caller the object's.
+    // In the constructors this is the base's IsValid(), later that of the derived class.
     if (IsValid()) return true;  // NOLINT(clang-analyzer-optin.cplusplus.VirtualCall)
     DR_LOG_AS(Setter, Err, "Bad keyword [%s]", keyword_.c_str());
     return false;

@@ -51,7 +51,7 @@ SqliteConnection::TakeRow AppendTo(std::vector<SqliteValueList>& records)
     };
 }
 
-// The form of SelectByCommand() for all rows, which are given to `takeRow`.
+// SelectByCommand() for all rows, each of which is given to `takeRow`.
 bool SelectRows(SqliteConnection& connection, const std::string& command,
                 const SqliteConnection::TakeRow& takeRow)
 {
@@ -126,7 +126,7 @@ bool SelectCommandInto(const Operation& operation, SqliteDB& db, const SelectCom
     return true;
 }
 
-// Takes the connection out of an object, which stays usable: closed, with the same file and limit.
+// Takes the connection out of an object. The object stays usable: closed, with the same path and limit.
 std::unique_ptr<SqliteConnection> Take(std::unique_ptr<SqliteConnection>& from)
 {
     auto closed = std::make_unique<SqliteConnection>(from->GetPath(), from->GetRetryLimit());
@@ -137,8 +137,8 @@ std::unique_ptr<SqliteConnection> Take(std::unique_ptr<SqliteConnection>& from)
 
 }  // namespace
 
-SqliteDB::SqliteDB(const std::string& file, unsigned int limit)
-    : connection_(std::make_unique<SqliteConnection>(file, limit))
+SqliteDB::SqliteDB(const std::string& path, unsigned int retryLimit)
+    : connection_(std::make_unique<SqliteConnection>(path, retryLimit))
 {
 }
 
@@ -159,7 +159,7 @@ SqliteConnection& SqliteDB::Connection() const
 
 bool SqliteDB::InsertRecord(const InsertCommand& command)
 {
-    // An invalid insert stays at 404 where the other operations answer 401, on purpose.
+    // The contract gives 404 for an invalid insert, and 401 for the other invalid commands.
     return ExecCommand({__func__, "insert", ERR::ERR_DATABASE_OPERATION}, *this, command);
 }
 
@@ -244,7 +244,7 @@ bool SqliteDB::DoDelete(const SqliteTableHandler& table, const std::string& cond
 
 bool SqliteDB::IsTableExisted(const std::string& table)
 {
-    // The rows alone decide: a failed query counts as a missing table.
+    // Only the row counts: the table exists if it was read, even if the lookup failed afterwards.
     bool isFound = false;
     SelectRows(*connection_,
                "SELECT 1 FROM sqlite_master WHERE type='table' AND name='" + table + "';",
@@ -254,7 +254,7 @@ bool SqliteDB::IsTableExisted(const std::string& table)
 
 bool SqliteDB::CreateTable(const SqliteTableHandler& table)
 {
-    // The schema comes first, on purpose: without one nothing is asked for, not even a name.
+    // The contract checks the schema first: without one nothing is needed, not even a name.
     if (table.GetSchema().empty()) return true;
     if (table.GetName().empty()) {
         DR_LOG(Err, "Invalid table [%s]", table.GetName().c_str());
@@ -378,7 +378,7 @@ bool SqliteDB::DoExecSqliteCommand(const std::string& command)
 
 bool SqliteDB::DoSelectSqliteRecord(const std::string& command, SqliteValueList& record)
 {
-    // A change whose commit fails has given a row all the same, so the row is not taken before.
+    // A statement that writes may give a row and still fail to commit; the row does not count then.
     std::optional<SqliteValueList> first;
     const auto takeFirst = [&first](const RowReader& row) {
         first = ParseRecord(row);

@@ -10,7 +10,7 @@ namespace {
 template <class Integer>
 void AppendNumber(std::string& text, Integer number)
 {
-    std::array<char, 24> digits{};  // 64 bits have 20 digits and a sign at most
+    std::array<char, 24> digits{};  // 64 bits need 20 digits and a sign at most
     char* const begin = digits.data();
     text.append(begin, std::to_chars(begin, begin + digits.size(), number).ptr);
 }

@@ -1,4 +1,4 @@
-// Values and records from within: as the texts that stand in statements, and made from rows.
+// The inside of values and records: how they are written into statements and made from rows.
 #ifndef ORVADRCORE_SRC_SQLITE_SQLITE_INTERNALS_H
 #define ORVADRCORE_SRC_SQLITE_SQLITE_INTERNALS_H
 
@@ -13,7 +13,7 @@
 
 namespace OrvaDRCore {
 
-// Whether a SqliteValue that is made of this is valid.
+// Whether a SqliteValue built from this is valid.
 inline bool MakesValue(const std::string& text)
 {
     return FitsJsonText(text.size());
@@ -30,12 +30,12 @@ bool MakesValue(Number /*number*/)
     return true;
 }
 
-// What the library's own sources see of values and records.
+// Access for the library's own sources.
 struct SqliteInternals {
-    // What a value holds: null, a number, a boolean or a text.
+    // Null, a number, a boolean or a text.
     static const Json::Value& Payload(const SqliteValue& value) { return value.value_; }
 
-    // Adds a field as AddValue() does, but makes its value in place, which takes half the time.
+    // Adds a field like AddValue(), but builds its value in place, which takes half the time.
     template <class T>
     static void Add(SqliteValueList& record, const std::string& field, const T& value)
     {
@@ -46,10 +46,10 @@ struct SqliteInternals {
     }
 };
 
-// Appends the literal that SqliteValue::ToFormatedValue() gives.
+// Appends what SqliteValue::ToFormatedValue() returns.
 void AppendLiteral(std::string& text, const SqliteValue& value);
 
-// A record's fields as one text: name, `between`, literal; pairs separated by `separator`.
+// The fields as one text: name, `between` and literal of each, with `separator` between fields.
 std::string JoinPairs(const SqliteValueList& record, const char* between, const char* separator);
 
 }  // namespace OrvaDRCore

@@ -31,7 +31,7 @@ SqliteValue::SqliteValue(const char* text, std::size_t length)
     }
 }
 
-// `valid` stays as it was, on purpose: only construction makes a value valid.
+// By contract `valid_` stays as it was: only construction makes a value valid.
 SqliteValue& SqliteValue::operator=(const SqliteValue& other)
 {
     value_ = other.value_;
@@ -40,7 +40,7 @@ SqliteValue& SqliteValue::operator=(const SqliteValue& other)
 
 bool SqliteValue::IsValid() const
 {
-    // The kinds that a value is built from; it may have lost its payload to another since.
+    // An assignment may have replaced the payload since the value was built.
     const Json::ValueType kind = value_.type();
     return valid_ && (kind == Json::intValue || kind == Json::uintValue ||
                       kind == Json::stringValue || kind == Json::booleanValue);
@@ -119,7 +119,7 @@ SqliteValueList::~SqliteValueList() = default;
 
 SqliteValueList& SqliteValueList::operator=(const SqliteValueList& other)
 {
-    // Through a copy made by construction: assigning value by value would lose `valid`.
+    // Copies by construction, because assigning each value would lose `valid_`.
     if (this != &other) values_ = std::map<std::string, SqliteValue>(other.values_);
     return *this;
 }
@@ -142,7 +142,7 @@ bool SqliteValueList::AddValue(const std::string& field, SqliteValue&& value)
         return false;
     }
     const auto [entry, added] = values_.try_emplace(field, std::move(value));
-    if (!added) entry->second = value;  // try_emplace has left it alone
+    if (!added) entry->second = value;  // try_emplace() has not moved from it
     return true;
 }
 
@@ -185,7 +185,7 @@ bool SqliteValueList::ReadField(const std::string& field, T& out) const
     }
     const auto entry = values_.find(field);
     if (entry == values_.end()) {
-        // A lower level than in the other GetValue, because asking this way is a test, too.
+        // DEBUG, unlike the other GetValue(): callers use this one to test whether a field exists.
         DR_LOG_AS(Function, Debug, "field [%s] is not existed", field.c_str());
         return false;
     }
