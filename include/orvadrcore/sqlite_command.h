@@ -10,12 +10,12 @@
 ///     insert.GetCommand();   // "INSERT INTO nodes (id,name) VALUES (1,'backup');"
 /// \endcode
 ///
-/// Builders copy what they are given; each is used by one thread at a time. They throw only when memory
-/// runs out. What they refuse changes nothing and gives false or an empty text, mostly with a line at
-/// ERR as `sqlite_command.cpp`; docs/records.md lists the lines.
+/// Builders copy what they are given; each is used by one thread at a time. They throw only when
+/// memory runs out. What they refuse changes nothing and gives false or an empty text, mostly with
+/// a line at ERR as `sqlite_command.cpp`; docs/records.md lists the lines.
 ///
-/// \warning Names, schemas and conditions are written as they are, and text values are quoted but not
-///          escaped: see SqliteValue::ToFormatedValue().
+/// \warning Names, schemas and conditions are written as they are, and text values are quoted but
+///          not escaped: see SqliteValue::ToFormatedValue().
 #ifndef ORVADRCORE_SQLITE_COMMAND_H
 #define ORVADRCORE_SQLITE_COMMAND_H
 
@@ -34,8 +34,8 @@ class ORVADRCORE_API SqliteTableHandler {
   public:
     SqliteTableHandler() = default;
 
-    /// The schema is what stands between the parentheses of CREATE TABLE. With an empty one SqliteDB
-    /// never creates the table.
+    /// The schema is what stands between the parentheses of CREATE TABLE. With an empty one
+    /// SqliteDB never creates the table.
     SqliteTableHandler(const std::string& name, const std::string& schema);
 
     SqliteTableHandler(const SqliteTableHandler&) = default;
@@ -50,8 +50,8 @@ class ORVADRCORE_API SqliteTableHandler {
     std::string schema_;
 };
 
-/// What SqliteDB needs of every statement. The order of the virtual operations is part of the binary
-/// interface.
+/// What SqliteDB needs of every statement. The order of the virtual operations is part of the
+/// binary interface.
 class ORVADRCORE_API SqliteCommand {
   public:
     virtual ~SqliteCommand();
@@ -134,8 +134,8 @@ class ORVADRCORE_API UpdateCommand : public SqliteCommand {
         return AddFieldValue(field, static_cast<const char*>(text));
     }
 
-    /// Sets the condition, without WHERE. Refuses an empty one, without a log line; the previous one
-    /// stays.
+    /// Sets the condition, without WHERE. Refuses an empty one, without a log line; the previous
+    /// one stays.
     bool SetCondition(const std::string& text);
     bool SetCondition(const SqliteCondition& object);  ///< Logs one that is not valid.
 

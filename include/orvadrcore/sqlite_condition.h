@@ -10,10 +10,10 @@
 ///
 /// A condition is a plain value that holds a text; each is used by one thread at a time. SetValue()
 /// returns false for operands that it refuses, and logs them at ERR as `sqlite_condition.cpp`; a
-/// constructor only logs, so ask IsValid() or look at the text. Nothing throws unless memory runs out.
+/// constructor only logs, so look at IsValid() or the text. Nothing throws unless memory runs out.
 ///
-/// \warning Column names and operand texts are written as they are, and text values are quoted but not
-///          escaped: see SqliteValue::ToFormatedValue().
+/// \warning Column names and operand texts are written as they are, and text values are quoted but
+///          not escaped: see SqliteValue::ToFormatedValue().
 #ifndef ORVADRCORE_SQLITE_CONDITION_H
 #define ORVADRCORE_SQLITE_CONDITION_H
 
@@ -23,15 +23,15 @@
 #include <orvadrcore/export.h>
 #include <orvadrcore/sqlite_value.h>
 
-// The binary interface has no virtual destructors here, and nobody owns a condition through a pointer
-// to its base. NOLINTBEGIN(cppcoreguidelines-virtual-class-destructor)
+// The binary interface has no virtual destructors here, and nobody owns a condition through a
+// pointer to its base. NOLINTBEGIN(cppcoreguidelines-virtual-class-destructor)
 #pragma GCC diagnostic push
 #pragma GCC diagnostic ignored "-Wnon-virtual-dtor"
 
 namespace OrvaDRCore {
 
 /// A condition with any text.
-/// \warning There is no virtual destructor: never delete a condition through a pointer to a base class.
+/// \warning It has no virtual destructor: never delete a condition through a pointer to its base.
 class ORVADRCORE_API SqliteCondition {
   public:
     SqliteCondition() = default;
@@ -52,8 +52,8 @@ class ORVADRCORE_API SqliteEqual : public SqliteCondition {
     SqliteEqual() = default;
     SqliteEqual(const std::string& lvalue, const SqliteValue& value);  ///< As SetValue().
 
-    /// Replaces the text. Refuses an empty column name and a value that is not valid; the text stays
-    /// as it was then.
+    /// Replaces the text. Refuses an empty column name and a value that is not valid; the text
+    /// stays as it was then.
     bool SetValue(const std::string& lvalue, const SqliteValue& value);
 };
 
@@ -72,7 +72,7 @@ class ORVADRCORE_API SqliteAnd : public SqliteCondition {
     SqliteAnd(const std::string& left, const std::string& right);  ///< As SetValue().
 
     /// Appends the texts of two conditions. Refuses an empty one; the text stays as it was then.
-    /// \warning A second call gives `(a) AND (b)(c) AND (d)`, which is not SQL. Use an object for each.
+    /// \warning A second call gives `(a) AND (b)(c) AND (d)`, which is not SQL.
     bool SetValue(const std::string& left, const std::string& right);
 };
 
@@ -99,8 +99,8 @@ class ORVADRCORE_API SqliteInFamily : public SqliteCondition {
     ///          condition, or none: check what SetValue() returns.
     bool IsValid() const override;
 
-    /// Replaces the text by a list, which may be empty: `id IN ( 1,2,3 )`. A value that is not valid
-    /// leaves the text empty; an empty column name leaves it as it was.
+    /// Replaces the text by a list, which may be empty: `id IN ( 1,2,3 )`. A value that is not
+    /// valid leaves the text empty; an empty column name leaves it as it was.
     bool SetValue(const std::string& lvalue, const std::vector<SqliteValue>& values);
 
     /// Replaces the text by a subquery or a finished list: `id IN ( SELECT id FROM jobs )`. Refuses

@@ -9,11 +9,11 @@
 /// \endcode
 ///
 /// A failed statement is retried, whatever the failure, and each attempt waits up to a second for a
-/// lock: a call may block for long. Operations return false when they fail, leave a code and a record
-/// of the error, and write log lines as `sqlite_db.cpp`. They throw only when memory runs out.
+/// lock: a call may block for long. A failed operation returns false, leaves a code and a record of
+/// the error, and logs as `sqlite_db.cpp`. Nothing throws unless memory runs out.
 ///
-/// An object is used by one thread at a time. In a forked child the parent's objects must not be used,
-/// closed or destroyed. docs/connection.md explains all this and lists codes and log lines.
+/// An object is used by one thread at a time. In a forked child the parent's objects must not be
+/// used, closed or destroyed. docs/connection.md explains all this and lists codes and log lines.
 #ifndef ORVADRCORE_SQLITE_DB_H
 #define ORVADRCORE_SQLITE_DB_H
 
@@ -58,12 +58,12 @@ class ORVADRCORE_API SqliteDB {
 
     /// Inserts all records or none, in one transaction or, inside an open one, in a savepoint. An
     /// attempt is the whole of it. Much faster than one by one; the records may differ in fields.
-    /// \warning Do not pass texts through SqliteValue::EscapeText() here: they are stored as they are.
+    /// \warning Texts are stored as they are. Do not pass them through SqliteValue::EscapeText().
     bool InsertRecords(const SqliteTableHandler& table, const std::vector<SqliteValueList>& records,
                        bool replacable = false);
 
-    bool UpdateRecord(
-        const UpdateCommand& command);  ///< True also when no row meets the condition.
+    /// True also when no row meets the condition.
+    bool UpdateRecord(const UpdateCommand& command);
 
     /// Appends the selected rows to `records`. See SelectByCommand() for what a row becomes.
     bool SelectRecords(const SelectCommand& command, std::vector<SqliteValueList>& records);
@@ -94,14 +94,14 @@ class ORVADRCORE_API SqliteDB {
     // -------------------------------------------------------------------------------- statements
 
     /// Runs statements without rows on the open connection.
-    /// \warning A retry repeats the whole text. After a failed "BEGIN; ..." the transaction is open.
+    /// \warning A retry repeats the whole text. A failed "BEGIN; ..." leaves its transaction open.
     bool Exec(const std::string& command);
 
     /// Selects the first row on the open connection. `record` is unchanged when there is none.
     ///
-    /// NULL, real and blob columns are left out, with a WARN line, and a text ends at its first zero
-    /// byte. Of columns with the same name the last that is not left out counts.
-    /// \warning Integers are cut to 32 bits. Select larger ones as text: `CAST(size AS TEXT) AS size`.
+    /// NULL, real and blob columns are left out, with a WARN line, and a text ends at its first
+    /// zero byte. Of columns with the same name the last that is not left out counts.
+    /// \warning Integers are cut to 32 bits. Select larger ones by `CAST(size AS TEXT) AS size`.
     bool SelectByCommand(const std::string& command, SqliteValueList& record);
 
     /// Appends all rows to `records`.
@@ -120,8 +120,8 @@ class ORVADRCORE_API SqliteDB {
 
     int GetErrCode() const;  ///< An ERR::Code, or 0 after a success.
 
-    /// Null if SQLite has reported no failure, an object after a single attempt, an array of all
-    /// failed attempts after retries. The reference is valid until the next operation.
+    /// Null if SQLite reported no failure, an object after a single attempt, an array of all failed
+    /// attempts after retries. Valid until the next operation.
     const Json::Value& GetErr() const;
 
     /// Records a failure of SQLite. Without a message it is SQLite's last one.
@@ -138,8 +138,9 @@ class ORVADRCORE_API SqliteDB {
     bool DoSelectSqliteRecords(const std::string& command, std::vector<SqliteValueList>& records);
 
     /// \cond INTERNAL
-    ORVADRCORE_LOCAL SqliteConnection& Connection() const;  // for the library's own classes
-                                                            /// \endcond
+    // For the library's own classes.
+    ORVADRCORE_LOCAL SqliteConnection& Connection() const;
+    /// \endcond
 
   private:
     std::unique_ptr<SqliteConnection> connection_;

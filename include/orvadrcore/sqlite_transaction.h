@@ -8,14 +8,15 @@
 ///     // The destructor rolls back what is not committed.
 /// \endcode
 ///
-/// While the transaction is open, each operation of the connection is a single attempt. When one fails,
-/// roll back: SQLite may have rolled back the whole transaction by itself, and the next operation would
-/// run outside of it. docs/recipes.md, "All or nothing", tells more.
+/// While the transaction is open, each operation of the connection is a single attempt. When one
+/// fails, roll back: SQLite may have rolled back the whole transaction by itself, and the next
+/// operation would run outside of it. docs/recipes.md, "All or nothing", tells more.
 ///
-/// \warning Other processes cannot write to the file meanwhile. Do not fork, and do not read a Cache,
-///          which forks.
-/// \warning Create the tables before, and use table handlers without a schema. The table lookup is a
-///          statement, too: if SQLite rolls back there, the operation runs outside of the transaction.
+/// \warning Other processes cannot write to the file meanwhile. Do not fork, and do not read a
+///          Cache, which forks.
+/// \warning Create the tables before, and use table handlers without a schema. The table lookup is
+///          a statement, too: if SQLite rolls back there, the operation runs outside of the
+///          transaction.
 #ifndef ORVADRCORE_SQLITE_TRANSACTION_H
 #define ORVADRCORE_SQLITE_TRANSACTION_H
 
@@ -43,7 +44,8 @@ class ORVADRCORE_API SqliteTransaction {
 
     /// Commits, with retries: readers are waited for. The transaction may still be open after a
     /// failure, and can be committed or rolled back.
-    /// \return false with 401 without a transaction, with 404 when it was rolled back or ended already
+    /// \return false with 401 when there is none, and with 404 when it has ended without this
+    ///         object
     [[nodiscard]] bool Commit();
 
     /// Rolls back in a single attempt. If that fails, closes the connection, which also rolls back.

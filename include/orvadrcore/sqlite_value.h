@@ -10,8 +10,8 @@
 ///     if (node.GetValue("name", name)) { ... }
 /// \endcode
 ///
-/// Values and records own what they hold; each is used by one thread at a time. They throw only when
-/// memory runs out. What they refuse is logged as `sqlite_value.cpp`; docs/records.md lists the lines.
+/// Values and records own what they hold; each is used by one thread at a time. Nothing throws
+/// unless memory runs out. Refusals are logged as `sqlite_value.cpp`; docs/records.md lists them.
 #ifndef ORVADRCORE_SQLITE_VALUE_H
 #define ORVADRCORE_SQLITE_VALUE_H
 
@@ -52,8 +52,8 @@ class ORVADRCORE_API SqliteValue {
     ~SqliteValue() = default;
 
     /// Copies what the other value holds, but not whether it is valid.
-    /// \warning `SqliteValue v; v = SqliteValue(1);` leaves `v` invalid. Build values where you need
-    ///          them, or put them into a SqliteValueList.
+    /// \warning `SqliteValue v; v = SqliteValue(1);` leaves `v` invalid. Build values where you
+    ///          need them, or put them into a SqliteValueList.
     SqliteValue& operator=(const SqliteValue& other);
 
     bool IsValid() const;  ///< Whether it was built with a value and still holds one.
@@ -93,8 +93,8 @@ template <>
 ORVADRCORE_API bool SqliteValue::GetValue<bool>(bool& out) const;
 /// \endcond
 
-/// A record: values by field name, in the byte order of the names. No name is empty, and every value is
-/// valid.
+/// A record: values by field name, in the byte order of the names. No name is empty, and every
+/// value is valid.
 class ORVADRCORE_API SqliteValueList {
   public:
     SqliteValueList() = default;
@@ -119,7 +119,7 @@ class ORVADRCORE_API SqliteValueList {
     const SqliteValue& GetValue(const std::string& field) const;
 
     /// Reads a field as SqliteValue::GetValue() does.
-    /// \return false when it cannot be read, with a DEBUG line when it is missing; `out` is unchanged
+    /// \return false, with `out` unchanged, when it cannot be read; DEBUG when it is missing
     template <class T>
     bool GetValue(  // T: std::string, unsigned int, int or bool
         const std::string& field, T& out) const = delete;
@@ -152,8 +152,8 @@ template <>
 ORVADRCORE_API bool SqliteValueList::GetValue<bool>(const std::string& field, bool& out) const;
 /// \endcond
 
-/// Base of a program's own record types, which turn themselves into a SqliteValueList. The order of the
-/// virtual operations is part of the binary interface.
+/// Base of a program's own record types, which turn themselves into a SqliteValueList. The order of
+/// the virtual operations is part of the binary interface.
 class ORVADRCORE_API SqliteRecord {
   public:
     /// Returns a record with the named fields, all of which GetRecordFields() names.

@@ -22,8 +22,8 @@ constexpr microseconds LongestPauseOfMany(15'000);
 constexpr microseconds LongestFirstPauseInCommit(50);
 constexpr microseconds TurnLength(6000);
 
-// The more connections wait, the longer each waits for its turn. Pauses that grow with the wait keep
-// the number of attempts per second the same.
+// The more connections wait, the longer each waits for its turn. Pauses that grow with the wait
+// keep the number of attempts per second the same.
 constexpr int PausesPerWait = 32;
 
 // Whether the waiting connection has changes to commit. Before SQLite 3.34 there is no way to ask.
@@ -89,8 +89,8 @@ void BusyWait::Yield()
     if (left > Microseconds::zero()) Sleep(left);
 }
 
-// The pause is half as long as the turn was: long enough for others to get the lock, and the file is
-// idle for a small part of the time only, however long a commit takes.
+// The pause is half as long as the turn was: long enough for others to get the lock, and the file
+// is idle for a small part of the time only, however long a commit takes.
 void BusyWait::NoteUnlocked()
 {
     if (!hasTurn_) return;

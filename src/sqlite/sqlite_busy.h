@@ -1,13 +1,13 @@
 // How a connection waits for a lock that another connection holds.
 //
 // SQLite's own waiting retries less and less often, up to 100 ms apart, while the connection that
-// just wrote comes back at once: some processes write all the time and others starve. Here a waiting
-// connection retries after a random 0.5 to 2.5 ms. When many wait, their attempts would keep the
-// processors busy, so the pauses grow with the wait, up to 15 ms, and shrink again as its second runs
-// out.
+// just wrote comes back at once: some processes write all the time and others starve. Here a
+// waiting connection retries after a random 0.5 to 2.5 ms. When many wait, their attempts would
+// keep the processors busy, so the pauses grow with the wait, up to 15 ms, and shrink again as its
+// second runs out.
 //
-// A connection that had to wait may then write for 6 ms, because passing the lock on costs as much as
-// a small write. Before its next write it pauses, so that others get the lock.
+// A connection that had to wait may then write for 6 ms, because passing the lock on costs as much
+// as a small write. Before its next write it pauses, so that others get the lock.
 //
 // With a rollback journal, a commit that waits for readers keeps everybody else out, even new
 // readers. It retries within 0.1 ms, and then less and less often: most of the readers it meets are
@@ -28,8 +28,8 @@ namespace OrvaDRCore {
 // How long one attempt waits for another connection's lock.
 inline constexpr int BusyTimeoutMSec = 1000;
 
-// A connection's busy handler. SQLite holds a pointer to it, so it must not move while the connection
-// is open.
+// A connection's busy handler. SQLite holds a pointer to it, so it must not move while the
+// connection is open.
 class BusyWait {
   public:
     BusyWait() = default;
@@ -49,8 +49,8 @@ class BusyWait {
     void LeaveToSqlite();
     void TakeBack();
 
-    // To be called before a statement that may write. Pauses for 2.5 ms at most when this connection
-    // had to wait, has used up its turn and comes back too soon.
+    // To be called before a statement that may write. Pauses for 2.5 ms at most when this
+    // connection had to wait, has used up its turn and comes back too soon.
     void Yield();
 
     // To be called after each statement that leaves no transaction open.
@@ -84,9 +84,9 @@ class BusyWait {
     Clock::time_point yieldUntil_;  // the clock's epoch when there is no need to yield
 };
 
-// Makes `PRAGMA busy_timeout` work as if SQLite waited by itself; it would answer 0 otherwise. While
-// this object lives, SQLite does wait by itself if the statement names the busy timeout. If the
-// statement has set it, that stays so until the connection is opened again.
+// Makes `PRAGMA busy_timeout` work as if SQLite waited by itself; it would answer 0 otherwise.
+// While this object lives, SQLite does wait by itself if the statement names the busy timeout. If
+// the statement has set it, that stays so until the connection is opened again.
 class BusyTimeoutAccess {
   public:
     BusyTimeoutAccess(BusyWait& wait, const StatementWatch& watch, const std::string& statement);

@@ -19,8 +19,8 @@ namespace OrvaDRCore {
 
 class SqliteTransaction;
 
-// Runs statements and logs nothing: SqliteDB and SqliteTransaction do that. It stays where it is when
-// its SqliteDB is moved, because SQLite holds pointers to its members.
+// Runs statements and logs nothing: SqliteDB and SqliteTransaction do that. It stays where it is
+// when its SqliteDB is moved, because SQLite holds pointers to its members.
 class SqliteConnection {
   public:
     SqliteConnection(const std::string& path, unsigned int retryLimit);
@@ -37,8 +37,8 @@ class SqliteConnection {
     // Sets the error to a failure of SQLite. Without a message it is SQLite's last one.
     void SetFailure(const std::string& command, int sqliteCode, const char* message);
 
-    // The two steps of opening a connection that is closed. When the second fails, the connection is
-    // open and waits for no lock. Neither changes the error.
+    // The two steps of opening a connection that is closed. When the second fails, the connection
+    // is open and waits for no lock. Neither changes the error.
     bool Open();
     bool InstallBusyWait();
 

@@ -126,7 +126,8 @@ bool SelectCommandInto(const Operation& operation, SqliteDB& db, const SelectCom
     return true;
 }
 
-// Takes the connection out of an object. The object stays usable: closed, with the same path and limit.
+// Takes the connection out of an object. The object stays usable: closed, with the same path and
+// limit.
 std::unique_ptr<SqliteConnection> Take(std::unique_ptr<SqliteConnection>& from)
 {
     auto closed = std::make_unique<SqliteConnection>(from->GetPath(), from->GetRetryLimit());

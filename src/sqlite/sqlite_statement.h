@@ -17,8 +17,8 @@ using Statement = std::unique_ptr<sqlite3_stmt, FinalizeStatement>;
 // Whether a statement is too long to be given to SQLite at all.
 bool IsTooLong(const std::string& command);
 
-// Returns SQLite's code, SQLITE_TOOBIG for a statement that is too long. `statement` is null after a
-// failure, and for a text that holds no statement.
+// Returns SQLite's code, SQLITE_TOOBIG for a statement that is too long. `statement` is null after
+// a failure, and for a text that holds no statement.
 int PrepareStatement(sqlite3* handle, const std::string& command, Statement& statement);
 
 // Ends a statement before its last row. A statement that writes commits only now, which may fail.

@@ -11,9 +11,9 @@
 
 namespace OrvaDRCore {
 
-// The eight selects that were used last. A cached statement is reset, so it holds no lock, and SQLite
-// prepares it again by itself when its tables have changed. SQLite closes no connection that has
-// statements, so the cache must be cleared before.
+// The eight selects that were used last. A cached statement is reset, so it holds no lock, and
+// SQLite prepares it again by itself when its tables have changed. SQLite closes no connection that
+// has statements, so the cache must be cleared before.
 //
 // While a database is attached nothing is cached. SQLite looks for a table in one database after
 // another, and a statement that found it in a later one would not notice a new table of the same
