@@ -201,7 +201,7 @@ static_assert(Has<bool (SelectCommand::*)(const string&)>(&SelectCommand::AddFie
 
 // ------------------------------------------------------------------------------------- conditions
 
-// Copied and passed by reference, never deleted through a base: no virtual destructor, on purpose.
+// Copied and passed by reference, never deleted through a base: by contract no virtual destructor.
 template <class T>
 constexpr bool IsCondition = std::is_base_of_v<SqliteCondition, T>&& std::is_polymorphic_v<T> &&
                              !std::has_virtual_destructor_v<T> && std::is_copy_constructible_v<T> &&
@@ -458,7 +458,7 @@ TEST(ApiTest, AnErrorCodeIsAnInt)
 TEST(ApiTest, AssigningDoesNotMakeAValueValid)
 {
     SqliteValue value;
-    value = SqliteValue(1);  // on purpose: neither a copy nor a move takes the flag along
+    value = SqliteValue(1);  // the contract: neither a copy nor a move takes the flag along
     EXPECT_FALSE(value.IsValid());
     const SqliteValue one(1);
     value = one;

@@ -1,4 +1,4 @@
-// How a connection waits for another one's lock, and what tells of it.
+// How a connection waits for another one's lock, and what callers see of it.
 #include "sqlite/sqlite_busy.h"
 
 #include <orvadrcore/sqlite_db.h>
@@ -23,8 +23,8 @@ using Waits = std::vector<unsigned int>;
 
 constexpr unsigned int Second = 1'000'000;
 constexpr unsigned int Shortest = 500;
-constexpr unsigned int Longest = 2500;         // between attempts to commit, and at first
-constexpr unsigned int LongestOfAll = 15'000;  // of a connection that waits for long
+constexpr unsigned int Longest = 2500;         // at first, and between attempts to commit
+constexpr unsigned int LongestOfAll = 15'000;  // after a long wait
 
 unsigned int Sum(const Waits& waits)
 {
@@ -44,7 +44,7 @@ class SqliteBusyTest : public SqliteFixture {
         pauses.OnWait([](std::size_t) {});
     }
 
-    // The waits of a statement that meets a lock all the time and is given up.
+    // The pauses of a statement that gives up because the file stays locked.
     Waits WaitInVain(SqliteDB& connection)
     {
         const LockHolder holder(path, "BEGIN IMMEDIATE");
@@ -59,7 +59,7 @@ class SqliteBusyTest : public SqliteFixture {
         return pauses.Waits();
     }
 
-    // The library waits, up to a second.
+    // The library's waiting: up to a second.
     void ExpectOurWaiting(SqliteDB& connection)
     {
         const Waits waits = WaitInVain(connection);
@@ -70,7 +70,7 @@ class SqliteBusyTest : public SqliteFixture {
         EXPECT_TRUE(IsBetween(Sum(waits), Second, Second + LongestOfAll)) << Sum(waits);
     }
 
-    // SQLite waits by itself, with pauses of its own.
+    // SQLite's own waiting, with its own pauses.
     void ExpectSqlitesWaiting(SqliteDB& connection, unsigned int milliseconds)
     {
         const Waits waits = WaitInVain(connection);
@@ -89,7 +89,7 @@ class SqliteBusyTest : public SqliteFixture {
         return record.ToStr();
     }
 
-    // Inserts a row behind another connection, which lets it in at the first pause.
+    // Inserts a row after one wait: another connection holds the lock until the first pause.
     void InsertAfterAWait(const std::string& begin = "BEGIN IMMEDIATE")
     {
         PlainDb other(path);
@@ -107,7 +107,7 @@ class SqliteBusyTest : public SqliteFixture {
 
 // ----------------------------------------------------------------------------------------- waiting
 
-TEST_F(SqliteBusyTest, AWaitingConnectionTriesAgainAfterAFewMillisecondsForASecond)
+TEST_F(SqliteBusyTest, AWaitingConnectionRetriesEveryFewMillisecondsForASecond)
 {
     ASSERT_TRUE(db.Open());
     ExpectOurWaiting(db);
@@ -125,7 +125,7 @@ TEST_F(SqliteBusyTest, PausesAreRandom)
     EXPECT_NE(waits, WaitInVain(retrying));
 }
 
-TEST_F(SqliteBusyTest, PausesAreLongerAfterALongWaitAndShorterAsTheSecondRunsOut)
+TEST_F(SqliteBusyTest, PausesGrowWithTheWaitAndShrinkAsTheSecondRunsOut)
 {
     ASSERT_TRUE(db.Open());
     const Waits waits = WaitInVain(db);
@@ -140,7 +140,7 @@ TEST_F(SqliteBusyTest, PausesAreLongerAfterALongWaitAndShorterAsTheSecondRunsOut
     EXPECT_LT(waits.back(), 2 * Shortest);
 }
 
-TEST_F(SqliteBusyTest, PausesThatTakeLongerThanTheyShouldCountAsLong)
+TEST_F(SqliteBusyTest, PausesCountAsLongAsTheyReallyTook)
 {
     pauses.OnWait([](std::size_t) {
         const timespec tenthOfASecond{0, 100'000'000};
@@ -163,7 +163,7 @@ TEST_F(SqliteBusyTest, EachStatementWaitsForASecondOfItsOwn)
     }
 }
 
-TEST_F(SqliteBusyTest, ACommitTriesAgainAtOnceAndThenEverMoreSeldom)
+TEST_F(SqliteBusyTest, ACommitRetriesAtOnceAndThenLessAndLessOften)
 {
     ASSERT_TRUE(db.Open());
     const LockHolder reader(path, "BEGIN; SELECT * FROM jobs");
@@ -177,9 +177,9 @@ TEST_F(SqliteBusyTest, ACommitTriesAgainAtOnceAndThenEverMoreSeldom)
     EXPECT_TRUE(IsBetween(Sum(waits), Second, Second + Longest)) << Sum(waits);
 }
 
-TEST_F(SqliteBusyTest, ACommitTriesAgainAtOnceAlsoAfterALongWaitForItsTurn)
+TEST_F(SqliteBusyTest, ACommitRetriesAtOnceEvenAfterALongWaitForTheLock)
 {
-    // First another writer, which leaves after half of the second, then a reader.
+    // First another writer, which finishes after half of the second, then a reader.
     ASSERT_TRUE(db.Open());
     PlainDb other(path);
     PlainDb reader(path);
@@ -199,13 +199,13 @@ TEST_F(SqliteBusyTest, ACommitTriesAgainAtOnceAlsoAfterALongWaitForItsTurn)
     EXPECT_TRUE(IsBetween(Sum(waits), Second, Second + Longest)) << Sum(waits);
 }
 
-// ---------------------------------------------------------------------------------------- give way
+// ------------------------------------------------------------------------------------------- yield
 
-TEST_F(SqliteBusyTest, WhoHadToWaitWritesForATurnAndThenGivesWayOnce)
+TEST_F(SqliteBusyTest, AConnectionThatWaitedWritesForATurnAndThenYieldsOnce)
 {
     ASSERT_TRUE(db.Open());
     constexpr std::chrono::milliseconds Turn(6);
-    // Where this process is kept from running for long enough there is no need to give way any more.
+    // If this process does not run for a while, there is no need to yield any more: try again.
     for (int attempt = 0; attempt < 1000 && pauses.Waits().empty(); ++attempt) {
         const auto begin = std::chrono::steady_clock::now();
         InsertAfterAWait();
@@ -224,7 +224,7 @@ TEST_F(SqliteBusyTest, WhoHadToWaitWritesForATurnAndThenGivesWayOnce)
     EXPECT_EQ(pauses.Waits().size(), 1U);
 }
 
-TEST_F(SqliteBusyTest, NobodyGivesWayWhoReadsOrHasNotWaitedOrHoldsTheLock)
+TEST_F(SqliteBusyTest, NoConnectionYieldsThatReadsOrDidNotWaitOrHoldsTheLock)
 {
     ASSERT_TRUE(db.Open());
     EXPECT_TRUE(db.DoExecSqliteCommand(busy.command) && db.DoExecSqliteCommand(busy.command));
@@ -239,16 +239,16 @@ TEST_F(SqliteBusyTest, NobodyGivesWayWhoReadsOrHasNotWaitedOrHoldsTheLock)
     pauses.OnWait([&other](std::size_t number) {
         if (number == 1) other.Run("COMMIT");
     });
-    ::usleep(1);  // in place of that by which BEGIN may give way
+    ::usleep(1);  // takes the place of the pause by which BEGIN may yield
     ASSERT_TRUE(transaction.Begin());
     pauses.ForgetWaits();
     EXPECT_TRUE(db.Exec(busy.command) && db.Exec(busy.command) && transaction.Commit());
     EXPECT_EQ(pauses.Waits(), Waits{});
 }
 
-// ------------------------------------------------------------------------------ PRAGMA busy_timeout
+// ----------------------------------------------------------------------------- PRAGMA busy_timeout
 
-TEST_F(SqliteBusyTest, TheBusyTimeoutIsAThousandHoweverItIsAskedFor)
+TEST_F(SqliteBusyTest, EveryWayToReadTheBusyTimeoutGives1000)
 {
     ASSERT_TRUE(db.Open());
     for (const char* statement :
@@ -271,7 +271,7 @@ TEST_F(SqliteBusyTest, TheBusyTimeoutIsAThousandHoweverItIsAskedFor)
     ExpectOurWaiting(moved);
 }
 
-TEST_F(SqliteBusyTest, WhoSetsTheBusyTimeoutGetsSqlitesOwnWaitingUntilTheFileIsOpenedAnew)
+TEST_F(SqliteBusyTest, SettingTheBusyTimeoutGivesSqlitesOwnWaitingUntilTheNextOpen)
 {
     for (const char* statement :
          {"PRAGMA busy_timeout=300", "pragma main.\"BUSY_timeout\"(300)",
@@ -298,7 +298,7 @@ TEST_F(SqliteBusyTest, WhoSetsTheBusyTimeoutGetsSqlitesOwnWaitingUntilTheFileIsO
     EXPECT_EQ(WaitInVain(db), Waits{});
 }
 
-TEST_F(SqliteBusyTest, ATextThatOnlyHoldsTheNameChangesNothing)
+TEST_F(SqliteBusyTest, ATextThatOnlyMentionsTheNameChangesNothing)
 {
     ASSERT_TRUE(db.Open());
     for (const char* statement :
@@ -311,7 +311,7 @@ TEST_F(SqliteBusyTest, ATextThatOnlyHoldsTheNameChangesNothing)
     ExpectOurWaiting(db);
 }
 
-TEST_F(SqliteBusyTest, ATimeoutThatCannotBeSetLeavesNoWaitingAtAll)
+TEST_F(SqliteBusyTest, WhenTheTimeoutCannotBeSetNothingIsWaitedFor)
 {
     {
         SqliteFaults faults;

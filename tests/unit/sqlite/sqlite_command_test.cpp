@@ -6,7 +6,7 @@
 
 #include "support/fakes/log_capture.h"
 
-// Conditions have no virtual destructor, on purpose, and neither have those that are derived here.
+// Conditions have no virtual destructor by contract, so those derived here have none either.
 #pragma GCC diagnostic ignored "-Wnon-virtual-dtor"
 
 namespace {
@@ -30,7 +30,7 @@ SqliteTableHandler Jobs()
     return {"jobs", "id INTEGER, name TEXT"};
 }
 
-// On the table `jobs`.
+// A command on the table `jobs`.
 template <class Command>
 Command OnJobs()
 {
@@ -82,7 +82,7 @@ TEST_F(SqliteCommandTest, ATableHandlerHoldsNameAndSchema)
     EXPECT_EQ(copy.GetSchema(), "x");
 }
 
-// What stands for the types in the cases' names.
+// How the types appear in the test names.
 struct TypeNames {
     template <class T>
     static std::string GetName(int /*index*/)
@@ -93,7 +93,7 @@ struct TypeNames {
     }
 };
 
-// The cases that all commands share.
+// Tests of all commands.
 template <class Command>
 class AnyCommandTest : public SqliteCommandTest {
 };
@@ -131,11 +131,11 @@ TYPED_TEST(AnyCommandTest, ItsOwnTableCanBeSetAgain)
     EXPECT_EQ(command.GetTable().GetSchema(), "id INTEGER, name TEXT");
 }
 
-// The cases that InsertCommand and UpdateCommand share.
+// Tests of InsertCommand and UpdateCommand.
 template <class Command>
 class FieldCommandTest : public SqliteCommandTest {
   protected:
-    // The command's fields, as its text for the log shows them.
+    // The command's fields, as ToStr() shows them.
     static std::string Values(const Command& command)
     {
         const std::string text = command.ToStr();
@@ -162,11 +162,11 @@ TYPED_TEST(FieldCommandTest, AStringLiteralIsAText)
     TypeParam command;
     EXPECT_TRUE(command.AddFieldValue("name", "abc"));
     EXPECT_TRUE(command.AddFieldValue("empty", ""));
-    EXPECT_TRUE(command.AddFieldValue("quote", "it's"));  // not escaped, on purpose
+    EXPECT_TRUE(command.AddFieldValue("quote", "it's"));  // the contract: not escaped
     EXPECT_EQ(this->Values(command), "values:[empty='',name='abc',quote='it's']");
 }
 
-TYPED_TEST(FieldCommandTest, AFieldThatIsAddedTwiceKeepsTheSecondValue)
+TYPED_TEST(FieldCommandTest, AddingAFieldTwiceKeepsTheSecondValue)
 {
     TypeParam command;
     EXPECT_TRUE(command.AddFieldValue("a", 1));
@@ -204,7 +204,7 @@ TYPED_TEST(FieldCommandTest, ARecordReplacesTheFields)
     EXPECT_TRUE(command.AddFieldValue("b", 2));
     SqliteValueList record = Fields("b", "x");
     command.SetFieldValues(record);
-    EXPECT_TRUE(record.AddValue("c", 3));  // a copy was taken
+    EXPECT_TRUE(record.AddValue("c", 3));  // the command has a copy
     EXPECT_EQ(this->Values(command), "values:[b='x']");
 
     EXPECT_TRUE(command.AddFieldValue("a", true));
@@ -213,7 +213,7 @@ TYPED_TEST(FieldCommandTest, ARecordReplacesTheFields)
     EXPECT_EQ(this->Values(command), "values:[]");
 }
 
-TEST_F(SqliteCommandTest, AnInsertNamesColumnsAndValuesInOneOrder)
+TEST_F(SqliteCommandTest, AnInsertNamesColumnsAndValuesInTheSameOrder)
 {
     auto insert = OnJobs<InsertCommand>();
     EXPECT_TRUE(insert.AddFieldValue("name", "x"));
@@ -248,7 +248,7 @@ TEST_F(SqliteCommandTest, AnInsertWithoutTableOrFieldsIsNotValid)
     EXPECT_EQ(InsertCommand().ToFormatedInsertValues(), "() VALUES ()");
 }
 
-// The bracket behind the table has no partner, on purpose.
+// The contract has a "]" without a "[".
 TEST_F(SqliteCommandTest, AnInsertIsDescribedForTheLog)
 {
     EXPECT_EQ(InsertCommand().ToStr(), "]values:[]");
@@ -268,12 +268,12 @@ TEST_F(SqliteCommandTest, AnUpdateSetsColumnsInTheOrderOfTheirNames)
     EXPECT_EQ(Statement(update), "UPDATE jobs SET state='done',tries=3 WHERE id=7");
 
     EXPECT_TRUE(update.AddFieldValue("note", "it's"));
-    EXPECT_TRUE(update.SetCondition(" id  =  7 ;"));  // taken as it stands
+    EXPECT_TRUE(update.SetCondition(" id  =  7 ;"));  // written as it is
     EXPECT_EQ(Statement(update),
               "UPDATE jobs SET note='it's',state='done',tries=3 WHERE  id  =  7 ;");
 }
 
-TEST_F(SqliteCommandTest, AnUpdateThatLacksAnythingIsNotValid)
+TEST_F(SqliteCommandTest, AnIncompleteUpdateIsNotValid)
 {
     for (const bool table : {false, true}) {
         for (const bool condition : {false, true}) {
@@ -301,7 +301,7 @@ TEST_F(SqliteCommandTest, AnUpdateIsDescribedForTheLog)
     EXPECT_EQ(update.ToStr(), "jobs]condition:[id=7]/values:[state='done',tries=3]");
 }
 
-// Two blanks before the star, on purpose.
+// The contract has two blanks before the star.
 TEST_F(SqliteCommandTest, ASelectOfAllColumnsHasAStar)
 {
     auto select = OnJobs<SelectCommand>();
@@ -323,7 +323,7 @@ TEST_F(SqliteCommandTest, ASelectKeepsTheOrderOfItsColumns)
               "SELECT id,name,id,CAST(size AS TEXT) AS size FROM jobs WHERE state='done'");
 }
 
-TEST_F(SqliteCommandTest, AllColumnsAndAListExcludeEachOther)
+TEST_F(SqliteCommandTest, SelectAllAndAddFieldReplaceEachOther)
 {
     auto select = OnJobs<SelectCommand>();
     select.SelectAll();
@@ -336,7 +336,7 @@ TEST_F(SqliteCommandTest, AllColumnsAndAListExcludeEachOther)
     EXPECT_EQ(Statement(select), "SELECT id FROM jobs");
 }
 
-// Without a line, on purpose.
+// The contract has no log line here.
 TEST_F(SqliteCommandTest, AnEmptyColumnIsRefusedSilently)
 {
     auto select = OnJobs<SelectCommand>();
@@ -381,11 +381,11 @@ TEST_F(SqliteCommandTest, ASelectIsDescribedForTheLog)
     EXPECT_EQ(select.ToStr(), "jobs]condition:[state='done']/fields:[id]");
 }
 
-// The cases that UpdateCommand and SelectCommand share.
+// Tests of UpdateCommand and SelectCommand.
 template <class Command>
 class ConditionCommandTest : public SqliteCommandTest {
   protected:
-    // The command's condition, as its text for the log shows it.
+    // The command's condition, as ToStr() shows it.
     static std::string Condition(const Command& command)
     {
         const std::string text = command.ToStr();
@@ -425,7 +425,7 @@ TYPED_TEST(ConditionCommandTest, AnInvalidConditionIsRefused)
     EXPECT_EQ(this->Condition(command), "]condition:[id=7]");
 }
 
-// A caller's own condition, which has its own idea of validity.
+// A caller's own condition, which decides by itself whether it is valid.
 // NOLINTNEXTLINE(cppcoreguidelines-virtual-class-destructor)
 class AnyCondition final : public SqliteCondition {
   public:
@@ -436,7 +436,7 @@ class AnyCondition final : public SqliteCondition {
     bool valid;
 };
 
-TYPED_TEST(ConditionCommandTest, ACallersConditionIsAskedWhetherItIsValid)
+TYPED_TEST(ConditionCommandTest, ACallersConditionDecidesWhetherItIsValid)
 {
     TypeParam command;
     EXPECT_TRUE(command.SetCondition(AnyCondition("id=7", true)));
@@ -445,13 +445,13 @@ TYPED_TEST(ConditionCommandTest, ACallersConditionIsAskedWhetherItIsValid)
     EXPECT_EQ(this->Condition(command), "]condition:[id=7]");
 }
 
-// An update refuses an empty text without a line, a select with one, on purpose.
+// By contract only a select logs an empty text.
 TEST_F(SqliteCommandTest, AnUpdateRefusesAnEmptyConditionSilently)
 {
     auto update = OnJobs<UpdateCommand>();
     update.SetFieldValues(Fields("a", 1));
     EXPECT_FALSE(update.SetCondition(""));
-    EXPECT_FALSE(update.SetCondition(SqliteIn()));  // valid, and without a text
+    EXPECT_FALSE(update.SetCondition(SqliteIn()));  // valid, but without a text
     ExpectLines({});
     ExpectNoStatement(update, "Bad update command");
 
@@ -461,14 +461,14 @@ TEST_F(SqliteCommandTest, AnUpdateRefusesAnEmptyConditionSilently)
     EXPECT_EQ(Statement(update), "UPDATE jobs SET a=1 WHERE id=7");
 }
 
-TEST_F(SqliteCommandTest, ASelectRefusesAnEmptyConditionWithALine)
+TEST_F(SqliteCommandTest, ASelectRefusesAnEmptyConditionAndLogsIt)
 {
     const LogLine line = Err("SetCondition", "Empty condition");
     auto select = OnJobs<SelectCommand>();
     select.SelectAll();
     EXPECT_FALSE(select.SetCondition(""));
     ExpectLines({line});
-    EXPECT_FALSE(select.SetCondition(SqliteIn()));  // valid, and without a text
+    EXPECT_FALSE(select.SetCondition(SqliteIn()));  // valid, but without a text
     ExpectLines({line});
     EXPECT_EQ(Statement(select), "SELECT  * FROM jobs");
 
@@ -479,7 +479,7 @@ TEST_F(SqliteCommandTest, ASelectRefusesAnEmptyConditionWithALine)
     EXPECT_EQ(Statement(select), "SELECT  * FROM jobs WHERE id=7");
 }
 
-TEST_F(SqliteCommandTest, ACopyGoesItsOwnWay)
+TEST_F(SqliteCommandTest, ACopyIsIndependent)
 {
     auto insert = OnJobs<InsertCommand>();
     insert.SetFieldValues(Fields("a", 1));
@@ -506,7 +506,7 @@ TEST_F(SqliteCommandTest, ACopyGoesItsOwnWay)
     EXPECT_EQ(Statement(select), "SELECT  * FROM jobs");
 }
 
-// A command whose validity and parameters its user decides on.
+// A command that is valid or not as the test wants, with parameters of its own.
 template <class Command>
 class Decided : public Command {
   public:
@@ -518,7 +518,7 @@ class Decided : public Command {
     bool valid;
 };
 
-TEST_F(SqliteCommandTest, ASubclassIsAskedWhetherItIsValid)
+TEST_F(SqliteCommandTest, ASubclassDecidesWhetherItIsValid)
 {
     EXPECT_EQ(Statement(Decided(OnJobs<InsertCommand>(), true)), "INSERT INTO jobs () VALUES ();");
     EXPECT_EQ(Statement(Decided(OnJobs<SelectCommand>(), true)), "SELECT FROM jobs");
@@ -542,7 +542,7 @@ TYPED_TEST(AnyCommandTest, ASubclassDescribesItsOwnParameters)
     EXPECT_EQ(Decided(TypeParam(), false).ToStr(), "]own parameters");
 }
 
-// A command that describes itself by what its user has, which may be nothing.
+// A command that writes a text into its description, which may be null.
 template <class Command>
 class Careless : public Command {
   public:
@@ -558,7 +558,7 @@ class Careless : public Command {
     const char* comment;
 };
 
-TYPED_TEST(AnyCommandTest, ANullTextThatASubclassWritesCutsTheDescriptionAtMost)
+TYPED_TEST(AnyCommandTest, ANullTextWrittenByASubclassOnlyTruncatesTheDescription)
 {
     const TypeParam command = OnJobs<TypeParam>();
     const std::string plain = command.ToStr();
@@ -567,7 +567,7 @@ TYPED_TEST(AnyCommandTest, ANullTextThatASubclassWritesCutsTheDescriptionAtMost)
     EXPECT_EQ(Careless<TypeParam>(command, NullText).ToStr().rfind(plain + "/comment:[", 0), 0U);
 }
 
-// Digits in groups of three, everywhere in the program, as long as one lives.
+// While it lives, the program's locale groups digits by three.
 class GroupedDigits {
   public:
     GroupedDigits() : before(std::locale::global({std::locale::classic(), new Grouping}))

@@ -4,7 +4,7 @@
 
 #include "support/fakes/log_capture.h"
 
-// Conditions have no virtual destructor, on purpose, and neither has the one that is derived here.
+// Conditions have no virtual destructor by contract, so the one derived here has none either.
 #pragma GCC diagnostic ignored "-Wnon-virtual-dtor"
 
 namespace {
@@ -21,7 +21,7 @@ using OrvaDRCore::SqliteValue;
 
 using Values = std::vector<SqliteValue>;
 
-// Polymorphic values without a virtual destructor, on purpose.
+// The contract: polymorphic values without a virtual destructor.
 template <class... Conditions>
 constexpr bool ArePlain = (... && (std::is_polymorphic_v<Conditions> &&
                                    !std::has_virtual_destructor_v<Conditions> &&
@@ -35,7 +35,7 @@ static_assert(std::is_base_of_v<SqliteInFamily, SqliteNotIn>);
 
 constexpr const char* NullText = nullptr;
 
-// Its validity is not copied by an assignment: it holds the number and is not valid.
+// Holds the number but is not valid, because an assignment does not copy validity.
 SqliteValue AssignedOnly(int number)
 {
     SqliteValue value;
@@ -47,7 +47,7 @@ class SqliteConditionTest : public LoggedTest {
   protected:
     SqliteConditionTest() : LoggedTest("sqlite_condition.cpp") {}
 
-    // Validity is asked through the base, as the commands do.
+    // Asks for validity through the base, as the commands do.
     static void ExpectCondition(const SqliteCondition& condition, bool valid,
                                 const std::string& text)
     {
@@ -68,7 +68,7 @@ TEST_F(SqliteConditionTest, AnEmptyConditionIsNotValid)
     ExpectCondition(SqliteOr(), false, "");
 }
 
-TEST_F(SqliteConditionTest, AReadyTextIsTakenAsItIs)
+TEST_F(SqliteConditionTest, AFinishedTextIsTakenAsItIs)
 {
     ExpectCondition(SqliteCondition("x > 5"), true, "x > 5");
     ExpectCondition(SqliteCondition(" "), true, " ");
@@ -84,7 +84,8 @@ TEST_F(SqliteConditionTest, AComparisonHasNoBlanks)
     ExpectCondition(SqliteEqual("id", std::string("abc")), true, "id='abc'");
     ExpectCondition(SqliteEqual("id", ""), true, "id=''");
     ExpectCondition(SqliteEqual("id", true), true, "id=1");
-    ExpectCondition(SqliteEqual("owner", "it's"), true, "owner='it's'");  // on purpose
+    ExpectCondition(SqliteEqual("owner", "it's"), true,
+                    "owner='it's'");  // the contract: not escaped
     ExpectCondition(SqliteEqual("lower(a b)", 1), true, "lower(a b)=1");
     ExpectCondition(SqliteNotEqual("id", 3), true, "id!=3");
     ExpectCondition(SqliteNotEqual("state", 0), true, "state!=0");
@@ -104,7 +105,7 @@ TEST_F(SqliteConditionTest, AJunctionPutsItsOperandsInParentheses)
                     "(a=1) AND ((b=2) OR (c=3))");
 }
 
-// What stands for the types in the cases' names.
+// How the types appear in the test names.
 struct TypeNames {
     template <class T>
     static std::string GetName(int /*index*/)
@@ -116,7 +117,7 @@ struct TypeNames {
     }
 };
 
-// The cases that SqliteEqual and SqliteNotEqual share; SqliteAnd and SqliteOr below.
+// Tests of SqliteEqual and SqliteNotEqual; SqliteAnd and SqliteOr follow below.
 template <class Condition>
 class SqliteComparisonTest : public SqliteConditionTest {
 };
@@ -163,7 +164,7 @@ class SqliteJunctionTest : public SqliteConditionTest {
 using Junctions = ::testing::Types<SqliteAnd, SqliteOr>;
 TYPED_TEST_SUITE(SqliteJunctionTest, Junctions, TypeNames);
 
-// Appended, not replaced, on purpose.
+// The contract appends here and replaces elsewhere.
 TYPED_TEST(SqliteJunctionTest, SettingAgainAppendsToTheText)
 {
     TypeParam condition("a", "b");
@@ -205,7 +206,7 @@ TYPED_TEST(SqliteJunctionTest, AnEmptyOperandIsRefused)
     }
 }
 
-TEST_F(SqliteConditionTest, AListOfValuesStandsInParentheses)
+TEST_F(SqliteConditionTest, AListOfValuesIsWrittenInParentheses)
 {
     ExpectCondition(SqliteIn("id", Values{1, 2, 3}), true, "id IN ( 1,2,3 )");
     ExpectCondition(SqliteIn("id", Values{7}), true, "id IN ( 7 )");
@@ -222,14 +223,14 @@ TEST_F(SqliteConditionTest, AnEmptyListIsAccepted)
     ExpectCondition(SqliteNotIn("id", Values{}), true, "id NOT IN (  )");
 }
 
-TEST_F(SqliteConditionTest, AReadyListStandsInParentheses)
+TEST_F(SqliteConditionTest, ASubqueryIsWrittenInParentheses)
 {
     ExpectCondition(SqliteIn("id", "SELECT id FROM jobs"), true, "id IN ( SELECT id FROM jobs )");
     ExpectCondition(SqliteNotIn("id", "1,2"), true, "id NOT IN ( 1,2 )");
     ExpectCondition(SqliteInFamily("IN", "id", "it's"), true, "id IN ( it's )");
 }
 
-// The keyword is asked, not the text, on purpose.
+// The contract looks at the keyword, not at the text.
 TEST_F(SqliteConditionTest, AListConditionIsValidBeforeItHasAText)
 {
     ExpectCondition(SqliteIn(), true, "");
@@ -261,7 +262,7 @@ TEST_F(SqliteConditionTest, ItsOwnTextCanBeAnOperandOfAComparisonAndOfAList)
     ExpectCondition(in, true, "id IN ( id IN ( SELECT id FROM jobs ) ) IN ( 1 )");
 }
 
-TEST_F(SqliteConditionTest, AnotherKeywordRefusesEveryValue)
+TEST_F(SqliteConditionTest, AnUnknownKeywordRefusesEveryValue)
 {
     for (const char* keyword :
          {"", "in", "In", "not in", " IN", "IN ", "NOT  IN", "NOTIN", "LIKE", "%s%n"}) {
@@ -272,7 +273,7 @@ TEST_F(SqliteConditionTest, AnotherKeywordRefusesEveryValue)
         ExpectRefusal(message);
         EXPECT_FALSE(condition.SetValue("id", "1"));
         ExpectRefusal(message);
-        // The keyword comes first, and one failure is one line.
+        // The keyword is checked first, and only one line is logged.
         EXPECT_FALSE(condition.SetValue("", Values{SqliteValue()}));
         ExpectRefusal(message);
         EXPECT_FALSE(condition.SetValue("", ""));
@@ -299,8 +300,8 @@ TEST_F(SqliteConditionTest, AListWithoutAColumnIsRefused)
     ExpectRefusal("Bad lvalue[]");
 }
 
-// Empty and yet valid, on purpose.
-TEST_F(SqliteConditionTest, AListWithABadValueEmptiesTheText)
+// By contract it is empty but valid.
+TEST_F(SqliteConditionTest, ABadValueInAListEmptiesTheText)
 {
     struct Row {
         Values values;
@@ -323,7 +324,7 @@ TEST_F(SqliteConditionTest, AListWithABadValueEmptiesTheText)
     }
 }
 
-TEST_F(SqliteConditionTest, AReadyListWithAnEmptyOperandIsRefused)
+TEST_F(SqliteConditionTest, ASubqueryWithAnEmptyOperandIsRefused)
 {
     struct Row {
         const char* lvalue;
@@ -346,7 +347,7 @@ TEST_F(SqliteConditionTest, AReadyListWithAnEmptyOperandIsRefused)
     }
 }
 
-TEST_F(SqliteConditionTest, ACopyGoesItsOwnWay)
+TEST_F(SqliteConditionTest, ACopyIsIndependent)
 {
     const SqliteEqual original("a", 1);
     SqliteEqual copy(original);
@@ -360,7 +361,7 @@ TEST_F(SqliteConditionTest, ACopyGoesItsOwnWay)
     ExpectCondition(list, true, "b IN ( 2 )");
 }
 
-// A caller's own kind of list, which has its own idea of validity.
+// A caller's own kind of list, which decides by itself whether it is valid.
 // NOLINTNEXTLINE(cppcoreguidelines-virtual-class-destructor)
 class AnyKeyword final : public SqliteInFamily {
   public:
@@ -371,7 +372,7 @@ class AnyKeyword final : public SqliteInFamily {
     bool valid;
 };
 
-TEST_F(SqliteConditionTest, ASubclassIsAskedWhetherItIsValid)
+TEST_F(SqliteConditionTest, ASubclassDecidesWhetherItIsValid)
 {
     AnyKeyword accepting("GLOB", true);
     EXPECT_TRUE(accepting.SetValue("id", Values{1}));

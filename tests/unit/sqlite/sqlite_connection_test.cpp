@@ -38,7 +38,7 @@ class SqliteConnectionTest : public SqliteFixture {
     SqliteConnection connection{path, 3};
 };
 
-// --------------------------------------------------------------------------------------- statements
+// -------------------------------------------------------------------------------------- statements
 
 TEST_F(SqliteConnectionTest, ASelectGivesEachRowUntilNoMoreAreWanted)
 {
@@ -71,7 +71,7 @@ TEST_F(SqliteConnectionTest, AClosedConnectionFailsThroughSqlite)
     EXPECT_EQ(connection.Error().GetRecord()["sqlite_errcode"], SQLITE_MISUSE);
 }
 
-// ------------------------------------------------------------------------------------ RunAtomically
+// ----------------------------------------------------------------------------------- RunAtomically
 
 TEST_F(SqliteConnectionTest, WorkThatSucceedsIsCommitted)
 {

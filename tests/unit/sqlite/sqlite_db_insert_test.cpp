@@ -1,4 +1,4 @@
-// SqliteDB's InsertRecords: many rows, all or none.
+// SqliteDB's InsertRecords: all rows or none.
 #include <orvadrcore/sqlite_db.h>
 
 #include <filesystem>
@@ -51,9 +51,9 @@ class SqliteDbInsertTest : public SqliteFixture {
     const Failure duplicate{insert, SQLITE_CONSTRAINT, "UNIQUE constraint failed: jobs.id"};
 };
 
-// ------------------------------------------------------------------------------------ what goes in
+// ------------------------------------------------------------------------------- what is stored
 
-TEST_F(SqliteDbInsertTest, AFileAndATableThatAreMissingAreMadeAndRowsKeepTheirOrder)
+TEST_F(SqliteDbInsertTest, AMissingFileAndTableAreCreatedAndRowsKeepTheirOrder)
 {
     db.SetDBErr("", 0, "earlier");
     EXPECT_TRUE(db.InsertRecords(jobs, {Job(3, "c"), Job(1, "a"), Job(2, "b")}));
@@ -70,7 +70,7 @@ TEST_F(SqliteDbInsertTest, AFileAndATableThatAreMissingAreMadeAndRowsKeepTheirOr
     EXPECT_EQ(Closed(), 0);
 }
 
-TEST_F(SqliteDbInsertTest, NoRecordsAreASuccessThatTouchesNothing)
+TEST_F(SqliteDbInsertTest, InsertingNoRecordsSucceedsWithoutOpeningTheFile)
 {
     db.SetDBErr("", 0, "earlier");
     EXPECT_TRUE(db.InsertRecords(jobs, {}));
@@ -98,7 +98,7 @@ TEST_F(SqliteDbInsertTest, NumbersAndBooleansAreStoredAsTheirLiteralsWouldBe)
         "SELECT low, high, most, none, yes, no, text, blank, typeof(low), typeof(most), "
         "typeof(yes),"
         " typeof(text), typeof(blank) FROM ";
-    // Columns without a type, with one that turns texts into numbers, and with one for texts.
+    // Column types: none, two that turn texts into numbers, and one for texts.
     for (const std::string type : {"", " INTEGER", " TEXT", " REAL"}) {
         SCOPED_TRACE(type);
         std::string schema;
@@ -129,7 +129,7 @@ TEST_F(SqliteDbInsertTest, TextsAreStoredByteForByte)
     EXPECT_EQ(Run("SELECT hex(name) FROM jobs WHERE id IN (4,5)"), "610062;FF");
 }
 
-TEST_F(SqliteDbInsertTest, RecordsMayDifferInTheirFieldsAndEachKindIsPreparedOnce)
+TEST_F(SqliteDbInsertTest, EachSetOfFieldsIsPreparedOnce)
 {
     MakeTable("id INTEGER DEFAULT 7, name TEXT DEFAULT 'none'");
     std::map<std::string, int> prepared;
@@ -143,8 +143,8 @@ TEST_F(SqliteDbInsertTest, RecordsMayDifferInTheirFieldsAndEachKindIsPreparedOnc
     {
         SqliteFaults faults;
         faults.prepare = [&](sqlite3* handle, const char* sql, sqlite3_stmt** statement) {
-            const bool isOwn = std::string(sql).rfind("SELECT", 0) == 0;  // SQLite reads the schema
-            if (!isOwn) ++prepared[sql];
+            const bool isSchemaRead = std::string(sql).rfind("SELECT", 0) == 0;  // by SQLite itself
+            if (!isSchemaRead) ++prepared[sql];
             return RealPrepare(handle, sql, statement);
         };
         EXPECT_TRUE(db.InsertRecords({"jobs", ""}, records));
@@ -159,7 +159,7 @@ TEST_F(SqliteDbInsertTest, RecordsMayDifferInTheirFieldsAndEachKindIsPreparedOnc
     EXPECT_EQ(prepared, once);
 }
 
-TEST_F(SqliteDbInsertTest, RowsThatAreThereAreReplacedWhereThatIsAllowed)
+TEST_F(SqliteDbInsertTest, ExistingRowsAreReplacedWhenAllowed)
 {
     EXPECT_TRUE(db.InsertRecords(jobs, {Job(1, "a"), Job(2, "b")}));
     EXPECT_TRUE(db.InsertRecords(jobs, {Job(2, "c"), Job(3, "d"), Job(3, "e")}, true));
@@ -169,9 +169,9 @@ TEST_F(SqliteDbInsertTest, RowsThatAreThereAreReplacedWhereThatIsAllowed)
 
 // -------------------------------------------------------------------------------- what is refused
 
-TEST_F(SqliteDbInsertTest, NoTableNameAndRecordsWithoutFieldsAreRefusedBeforeTheFileIsOpened)
+TEST_F(SqliteDbInsertTest, ATableWithoutANameOrARecordWithoutFieldsIsRefusedBeforeOpening)
 {
-    // Only by breaking a promise does a record come to hold a value that is not valid.
+    // Only a caller who casts const away can put an invalid value into a record.
     Records broken = {Job(1, "a")};
     // NOLINTNEXTLINE(cppcoreguidelines-pro-type-const-cast)
     const_cast<SqliteValue&>(broken.front().GetValue("name")) = SqliteValue();
@@ -197,7 +197,7 @@ TEST_F(SqliteDbInsertTest, NoTableNameAndRecordsWithoutFieldsAreRefusedBeforeThe
     ExpectPauses(0);
 }
 
-TEST_F(SqliteDbInsertTest, AFileThatCannotBeOpenedIsToldByBothLayers)
+TEST_F(SqliteDbInsertTest, AFileThatCannotBeOpenedIsLoggedByBothLayers)
 {
     SqliteDB refused(dir.Path(), 3);
     refused.SetDBErr("", 0, "earlier");
@@ -208,7 +208,7 @@ TEST_F(SqliteDbInsertTest, AFileThatCannotBeOpenedIsToldByBothLayers)
     ExpectPauses(0);
 }
 
-TEST_F(SqliteDbInsertTest, ATableThatCannotBeMadeIsToldByAllLayers)
+TEST_F(SqliteDbInsertTest, ATableThatCannotBeCreatedIsLoggedByAllLayers)
 {
     std::ofstream(path) << "text, and nothing that SQLite wrote\n";
     const std::string create =
@@ -225,7 +225,7 @@ TEST_F(SqliteDbInsertTest, ATableThatCannotBeMadeIsToldByAllLayers)
 
 // ---------------------------------------------------------------------------------- all or nothing
 
-TEST_F(SqliteDbInsertTest, ARowThatIsRefusedRefusesAllAndTheWholeIsRetried)
+TEST_F(SqliteDbInsertTest, OneRefusedRowRollsBackAllAndEverythingIsRetried)
 {
     MakeTable();
     Run("INSERT INTO jobs VALUES (2,'old')");
@@ -235,13 +235,13 @@ TEST_F(SqliteDbInsertTest, ARowThatIsRefusedRefusesAllAndTheWholeIsRetried)
     ExpectPauses(3);
     EXPECT_EQ(Run("SELECT * FROM jobs"), "2,old");
 
-    // The connection is as good as before, and holds no lock.
+    // The connection still works and holds no lock.
     Run("DELETE FROM jobs");
     EXPECT_TRUE(retrying.InsertRecords(jobs, {Job(2, "b")}));
     ExpectErr(retrying, 0);
 }
 
-TEST_F(SqliteDbInsertTest, ReplacedRowsAreBackWhenALaterRowIsRefused)
+TEST_F(SqliteDbInsertTest, ReplacedRowsAreRestoredWhenALaterRowIsRefused)
 {
     MakeTable("id INTEGER PRIMARY KEY, name TEXT NOT NULL");
     Run("INSERT INTO jobs VALUES (1,'old')");
@@ -253,7 +253,7 @@ TEST_F(SqliteDbInsertTest, ReplacedRowsAreBackWhenALaterRowIsRefused)
     EXPECT_EQ(Run("SELECT * FROM jobs"), "1,old");
 }
 
-TEST_F(SqliteDbInsertTest, AStatementThatSqliteRefusesIsToldWithItsPlaceholders)
+TEST_F(SqliteDbInsertTest, ARefusedStatementIsRecordedWithItsPlaceholders)
 {
     MakeTable();
     const Failure noColumn{"INSERT INTO jobs (size) VALUES (?);", SQLITE_ERROR,
@@ -268,7 +268,7 @@ TEST_F(SqliteDbInsertTest, AStatementThatSqliteRefusesIsToldWithItsPlaceholders)
     ExpectLines({GaveUp(2), GaveUp(1)});
 }
 
-TEST_F(SqliteDbInsertTest, AFieldsNameIsWrittenAsItStandsAndCannotEndTheStatement)
+TEST_F(SqliteDbInsertTest, AFieldNameIsWrittenAsItIsButCannotAddAStatement)
 {
     MakeTable();
     const std::string field = "id) VALUES (1); --";
@@ -280,7 +280,7 @@ TEST_F(SqliteDbInsertTest, AFieldsNameIsWrittenAsItStandsAndCannotEndTheStatemen
     EXPECT_EQ(Run("SELECT count(*) FROM jobs"), "0");
 }
 
-TEST_F(SqliteDbInsertTest, NoInsertOutlivesTheCall)
+TEST_F(SqliteDbInsertTest, NoPreparedInsertOutlivesTheCall)
 {
     MakeTable();
     sqlite3* handle = nullptr;
@@ -306,7 +306,7 @@ TEST_F(SqliteDbInsertTest, NoInsertOutlivesTheCall)
 
 // ---------------------------------------------------------------------------------------- locks
 
-TEST_F(SqliteDbInsertTest, AnotherWriterIsMetBeforeTheFirstRow)
+TEST_F(SqliteDbInsertTest, AnotherWriterIsWaitedForBeforeTheFirstRow)
 {
     MakeTable();
     LockHolder holder(path, "BEGIN IMMEDIATE");
@@ -318,7 +318,7 @@ TEST_F(SqliteDbInsertTest, AnotherWriterIsMetBeforeTheFirstRow)
     EXPECT_TRUE(retrying.InsertRecords(jobs, {Job(1, "a")}));
 }
 
-TEST_F(SqliteDbInsertTest, AWriterThatIsDoneInTimeIsWaitedFor)
+TEST_F(SqliteDbInsertTest, AnotherWriterMayFinishBetweenTwoAttempts)
 {
     MakeTable();
     LockHolder holder(path, "BEGIN IMMEDIATE");
@@ -331,9 +331,9 @@ TEST_F(SqliteDbInsertTest, AWriterThatIsDoneInTimeIsWaitedFor)
     EXPECT_EQ(Run("SELECT * FROM jobs"), "1,a;2,b");
 }
 
-TEST_F(SqliteDbInsertTest, AReaderThatKeepsTheCommitOutMakesTheWholeRetried)
+TEST_F(SqliteDbInsertTest, ACommitThatReadersBlockIsRetriedAsAWhole)
 {
-    const SqliteTableHandler notes("notes", "id INTEGER, name TEXT");  // takes a row twice
+    const SqliteTableHandler notes("notes", "id INTEGER, name TEXT");  // allows duplicate rows
     Run("CREATE TABLE notes (id INTEGER, name TEXT)");
     LockHolder holder(path, "BEGIN; SELECT * FROM notes");
     pauses.OnPause([&](std::size_t number) {
@@ -351,9 +351,9 @@ TEST_F(SqliteDbInsertTest, AReaderThatKeepsTheCommitOutMakesTheWholeRetried)
     staying.Release();
 }
 
-// ------------------------------------------------------------------------- transactions in the way
+// ------------------------------------------------------------------------------- open transactions
 
-TEST_F(SqliteDbInsertTest, InsideATransactionTheRowsAreThoseOfTheTransaction)
+TEST_F(SqliteDbInsertTest, InsideATransactionTheRowsAreCommittedOrRolledBackWithIt)
 {
     MakeTable();
     ASSERT_TRUE(db.Open() && db.Exec("BEGIN"));
@@ -369,7 +369,7 @@ TEST_F(SqliteDbInsertTest, InsideATransactionTheRowsAreThoseOfTheTransaction)
     EXPECT_EQ(Run("SELECT * FROM jobs"), "1,a;2,b");
 }
 
-TEST_F(SqliteDbInsertTest, InsideATransactionAFailureTakesBackItsOwnRowsOnly)
+TEST_F(SqliteDbInsertTest, InsideATransactionAFailureRollsBackItsOwnRowsOnly)
 {
     MakeTable();
     ASSERT_TRUE(retrying.Open() && retrying.Exec("BEGIN") &&
@@ -383,7 +383,7 @@ TEST_F(SqliteDbInsertTest, InsideATransactionAFailureTakesBackItsOwnRowsOnly)
     EXPECT_EQ(Run("SELECT * FROM jobs"), "1,before;3,after");
 }
 
-TEST_F(SqliteDbInsertTest, NoRowIsStoredBehindARollbackOfSqlitesOwn)
+TEST_F(SqliteDbInsertTest, NoRowIsStoredAfterSqliteRolledBackByItself)
 {
     MakeTable("id INTEGER PRIMARY KEY ON CONFLICT ROLLBACK, name TEXT");
     Run("INSERT INTO jobs VALUES (1,'old')");
@@ -393,12 +393,12 @@ TEST_F(SqliteDbInsertTest, NoRowIsStoredBehindARollbackOfSqlitesOwn)
     EXPECT_EQ(Run("SELECT * FROM jobs"), "1,old");
 }
 
-TEST_F(SqliteDbInsertTest, NoRowIsStoredOnceTheCallersTransactionIsLost)
+TEST_F(SqliteDbInsertTest, NoRowIsStoredAfterSqliteRolledBackTheCallersTransaction)
 {
     MakeTable("id INTEGER PRIMARY KEY ON CONFLICT ROLLBACK, name TEXT");
     ASSERT_TRUE(retrying.Open() && retrying.Exec("BEGIN") &&
                 retrying.Exec("INSERT INTO jobs VALUES (1,'before')"));
-    // Once the first try has lost the transaction, and the row 1 with it, all of these would fit.
+    // After the first attempt the transaction and its row 1 are gone, so all of these would fit.
     EXPECT_FALSE(retrying.InsertRecords(jobs, {Job(2, "a"), Job(1, "b"), Job(3, "c")}));
     const Failure lost{"SAVEPOINT orvadr_insert", SQLITE_ABORT, "the transaction was rolled back"};
     ExpectErr(retrying, 404, TriesText({duplicate, lost, lost, lost}));
@@ -407,7 +407,7 @@ TEST_F(SqliteDbInsertTest, NoRowIsStoredOnceTheCallersTransactionIsLost)
     EXPECT_TRUE(retrying.Exec("BEGIN"));  // none is open
 }
 
-TEST_F(SqliteDbInsertTest, WhatCannotBeRolledBackEndsWithTheConnection)
+TEST_F(SqliteDbInsertTest, AFailedRollbackClosesTheConnection)
 {
     MakeTable();
     Run("INSERT INTO jobs VALUES (1,'old')");
@@ -433,7 +433,7 @@ TEST_F(SqliteDbInsertTest, WhatCannotBeRolledBackEndsWithTheConnection)
 
 // ----------------------------------------------------------------------------------- two processes
 
-TEST(SqliteDbInsertProcessesTest, OfTwoThatInsertTheSameRowsOneGetsAllAndTheOtherNone)
+TEST(SqliteDbInsertProcessesTest, OfTwoProcessesInsertingTheSameRowsOneStoresAllAndTheOtherNone)
 {
     constexpr int Rounds = 20;
     constexpr int RowsEach = 50;
@@ -445,10 +445,10 @@ TEST(SqliteDbInsertProcessesTest, OfTwoThatInsertTheSameRowsOneGetsAllAndTheOthe
         return [&jobs, &path, name](ChildProcess::Link& link) {
             link.Await();
             SqliteDB db(path, 0);
-            // Not a matter of the disk's speed: the lock is what the two contend for.
+            // Without waits for the disk the two contend for the lock more often.
             if (!db.Open() || !db.Exec("PRAGMA synchronous = OFF")) throw std::runtime_error(path);
             for (int round = 0; round < Rounds; ++round) {
-                // Each begins its rounds with a row of its own, which no failure may leave.
+                // The first row of each round is unique, so a failure must roll it back.
                 Records records = {Job(-1 - round * 2 - (name == "one" ? 0 : 1), name)};
                 for (int row = 0; row < RowsEach; ++row) {
                     records.push_back(Job(round * RowsEach + row, name));

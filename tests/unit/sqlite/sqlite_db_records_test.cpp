@@ -47,7 +47,7 @@ SelectCommand SelectAll(const SqliteTableHandler& table)
     return command;
 }
 
-// A command whose text tells how often it was asked for.
+// A command whose text says how often GetCommand() was called.
 template <class Command>
 class Counting : public Command {
   public:
@@ -59,7 +59,7 @@ class Counting : public Command {
     mutable int asked = 0;
 };
 
-// A command that claims to be valid and has no text.
+// A command that claims to be valid but has no text.
 template <class Command>
 class Hollow : public Command {
   public:
@@ -67,7 +67,7 @@ class Hollow : public Command {
     std::string GetCommand() const override { return {}; }
 };
 
-// The record operations, for what holds for all of them.
+// A record operation, for tests of what all of them have in common.
 struct Operation {
     std::string function;   // in the log lines
     std::string statement;  // on the table jobs
@@ -131,7 +131,7 @@ class SqliteDbRecordsTest : public SqliteFixture {
 
 // --------------------------------------------------------------------------------- all operations
 
-TEST_F(SqliteDbRecordsTest, AFileAndATableThatAreMissingAreMade)
+TEST_F(SqliteDbRecordsTest, AMissingFileAndTableAreCreated)
 {
     for (const Operation& operation : Operations()) {
         SCOPED_TRACE(operation.statement);
@@ -154,7 +154,7 @@ TEST_F(SqliteDbRecordsTest, TheConnectionIsOpenedOnFirstUseAndStaysOpen)
     EXPECT_EQ(Closed(), 0);
 }
 
-TEST_F(SqliteDbRecordsTest, AFileThatCannotBeOpenedIsToldByBothLayers)
+TEST_F(SqliteDbRecordsTest, AFileThatCannotBeOpenedIsLoggedByBothLayers)
 {
     for (const Operation& operation : Operations()) {
         SCOPED_TRACE(operation.statement);
@@ -179,13 +179,13 @@ TEST_F(SqliteDbRecordsTest, ABusyTimeoutThatCannotBeSetFailsTheFirstOperationOnl
         ExpectErr(fresh, 404);
         ExpectLines({Warn("Open", "Failed to set busy timeout with error"),
                      Err(operation.function, "Failed to open db [" + path + "]")});
-        EXPECT_TRUE(operation.run(fresh, jobs));  // on purpose: the connection is there
+        EXPECT_TRUE(operation.run(fresh, jobs));  // the contract: the connection is open
         ExpectErr(fresh, 0);
         Run("DELETE FROM jobs");
     }
 }
 
-TEST_F(SqliteDbRecordsTest, ATableThatCannotBeMadeIsToldByAllLayers)
+TEST_F(SqliteDbRecordsTest, ATableThatCannotBeCreatedIsLoggedByAllLayers)
 {
     std::ofstream(path) << "text, and nothing that SQLite wrote\n";
     const Failure look{LookFor("jobs"), SQLITE_NOTADB, NoDatabase};
@@ -200,7 +200,7 @@ TEST_F(SqliteDbRecordsTest, ATableThatCannotBeMadeIsToldByAllLayers)
     }
 }
 
-TEST_F(SqliteDbRecordsTest, AStatementThatFailsIsToldByAllLayers)
+TEST_F(SqliteDbRecordsTest, AFailedStatementIsLoggedByAllLayers)
 {
     for (const Operation& operation : Operations()) {
         SCOPED_TRACE(operation.statement);
@@ -213,7 +213,7 @@ TEST_F(SqliteDbRecordsTest, AStatementThatFailsIsToldByAllLayers)
     ExpectPauses(3 * Operations().size());
 }
 
-TEST_F(SqliteDbRecordsTest, TheTableIsLookedForOnceByEachOperationAndWithoutASchemaNotAtAll)
+TEST_F(SqliteDbRecordsTest, EachOperationLooksTheTableUpOnceAndNeverWithoutASchema)
 {
     Run("CREATE TABLE jobs (id, name)");
     std::size_t looks = 0;
@@ -233,7 +233,7 @@ TEST_F(SqliteDbRecordsTest, TheTableIsLookedForOnceByEachOperationAndWithoutASch
     EXPECT_EQ(looks, Operations().size());
 }
 
-TEST_F(SqliteDbRecordsTest, OnAFileThatStaysLockedLookAndCreationEachGoThroughAllTries)
+TEST_F(SqliteDbRecordsTest, OnALockedFileLookupAndCreationEachUseAllAttempts)
 {
     const LockHolder holder(path);
     const Failure look{LookFor("jobs"), SQLITE_BUSY, Locked};
@@ -250,7 +250,7 @@ TEST_F(SqliteDbRecordsTest, OnAFileThatStaysLockedLookAndCreationEachGoThroughAl
     }
 }
 
-TEST_F(SqliteDbRecordsTest, AFileThatIsFreeInTimeIsUsedThoughTheLookForTheTableFailed)
+TEST_F(SqliteDbRecordsTest, AFileUnlockedDuringTheCreationIsUsedAlthoughTheLookupFailed)
 {
     LockHolder holder(path);
     pauses.OnPause([&](std::size_t number) {
@@ -266,7 +266,7 @@ TEST_F(SqliteDbRecordsTest, AFileThatIsFreeInTimeIsUsedThoughTheLookForTheTableF
     EXPECT_EQ(Run("SELECT * FROM jobs"), "1,a");
 }
 
-TEST_F(SqliteDbRecordsTest, ATableThatIsFoundLeavesOnlyTheStatementToTheLock)
+TEST_F(SqliteDbRecordsTest, WhenTheLookupSucceedsOnlyTheStatementIsRetried)
 {
     Run("CREATE TABLE jobs (id INTEGER PRIMARY KEY, name TEXT)");
     LockHolder holder(path, "BEGIN IMMEDIATE");
@@ -298,7 +298,7 @@ TEST_F(SqliteDbRecordsTest, AnInvalidCommandIsRefusedBeforeTheFileIsOpened)
     SqliteValueList record;
     Records records;
     const std::vector<Row> rows = {
-        // On purpose: the insert alone stays at 404.
+        // By contract only the insert gives 404.
         {[&] { return retrying.InsertRecord(insert); }, 404,
          Err("InsertRecord", "invalid insert command [jobs]values:[]]")},
         {[&] { return retrying.UpdateRecord(update); }, 401,
@@ -354,7 +354,7 @@ TEST_F(SqliteDbRecordsTest, ACommandWithoutATextIsRefusedByExecAndSelect)
     ExpectPauses(0);
 }
 
-TEST_F(SqliteDbRecordsTest, TheTextOfAnInsertOrUpdateIsAskedForAgainForTheLineOfItsFailure)
+TEST_F(SqliteDbRecordsTest, AFailedInsertOrUpdateBuildsItsTextAgainForTheLog)
 {
     const Failure insertFailed{"INSERT INTO jobs (id,name) VALUES (1,'a'); -- 1", SQLITE_ERROR,
                                "no such table: jobs"};
@@ -391,7 +391,7 @@ TEST_F(SqliteDbRecordsTest, InsertsAddARow)
     EXPECT_EQ(Run("SELECT * FROM jobs ORDER BY id"), "1,a;2,b");
 }
 
-TEST_F(SqliteDbRecordsTest, AnInsertOfAKeyThatIsThereFailsUnlessItMayReplace)
+TEST_F(SqliteDbRecordsTest, InsertingAnExistingKeyFailsUnlessItMayReplace)
 {
     const Failure unique{"INSERT INTO jobs (id,name) VALUES (1,'b');", SQLITE_CONSTRAINT,
                          "UNIQUE constraint failed: jobs.id"};
@@ -409,12 +409,12 @@ TEST_F(SqliteDbRecordsTest, AnInsertOfAKeyThatIsThereFailsUnlessItMayReplace)
     EXPECT_EQ(Run("SELECT * FROM jobs"), "1,b");
 }
 
-TEST_F(SqliteDbRecordsTest, UpdatesChangeTheRowsOfTheirCondition)
+TEST_F(SqliteDbRecordsTest, AnUpdateChangesTheRowsThatMeetItsCondition)
 {
     EXPECT_TRUE(db.InsertRecord(Insert(jobs, 1, "a")));
     EXPECT_TRUE(db.InsertRecord(Insert(jobs, 2, "b")));
     EXPECT_TRUE(db.UpdateRecord(Update(jobs, 2, "c")));
-    EXPECT_TRUE(db.UpdateRecord(Update(jobs, 3, "none is not an error")));
+    EXPECT_TRUE(db.UpdateRecord(Update(jobs, 3, "no row is not an error")));
     ExpectErr(db, 0);
     EXPECT_EQ(Run("SELECT * FROM jobs ORDER BY id"), "1,a;2,c");
 }
@@ -446,7 +446,7 @@ TEST_F(SqliteDbRecordsTest, SelectsGiveAllRowsOrTheFirst)
     ExpectErr(db, 0);
 }
 
-TEST_F(SqliteDbRecordsTest, DeletesRemoveTheRowsOfTheirCondition)
+TEST_F(SqliteDbRecordsTest, ADeleteRemovesTheRowsThatMeetItsCondition)
 {
     for (const int id : {1, 2, 3, 4}) EXPECT_TRUE(db.InsertRecord(Insert(jobs, id, "a")));
     EXPECT_TRUE(db.DeleteRecord(SqliteEqual("id", 1).GetCondition(), jobs));
@@ -471,7 +471,7 @@ TEST_F(SqliteDbRecordsTest, ADeleteWithoutConditionOrTableIsRefusedBeforeTheFile
     const LogLine noTable = Err("DoDelete", "invalid table:[]");
     const std::vector<Row> rows = {
         {[&] { return retrying.DeleteRecord("", jobs); }, noCondition},
-        {[&] { return retrying.DeleteRecord("", nameless); }, noCondition},  // it comes first
+        {[&] { return retrying.DeleteRecord("", nameless); }, noCondition},  // checked first
         {[&] { return retrying.DeleteRecord("id = 1", nameless); }, noTable},
         {[&] { return retrying.DeleteAllRecords(nameless); }, noTable},
         {[&] { return retrying.DoDelete(nameless, ""); }, noTable},
@@ -545,9 +545,9 @@ TEST_F(SqliteDbRecordsTest, OnAClosedObjectNoTableIsFoundAndNothingIsOpened)
     EXPECT_FALSE(std::filesystem::exists(path));
 }
 
-TEST_F(SqliteDbRecordsTest, ATableThatWasReadIsFoundThoughTheQueryFailedAfterwards)
+TEST_F(SqliteDbRecordsTest, ATableThatWasReadExistsEvenIfTheLookupFailsAfterwards)
 {
-    // On purpose: the rows count, not the answer of the select.
+    // The contract: only the row counts, not the result of the select.
     std::string message;
     Run("CREATE TABLE jobs (id)");
     ASSERT_TRUE(retrying.Open());
@@ -564,9 +564,9 @@ TEST_F(SqliteDbRecordsTest, ATableThatWasReadIsFoundThoughTheQueryFailedAfterwar
     ExpectLines({ManyRowsGaveUp(broken, 4)});
 }
 
-TEST_F(SqliteDbRecordsTest, ATableNameWithAQuoteIsPlacedIntoTheQueryAsItStands)
+TEST_F(SqliteDbRecordsTest, ATableNameIsWrittenIntoTheLookupUnescaped)
 {
-    // On purpose: the name is the caller's to escape.
+    // The contract: the caller escapes the name.
     const Failure broken{LookFor("o'brien"), SQLITE_ERROR, R"(near "brien": syntax error)"};
     Run("CREATE TABLE \"o'brien\" (id)");
     ASSERT_TRUE(db.Open());
@@ -577,7 +577,7 @@ TEST_F(SqliteDbRecordsTest, ATableNameWithAQuoteIsPlacedIntoTheQueryAsItStands)
     EXPECT_TRUE(db.IsTableExisted("x' OR '1'='1"));
 }
 
-TEST_F(SqliteDbRecordsTest, ATableIsMadeOnceAndThenLeftAsItIs)
+TEST_F(SqliteDbRecordsTest, AnExistingTableIsNotChanged)
 {
     ASSERT_TRUE(db.Open());
     EXPECT_TRUE(db.CreateTable(jobs));
@@ -588,7 +588,7 @@ TEST_F(SqliteDbRecordsTest, ATableIsMadeOnceAndThenLeftAsItIs)
               "CREATE TABLE jobs (id INTEGER PRIMARY KEY, name TEXT)");
 }
 
-TEST_F(SqliteDbRecordsTest, WithoutASchemaNoTableIsMadeNorItsNameLookedAt)
+TEST_F(SqliteDbRecordsTest, WithoutASchemaNothingIsCreatedAndNoNameIsNeeded)
 {
     ASSERT_TRUE(db.Open());
     db.SetDBErr("", 0, "earlier");
@@ -609,7 +609,7 @@ TEST_F(SqliteDbRecordsTest, ATableWithoutANameIsRefusedAndTheErrorStays)
     ExpectLines({Err("CreateTable", "Invalid table []")});
 }
 
-TEST_F(SqliteDbRecordsTest, ASchemaThatSqliteRefusesIsToldWithItsStatement)
+TEST_F(SqliteDbRecordsTest, ARefusedSchemaIsLoggedWithItsStatement)
 {
     const Failure bad{"CREATE TABLE IF NOT EXISTS jobs (SELECT)", SQLITE_ERROR,
                       R"(near "SELECT": syntax error)"};
@@ -623,7 +623,7 @@ TEST_F(SqliteDbRecordsTest, ASchemaThatSqliteRefusesIsToldWithItsStatement)
 
 // ----------------------------------------------------------------------------------- two processes
 
-TEST(SqliteDbProcessesTest, TwoThatInsertAtTheSameTimeLoseNothing)
+TEST(SqliteDbProcessesTest, TwoProcessesInsertingAtTheSameTimeLoseNothing)
 {
     constexpr int RowsEach = 200;
     const TempDir dir;
@@ -633,7 +633,7 @@ TEST(SqliteDbProcessesTest, TwoThatInsertAtTheSameTimeLoseNothing)
         return [&jobs, &path, first](ChildProcess::Link& link) {
             link.Await();
             SqliteDB db(path, 5);
-            // Not a matter of the disk's speed: the lock is what the two contend for.
+            // Without waits for the disk the two contend for the lock more often.
             if (!db.Open() || !db.Exec("PRAGMA synchronous = OFF")) throw std::runtime_error(path);
             for (int id = first; id < first + RowsEach; ++id) {
                 if (!db.InsertRecord(Insert(jobs, id, "a"))) {

@@ -1,4 +1,4 @@
-// SqliteDB's statements that give rows: what comes out of a row, and both forms of SelectByCommand.
+// SqliteDB's selects: how a row becomes a record, and both forms of SelectByCommand.
 #include <orvadrcore/sqlite_db.h>
 
 #include "support/fixtures/sqlite_fixture.h"
@@ -21,8 +21,7 @@ class SqliteDbSelectTest : public SqliteFixture {
   protected:
     SqliteDbSelectTest() { earlier.AddValue("kept", 1); }
 
-    // The row of a statement that has exactly one, which both forms must read alike, with these
-    // lines each.
+    // Expects one row, which both forms read alike, each with these log lines.
     void ExpectRow(const std::string& statement, const std::string& row,
                    const std::vector<LogLine>& lines = {})
     {
@@ -41,7 +40,7 @@ class SqliteDbSelectTest : public SqliteFixture {
         ExpectLines(lines);
     }
 
-    // A statement that fails on each of `tries` tries, in both forms, and changes no output.
+    // Expects a failure after so many attempts, in both forms, with the outputs unchanged.
     void ExpectGivenUp(SqliteDB& connection, const Failure& failure, std::size_t tries)
     {
         SCOPED_TRACE(failure.command);
@@ -90,7 +89,7 @@ TEST_F(SqliteDbSelectTest, IntegersAreSignedNumbersAndTextsAreTexts)
 
 TEST_F(SqliteDbSelectTest, IntegersBeyond32BitsAreTruncated)
 {
-    // On purpose; CAST(... AS TEXT) is the way to the whole number.
+    // The contract; CAST(... AS TEXT) gives the whole number.
     struct Row {
         std::string stored;
         std::string read;
@@ -117,10 +116,10 @@ TEST_F(SqliteDbSelectTest, TextsKeepTheirBytesAndQuotes)
 {
     ExpectRow("SELECT 'it''s' AS x", "x:'it's'");
     ExpectRow("SELECT 'Z\xC3\xBCrich' AS x", "x:'Z\xC3\xBCrich'");
-    ExpectRow("SELECT CAST(x'FF61' AS TEXT) AS x", "x:'\xFF\x61'");  // is no UTF-8
+    ExpectRow("SELECT CAST(x'FF61' AS TEXT) AS x", "x:'\xFF\x61'");  // not UTF-8
 }
 
-TEST_F(SqliteDbSelectTest, NullsRealNumbersAndBlobsAreLeftOutWithALine)
+TEST_F(SqliteDbSelectTest, NullsRealsAndBlobsAreLeftOutAndLogged)
 {
     ExpectRow("SELECT NULL AS x", "", {Warn("ParseRecord", "field [x] has null value")});
     ExpectRow("SELECT 1.5 AS x", "",
@@ -136,7 +135,7 @@ TEST_F(SqliteDbSelectTest, NullsRealNumbersAndBlobsAreLeftOutWithALine)
                Warn("ParseRecord", "Not supported type [4] with field [body]")});
 }
 
-TEST_F(SqliteDbSelectTest, OfColumnsWithOneNameTheLaterThatIsNotNullCounts)
+TEST_F(SqliteDbSelectTest, OfColumnsWithTheSameNameTheLastNonNullCounts)
 {
     ExpectRow("SELECT 1 AS x, 'two' AS x", "x:'two'");
     ExpectRow("SELECT 1 AS x, NULL AS x", "x:1", {Warn("ParseRecord", "field [x] has null value")});
@@ -150,7 +149,7 @@ TEST_F(SqliteDbSelectTest, AColumnWithoutANameIsLeftOut)
                Err("AddValue", "Bad Field[] or value ['a']").In("sqlite_value.cpp")});
 }
 
-TEST_F(SqliteDbSelectTest, AColumnWhoseNameCannotBeHadIsLeftOut)
+TEST_F(SqliteDbSelectTest, AColumnIsLeftOutWhenItsNameCannotBeRead)
 {
     SqliteFaults faults;
     faults.columnName = [](sqlite3_stmt*, int column) { return column == 2 ? "last" : nullptr; };
@@ -159,7 +158,7 @@ TEST_F(SqliteDbSelectTest, AColumnWhoseNameCannotBeHadIsLeftOut)
                Warn("ParseRecord", "field [] has null value")});
 }
 
-TEST_F(SqliteDbSelectTest, ATextThatCannotBeHadIsLeftOut)
+TEST_F(SqliteDbSelectTest, ATextIsLeftOutWhenItCannotBeRead)
 {
     SqliteFaults faults;
     faults.columnText = [](sqlite3_stmt*, int) -> const unsigned char* { return nullptr; };
@@ -177,7 +176,7 @@ TEST_F(SqliteDbSelectTest, ARowWithoutAStatementIsEmpty)
     };
     ASSERT_TRUE(db.Open());
     SqliteValueList record(earlier);
-    EXPECT_TRUE(db.SelectByCommand(" ", record));  // one step; the next two are the other form's
+    EXPECT_TRUE(db.SelectByCommand(" ", record));  // takes one step; the other form takes two
     EXPECT_EQ(record.ToStr(), "");
     ExpectErr(db, 0);
     ExpectLines({Err("ParseRecord", "Null Pointer")});
@@ -191,7 +190,7 @@ TEST_F(SqliteDbSelectTest, ARowWithoutAStatementIsEmpty)
 
 // -------------------------------------------------------------------------------- the two forms
 
-TEST_F(SqliteDbSelectTest, WithoutARowBothOutputsStayAsTheyWere)
+TEST_F(SqliteDbSelectTest, WithoutARowTheOutputsAreUnchanged)
 {
     Run("CREATE TABLE jobs (id)");
     ASSERT_TRUE(db.Open());
@@ -208,7 +207,7 @@ TEST_F(SqliteDbSelectTest, WithoutARowBothOutputsStayAsTheyWere)
     EXPECT_EQ(ToText(records), "{kept:1}");
 }
 
-TEST_F(SqliteDbSelectTest, OfThreeRowsTheOneRowFormTakesTheFirstAndReplacesTheRecord)
+TEST_F(SqliteDbSelectTest, TheOneRowFormReplacesTheRecordByTheFirstRow)
 {
     Run("CREATE TABLE jobs (id); INSERT INTO jobs VALUES (3), (1), (2)");
     ASSERT_TRUE(db.Open());
@@ -217,9 +216,9 @@ TEST_F(SqliteDbSelectTest, OfThreeRowsTheOneRowFormTakesTheFirstAndReplacesTheRe
     EXPECT_EQ(record.ToStr(), "id:1");
 }
 
-TEST_F(SqliteDbSelectTest, TheOneRowFormReadsNoFurtherThanTheFirstRow)
+TEST_F(SqliteDbSelectTest, TheOneRowFormReadsOnlyTheFirstRow)
 {
-    // The second row is one that cannot be computed.
+    // The second row cannot be computed.
     Run("CREATE TABLE jobs (id); INSERT INTO jobs VALUES (-1), (-9223372036854775808)");
     ExpectLines({});
     ASSERT_TRUE(db.Open());
@@ -263,7 +262,7 @@ TEST_F(SqliteDbSelectTest, AStatementThatGivesNoRowsRunsOnceAndSucceeds)
     EXPECT_EQ(Run("SELECT id FROM jobs ORDER BY id"), "1;2");
 }
 
-TEST_F(SqliteDbSelectTest, TheRowOfAStatementThatWritesIsThereWhenTheChangeIs)
+TEST_F(SqliteDbSelectTest, AStatementThatWritesGivesItsRowOnceItIsCommitted)
 {
     Run("CREATE TABLE jobs (id)");
     ASSERT_TRUE(db.Open());
@@ -277,7 +276,7 @@ TEST_F(SqliteDbSelectTest, TheRowOfAStatementThatWritesIsThereWhenTheChangeIs)
     EXPECT_EQ(Run("SELECT id FROM jobs"), "6;7");
 }
 
-TEST_F(SqliteDbSelectTest, TheRowOfAStatementWhoseCommitMeetsAReaderIsNone)
+TEST_F(SqliteDbSelectTest, AStatementThatWritesGivesNoRowWhenItsCommitFails)
 {
     const Failure busy{"INSERT INTO jobs VALUES (1),(2) RETURNING id", SQLITE_BUSY, Locked};
     Run("CREATE TABLE jobs (id)");
@@ -302,7 +301,7 @@ TEST_F(SqliteDbSelectTest, TheRowOfAStatementWhoseCommitMeetsAReaderIsNone)
     EXPECT_EQ(Run("SELECT id FROM jobs"), "1;2");
 }
 
-TEST_F(SqliteDbSelectTest, SideEffectsHappenOncePerTry)
+TEST_F(SqliteDbSelectTest, SideEffectsHappenInEachAttempt)
 {
     const std::string insert = "INSERT INTO jobs VALUES (1)";
     Run("CREATE TABLE jobs (id)");
@@ -315,7 +314,7 @@ TEST_F(SqliteDbSelectTest, SideEffectsHappenOncePerTry)
             const int code = RealStep(statement);
             if (!IsStatement(statement, insert) || ++steps % 2 == 0) return code;
             message = sqlite3_errmsg(sqlite3_db_handle(statement));
-            return SQLITE_IOERR;  // after the deed
+            return SQLITE_IOERR;  // after the insert
         };
         SqliteValueList record;
         EXPECT_TRUE(retrying.SelectByCommand(insert, record));
@@ -333,7 +332,7 @@ TEST_F(SqliteDbSelectTest, SideEffectsHappenOncePerTry)
 
 // -------------------------------------------------------------------------- failures and retries
 
-TEST_F(SqliteDbSelectTest, AnEmptyStatementIsRefusedBeforeTheConnectionIsLookedAt)
+TEST_F(SqliteDbSelectTest, AnEmptyStatementIsRefusedEvenOnAClosedObject)
 {
     SqliteValueList record(earlier);
     Records records{earlier};
@@ -356,7 +355,7 @@ TEST_F(SqliteDbSelectTest, AnEmptyStatementIsRefusedBeforeTheConnectionIsLookedA
     ExpectPauses(0);
 }
 
-TEST_F(SqliteDbSelectTest, TheLinesOfBothFormsDifferByTheLetter)
+TEST_F(SqliteDbSelectTest, TheTwoFormsLogDifferentMessages)
 {
     const std::string tries =
         R"([{"err_code":404,"err_code_str":"ERR_DATABASE_OPERATION","err_msg":{"command":"BAD",)"
@@ -379,23 +378,23 @@ TEST_F(SqliteDbSelectTest, TheLinesOfBothFormsDifferByTheLetter)
     ExpectPauses(0);
 }
 
-TEST_F(SqliteDbSelectTest, ALimitOfThreeTriesFourTimesWithThreePauses)
+TEST_F(SqliteDbSelectTest, ALimitOfThreeMeansFourAttemptsAndThreePauses)
 {
     ASSERT_TRUE(retrying.Open());
     ExpectGivenUp(retrying, noTable, 4);
     ExpectPauses(6);  // three for each form
 }
 
-TEST_F(SqliteDbSelectTest, AClosedObjectFailsEachTryAndStaysClosed)
+TEST_F(SqliteDbSelectTest, AClosedObjectFailsInEachAttemptAndStaysClosed)
 {
     ExpectGivenUp(retrying, {"SELECT 1", SQLITE_MISUSE, sqlite3_errmsg(nullptr)}, 4);
     ExpectPauses(6);
     EXPECT_EQ(Opened(), 0);
 }
 
-TEST_F(SqliteDbSelectTest, AStatementWithoutContentFailsEachTry)
+TEST_F(SqliteDbSelectTest, ATextWithoutAStatementFailsInEachAttempt)
 {
-    // SQLite makes no statement of it; there is no error of the connection then.
+    // SQLite prepares nothing and reports no error.
     ASSERT_TRUE(db.Open());
     for (const char* statement : {" ", "\n", ";", "-- nothing", "/* nothing */"}) {
         ExpectGivenUp(db, {statement, SQLITE_MISUSE, "not an error"}, 1);
@@ -404,7 +403,7 @@ TEST_F(SqliteDbSelectTest, AStatementWithoutContentFailsEachTry)
     ExpectGivenUp(retrying, {" ", SQLITE_MISUSE, "not an error"}, 4);
 }
 
-TEST_F(SqliteDbSelectTest, AFileThatStaysLockedIsGivenUp)
+TEST_F(SqliteDbSelectTest, AStatementOnAFileThatStaysLockedGivesUp)
 {
     Run("CREATE TABLE jobs (id)");
     const LockHolder holder(path);
@@ -412,7 +411,7 @@ TEST_F(SqliteDbSelectTest, AFileThatStaysLockedIsGivenUp)
     ExpectGivenUp(retrying, {"SELECT id FROM jobs", SQLITE_BUSY, Locked}, 4);
 }
 
-TEST_F(SqliteDbSelectTest, ASuccessOfTheOneRowFormAfterAFailedTryIsTold)
+TEST_F(SqliteDbSelectTest, TheOneRowFormLogsASuccessAfterAFailedAttempt)
 {
     Run("CREATE TABLE jobs (id); INSERT INTO jobs VALUES (7)");
     LockHolder holder(path);
@@ -431,7 +430,7 @@ TEST_F(SqliteDbSelectTest, ASuccessOfTheOneRowFormAfterAFailedTryIsTold)
     ExpectPauses(1);
 }
 
-TEST_F(SqliteDbSelectTest, ASuccessOfTheManyRowsFormAfterFailedTriesIsTold)
+TEST_F(SqliteDbSelectTest, TheManyRowsFormLogsASuccessAfterFailedAttempts)
 {
     Run("CREATE TABLE jobs (id); INSERT INTO jobs VALUES (7)");
     LockHolder holder(path);
@@ -454,10 +453,10 @@ TEST_F(SqliteDbSelectTest, ASuccessOfTheManyRowsFormAfterFailedTriesIsTold)
     ExpectPauses(2);
 }
 
-TEST_F(SqliteDbSelectTest, RowsOfATryThatFailedStayAndTheNextTryAppendsAgain)
+TEST_F(SqliteDbSelectTest, RowsOfAFailedAttemptStayAndTheNextOneAppendsAllAgain)
 {
-    // On purpose: the vector is the caller's. The third row is one that cannot be computed, until
-    // it is deleted in the pause.
+    // The contract: the vector belongs to the caller. The third row cannot be computed and is
+    // deleted during the second pause.
     const Failure overflow{"SELECT abs(id) AS id FROM jobs", SQLITE_ERROR, "integer overflow"};
     Run("CREATE TABLE jobs (id); INSERT INTO jobs VALUES (1), (2), (-9223372036854775808), (4)");
     pauses.OnPause([&](std::size_t number) {
@@ -473,7 +472,7 @@ TEST_F(SqliteDbSelectTest, RowsOfATryThatFailedStayAndTheNextTryAppendsAgain)
                           TriesText(overflow, 2) + "]")});
 }
 
-TEST_F(SqliteDbSelectTest, RowsStayAlsoWhenAllTriesFail)
+TEST_F(SqliteDbSelectTest, RowsStayWhenAllAttemptsFail)
 {
     const Failure overflow{"SELECT abs(id) AS id FROM jobs", SQLITE_ERROR, "integer overflow"};
     Run("CREATE TABLE jobs (id); INSERT INTO jobs VALUES (1), (-9223372036854775808)");
@@ -485,7 +484,7 @@ TEST_F(SqliteDbSelectTest, RowsStayAlsoWhenAllTriesFail)
     ExpectLines({ManyRowsGaveUp(overflow, 4)});
 }
 
-TEST_F(SqliteDbSelectTest, AStepThatFailsLeavesTheOneRowOutputAsItWas)
+TEST_F(SqliteDbSelectTest, AFailedStepLeavesTheOutputUnchanged)
 {
     const Failure overflow{"SELECT abs(-9223372036854775808) AS x", SQLITE_ERROR,
                            "integer overflow"};
@@ -493,9 +492,9 @@ TEST_F(SqliteDbSelectTest, AStepThatFailsLeavesTheOneRowOutputAsItWas)
     ExpectGivenUp(db, overflow, 1);
 }
 
-// --------------------------------------------------------------------------------------- one try
+// -------------------------------------------------------------------------------- single attempt
 
-TEST_F(SqliteDbSelectTest, OneTryThatSucceedsClearsTheError)
+TEST_F(SqliteDbSelectTest, ASuccessfulSingleAttemptClearsTheError)
 {
     ASSERT_TRUE(db.Open());
     SqliteValueList record;
@@ -511,7 +510,7 @@ TEST_F(SqliteDbSelectTest, OneTryThatSucceedsClearsTheError)
     EXPECT_EQ(ToText(records), "{x:1}{x:2}");
 }
 
-TEST_F(SqliteDbSelectTest, OneTryLogsNothingAndRecordsASingleError)
+TEST_F(SqliteDbSelectTest, ASingleAttemptLogsNothingAndRecordsOneError)
 {
     struct Row {
         bool open;
@@ -542,7 +541,7 @@ TEST_F(SqliteDbSelectTest, OneTryLogsNothingAndRecordsASingleError)
     ExpectPauses(0);
 }
 
-TEST_F(SqliteDbSelectTest, UntilItHasSucceededATryCountsAsFailed)
+TEST_F(SqliteDbSelectTest, TheErrorIsSetUntilAnAttemptSucceeds)
 {
     SqliteFaults faults;
     faults.prepare = [&](sqlite3* handle, const char* sql, sqlite3_stmt** statement) {
@@ -584,11 +583,11 @@ TEST_F(SqliteDbSelectTest, NoStatementIsLeftRunning)
         EXPECT_EQ(countLeft(), left);
     };
     expectLeft("SELECT abs(-9223372036854775808) AS x", 0);  // fails
-    expectLeft("SELECT 1 AS x UNION SELECT 2", 1);           // the one-row form leaves a row
+    expectLeft("SELECT 1 AS x UNION SELECT 2", 1);           // one row is not read
     expectLeft("SELECT 1 AS x WHERE 0", 2);
     expectLeft("SELECT abs(-9223372036854775808) AS x", 2);
 
-    // A statement that comes with a failure.
+    // A failed preparation that gives a statement all the same.
     faults.prepare = [](sqlite3* handle, const char* sql, sqlite3_stmt** statement) {
         EXPECT_EQ(RealPrepare(handle, sql, statement), SQLITE_OK);
         return SQLITE_NOMEM;

@@ -23,8 +23,8 @@ static_assert(std::is_nothrow_move_constructible_v<SqliteDB> &&
 
 class SqliteDbTest : public SqliteFixture {
   protected:
-    // Runs `body` in a process that has no more rights than an ordinary user, because modes do not
-    // count for root, while file and directory have these modes.
+    // Runs `body` in a process of an ordinary user while file and directory have these modes. Root
+    // may do anything, whatever the modes.
     void AsOrdinaryUser(mode_t fileMode, mode_t directoryMode, const std::function<void()>& body)
     {
         ASSERT_EQ(::chmod(path.c_str(), fileMode), 0);
@@ -73,7 +73,7 @@ TEST_F(SqliteDbTest, AFileThatSqliteCannotOpenLeavesNoConnection)
         SqliteDB refused(unopenable, 3);
         EXPECT_FALSE(refused.Open());
         ExpectErr(refused, 0);
-        EXPECT_EQ(Opened(), openedBefore + 1);  // SQLite hands out a handle with the failure
+        EXPECT_EQ(Opened(), openedBefore + 1);  // SQLite returns a handle although it fails
         EXPECT_EQ(Closed(), Opened());
         EXPECT_FALSE(refused.Exec("SELECT 1"));
         ExpectLines({Warn("Open", "Failed to open db[" + unopenable + "]"),
@@ -82,7 +82,7 @@ TEST_F(SqliteDbTest, AFileThatSqliteCannotOpenLeavesNoConnection)
     ExpectPauses(0);
 }
 
-TEST_F(SqliteDbTest, AnOpenThatFailedCanBeAskedForAgain)
+TEST_F(SqliteDbTest, AFailedOpenCanBeRepeated)
 {
     SqliteDB early(dir.File("later/test.db"), 0);
     EXPECT_FALSE(early.Open());
@@ -105,7 +105,7 @@ TEST_F(SqliteDbTest, ABusyTimeoutThatCannotBeSetLeavesTheConnectionOpen)
     ExpectErr(db, 0);
     EXPECT_EQ(Closed(), 0);
 
-    EXPECT_TRUE(db.Open());  // on purpose: the connection is there, the time-out is not set again
+    EXPECT_TRUE(db.Open());  // the contract: the connection is open
     EXPECT_TRUE(db.Exec("CREATE TABLE jobs (id)"));
     EXPECT_EQ(asked, 1);
     EXPECT_EQ(Opened(), 1);
@@ -179,13 +179,13 @@ TEST_F(SqliteDbTest, AMoveTakesConnectionErrorAndLimit)
     EXPECT_EQ(Closed(), 0);
 }
 
-TEST_F(SqliteDbTest, AMovedFromObjectIsClosedAndNamesItsFileStill)
+TEST_F(SqliteDbTest, AMovedFromObjectIsClosedButCanBeOpenedAgain)
 {
     ASSERT_TRUE(db.Open());
     SqliteDB taken(std::move(db));
     SqliteDB assigned("", 0);
     assigned = std::move(taken);
-    // That they can be used is what this is about. NOLINTBEGIN(bugprone-use-after-move)
+    // Moved-from objects can be used. NOLINTBEGIN(bugprone-use-after-move)
     for (SqliteDB* moved : {&db, &taken}) {
         ExpectErr(*moved, 0);
         EXPECT_FALSE(moved->Exec("SELECT 1"));
@@ -199,7 +199,7 @@ TEST_F(SqliteDbTest, AMovedFromObjectIsClosedAndNamesItsFileStill)
     EXPECT_EQ(Run("SELECT name FROM sqlite_master"), "jobs");
 }
 
-TEST_F(SqliteDbTest, AMoveLeavesNoErrorBehind)
+TEST_F(SqliteDbTest, AMovedFromObjectHasNoError)
 {
     const std::string record = R"({"sqlite_errmsg":"why"})";
     db.SetDBErr("", 0, "why");
@@ -248,7 +248,7 @@ TEST_F(SqliteDbTest, AssigningAnObjectToItselfChangesNothing)
 
 TEST_F(SqliteDbTest, ExecOnAClosedObjectIsRefusedAndTouchesNoFile)
 {
-    // With an empty statement, too: the connection is asked for first.
+    // Also for an empty statement: the connection is checked first.
     for (const char* statement : {"CREATE TABLE jobs (id)", ""}) {
         retrying.SetDBErr("", 0, "earlier");
         EXPECT_FALSE(retrying.Exec(statement));
@@ -287,7 +287,7 @@ TEST_F(SqliteDbTest, ExecDropsTheRowsOfAStatementThatHasSome)
     ExpectErr(db, 0);
 }
 
-TEST_F(SqliteDbTest, AStatementWithoutContentSucceeds)
+TEST_F(SqliteDbTest, ATextWithoutAStatementSucceeds)
 {
     ASSERT_TRUE(db.Open());
     for (const char* statement : {" ", "\n\t", ";", "-- nothing", "/* nothing */"}) {
@@ -296,7 +296,7 @@ TEST_F(SqliteDbTest, AStatementWithoutContentSucceeds)
     }
 }
 
-TEST_F(SqliteDbTest, ALimitOfZeroTriesOnceAndReportsOne)
+TEST_F(SqliteDbTest, ALimitOfZeroMeansOneAttempt)
 {
     ASSERT_TRUE(db.Open());
     EXPECT_FALSE(db.Exec("BAD"));
@@ -309,7 +309,7 @@ TEST_F(SqliteDbTest, ALimitOfZeroTriesOnceAndReportsOne)
     ExpectPauses(0);
 }
 
-TEST_F(SqliteDbTest, ALimitOfThreeTriesFourTimesWithThreePauses)
+TEST_F(SqliteDbTest, ALimitOfThreeMeansFourAttemptsAndThreePauses)
 {
     const Failure bad{"BAD", SQLITE_ERROR, R"(near "BAD": syntax error)"};
     ASSERT_TRUE(retrying.Open());
@@ -324,7 +324,7 @@ TEST_F(SqliteDbTest, ALimitOfThreeTriesFourTimesWithThreePauses)
     EXPECT_EQ(record[0]["err_msg"]["sqlite_errcode"].type(), Json::intValue);
 }
 
-TEST_F(SqliteDbTest, ASuccessAfterAFailedTryIsTold)
+TEST_F(SqliteDbTest, ASuccessAfterAFailedAttemptIsLogged)
 {
     Run("CREATE TABLE jobs (id); INSERT INTO jobs VALUES (1)");
     LockHolder holder(path);
@@ -342,7 +342,7 @@ TEST_F(SqliteDbTest, ASuccessAfterAFailedTryIsTold)
     EXPECT_EQ(Run("SELECT count(*) FROM jobs"), "0");
 }
 
-TEST_F(SqliteDbTest, TheLastTryMaySucceedAndEachTryKeepsItsOwnReason)
+TEST_F(SqliteDbTest, TheLastAttemptMaySucceedAndEachFailureIsRecorded)
 {
     const std::string insert = "INSERT INTO jobs VALUES (1)";
     pauses.OnPause([&](std::size_t number) {
@@ -364,7 +364,7 @@ TEST_F(SqliteDbTest, TheLastTryMaySucceedAndEachTryKeepsItsOwnReason)
     EXPECT_EQ(Run("SELECT id FROM jobs"), "1");
 }
 
-TEST_F(SqliteDbTest, AFileThatStaysLockedIsGivenUp)
+TEST_F(SqliteDbTest, AStatementOnAFileThatStaysLockedGivesUp)
 {
     const Failure busy{"INSERT INTO jobs VALUES (1)", SQLITE_BUSY, Locked};
     Run("CREATE TABLE jobs (id)");
@@ -381,7 +381,7 @@ TEST_F(SqliteDbTest, AFileThatStaysLockedIsGivenUp)
     ExpectErr(retrying, 0);
 }
 
-TEST_F(SqliteDbTest, AFileThatIsNoDatabaseIsOpenedButRunsNothing)
+TEST_F(SqliteDbTest, AFileThatIsNotADatabaseOpensButRunsNothing)
 {
     const Failure noDatabase{"CREATE TABLE jobs (id)", SQLITE_NOTADB, NoDatabase};
     std::ofstream(path) << "text, and nothing that SQLite wrote\n";
@@ -421,7 +421,7 @@ TEST_F(SqliteDbTest, AFileThatMayNotBeReadIsNotOpened)
     });
 }
 
-TEST_F(SqliteDbTest, StatementsOfAnyTextStandWholeInLineAndRecord)
+TEST_F(SqliteDbTest, AnyStatementIsCompleteInLogLineAndRecord)
 {
     struct Row {
         std::string statement;
@@ -462,9 +462,9 @@ TEST_F(SqliteDbTest, AStatementEndsAtItsFirstZeroByte)
         "Exec", "Reach retry limit [1], failed to exec command [BAD] with err[" + tries + "]")});
 }
 
-TEST_F(SqliteDbTest, SeveralStatementsInOneTextAreRepeatedOnEachTry)
+TEST_F(SqliteDbTest, EachAttemptRepeatsAllStatementsOfAText)
 {
-    // On purpose: a try is the whole text, and what succeeded in it stays.
+    // The contract: an attempt runs the whole text, and the statements that succeeded stay.
     const Failure half{"INSERT INTO jobs VALUES (1); INSERT INTO nowhere VALUES (1)", SQLITE_ERROR,
                        "no such table: nowhere"};
     Run("CREATE TABLE jobs (id)");
@@ -476,7 +476,7 @@ TEST_F(SqliteDbTest, SeveralStatementsInOneTextAreRepeatedOnEachTry)
 
 TEST_F(SqliteDbTest, ATransactionInOneTextIsLeftOpenWhenItFails)
 {
-    // On purpose: the second try meets the transaction of the first.
+    // The contract: the transaction of the first attempt is open when the second one begins.
     const std::string text = "BEGIN; INSERT INTO jobs VALUES (1); INSERT INTO nowhere VALUES (1)";
     const std::string again = "cannot start a transaction within a transaction";
     Run("CREATE TABLE jobs (id)");
@@ -494,9 +494,9 @@ TEST_F(SqliteDbTest, ATransactionInOneTextIsLeftOpenWhenItFails)
     EXPECT_EQ(Run("SELECT count(*) FROM jobs"), "1");
 }
 
-// ------------------------------------------------------------------------- one try, error record
+// ------------------------------------------------------------------- single attempt, error record
 
-TEST_F(SqliteDbTest, OneTryLogsNothingAndRecordsASingleError)
+TEST_F(SqliteDbTest, ASingleAttemptLogsNothingAndRecordsOneError)
 {
     const Failure bad{"BAD", SQLITE_ERROR, R"(near "BAD": syntax error)"};
     ASSERT_TRUE(retrying.Open());
@@ -505,7 +505,7 @@ TEST_F(SqliteDbTest, OneTryLogsNothingAndRecordsASingleError)
     ExpectPauses(0);
 }
 
-TEST_F(SqliteDbTest, OneTryThatSucceedsLeavesTheErrorAsItWas)
+TEST_F(SqliteDbTest, ASuccessfulSingleAttemptLeavesTheErrorAsItWas)
 {
     ASSERT_TRUE(db.Open());
     db.SetDBErr("earlier", 5, "why");
@@ -515,14 +515,14 @@ TEST_F(SqliteDbTest, OneTryThatSucceedsLeavesTheErrorAsItWas)
     EXPECT_EQ(Run("SELECT name FROM sqlite_master"), "jobs");
 }
 
-TEST_F(SqliteDbTest, OneTryOnAClosedObjectFailsThroughSqlite)
+TEST_F(SqliteDbTest, ASingleAttemptOnAClosedObjectFailsInSqlite)
 {
     EXPECT_FALSE(db.DoExecSqliteCommand("SELECT 1"));
     ExpectErr(db, 404, ErrorText({"SELECT 1", SQLITE_MISUSE, sqlite3_errmsg(nullptr)}));
     EXPECT_FALSE(std::filesystem::exists(path));
 }
 
-TEST_F(SqliteDbTest, AnErrorObjectHoldsWhatIsKnown)
+TEST_F(SqliteDbTest, AnErrorObjectLeavesOutWhatIsUnknown)
 {
     struct Row {
         const char* command;
@@ -547,7 +547,7 @@ TEST_F(SqliteDbTest, AnErrorObjectHoldsWhatIsKnown)
         {"S", -1, "why", R"({"command":"S","sqlite_errcode":-1,"sqlite_errmsg":"why"})"},
     };
     ASSERT_TRUE(db.Open());
-    EXPECT_FALSE(db.DoExecSqliteCommand("SELECT 1 FROM t"));  // gives the connection its message
+    EXPECT_FALSE(db.DoExecSqliteCommand("SELECT 1 FROM t"));  // sets SQLite's last message
     const SqliteDB& constant = db;
     for (const Row& row : rows) {
         constant.SetDBErr(row.command, row.code, row.message);
@@ -555,14 +555,14 @@ TEST_F(SqliteDbTest, AnErrorObjectHoldsWhatIsKnown)
     }
 }
 
-TEST_F(SqliteDbTest, AnErrorObjectCanRepeatTheOneBeforeIt)
+TEST_F(SqliteDbTest, AnErrorObjectMayUseTheMessageOfThePreviousOne)
 {
     db.SetDBErr("a statement that is long enough", 5, "a message that is long enough");
     db.SetDBErr("S", 6, db.GetErr()["sqlite_errmsg"].asCString());
     ExpectErr(db, 404, ErrorText({"S", 6, "a message that is long enough"}));
 }
 
-TEST_F(SqliteDbTest, AnErrorObjectOfAClosedObjectHasSqlitesWordsForNoConnection)
+TEST_F(SqliteDbTest, AClosedObjectsErrorHasSqlitesMessageForNoConnection)
 {
     db.SetDBErr("S", 5, nullptr);
     ExpectErr(db, 404, ErrorText({"S", 5, sqlite3_errmsg(nullptr)}));

@@ -105,7 +105,7 @@ TEST_F(SqliteStatementCacheTest, ACachedSelectSeesNewRowsAndColumns)
     EXPECT_EQ(Select(all), "name:'new'; cached");
 }
 
-TEST_F(SqliteStatementCacheTest, ACachedSelectOfATableThatIsGoneFailsAsANewOneDoes)
+TEST_F(SqliteStatementCacheTest, ACachedSelectFailsLikeANewOneWhenItsTableIsGone)
 {
     const Failure noTable{ids, SQLITE_ERROR, "no such table: jobs"};
     Run("CREATE TABLE jobs (id)");
@@ -119,7 +119,7 @@ TEST_F(SqliteStatementCacheTest, ACachedSelectOfATableThatIsGoneFailsAsANewOneDo
     ExpectPauses(3);
 }
 
-TEST_F(SqliteStatementCacheTest, ACachedSelectWaitsForNobodyAndKeepsNobodyOut)
+TEST_F(SqliteStatementCacheTest, ACachedSelectHoldsNoLock)
 {
     RunEach({"CREATE TABLE jobs (id)", "INSERT INTO jobs VALUES (1), (2)"});
     ASSERT_TRUE(db.Open());
@@ -132,7 +132,7 @@ TEST_F(SqliteStatementCacheTest, ACachedSelectWaitsForNobodyAndKeepsNobodyOut)
     EXPECT_TRUE(db.Exec("VACUUM"));
 }
 
-TEST_F(SqliteStatementCacheTest, TheSelectsUsedLastAreCached)
+TEST_F(SqliteStatementCacheTest, TheMostRecentSelectsAreCached)
 {
     ASSERT_TRUE(db.Open());
     const auto number = [](int value) { return "SELECT " + std::to_string(value) + " AS x"; };
@@ -144,7 +144,7 @@ TEST_F(SqliteStatementCacheTest, TheSelectsUsedLastAreCached)
     EXPECT_EQ(Select(number(2)), "x:2; prepared");
 }
 
-TEST_F(SqliteStatementCacheTest, WhatIsNoSelectOrVeryLongIsPreparedEachTime)
+TEST_F(SqliteStatementCacheTest, OtherStatementsAndVeryLongSelectsAreNotCached)
 {
     Run("CREATE TABLE jobs (id)");
     ASSERT_TRUE(db.Open());
@@ -202,7 +202,7 @@ TEST_F(SqliteStatementCacheTest, ATableMadeInMainIsReadInsteadOfTheAttachedOne)
     EXPECT_EQ(record.ToStr(), "id:1");
 }
 
-TEST_F(SqliteStatementCacheTest, WhateverComesToBeFoundEarlierIsReadInsteadOfTheAttachedTable)
+TEST_F(SqliteStatementCacheTest, AViewOrTempTableMadeLaterIsReadInsteadOfTheAttachedTable)
 {
     AttachNodes("old");
     AttachNodes("older");

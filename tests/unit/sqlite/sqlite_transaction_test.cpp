@@ -19,8 +19,8 @@ class SqliteTransactionTest : public SqliteFixture {
   protected:
     SqliteTransactionTest() { Run("CREATE TABLE jobs (id INTEGER PRIMARY KEY, name TEXT)"); }
 
-    // Lines of the transaction's own.
-    static LogLine Told(const std::string& function, const std::string& message)
+    // A log line of the transaction itself.
+    static LogLine TransactionErr(const std::string& function, const std::string& message)
     {
         return Err(function, message).In("sqlite_transaction.cpp");
     }
@@ -35,22 +35,22 @@ class SqliteTransactionTest : public SqliteFixture {
 
     std::string Ids() const { return Run("SELECT id FROM jobs"); }
 
-    // Has SQLite roll back what is open on the connection, at a row that is there already.
-    void HaveSqliteRollBack(SqliteDB& connection)
+    // Makes SQLite roll back the open transaction, by inserting a row that exists already.
+    void MakeSqliteRollBack(SqliteDB& connection)
     {
         EXPECT_FALSE(connection.InsertRecord(Insert(7)));
         EXPECT_EQ(TakeLines().size(), 2U);
     }
 
-    // How often a statement that fails is tried.
-    static std::size_t CountTries(SqliteDB& connection)
+    // How many attempts a failing statement gets.
+    static std::size_t CountAttempts(SqliteDB& connection)
     {
         EXPECT_FALSE(connection.Exec("BAD"));
         EXPECT_EQ(TakeLines().size(), 1U);
         return connection.GetErr().size();
     }
 
-    // A row that makes SQLite roll back whatever is open.
+    // From now on SQLite rolls back when row 7 is inserted again.
     void MakeConflictsRollBack() const
     {
         Run("DROP TABLE jobs; CREATE TABLE jobs (id INTEGER PRIMARY KEY ON CONFLICT ROLLBACK);"
@@ -62,13 +62,15 @@ class SqliteTransactionTest : public SqliteFixture {
                             "UNIQUE constraint failed: jobs.id"};
     const LogLine duplicateFailed =
         Err("InsertRecord", "Failed to exec [" + duplicate.command + "] in db[" + path + "]");
-    const LogLine alreadyOpen = Told("Begin", "transaction is already open in db[" + path + "]");
-    const LogLine wasRolledBack = Told("Commit", "transaction in db[" + path + "] was rolled back");
+    const LogLine alreadyOpen =
+        TransactionErr("Begin", "transaction is already open in db[" + path + "]");
+    const LogLine wasRolledBack =
+        TransactionErr("Commit", "transaction in db[" + path + "] was rolled back");
 };
 
-// ------------------------------------------------------------------------------------- all or none
+// ---------------------------------------------------------------------------------- all or nothing
 
-TEST_F(SqliteTransactionTest, CommittedOperationsAreSeenByOthersTogether)
+TEST_F(SqliteTransactionTest, CommittedOperationsBecomeVisibleTogether)
 {
     SqliteTransaction transaction(db);
     EXPECT_EQ(Opened(), 0);
@@ -90,7 +92,7 @@ TEST_F(SqliteTransactionTest, CommittedOperationsAreSeenByOthersTogether)
     EXPECT_EQ(Run("SELECT * FROM jobs"), "1,a;3,NULL");
 }
 
-TEST_F(SqliteTransactionTest, RolledBackOperationsHaveNotHappened)
+TEST_F(SqliteTransactionTest, RolledBackOperationsLeaveNoTrace)
 {
     SqliteTransaction transaction(db);
     ASSERT_TRUE(transaction.Begin() && db.InsertRecord(Insert(1)));
@@ -103,7 +105,7 @@ TEST_F(SqliteTransactionTest, RolledBackOperationsHaveNotHappened)
     EXPECT_EQ(Closed(), 0);
 }
 
-TEST_F(SqliteTransactionTest, WhatIsStillOpenIsRolledBackAtTheEndAndTheErrorStays)
+TEST_F(SqliteTransactionTest, TheDestructorRollsBackAndKeepsTheError)
 {
     {
         SqliteTransaction transaction(db);
@@ -117,7 +119,7 @@ TEST_F(SqliteTransactionTest, WhatIsStillOpenIsRolledBackAtTheEndAndTheErrorStay
     EXPECT_EQ(Ids(), "1");
 }
 
-TEST_F(SqliteTransactionTest, TheEndOfWhatIsNotOpenTouchesNothing)
+TEST_F(SqliteTransactionTest, TheDestructorLeavesAloneWhatTheObjectDidNotBegin)
 {
     {
         const SqliteTransaction never(db);
@@ -126,13 +128,13 @@ TEST_F(SqliteTransactionTest, TheEndOfWhatIsNotOpenTouchesNothing)
     {
         SqliteTransaction committed(db);
         ASSERT_TRUE(committed.Begin() && db.InsertRecord(Insert(1)) && committed.Commit());
-        ASSERT_TRUE(db.Exec("BEGIN") && db.InsertRecord(Insert(2)));  // somebody else's
+        ASSERT_TRUE(db.Exec("BEGIN") && db.InsertRecord(Insert(2)));  // not the object's
     }
     EXPECT_TRUE(db.Exec("COMMIT"));
     EXPECT_EQ(Ids(), "1;2");
 }
 
-TEST_F(SqliteTransactionTest, OneObjectServesManyTransactionsOneAfterTheOther)
+TEST_F(SqliteTransactionTest, AnObjectCanBeginOneTransactionAfterTheOther)
 {
     SqliteTransaction transaction(db);
     ASSERT_TRUE(transaction.Begin() && db.InsertRecord(Insert(1)) && transaction.Commit());
@@ -165,7 +167,7 @@ TEST_F(SqliteTransactionTest, BeginInsideATransactionIsRefusedAndLeavesItOpen)
     EXPECT_TRUE(db.Exec("COMMIT"));
 }
 
-TEST_F(SqliteTransactionTest, AFileThatCannotBeOpenedIsToldByBothLayers)
+TEST_F(SqliteTransactionTest, AFileThatCannotBeOpenedIsLoggedByBothLayers)
 {
     SqliteDB refused(dir.Path(), 3);
     SqliteTransaction transaction(refused);
@@ -173,21 +175,21 @@ TEST_F(SqliteTransactionTest, AFileThatCannotBeOpenedIsToldByBothLayers)
     EXPECT_FALSE(transaction.Begin());
     ExpectErr(refused, 404);
     ExpectLines({Warn("Open", "Failed to open db[" + dir.Path() + "]"),
-                 Told("Begin", "Failed to open db [" + dir.Path() + "]")});
+                 TransactionErr("Begin", "Failed to open db [" + dir.Path() + "]")});
     EXPECT_TRUE(transaction.Rollback());
     ExpectErr(refused, 0);
     ExpectPauses(0);
 }
 
-TEST_F(SqliteTransactionTest, AnotherWriterIsWaitedFor)
+TEST_F(SqliteTransactionTest, BeginWaitsForAnotherWriter)
 {
     LockHolder holder(path, "BEGIN IMMEDIATE");
     const Failure busy{"BEGIN IMMEDIATE", SQLITE_BUSY, Locked};
     SqliteTransaction transaction(retrying);
     EXPECT_FALSE(transaction.Begin());
     ExpectErr(retrying, 404, TriesText(busy, 4));
-    ExpectLines(
-        {ExecGaveUp(busy, 4), Told("Begin", "Failed to begin transaction in db[" + path + "]")});
+    ExpectLines({ExecGaveUp(busy, 4),
+                 TransactionErr("Begin", "Failed to begin transaction in db[" + path + "]")});
     ExpectPauses(3);
 
     pauses.OnPause([&](std::size_t number) {
@@ -203,9 +205,9 @@ TEST_F(SqliteTransactionTest, AnotherWriterIsWaitedFor)
     EXPECT_EQ(Ids(), "1");
 }
 
-// ------------------------------------------------------------------------------------ single tries
+// --------------------------------------------------------------------------------- single attempts
 
-TEST_F(SqliteTransactionTest, WhileItIsOpenOperationsAreTriedOnceAndAfterwardsAsBefore)
+TEST_F(SqliteTransactionTest, OperationsAreNotRetriedWhileATransactionIsOpen)
 {
     Run("INSERT INTO jobs (id) VALUES (7)");
     const auto expectTries = [&](std::size_t tries) {
@@ -232,13 +234,13 @@ TEST_F(SqliteTransactionTest, WhileItIsOpenOperationsAreTriedOnceAndAfterwardsAs
     expectTries(4);
 }
 
-TEST_F(SqliteTransactionTest, NoOperationGoesOnOutsideOfATransactionThatSqliteHasEnded)
+TEST_F(SqliteTransactionTest, AfterARollbackBySqliteNoRetryRunsOutsideOfTheTransaction)
 {
     MakeConflictsRollBack();
     SqliteTransaction transaction(retrying);
     ASSERT_TRUE(transaction.Begin() && retrying.Exec("DELETE FROM jobs") &&
                 retrying.Exec("INSERT INTO jobs VALUES (7),(8)"));
-    // A second try, by itself, would meet the old row 7 alone; a row 8 it could store.
+    // Outside of the transaction only the old row 7 exists: a second attempt could store 9 and 8.
     const Failure both{"INSERT INTO jobs VALUES (9),(8)", SQLITE_CONSTRAINT, duplicate.message};
     EXPECT_FALSE(retrying.Exec(both.command));
     ExpectErr(retrying, 404, TriesText(both));
@@ -251,12 +253,12 @@ TEST_F(SqliteTransactionTest, NoOperationGoesOnOutsideOfATransactionThatSqliteHa
     EXPECT_EQ(Ids(), "7");
 }
 
-// ------------------------------------------------------------------------------ Commit and Rollback
+// ----------------------------------------------------------------------------- Commit and Rollback
 
 TEST_F(SqliteTransactionTest, ACommitWithoutATransactionIsRefused)
 {
     SqliteTransaction transaction(db);
-    const LogLine none = Told("Commit", "no transaction to commit in db[" + path + "]");
+    const LogLine none = TransactionErr("Commit", "no transaction to commit in db[" + path + "]");
     EXPECT_FALSE(transaction.Commit());
     ExpectErr(db, 401);
     ASSERT_TRUE(transaction.Begin() && transaction.Commit());
@@ -266,12 +268,12 @@ TEST_F(SqliteTransactionTest, ACommitWithoutATransactionIsRefused)
     EXPECT_FALSE(transaction.Commit());
     ExpectErr(db, 401);
     ASSERT_TRUE(db.Exec("BEGIN"));
-    EXPECT_FALSE(transaction.Commit());  // somebody else's
+    EXPECT_FALSE(transaction.Commit());  // not the object's
     EXPECT_TRUE(db.Exec("COMMIT"));
     ExpectLines({none, none, none, none});
 }
 
-TEST_F(SqliteTransactionTest, ACommitWaitsForReadersAndLeavesTheTransactionOpenWhenTheyStay)
+TEST_F(SqliteTransactionTest, ACommitThatReadersBlockLeavesTheTransactionOpen)
 {
     LockHolder reader(path, "BEGIN; SELECT * FROM jobs");
     const Failure busy{"COMMIT", SQLITE_BUSY, Locked};
@@ -279,11 +281,11 @@ TEST_F(SqliteTransactionTest, ACommitWaitsForReadersAndLeavesTheTransactionOpenW
     ASSERT_TRUE(transaction.Begin() && retrying.InsertRecord(Insert(7)));
     EXPECT_FALSE(transaction.Commit());
     ExpectErr(retrying, 404, TriesText(busy, 4));
-    ExpectLines(
-        {ExecGaveUp(busy, 4), Told("Commit", "Failed to commit transaction in db[" + path + "]")});
+    ExpectLines({ExecGaveUp(busy, 4),
+                 TransactionErr("Commit", "Failed to commit transaction in db[" + path + "]")});
     ExpectPauses(3);
 
-    EXPECT_FALSE(retrying.InsertRecord(Insert(7)));  // a single try still
+    EXPECT_FALSE(retrying.InsertRecord(Insert(7)));  // still a single attempt
     ExpectErr(retrying, 404, TriesText(duplicate));
     ExpectLines({ExecGaveUp(duplicate), duplicateFailed});
     reader.Release();
@@ -309,10 +311,10 @@ TEST_F(SqliteTransactionTest, ACommitThatEndsTheTransactionLeavesNothingToRollBa
     EXPECT_EQ(Ids(), "");
     EXPECT_FALSE(transaction.Commit());
     ExpectErr(db, 401);
-    ExpectLines({Told("Commit", "no transaction to commit in db[" + path + "]")});
+    ExpectLines({TransactionErr("Commit", "no transaction to commit in db[" + path + "]")});
 }
 
-TEST_F(SqliteTransactionTest, ARollbackBehindSqlitesOwnRunsNothing)
+TEST_F(SqliteTransactionTest, ARollbackAfterSqlitesOwnRunsNothing)
 {
     MakeConflictsRollBack();
     std::vector<std::string> run;
@@ -332,7 +334,7 @@ TEST_F(SqliteTransactionTest, ARollbackBehindSqlitesOwnRunsNothing)
     EXPECT_EQ(Ids(), "7");
 }
 
-TEST_F(SqliteTransactionTest, ANewOneCanBeBegunBehindSqlitesOwnRollback)
+TEST_F(SqliteTransactionTest, ATransactionCanBeginAfterSqliteRolledBackTheLastOne)
 {
     MakeConflictsRollBack();
     {
@@ -345,11 +347,11 @@ TEST_F(SqliteTransactionTest, ANewOneCanBeBegunBehindSqlitesOwnRollback)
     ExpectLines({ExecGaveUp(duplicate), duplicateFailed});
     EXPECT_EQ(Ids(), "1;7");
     EXPECT_FALSE(retrying.InsertRecord(Insert(7)));
-    ExpectErr(retrying, 404, TriesText(duplicate, 4));  // the limit is the connection's own again
+    ExpectErr(retrying, 404, TriesText(duplicate, 4));  // the connection's own limit again
     ExpectLines({ExecGaveUp(duplicate, 4), duplicateFailed});
 }
 
-TEST_F(SqliteTransactionTest, AConnectionThatIsClosedMeanwhileHasRolledBack)
+TEST_F(SqliteTransactionTest, ClosingTheConnectionRollsBack)
 {
     SqliteTransaction transaction(db);
     ASSERT_TRUE(transaction.Begin() && db.InsertRecord(Insert(1)));
@@ -363,14 +365,15 @@ TEST_F(SqliteTransactionTest, AConnectionThatIsClosedMeanwhileHasRolledBack)
     EXPECT_EQ(Ids(), "");
 }
 
-TEST_F(SqliteTransactionTest, WhatCannotBeRolledBackEndsWithTheConnection)
+TEST_F(SqliteTransactionTest, AFailedRollbackClosesTheConnection)
 {
     SqliteFaults faults;
     faults.prepare = [](sqlite3* handle, const char* sql, sqlite3_stmt** statement) {
         if (std::string(sql) == "ROLLBACK") return SQLITE_NOMEM;
         return RealPrepare(handle, sql, statement);
     };
-    const LogLine failed = Told("Rollback", "Failed to roll back transaction in db[" + path + "]");
+    const LogLine failed =
+        TransactionErr("Rollback", "Failed to roll back transaction in db[" + path + "]");
     SqliteTransaction transaction(db);
     ASSERT_TRUE(transaction.Begin() && db.InsertRecord(Insert(1)));
     EXPECT_FALSE(transaction.Rollback());
@@ -393,33 +396,33 @@ TEST_F(SqliteTransactionTest, WhatCannotBeRolledBackEndsWithTheConnection)
 
 // ------------------------------------------------------------------------------------------- owner
 
-TEST_F(SqliteTransactionTest, ASecondObjectThatBeginsAfterSqlitesRollbackOwnsTheTransactionAlone)
+TEST_F(SqliteTransactionTest, AfterSqlitesRollbackASecondObjectOwnsTheNextTransaction)
 {
     MakeConflictsRollBack();
     SqliteTransaction second(retrying);
     {
         SqliteTransaction first(retrying);
         ASSERT_TRUE(first.Begin());
-        HaveSqliteRollBack(retrying);
+        MakeSqliteRollBack(retrying);
         ASSERT_TRUE(second.Begin() && retrying.InsertRecord(Insert(1)));
         EXPECT_TRUE(first.Rollback());  // it has none
         ExpectErr(retrying, 0);
-        EXPECT_EQ(CountTries(retrying), 1U);
+        EXPECT_EQ(CountAttempts(retrying), 1U);
         EXPECT_FALSE(first.Begin());
         ExpectLines({alreadyOpen});
     }
-    EXPECT_EQ(CountTries(retrying), 1U);
+    EXPECT_EQ(CountAttempts(retrying), 1U);
     EXPECT_TRUE(second.Commit());
-    EXPECT_EQ(CountTries(retrying), 4U);
+    EXPECT_EQ(CountAttempts(retrying), 4U);
     EXPECT_EQ(Ids(), "1;7");
 }
 
-TEST_F(SqliteTransactionTest, TheFirstOfTwoObjectsLearnsAtItsCommitThatSqliteRolledBack)
+TEST_F(SqliteTransactionTest, TheFirstObjectsCommitReportsThatSqliteRolledBack)
 {
     MakeConflictsRollBack();
     SqliteTransaction first(retrying);
     ASSERT_TRUE(first.Begin());
-    HaveSqliteRollBack(retrying);
+    MakeSqliteRollBack(retrying);
     {
         SqliteTransaction second(retrying);
         ASSERT_TRUE(second.Begin() && retrying.InsertRecord(Insert(1)));
@@ -427,43 +430,43 @@ TEST_F(SqliteTransactionTest, TheFirstOfTwoObjectsLearnsAtItsCommitThatSqliteRol
         ExpectErr(retrying, 404);
         EXPECT_FALSE(first.Commit());
         ExpectErr(retrying, 401);
-        ExpectLines(
-            {wasRolledBack, Told("Commit", "no transaction to commit in db[" + path + "]")});
-        EXPECT_EQ(CountTries(retrying), 1U);
+        ExpectLines({wasRolledBack,
+                     TransactionErr("Commit", "no transaction to commit in db[" + path + "]")});
+        EXPECT_EQ(CountAttempts(retrying), 1U);
     }
-    EXPECT_EQ(CountTries(retrying), 4U);
-    EXPECT_EQ(Ids(), "7");  // the second one's was rolled back, by the second one
+    EXPECT_EQ(CountAttempts(retrying), 4U);
+    EXPECT_EQ(Ids(), "7");  // the second object rolled back its own
 }
 
-TEST_F(SqliteTransactionTest, TheFirstOfTwoObjectsLeavesTheSecondOnesTransactionAloneWhenItGoes)
+TEST_F(SqliteTransactionTest, TheFirstObjectsDestructorLeavesTheSecondOnesTransactionOpen)
 {
     MakeConflictsRollBack();
     auto first = std::make_unique<SqliteTransaction>(retrying);
     ASSERT_TRUE(first->Begin());
-    HaveSqliteRollBack(retrying);
+    MakeSqliteRollBack(retrying);
     SqliteTransaction second(retrying);
     ASSERT_TRUE(second.Begin() && retrying.InsertRecord(Insert(1)));
     first.reset();
-    EXPECT_EQ(CountTries(retrying), 1U);
+    EXPECT_EQ(CountAttempts(retrying), 1U);
     EXPECT_TRUE(second.Commit());
-    EXPECT_EQ(CountTries(retrying), 4U);
+    EXPECT_EQ(CountAttempts(retrying), 4U);
     EXPECT_EQ(Ids(), "1;7");
 }
 
-TEST_F(SqliteTransactionTest, ATransactionThatTheCallerBeganAfterTheOwnersIsTheCallers)
+TEST_F(SqliteTransactionTest, ATransactionBegunByAStatementBelongsToTheCaller)
 {
     MakeConflictsRollBack();
     const std::vector<std::function<void()>> ways{
         [this] {
-            HaveSqliteRollBack(db);
+            MakeSqliteRollBack(db);
             EXPECT_TRUE(db.Exec("BEGIN"));
         },
         [this] {
-            HaveSqliteRollBack(db);
+            MakeSqliteRollBack(db);
             EXPECT_TRUE(db.Exec("SAVEPOINT mine"));
         },
         [this] {
-            HaveSqliteRollBack(db);
+            MakeSqliteRollBack(db);
             SqliteValueList none;
             EXPECT_TRUE(db.SelectByCommand("BEGIN", none));
         },
@@ -501,7 +504,7 @@ TEST_F(SqliteTransactionTest, ATransactionThatTheCallerBeganAfterTheOwnersIsTheC
     }
 }
 
-TEST_F(SqliteTransactionTest, WhatHappensInsideATransactionLeavesItToItsOwner)
+TEST_F(SqliteTransactionTest, SavepointsAndFailedBeginsLeaveTheTransactionToItsOwner)
 {
     SqliteTransaction transaction(db);
     ASSERT_TRUE(transaction.Begin() && db.InsertRecord(Insert(1)));
@@ -518,7 +521,7 @@ TEST_F(SqliteTransactionTest, WhatHappensInsideATransactionLeavesItToItsOwner)
     EXPECT_EQ(Ids(), "1");
 }
 
-TEST_F(SqliteTransactionTest, AMoveOfTheConnectionPartsATransactionFromItsObject)
+TEST_F(SqliteTransactionTest, MovingTheConnectionSeparatesTheTransactionFromItsObject)
 {
     SqliteDB target(path, 2);
     SqliteTransaction ofTarget(target);
@@ -529,16 +532,16 @@ TEST_F(SqliteTransactionTest, AMoveOfTheConnectionPartsATransactionFromItsObject
         ASSERT_TRUE(moved.Begin() && retrying.InsertRecord(Insert(1)));
         SqliteDB between(std::move(retrying));
         target = std::move(between);
-        // That it can be used is what this is about.
+        // A moved-from object can be used.
         EXPECT_TRUE(retrying.Open());  // NOLINT(bugprone-use-after-move)
-        EXPECT_EQ(CountTries(retrying), 4U);
+        EXPECT_EQ(CountAttempts(retrying), 4U);
         EXPECT_TRUE(retrying.Exec("BEGIN"));
         EXPECT_FALSE(moved.Commit());
         EXPECT_FALSE(ofTarget.Commit());
         ExpectLines({wasRolledBack, wasRolledBack});
     }
     EXPECT_TRUE(retrying.Exec("COMMIT"));
-    EXPECT_EQ(CountTries(target), 4U);  // the limit has moved along
+    EXPECT_EQ(CountAttempts(target), 4U);  // the limit was moved, too
     EXPECT_TRUE(target.InsertRecord(Insert(2)) && target.Exec("COMMIT"));
     EXPECT_EQ(Ids(), "1;2");
 }

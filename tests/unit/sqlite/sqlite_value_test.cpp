@@ -18,7 +18,7 @@ using ::testing::ElementsAre;
 
 constexpr const char* NullText = nullptr;
 
-// A value is read as one of four types, and as no other by way of a conversion.
+// A value can be read as one of four types and is not converted to others.
 template <class T, class = void>
 constexpr bool CanBeReadAs = false;
 template <class T>
@@ -29,7 +29,7 @@ static_assert(CanBeReadAs<std::string> && CanBeReadAs<unsigned int> && CanBeRead
               CanBeReadAs<bool>);
 static_assert(!CanBeReadAs<double> && !CanBeReadAs<long> && !CanBeReadAs<char>);
 
-// The value read as T; nothing when it was refused, which must leave the output alone.
+// The value read as T; nothing when the read fails, which must leave the output unchanged.
 template <class T>
 std::optional<T> Read(const SqliteValue& value, T before)
 {
@@ -54,7 +54,7 @@ std::optional<unsigned int> ReadUnsigned(const SqliteValue& value)
     return Read(value, 77U);
 }
 
-// Read twice, so that an output that was written would show whatever was written.
+// Reads twice, with different outputs, so that a wrong write shows whatever it wrote.
 std::optional<bool> ReadBool(const SqliteValue& value)
 {
     const std::optional<bool> first = Read(value, false);
@@ -62,7 +62,7 @@ std::optional<bool> ReadBool(const SqliteValue& value)
     return first;
 }
 
-// Built from a number, then emptied by an assignment.
+// Built from a number, then assigned an empty value.
 SqliteValue Emptied()
 {
     SqliteValue value(1);
@@ -83,7 +83,7 @@ class SqliteValueTest : public LoggedTest {
     SqliteValueTest() : LoggedTest("sqlite_value.cpp") {}
 };
 
-TEST_F(SqliteValueTest, ADefaultBuiltValueIsNoValue)
+TEST_F(SqliteValueTest, ADefaultConstructedValueIsNotValid)
 {
     const SqliteValue value;
     EXPECT_FALSE(value.IsValid());
@@ -109,7 +109,7 @@ TEST_F(SqliteValueTest, AValueIsWrittenAsALiteral)
         {false, "0"},
         {std::string("abc"), "'abc'"},
         {std::string(), "''"},
-        {std::string("O'Brien"), "'O'Brien'"},  // quoted, not escaped, on purpose
+        {std::string("O'Brien"), "'O'Brien'"},  // the contract: not escaped
         {std::string("it's"), "'it's'"},
         {std::string("'"), "'''"},
         {std::string("a\0b", 3), std::string("'a\0b'", 5)},
@@ -138,7 +138,7 @@ TEST_F(SqliteValueTest, ACharacterArrayIsAText)
     EXPECT_EQ(SqliteValue(pointer).ToFormatedValue(), "'abc'");
 }
 
-TEST_F(SqliteValueTest, ANullTextIsNoValue)
+TEST_F(SqliteValueTest, ANullTextIsNotValid)
 {
     const SqliteValue value(NullText);
     EXPECT_FALSE(value.IsValid());
@@ -199,13 +199,13 @@ TEST_F(SqliteValueTest, ABooleanIsReadFromABooleanAndFromZeroAndOne)
     EXPECT_EQ(ReadBool(0U), false);
 }
 
-// A value that is refused, and its text as JSON, which stands in the line.
+// A value that cannot be read, and its JSON in the log line.
 struct Refused {
     SqliteValue value;
     std::string json;
 };
 
-TEST_F(SqliteValueTest, ATextIsReadFromNothingElse)
+TEST_F(SqliteValueTest, OnlyATextIsReadAsAText)
 {
     const std::vector<Refused> rows{
         {1, "1"}, {-1, "-1"}, {UINT_MAX, "4294967295"}, {true, "true"}, {{}, "null"},
@@ -217,7 +217,7 @@ TEST_F(SqliteValueTest, ATextIsReadFromNothingElse)
     }
 }
 
-TEST_F(SqliteValueTest, AnIntegerIsReadFromNothingElse)
+TEST_F(SqliteValueTest, OnlyAnIntegerIsReadAsAnInteger)
 {
     const std::vector<Refused> rows{
         {"12", "\"12\""}, {"", "\"\""},       {true, "true"},      {false, "false"},
@@ -231,7 +231,7 @@ TEST_F(SqliteValueTest, AnIntegerIsReadFromNothingElse)
     }
 }
 
-TEST_F(SqliteValueTest, AnIntegerThatDoesNotFitIsOfAnotherKind)
+TEST_F(SqliteValueTest, AnIntegerThatDoesNotFitIsRefused)
 {
     EXPECT_EQ(ReadInt(4000000000U), std::nullopt);
     ExpectLines({Warn("GetValue<int>", "[4000000000] is not int")});
@@ -243,7 +243,7 @@ TEST_F(SqliteValueTest, AnIntegerThatDoesNotFitIsOfAnotherKind)
     ExpectLines({Warn("GetValue<unsigned int>", "[-2147483648] is not int")});
 }
 
-TEST_F(SqliteValueTest, ABooleanIsReadFromNothingElse)
+TEST_F(SqliteValueTest, NothingElseIsReadAsABoolean)
 {
     const std::vector<Refused> rows{
         {2, "2"},
@@ -263,7 +263,7 @@ TEST_F(SqliteValueTest, ABooleanIsReadFromNothingElse)
     }
 }
 
-TEST_F(SqliteValueTest, ARefusedTextStandsInTheLineAsJson)
+TEST_F(SqliteValueTest, ARefusedTextIsLoggedAsJson)
 {
     const std::vector<Refused> rows{
         {"a\"b\\c", R"("a\"b\\c")"},
@@ -288,7 +288,7 @@ TEST_F(SqliteValueTest, ACopyIsAsValidAsItsOriginal)
     }
 }
 
-TEST_F(SqliteValueTest, AMovedValueArrivesWhole)
+TEST_F(SqliteValueTest, AMoveKeepsValueAndValidity)
 {
     SqliteValue from("abc");
     const SqliteValue to(std::move(from));
@@ -300,7 +300,7 @@ TEST_F(SqliteValueTest, AMovedValueArrivesWhole)
     EXPECT_FALSE(stillEmpty.IsValid());
 }
 
-// Assignment moves the payload and not the validity, on purpose: here and in the next cases.
+// By contract an assignment copies the payload but not the validity, here and in the next tests.
 TEST_F(SqliteValueTest, AnEmptyValueThatIsAssignedANumberStaysInvalid)
 {
     SqliteValue value;
@@ -318,7 +318,7 @@ TEST_F(SqliteValueTest, AnEmptyValueThatIsAssignedANumberStaysInvalid)
     EXPECT_FALSE(ofNullText.IsValid());
 }
 
-TEST_F(SqliteValueTest, ReadingAndWritingDoNotAskForValidity)
+TEST_F(SqliteValueTest, ReadingAndWritingIgnoreValidity)
 {
     const SqliteValue value = AssignedOnly(1);
     EXPECT_FALSE(value.IsValid());
@@ -344,7 +344,7 @@ TEST_F(SqliteValueTest, AValueThatIsAssignedAnEmptyOneIsInvalidUntilItIsAssigned
     EXPECT_EQ(value.ToFormatedValue(), "3");
 }
 
-TEST_F(SqliteValueTest, AssignedToItselfAValueStaysAsItIs)
+TEST_F(SqliteValueTest, SelfAssignmentChangesNothing)
 {
     SqliteValue text("abc");
     const SqliteValue& sameText = text;
@@ -370,7 +370,7 @@ class SqliteValueListTest : public LoggedTest {
         return list;
     }
 
-    // The list's text, after a look at every value: none may have lost its validity.
+    // The list's text. Every value must still be valid.
     static std::string Text(const SqliteValueList& list)
     {
         for (const auto& [field, value] : list.GetValues()) EXPECT_TRUE(value.IsValid()) << field;
@@ -392,7 +392,7 @@ TEST_F(SqliteValueListTest, TheTextShowsNamesAndLiterals)
               "a:1, b:4294967295, c:'', d:'it's'");
 }
 
-TEST_F(SqliteValueListTest, FieldsStandInTheByteOrderOfTheirNames)
+TEST_F(SqliteValueListTest, FieldsAreSortedByTheBytesOfTheirNames)
 {
     EXPECT_EQ(Text(List({{"b", 1}, {"a", 2}})), "a:2, b:1");
     EXPECT_EQ(Text(List({{"name", 1}, {"Name", 2}})), "Name:2, name:1");
@@ -401,7 +401,7 @@ TEST_F(SqliteValueListTest, FieldsStandInTheByteOrderOfTheirNames)
         "10:6, 9:7, Z:5, _:4, a:3, ab:2, \xc3\xa4:1");
 }
 
-TEST_F(SqliteValueListTest, AFieldThatIsAddedTwiceKeepsTheSecondValue)
+TEST_F(SqliteValueListTest, AddingAFieldTwiceKeepsTheSecondValue)
 {
     SqliteValueList list = List({{"a", 1}, {"a", "text"}});
     EXPECT_EQ(Text(list), "a:'text'");
@@ -435,11 +435,11 @@ TEST_F(SqliteValueListTest, AnEmptyNameOrABadValueIsRefused)
     EXPECT_EQ(Text(list), "a:5");
 }
 
-TEST_F(SqliteValueListTest, AValueThatIsGivenAwayIsTakenUnlessItIsRefused)
+TEST_F(SqliteValueListTest, AMovedValueIsTakenUnlessItIsRefused)
 {
     SqliteValueList record;
     SqliteValue text("a text that is not short");
-    // What is left of the value is what this is about. NOLINTBEGIN(bugprone-use-after-move)
+    // The moved-from value is what is tested. NOLINTBEGIN(bugprone-use-after-move)
     EXPECT_FALSE(record.AddValue("", std::move(text)));
     EXPECT_TRUE(text.IsValid());
     EXPECT_TRUE(record.AddValue("name", std::move(text)));
@@ -458,7 +458,7 @@ TEST_F(SqliteValueListTest, AListsOwnValueCanBeAdded)
     EXPECT_EQ(Text(list), "a:'x', b:'x'");
 }
 
-TEST_F(SqliteValueListTest, AFieldIsThereOrNot)
+TEST_F(SqliteValueListTest, HasFieldTellsWhetherAFieldExists)
 {
     const SqliteValueList list = List({{"a", 1}});
     EXPECT_TRUE(list.HasField("a"));
@@ -469,7 +469,7 @@ TEST_F(SqliteValueListTest, AFieldIsThereOrNot)
     ExpectLines({Err("HasField", "Invalid field []")});
 }
 
-TEST_F(SqliteValueListTest, AFieldsValueIsGivenByReference)
+TEST_F(SqliteValueListTest, GetValueReturnsAReference)
 {
     SqliteValueList list = List({{"a", 1}});
     const SqliteValue& value = list.GetValue("a");
@@ -517,7 +517,7 @@ TEST_F(SqliteValueListTest, AFieldIsReadAsItsType)
     EXPECT_TRUE(truth);
 }
 
-// What stands for the types in the cases' names.
+// How the types appear in the test names.
 struct TypeNames {
     template <class T>
     static std::string GetName(int /*index*/)
@@ -529,7 +529,7 @@ struct TypeNames {
     }
 };
 
-// The fixture of cases that are the same for every type that a field is read as.
+// The tests that are the same for every type.
 template <class T>
 class SqliteFieldReadTest : public SqliteValueListTest {
 };
@@ -537,7 +537,7 @@ class SqliteFieldReadTest : public SqliteValueListTest {
 using FieldTypes = ::testing::Types<std::string, bool, int, unsigned int>;
 TYPED_TEST_SUITE(SqliteFieldReadTest, FieldTypes, TypeNames);
 
-// DEBUG, where the reference is refused with WARN, on purpose.
+// DEBUG here, WARN in the form that returns a reference: the contract.
 TYPED_TEST(SqliteFieldReadTest, AMissingFieldIsRefused)
 {
     const SqliteValueList list = this->List({{"a", 1}});
@@ -582,7 +582,7 @@ TEST_F(SqliteValueListTest, AddingAListOverwritesSharedFieldsAndAddsTheRest)
     EXPECT_EQ(Text(list), "a:1, b:'new', c:3");
 }
 
-TEST_F(SqliteValueListTest, AddedToItselfAListStaysAsItIs)
+TEST_F(SqliteValueListTest, AddingAListToItselfChangesNothing)
 {
     SqliteValueList list = List({{"a", 1}, {"b", "x"}});
     list += list;
@@ -601,7 +601,7 @@ TEST_F(SqliteValueListTest, AssignmentReplacesAllFields)
     EXPECT_EQ(Text(list), "");
 }
 
-TEST_F(SqliteValueListTest, AssignedToItselfAListStaysAsItIs)
+TEST_F(SqliteValueListTest, SelfAssignmentChangesNothing)
 {
     SqliteValueList list = List({{"a", 1}, {"b", "x"}});
     SqliteValueList& same = list;
@@ -611,7 +611,7 @@ TEST_F(SqliteValueListTest, AssignedToItselfAListStaysAsItIs)
     EXPECT_EQ(Text(list), "a:1, b:'x'");
 }
 
-TEST_F(SqliteValueListTest, ReferencesIntoAListStayGoodWhenItIsAssignedOrAddedToItself)
+TEST_F(SqliteValueListTest, ReferencesStayValidWhenAListIsAssignedOrAddedToItself)
 {
     SqliteValueList list = List({{"a", 1}, {"b", "a text that is too long to be kept in place"}});
     const SqliteValue& text = list.GetValue("b");
@@ -624,7 +624,7 @@ TEST_F(SqliteValueListTest, ReferencesIntoAListStayGoodWhenItIsAssignedOrAddedTo
     EXPECT_EQ(field, "a");
 }
 
-TEST_F(SqliteValueListTest, AFieldCanBeGivenAnotherFieldsValueOrItsOwn)
+TEST_F(SqliteValueListTest, AFieldCanGetTheValueOfAnotherFieldOrItsOwn)
 {
     SqliteValueList list = List({{"a", 1}, {"b", "a text that is too long to be kept in place"}});
     EXPECT_TRUE(list.AddValue("c", list.GetValue("b")));
@@ -645,7 +645,7 @@ TEST_F(SqliteValueListTest, ATextCanBeReadIntoTheVariableThatNamesItsField)
     EXPECT_EQ(text, "backup");
 }
 
-TEST_F(SqliteValueListTest, ACopyGoesItsOwnWay)
+TEST_F(SqliteValueListTest, ACopyIsIndependent)
 {
     const SqliteValueList original = List({{"a", 1}});
     SqliteValueList copy(original);
@@ -655,7 +655,7 @@ TEST_F(SqliteValueListTest, ACopyGoesItsOwnWay)
     EXPECT_EQ(Text(original), "a:1");
 }
 
-TEST_F(SqliteValueListTest, AMovedListArrivesWhole)
+TEST_F(SqliteValueListTest, AMoveTakesAllFields)
 {
     SqliteValueList from = List({{"a", 1}, {"b", "x"}});
     SqliteValueList built(std::move(from));
@@ -670,7 +670,7 @@ TEST_F(SqliteValueListTest, AMovedListArrivesWhole)
     ExpectLines({Warn("GetValue", "Failed to find field [c]")});
 }
 
-// Writes down how it is called.
+// Records how it is called.
 class Node : public SqliteRecord {
   public:
     SqliteValueList BuildRecord(const std::vector<std::string>& fields) const override
@@ -711,7 +711,7 @@ TEST_F(SqliteRecordTest, ARecordIsBuiltFromAllItsFields)
     EXPECT_THAT(node.calls, ElementsAre("GetRecordFields", "BuildRecord", "name", "id"));
 }
 
-TEST_F(SqliteRecordTest, LoadingIsRefusedUnlessATypeKnowsHow)
+TEST_F(SqliteRecordTest, LoadRecordReturnsFalseUnlessOverridden)
 {
     const SqliteValueList record = List({{"id", 1}});
     Node node;

@@ -29,7 +29,7 @@ class StatementWatchTest : public ::testing::Test {
     Database db = OpenInMemory(watch);
 };
 
-TEST_F(StatementWatchTest, CountsTransactionsThatAreBegunOutsideOfAnyOther)
+TEST_F(StatementWatchTest, CountsOutermostTransactions)
 {
     EXPECT_EQ(watch.CountTransactions(), 0U);
     struct Row {
@@ -68,7 +68,7 @@ TEST_F(StatementWatchTest, SeesTheBusyTimeoutSetInEverySpelling)
     }
 }
 
-TEST_F(StatementWatchTest, GoesOnCountingOnTheNextConnection)
+TEST_F(StatementWatchTest, KeepsCountingOnTheNextConnection)
 {
     Run("BEGIN");
     db = OpenInMemory(watch);
