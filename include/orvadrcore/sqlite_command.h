@@ -96,7 +96,7 @@ class ORVADRCORE_API InsertCommand : public SqliteCommand {
         const std::string& field, const T& value) = delete;
 
     bool AddFieldValue(const std::string& field, const char* text);  ///< Refuses null, too.
-    bool AddFieldValue(const std::string& field, char* text)         ///< The same.
+    bool AddFieldValue(const std::string& field, char* text)
     {
         return AddFieldValue(field, static_cast<const char*>(text));
     }
@@ -129,7 +129,7 @@ class ORVADRCORE_API UpdateCommand : public SqliteCommand {
         const std::string& field, const T& value) = delete;
 
     bool AddFieldValue(const std::string& field, const char* text);  ///< Refuses null, too.
-    bool AddFieldValue(const std::string& field, char* text)         ///< The same.
+    bool AddFieldValue(const std::string& field, char* text)
     {
         return AddFieldValue(field, static_cast<const char*>(text));
     }

@@ -52,7 +52,6 @@ class ORVADRCORE_API SqliteDB {
     // These open the file and create the table if it is missing and has a schema. The connection
     // stays open. A command that is not valid gives the code 401.
 
-    /// Inserts a record.
     /// \note Unlike elsewhere, a command that is not valid gives the code 404.
     bool InsertRecord(const InsertCommand& command);
 
@@ -74,7 +73,7 @@ class ORVADRCORE_API SqliteDB {
     /// Deletes the rows that meet the condition, which must not be empty. Note the argument order.
     bool DeleteRecord(const std::string& condition, const SqliteTableHandler& table);
 
-    bool DeleteAllRecords(const SqliteTableHandler& table);  ///< Deletes all rows.
+    bool DeleteAllRecords(const SqliteTableHandler& table);
 
     /// Deletes the rows that meet the condition, or all rows if it is empty.
     bool DoDelete(const SqliteTableHandler& table, const std::string& condition);

@@ -50,7 +50,8 @@ bool NamesBusyTimeout(std::string_view statement)
     return false;
 }
 
-// Processes that start together must not retry at the same moments.
+// Processes that start together must not retry at the same moments. Taken when a connection is
+// opened, because its object may have been built before a fork.
 std::minstd_rand::result_type Seed()
 {
     const auto now = std::chrono::steady_clock::now().time_since_epoch().count();

@@ -32,7 +32,7 @@ inline constexpr int BusyTimeoutMSec = 1000;
 // connection is open.
 class BusyWait {
   public:
-    BusyWait() = default;
+    BusyWait() = default;  // NOLINT(cert-msc32-c,cert-msc51-cpp): Install() seeds the generator
     BusyWait(const BusyWait&) = delete;
     BusyWait& operator=(const BusyWait&) = delete;
     ~BusyWait() = default;
