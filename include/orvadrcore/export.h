@@ -1,12 +1,12 @@
 /// \file
-/// The marks on what the shared library shows, and on what it hides of that.
+/// What the shared library exports. Everything without a mark is hidden.
 #ifndef ORVADRCORE_EXPORT_H
 #define ORVADRCORE_EXPORT_H
 
-/// Stands before the name of a class, or before a function, that callers may use.
+/// Marks a class or function that callers may use.
 #define ORVADRCORE_API __attribute__((visibility("default")))
 
-/// Stands before a private function of such a class, for the library alone.
+/// Marks a private function of such a class, which only the library calls.
 #define ORVADRCORE_LOCAL __attribute__((visibility("hidden")))
 
 #endif

@@ -1,5 +1,5 @@
 /// \file
-/// One call of a web API: which API, method and version, and the parameters.
+/// One call of a web API: API, method, version and parameters.
 ///
 /// \code
 ///     Request request("DR.Node", 1, "get", Json::Value());
@@ -8,10 +8,9 @@
 ///     request.toJson();   // {"api":"DR.Node","method":"get","name":"backup","version":1}
 /// \endcode
 ///
-/// A request only holds and checks its parts; it sends nothing. In JSON the three reserved keys
-/// "api", "method" and "version" stand beside the parameters. Requests are plain values, each used
-/// by one thread at a time. Nothing is logged and nothing throws, whatever the JSON looks like,
-/// unless memory runs out.
+/// A request holds and checks its parts; it sends nothing. Its JSON form is one flat object: the
+/// reserved keys "api", "method" and "version", and next to them the parameters. Use a request from
+/// one thread at a time. Nothing is logged. No JSON makes it throw; only running out of memory does.
 #ifndef ORVADRCORE_REQUEST_H
 #define ORVADRCORE_REQUEST_H
 
@@ -23,150 +22,98 @@
 
 namespace OrvaDRCore {
 
-/// A file to send along with a request; only stored here.
+/// A file to upload with a request.
 struct ORVADRCORE_API UploadFileDescription {
-    std::string name;  ///< The name that the other side sees.
-    std::string path;  ///< Where the file lies on this side.
+    std::string name;  ///< What the server calls it.
+    std::string path;  ///< Where it is on this machine. The library never opens it.
 };
 
 /// One call of a web API.
 class ORVADRCORE_API Request {
   public:
-    /// Not valid yet: no API, no method, version -1, time-out 300, no parameters.
+    /// Not valid yet: empty names, version -1, timeout 300, null parameters, no encryption.
     Request() = default;
 
-    /// A request with API, version, method and parameters; the other parts have their defaults.
-    /// \param apiName     the API
-    /// \param apiVersion  its version, valid above 0; note the place between the two names
-    /// \param methodName  the method
-    /// \param parameters  the parameters, copied as they are: reserved keys are not taken out
-    Request(const std::string& apiName, int apiVersion, const std::string& methodName,
-            const Json::Value& parameters);
+    /// Note that the version comes between the two names. `params` is copied unchanged, even if it
+    /// contains reserved keys.
+    Request(const std::string& api, int version, const std::string& method,
+            const Json::Value& params);
 
     /// A default request, then setRequest().
-    /// \param request  as in setRequest()
     Request(const Json::Value& request);
 
-    Request(const Request&) = default;             ///< A copy of all parts.
-    Request& operator=(const Request&) = default;  ///< \return this request, now such a copy
+    Request(const Request&) = default;             ///< Copies every part.
+    Request& operator=(const Request&) = default;  ///< Copies every part.
     virtual ~Request();
 
-    /// Takes a request in its JSON form: "api" and "method" where they are texts and "version"
-    /// where it is an integer become the fields of those names; everything else becomes the
-    /// parameters, a reserved key of the wrong type included. A field whose key is missing keeps
-    /// its value; time-out, upload file and encryption are never taken from JSON.
-    /// \param request  the JSON form; a value that is no object is kept as parameters as it is
+    /// Reads the JSON form. "api" and "method" must be strings, "version" an integer; everything
+    /// else becomes the parameters, including a reserved key of the wrong type. A part whose key is
+    /// missing keeps its value. Timeout, upload file and encryption are never read from JSON. A
+    /// value that is not an object is kept as the parameters.
     void setRequest(const Json::Value& request);
 
-    /// Back to the defaults.
-    /// \note isEncryptRequired() keeps its answer, on purpose. Parameters keep their JSON type:
-    ///       an object becomes an empty one.
+    /// Restores the defaults, except that isEncryptRequired() does not change and that an object or
+    /// array of parameters becomes an empty one, not null.
     void clear();
 
-    // --------------------------------------------------------------------------- setting the parts
+    // ------------------------------------------------------------------------------------- setters
+    // Any value is stored; isValid() judges it.
 
-    /// Stores the version.
-    /// \param apiVersion  any number; the request is valid with one above 0
-    void setVersion(int apiVersion);
-
-    /// Stores the method.
-    /// \param methodName  any text; the request is valid with one that is not empty
-    void setMethod(const std::string& methodName);
-
-    /// Stores the API.
-    /// \param apiName  any text; the request is valid with one that is not empty
-    void setAPI(const std::string& apiName);
-
-    /// Stores the transport's time-out.
-    /// \param limit  any number, in the transport's unit
-    void setTimeout(int limit);
-
-    /// Stores the file to send along.
-    /// \param file  names the file, which is neither opened nor looked up
+    void setVersion(int version);
+    void setMethod(const std::string& method);
+    void setAPI(const std::string& api);
+    void setTimeout(int timeout);  ///< In whatever unit the transport uses.
     void setUploadFile(const UploadFileDescription& file);
+    bool setEncryptRequired(bool required);  ///< \return true, always
 
-    /// Stores whether the transport has to encrypt.
-    /// \param required  true when it has to
-    /// \return true
-    bool setEncryptRequired(bool required);
+    // ------------------------------------------------------------------------------------- getters
 
-    // ---------------------------------------------------------------------------- asking for parts
-
-    /// The API.
-    /// \return its name; empty by default
-    const std::string& getAPI() const { return api; }
-
-    /// The method.
-    /// \return its name; empty by default
-    const std::string& getMethod() const { return method; }
-
-    /// The version.
-    /// \return the number; -1 by default
-    int getVersion() const { return version; }
-
-    /// The parameters.
-    /// \return what was set, an object in a useful request; null by default
-    const Json::Value& getParams() const { return params; }
-
-    /// The time-out, for the transport.
-    /// \return the number, in the transport's unit; 300 by default
-    int getTimeout() const { return timeout; }
-
-    /// The file to send along.
-    /// \return its names; both empty by default
-    const UploadFileDescription& getUploadFile() const { return uploadFile; }
-
-    /// Whether the transport has to encrypt.
-    /// \return what was set; false by default
-    bool isEncryptRequired() const { return encryptRequired; }
+    const std::string& getAPI() const { return api_; }
+    const std::string& getMethod() const { return method_; }
+    int getVersion() const { return version_; }
+    const Json::Value& getParams() const { return params_; }
+    int getTimeout() const { return timeout_; }
+    const UploadFileDescription& getUploadFile() const { return uploadFile_; }
+    bool isEncryptRequired() const { return encryptRequired_; }
 
     // ---------------------------------------------------------------------------------- parameters
 
-    /// Whether a key is free for parameters.
-    /// \param key  the key
-    /// \return false for "api", "method" and "version", true for all others
+    /// False for the reserved keys "api", "method" and "version".
     static bool isValidKey(const std::string& key);
 
-    /// Sets one parameter.
-    /// \param key    its key; of two with the same key the later counts
-    /// \param value  its value, copied
-    /// \return false, nothing changed, for a reserved key, for one of 1 GiB or more, which JSON
-    ///         values cannot hold, and when the parameters are neither null nor an object
+    /// Sets one parameter, or replaces it.
+    /// \return false, nothing changed, if the key is reserved or 1 GiB or longer (a JSON object
+    ///         cannot hold such a key), or if the parameters are neither null nor an object
     bool addParam(const std::string& key, const Json::Value& value);
 
-    /// Sets a parameter for each member of `object`; reserved keys are passed over.
-    /// \param object  an object; of an array the elements are taken under their index, any other
-    ///                value has no members
-    /// \return false, nothing changed, when the parameters are neither null nor an object; passing
-    ///         over a reserved key is no failure
+    /// Sets each member of `object`, skipping reserved keys: that is not a failure. An array's
+    /// elements get their index as key. Other values have no members.
+    /// \return false, nothing changed, if the parameters are neither null nor an object
     bool addParam(const Json::Value& object);
 
-    // ----------------------------------------------------------------------------------- the whole
+    // ------------------------------------------------------------------------------- whole request
 
-    /// Whether API and method are given and the version is above 0.
-    /// \return true when all three are so
+    /// Whether API and method are not empty and the version is above 0.
     bool isValid() const;
 
-    /// The JSON form: the parameters and the three reserved keys, in one object.
-    /// \return the object, of a request that is not valid, too. Parameters that are neither null
-    ///         nor an object are left out; one with a reserved key gives way. An API or a method
-    ///         of 2 GiB or more, which no JSON value can hold, is null
+    /// The JSON form, of an invalid request, too. The three parts replace parameters with reserved
+    /// keys. Parameters that are neither null nor an object are left out. An API or method of 2 GiB
+    /// or more becomes null, because a JSON value cannot hold it.
     Json::Value toJson() const;
 
-    /// The request for a reader of the log, without parameters.
-    /// \return "API/method/version"
+    /// "API/method/version", without parameters: safe to log.
     std::string toStr() const;
 
   private:
     ORVADRCORE_LOCAL bool takesParams() const;
 
-    int version = -1;
-    int timeout = 300;
-    std::string api;
-    std::string method;
-    Json::Value params;
-    bool encryptRequired = false;
-    UploadFileDescription uploadFile;
+    int version_ = -1;
+    int timeout_ = 300;
+    std::string api_;
+    std::string method_;
+    Json::Value params_;
+    bool encryptRequired_ = false;
+    UploadFileDescription uploadFile_;
 };
 
 }  // namespace OrvaDRCore

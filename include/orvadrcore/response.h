@@ -1,5 +1,5 @@
 /// \file
-/// The reply of one web-API call, and the questions that callers ask of it.
+/// The reply to one web-API call.
 ///
 /// \code
 ///     const Response response(text);
@@ -7,16 +7,16 @@
 ///     const std::string id = response.getDataFieldtoStr("id");
 /// \endcode
 ///
-/// A reply looks like this, and no other keys are read:
+/// Only these keys have a meaning:
 /// \code
 ///     {"success": true,  "data": {"task_id": "t1", "finish": true, "success": true, ...}}
 ///     {"success": false, "error": {"code": 507, "errors": ...}}
 /// \endcode
 ///
-/// Replies come from remote nodes and may be broken in every way: whatever the text or JSON looks
-/// like, each question gets an answer, nothing throws unless memory runs out, and nothing is
-/// logged. A response is a plain value, used by one thread at a time. References that it gives out
-/// are good until it changes.
+/// Replies come from other machines, so any text or JSON is accepted and every question has an
+/// answer. A member of the wrong type counts as missing. Nothing is logged, and nothing throws
+/// unless memory runs out. Use a response from one thread at a time; references to its parts are
+/// good until it changes.
 #ifndef ORVADRCORE_RESPONSE_H
 #define ORVADRCORE_RESPONSE_H
 
@@ -28,147 +28,99 @@
 
 namespace OrvaDRCore {
 
-/// The reply of one web-API call.
+/// The reply to one web-API call.
 ///
-/// A key is a C string; null counts as a key that is absent. A value of the wrong kind counts as
-/// absent, too. No data of a failed reply is ever given out; errors are, also of a successful one.
+/// A null `key` is a key that is missing. A failed reply never gives out its data, but a successful
+/// one does give out its error.
 class ORVADRCORE_API Response {
   public:
     /// A null reply: not valid.
     Response() = default;
 
-    /// A copy of the reply.
-    /// \param other  where it comes from
-    Response(const Response& other);
-    Response& operator=(const Response&) = default;  ///< \return this response, now a copy, too
+    Response(const Response& other);                 ///< Copies the reply.
+    Response& operator=(const Response&) = default;  ///< Copies the reply.
 
-    /// As setResp(const std::string&), the answer dropped: ask isValid().
-    /// \param text  the reply as JSON text
+    /// As setResp(). Text that does not parse gives a null reply: ask isValid().
     Response(const std::string& text);
-
-    /// As above.
-    /// \param text  the reply as JSON text; null is a text that does not parse
-    Response(const char* text);
-
-    /// Takes a reply that is parsed already.
-    /// \param reply  the reply, copied; any value
-    Response(const Json::Value& reply);
+    Response(const char* text);          ///< Null is text that does not parse.
+    Response(const Json::Value& reply);  ///< Any value.
     virtual ~Response();
 
-    /// Parses a reply. The whole text must be one JSON document.
-    /// \param text  the reply as JSON text
-    /// \return false when it is no JSON document; the reply is null then, whatever it was before
+    /// Parses a reply: the whole text must be one JSON document.
+    /// \return false if it is not. The reply is null then, and the old one is lost
     bool setResp(const std::string& text);
+    bool setResp(const char* text);          ///< Null is text that does not parse.
+    void setResp(const Json::Value& reply);  ///< Any value.
 
-    /// As above.
-    /// \param text  the reply as JSON text; null is a text that does not parse
-    /// \return as above
-    bool setResp(const char* text);
-
-    /// Takes a reply that is parsed already.
-    /// \param reply  the reply, copied; any value
-    void setResp(const Json::Value& reply);
-
-    /// Drops the reply's content: an object or array becomes empty, anything else null.
+    /// Empties the reply: an object or array keeps its type, anything else becomes null.
     void clear();
 
-    // ----------------------------------------------------------------------------- the whole reply
+    // --------------------------------------------------------------------------------- whole reply
 
-    /// The whole reply.
-    /// \return the reply as it is; null when there is none
-    const Json::Value& getResp() const { return resp; }
+    const Json::Value& getResp() const { return resp_; }
 
-    /// Whether this is a reply at all.
-    /// \return true for an object with a member "success"
+    /// Whether the reply is an object with a member "success".
     bool isValid() const;
 
-    /// Whether the call succeeded.
-    /// \return true for a valid reply whose "success" is true, as a boolean: a number that is not 0
-    ///         is true, a text never
+    /// Whether "success" is true. A number other than 0 is true; a string never is.
     bool isSuccess() const;
 
     // -------------------------------------------------------------------------------------- errors
 
-    /// The "code" of "error", of a valid reply.
-    /// \return the code; -1 when it is absent or no integer of 32 bits
+    /// The "code" of "error"; -1 if there is none, if it is not a 32-bit integer, or if the reply is
+    /// not valid.
     int getErrCode() const;
 
-    /// The "errors" of "error", of a valid reply.
-    /// \return a copy; null when it is absent
+    /// A copy of the "errors" of "error"; null if there are none or the reply is not valid.
     Json::Value getErrMsg() const;
 
-    /// The "error" of any reply.
-    /// \return a copy; null when it is absent
+    /// A copy of "error", even of a reply that is not valid; null if there is none.
     Json::Value getErr() const;
 
     // ---------------------------------------------------------------------------------------- data
 
     /// Whether the reply is a success and has "data".
-    /// \return true when it is and has
     bool hasData() const;
 
-    /// The "data" of a successful reply.
-    /// \return the value; null when there is none
+    /// "data"; null unless hasData().
     const Json::Value& getData() const;
 
-    /// Whether "data" has a member.
-    /// \param key  the member's name
-    /// \return true when it is there
+    /// Whether hasData(), and "data" has a member `key`.
     bool hasDataField(const char* key) const;
 
-    /// A member of "data".
-    /// \param key  the member's name
-    /// \return the member; null when it is absent
+    /// The member of "data"; null unless hasDataField().
     const Json::Value& getDataField(const char* key) const;
 
-    /// A member of "data" that is a text.
-    /// \param key  the member's name
-    /// \return the text; empty for any other member: numbers are not converted
+    /// The member of "data" if it is a string, otherwise an empty one: numbers are not converted.
     std::string getDataFieldtoStr(const char* key) const;
 
     // ----------------------------------------------------------------------- a task that is polled
 
-    /// Whether the task has ended.
-    /// \return the "finish" of "data" as a boolean, as in isSuccess()
-    bool isPollFinish() const;
+    bool isPollFinish() const;   ///< Whether "finish" of "data" is true, as in isSuccess().
+    bool isPollSuccess() const;  ///< Whether "success" of "data" is true, as in isSuccess().
 
-    /// Whether the task succeeded.
-    /// \return the "success" of "data" as a boolean, as in isSuccess()
-    bool isPollSuccess() const;
-
-    /// The "task_id" of "data", as text.
-    /// \return the id: numbers and booleans are converted; empty when it is absent, an array or an
-    ///         object
+    /// "task_id" of "data". Numbers and booleans are converted; empty if it is missing, an array or
+    /// an object.
     std::string getTaskId() const;
 
-    // ---------------------------------------------------------------------------- any other member
+    // ------------------------------------------------------------------------------- other members
 
-    /// Whether the reply has a member, be it a success or not.
-    /// \param key  the member's name
-    /// \return true when it is there
+    /// Whether the reply, successful or not, has a member `key`.
     bool hasField(const char* key) const;
 
-    /// A member of the reply, be it a success or not.
-    /// \param key  the member's name
-    /// \return the member; null when it is absent
+    /// The member; null unless hasField().
     const Json::Value& getField(const char* key) const;
 
-    /// Whether "data" has "additional".
-    /// \return true when it is there
-    bool hasAdditional() const;
-
-    /// The "additional" of "data".
-    /// \return the value; null when it is absent
-    const Json::Value& getAdditional() const;
+    bool hasAdditional() const;                ///< hasDataField("additional")
+    const Json::Value& getAdditional() const;  ///< getDataField("additional")
 
   private:
     ORVADRCORE_LOCAL const Json::Value* findData() const;
     ORVADRCORE_LOCAL const Json::Value* findDataField(const char* key) const;
     ORVADRCORE_LOCAL const Json::Value* findErrorField(const char* key) const;
 
-    // Behind the references that are given out for what is absent; always null.
-    Json::Value emptyValue;
-    Json::Value resp;
+    Json::Value emptyValue_;  // always null; what references to missing members refer to
+    Json::Value resp_;
 };
 
 }  // namespace OrvaDRCore

@@ -1,14 +1,12 @@
 /// \file
-/// Small helpers that stand alone: a UUID, a random pause, vectors as JSON or as one text, a path
-/// test.
+/// Small helpers: UUIDs, random pauses, vectors as JSON or as text, a path test.
 ///
 /// \code
 ///     Container::ToString<std::string>({"id", "name"}, ",");   // "id,name"
 ///     Validator::IsVolPath("/volume1/replica");                // true
 /// \endcode
 ///
-/// Nothing here keeps state; every function may be called from any thread. Log lines name the file
-/// `utils.cpp`.
+/// No function keeps state; any thread may call them.
 #ifndef ORVADRCORE_UTILS_H
 #define ORVADRCORE_UTILS_H
 
@@ -19,50 +17,39 @@
 
 #include <orvadrcore/export.h>
 
-/// All that the library has for its callers.
+/// Everything that callers use.
 namespace OrvaDRCore {
 
-/// A new UUID: the first line that `/usr/bin/uuidgen` prints, without blanks around it.
-/// \return the text; empty when the program printed nothing, or when reading failed before the end
-///         of the line, both without a log line; and empty when the program could not be started,
-///         with ERR `Failed to exec the command [%s].`
-/// \note Starts a process; the process inherits no descriptor but 0, 1 and 2.
+/// A new UUID: the first line that `/usr/bin/uuidgen` prints, trimmed. The program inherits only
+/// descriptors 0, 1 and 2.
+/// \return empty if the program could not be started, with ERR `Failed to exec the command [%s].`;
+///         also empty, but without a log line, if it printed nothing or the line could not be read
 ORVADRCORE_API std::string GenerateUUID();
 
-/// Sleeps for a random time between two bounds, both included.
-/// \param min  shortest sleep in milliseconds, above 0
-/// \param max  longest sleep in milliseconds, above `min`: equal bounds are refused on purpose
-/// \return true after the sleep; false at once, with ERR `Invalid period [%u - %u] to sleep`, when
-///         the bounds are not as said
-/// \note A signal handler that runs in the meantime may cut the sleep short.
+/// Sleeps for a random number of milliseconds from `min` to `max`, both included. A signal handler
+/// may cut the sleep short.
+/// \return false without sleeping, with ERR `Invalid period [%u - %u] to sleep`, unless
+///         0 < min < max: equal bounds are refused, too
 ORVADRCORE_API bool RandomSleepInMSec(unsigned int min, unsigned int max);
 
-/// Vectors turned into something else, for elements of type `std::string`, `int`, `bool` and
-/// `double`. Neither operation fails or logs.
+/// Conversions of vectors whose elements are `std::string`, `int`, `bool` or `double`. They neither
+/// fail nor log.
 class ORVADRCORE_API Container {
   public:
     Container() = delete;
 
-    /// The elements, in order, as a JSON array of text, integers, booleans or numbers.
-    /// \tparam T      the type of the elements
-    /// \param values  the elements
-    /// \return the array; an empty array, not null, for an empty vector. A text of 2 GiB or more,
-    ///         which no JSON value can hold, is null there
+    /// The elements as a JSON array; an empty vector gives an empty array, not null. A text of 2 GiB
+    /// or more becomes null, because a JSON value cannot hold it.
     template <class T>
     static Json::Value ToJsonArray(  // T: std::string, int, bool or double
         const std::vector<T>& values) = delete;
 
-    /// The elements one after the other, with `separator` between them.
-    /// \tparam T         the type of the elements
-    /// \param values     the elements
-    /// \param separator  any text
-    /// \return the text; empty for an empty vector
-    /// \warning Numbers are appended as characters, not in decimals: an `int` as the character of
-    ///          its low 8 bits (65 and 66 joined with "," give "A,B"), a `bool` as the character 1
-    ///          or 0, a `double` as the character of the low 8 bits of its value without the
-    ///          fraction (0 when negative). Format numbers as text first when you want decimals.
-    /// \note No separator follows as long as the result is empty, so empty texts at the beginning
-    ///       vanish: "" and "b" give "b". Later ones keep their separator.
+    /// The elements, joined with `separator`.
+    /// \warning Numbers are appended as one character, not as digits: an `int` as the character of
+    ///          its low 8 bits (65 and 66 joined with "," give "A,B"), a `bool` as character 1 or
+    ///          0, a `double` as the character of the low 8 bits of its integer part (0 if
+    ///          negative). Format numbers as text yourself if you want digits.
+    /// \note Empty texts at the beginning get no separator: "" and "b" give "b". Later ones do.
     template <class T>
     static std::string ToString(  // T: std::string, int, bool or double
         const std::vector<T>& values, const std::string& separator) = delete;
@@ -91,15 +78,13 @@ ORVADRCORE_API std::string Container::ToString(const std::vector<double>& values
                                                const std::string& separator);
 /// \endcond
 
-/// Tests of texts.
+/// Checks of texts.
 class ORVADRCORE_API Validator {
   public:
     Validator() = delete;
 
-    /// Whether a path begins with "/volume".
-    /// \param path  the path; it is not looked up, and its case counts
-    /// \return true when it does. What follows is not looked at: "/volume", "/volume1/x" and
-    ///         "/volumeUSB" all pass, an empty path does not
+    /// Whether a path begins with "/volume", and nothing else: "/volume", "/volume1/x" and
+    /// "/volumeUSB" all pass. The file system is not consulted.
     static bool IsVolPath(const std::string& path);
 };
 

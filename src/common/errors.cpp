@@ -4,7 +4,7 @@ namespace OrvaDRCore {
 
 namespace {
 
-// A switch, not a map: it is compiled into a constant table, and nothing has to run at load time.
+// A switch, not a map: it compiles into a constant table, so that nothing runs at load time.
 constexpr const char* Name(int code)
 {
     switch (code) {

@@ -46,7 +46,7 @@ void Append(std::string& text, bool element)
 
 void Append(std::string& text, double element)
 {
-    // fmod keeps the low 8 bits of numbers that no integer type holds; infinity and NaN have none.
+    // fmod, because no integer type holds every double. Infinity and NaN count as 0.
     const double low = element > 0 ? std::fmod(std::trunc(element), 256.0) : 0.0;
     text += std::isfinite(low) ? static_cast<char>(static_cast<unsigned char>(low)) : '\0';
 }
@@ -75,7 +75,7 @@ std::string Join(const std::vector<T>& values, const std::string& separator)
 {
     std::string text;
     for (const auto& value : values) {
-        // The text decides, not the position: the contract has empty elements at the beginning vanish.
+        // Not "is it the first?": the contract drops empty elements at the beginning.
         if (!text.empty()) text += separator;
         Append(text, value);
     }
@@ -96,9 +96,9 @@ std::string GenerateUUID()
     std::size_t size = 0;
     const ssize_t length = ::getline(&text, &size, output.get());
     const std::unique_ptr<char, Free> line(text);
-    // What a failed read has cut off is no line.
-    const bool isLine = length >= 0 && std::ferror(output.get()) == 0;
-    if (isLine) uuid = CoreLibStrTrim(line.get(), nullptr, nullptr);
+    // A read error may have cut the line off.
+    const bool isWholeLine = length >= 0 && std::ferror(output.get()) == 0;
+    if (isWholeLine) uuid = CoreLibStrTrim(line.get(), nullptr, nullptr);
     return uuid;
 }
 

@@ -12,7 +12,7 @@ constexpr const char* ApiKey = "api";
 constexpr const char* MethodKey = "method";
 constexpr const char* VersionKey = "version";
 
-// Moves a text out of an object's member; any other member stays.
+// Moves a string member out of `object` into `text`. A member of another type stays.
 void TakeText(Json::Value& object, const char* key, std::string& text)
 {
     const Json::Value* member = FindMember(object, key);
@@ -23,9 +23,9 @@ void TakeText(Json::Value& object, const char* key, std::string& text)
 
 }  // namespace
 
-Request::Request(const std::string& apiName, int apiVersion, const std::string& methodName,
-                 const Json::Value& parameters)
-    : version(apiVersion), api(apiName), method(methodName), params(parameters)
+Request::Request(const std::string& api, int version, const std::string& method,
+                 const Json::Value& params)
+    : version_(version), api_(api), method_(method), params_(params)
 {
 }
 
@@ -38,55 +38,55 @@ Request::~Request() = default;
 
 void Request::setRequest(const Json::Value& request)
 {
-    params = request;
-    TakeText(params, ApiKey, api);
-    TakeText(params, MethodKey, method);
-    const Json::Value* member = FindMember(params, VersionKey);
+    params_ = request;
+    TakeText(params_, ApiKey, api_);
+    TakeText(params_, MethodKey, method_);
+    const Json::Value* member = FindMember(params_, VersionKey);
     if (member != nullptr && member->isInt()) {
-        version = member->asInt();
-        params.removeMember(VersionKey);
+        version_ = member->asInt();
+        params_.removeMember(VersionKey);
     }
 }
 
 void Request::clear()
 {
-    version = -1;
-    timeout = 300;
-    api.clear();
-    method.clear();
-    uploadFile = UploadFileDescription();
-    Clear(params);
-    // encryptRequired stays as it was, on purpose.
+    version_ = -1;
+    timeout_ = 300;
+    api_.clear();
+    method_.clear();
+    uploadFile_ = UploadFileDescription();
+    Clear(params_);
+    // encryptRequired_ stays: the contract says so.
 }
 
-void Request::setVersion(int apiVersion)
+void Request::setVersion(int version)
 {
-    version = apiVersion;
+    version_ = version;
 }
 
-void Request::setMethod(const std::string& methodName)
+void Request::setMethod(const std::string& method)
 {
-    method = methodName;
+    method_ = method;
 }
 
-void Request::setAPI(const std::string& apiName)
+void Request::setAPI(const std::string& api)
 {
-    api = apiName;
+    api_ = api;
 }
 
-void Request::setTimeout(int limit)
+void Request::setTimeout(int timeout)
 {
-    timeout = limit;
+    timeout_ = timeout;
 }
 
 void Request::setUploadFile(const UploadFileDescription& file)
 {
-    uploadFile = file;
+    uploadFile_ = file;
 }
 
 bool Request::setEncryptRequired(bool required)
 {
-    encryptRequired = required;
+    encryptRequired_ = required;
     return true;
 }
 
@@ -97,29 +97,30 @@ bool Request::isValidKey(const std::string& key)
 
 bool Request::takesParams() const
 {
-    return params.isNull() || params.isObject();
+    return params_.isNull() || params_.isObject();
 }
 
 bool Request::addParam(const std::string& key, const Json::Value& value)
 {
     if (!isValidKey(key) || !FitsJsonName(key.size()) || !takesParams()) return false;
-    Json::Value copy(value);  // made first: the value may be a part of the parameters
-    params[key] = std::move(copy);
+    Json::Value copy(value);  // first, because the value may be part of the parameters
+    params_[key] = std::move(copy);
     return true;
 }
 
 bool Request::addParam(const Json::Value& object)
 {
     if (!takesParams()) return false;
-    // A copy: the object may be a part of the parameters.
+    // A copy, because the object may be part of the parameters.
     const Json::Value members(object);  // NOLINT(performance-unnecessary-copy-initialization)
     bool allTaken = true;
     for (auto member = members.begin(); member != members.end(); ++member) {
         const Json::Value key = member.key();
         if (!key.isConvertibleTo(Json::stringValue)) {
-            allTaken = false;  // GCOVR_EXCL_LINE: jsoncpp gives names and numbers, which are texts
+            allTaken =
+                false;  // GCOVR_EXCL_LINE: jsoncpp's keys are names and numbers, which convert
         } else if (isValidKey(key.asString())) {
-            params[key.asString()] = *member;
+            params_[key.asString()] = *member;
         }
     }
     return allTaken;
@@ -127,21 +128,21 @@ bool Request::addParam(const Json::Value& object)
 
 bool Request::isValid() const
 {
-    return !api.empty() && !method.empty() && version > 0;
+    return !api_.empty() && !method_.empty() && version_ > 0;
 }
 
 Json::Value Request::toJson() const
 {
-    Json::Value json = takesParams() ? params : Json::Value(Json::objectValue);
-    json[ApiKey] = ToJsonText(api);
-    json[MethodKey] = ToJsonText(method);
-    json[VersionKey] = version;
+    Json::Value json = takesParams() ? params_ : Json::Value(Json::objectValue);
+    json[ApiKey] = ToJsonText(api_);
+    json[MethodKey] = ToJsonText(method_);
+    json[VersionKey] = version_;
     return json;
 }
 
 std::string Request::toStr() const
 {
-    return api + "/" + method + "/" + std::to_string(version);
+    return api_ + "/" + method_ + "/" + std::to_string(version_);
 }
 
 }  // namespace OrvaDRCore

@@ -4,7 +4,7 @@
 
 namespace OrvaDRCore {
 
-Response::Response(const Response& other) : resp(other.resp) {}
+Response::Response(const Response& other) : resp_(other.resp_) {}
 
 Response::Response(const std::string& text)
 {
@@ -16,14 +16,14 @@ Response::Response(const char* text)
     setResp(text);
 }
 
-Response::Response(const Json::Value& reply) : resp(reply) {}
+Response::Response(const Json::Value& reply) : resp_(reply) {}
 
 Response::~Response() = default;
 
 bool Response::setResp(const std::string& text)
 {
-    resp = Json::Value();  // a reply that breaks off is none, and the one before it is past
-    return fromString(resp, text);
+    resp_ = Json::Value();  // text that does not parse leaves no reply, not the old one
+    return fromString(resp_, text);
 }
 
 bool Response::setResp(const char* text)
@@ -33,12 +33,12 @@ bool Response::setResp(const char* text)
 
 void Response::setResp(const Json::Value& reply)
 {
-    resp = reply;
+    resp_ = reply;
 }
 
 void Response::clear()
 {
-    Clear(resp);
+    Clear(resp_);
 }
 
 bool Response::isValid() const
@@ -76,7 +76,7 @@ bool Response::hasData() const
 const Json::Value& Response::getData() const
 {
     const Json::Value* data = findData();
-    return data != nullptr ? *data : emptyValue;
+    return data != nullptr ? *data : emptyValue_;
 }
 
 bool Response::hasDataField(const char* key) const
@@ -87,7 +87,7 @@ bool Response::hasDataField(const char* key) const
 const Json::Value& Response::getDataField(const char* key) const
 {
     const Json::Value* field = findDataField(key);
-    return field != nullptr ? *field : emptyValue;
+    return field != nullptr ? *field : emptyValue_;
 }
 
 std::string Response::getDataFieldtoStr(const char* key) const
@@ -113,13 +113,13 @@ std::string Response::getTaskId() const
 
 bool Response::hasField(const char* key) const
 {
-    return FindMember(resp, key) != nullptr;
+    return FindMember(resp_, key) != nullptr;
 }
 
 const Json::Value& Response::getField(const char* key) const
 {
-    const Json::Value* field = FindMember(resp, key);
-    return field != nullptr ? *field : emptyValue;
+    const Json::Value* field = FindMember(resp_, key);
+    return field != nullptr ? *field : emptyValue_;
 }
 
 bool Response::hasAdditional() const
@@ -134,7 +134,7 @@ const Json::Value& Response::getAdditional() const
 
 const Json::Value* Response::findData() const
 {
-    return isSuccess() ? FindMember(resp, "data") : nullptr;
+    return isSuccess() ? FindMember(resp_, "data") : nullptr;
 }
 
 const Json::Value* Response::findDataField(const char* key) const

@@ -173,10 +173,10 @@ TEST(MemberTest, LocksAndCachesKeepTheirOrder)
 TEST(MemberTest, RequestsAndResponsesKeepTheirOrder)
 {
     ExpectInOrder(BehindTable,
-                  {offsetof(Request, version), offsetof(Request, timeout), offsetof(Request, api),
-                   offsetof(Request, method), offsetof(Request, params),
-                   offsetof(Request, encryptRequired), offsetof(Request, uploadFile)});
-    ExpectInOrder(BehindTable, {offsetof(Response, emptyValue), offsetof(Response, resp)});
+                  {offsetof(Request, version_), offsetof(Request, timeout_),
+                   offsetof(Request, api_), offsetof(Request, method_), offsetof(Request, params_),
+                   offsetof(Request, encryptRequired_), offsetof(Request, uploadFile_)});
+    ExpectInOrder(BehindTable, {offsetof(Response, emptyValue_), offsetof(Response, resp_)});
 }
 
 }  // namespace

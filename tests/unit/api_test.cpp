@@ -23,7 +23,7 @@
 
 namespace {
 
-using namespace OrvaDRCore;  // NOLINT(google-build-using-namespace): all of it is looked at
+using namespace OrvaDRCore;  // NOLINT(google-build-using-namespace): every name is checked
 using std::string;
 
 // The overload of an operation that has exactly the given type; without one it does not compile.
@@ -50,7 +50,7 @@ static_assert(Has<string (*)(int)>(&ERR::ToString));
 static_assert(!std::is_polymorphic_v<SqliteValue>);
 static_assert(IsPlainValue<SqliteValue>);
 static_assert(std::is_nothrow_move_constructible_v<SqliteValue>);
-// The only assignment: one that moved would take the flag along with the payload.
+// The only assignment. A move assignment would take the valid flag over.
 static_assert(std::is_same_v<decltype(&SqliteValue::operator=),
                              SqliteValue& (SqliteValue::*)(const SqliteValue&)>);
 static_assert(std::is_convertible_v<int, SqliteValue>);
@@ -59,7 +59,7 @@ static_assert(std::is_convertible_v<bool, SqliteValue>);
 static_assert(std::is_convertible_v<string, SqliteValue>);
 static_assert(std::is_convertible_v<const char*, SqliteValue>);
 static_assert(!std::is_constructible_v<SqliteValue, std::nullptr_t>);
-// Numbers that would lose bits without a word.
+// Numbers that would silently lose bits.
 static_assert(!std::is_constructible_v<SqliteValue, long>);
 static_assert(!std::is_constructible_v<SqliteValue, unsigned long>);
 static_assert(!std::is_constructible_v<SqliteValue, double>);
@@ -83,7 +83,7 @@ static_assert(!std::is_constructible_v<SqliteValue, void (*)()>);
 static_assert(!std::is_constructible_v<SqliteValue, void (&)()>);
 static_assert(!std::is_constructible_v<SqliteValue, int std::pair<int, int>::*>);
 static_assert(!std::is_constructible_v<SqliteValue, bool (SqliteValue::*)() const>);
-// What still is a value: texts of every kind, numbers, and what stands for a boolean.
+// Still accepted: every kind of text, numbers, and proxies of a boolean.
 static_assert(std::is_convertible_v<char*, SqliteValue>);
 static_assert(std::is_convertible_v<char* const, SqliteValue>);
 static_assert(std::is_convertible_v<const char (&)[4], SqliteValue>);
@@ -157,7 +157,7 @@ static_assert(Has<bool (SqliteCommand::*)(const SqliteTableHandler&)>(&SqliteCom
 static_assert(Has<const SqliteTableHandler& (SqliteCommand::*)() const>(&SqliteCommand::GetTable));
 static_assert(Has<string (SqliteCommand::*)() const>(&SqliteCommand::ToStr));
 
-// What every builder has, and what those have that hold values or a condition.
+// What every builder has; what those with values or a condition have in addition.
 template <class T>
 constexpr bool IsBuilder =
     std::is_base_of_v<SqliteCommand, T>&& IsPlainValue<T>&& std::has_virtual_destructor_v<T> &&
@@ -380,7 +380,7 @@ static_assert(CanBeAnArray<string> && CanBeJoined<string>);
 static_assert(!CanBeAnArray<long> && !CanBeAnArray<const char*> && !CanBeAnArray<SqliteValue>);
 static_assert(!CanBeJoined<long> && !CanBeJoined<const char*> && !CanBeJoined<unsigned int>);
 
-// ------------------------------------------------------------- which overload a literal comes to
+// ----------------------------------------------------------------- which overload a literal picks
 
 TEST(ApiTest, AStringLiteralIsATextAndNeverABoolean)
 {
@@ -467,30 +467,30 @@ TEST(ApiTest, AssigningDoesNotMakeAValueValid)
 
 // --------------------------------------------------------------------------------- derived classes
 
-// Counts its ends: with a virtual destructor the base's owner reaches it.
+// Counts its destructions: deleting it through its base must reach its destructor.
 template <class Base>
 class Derived : public Base {
   public:
-    explicit Derived(int& count) : ends(count) {}
+    explicit Derived(int& count) : destructions(count) {}
     Derived(const Derived&) = delete;
     Derived& operator=(const Derived&) = delete;
-    ~Derived() override { ++ends; }
+    ~Derived() override { ++destructions; }
 
   private:
-    int& ends;
+    int& destructions;
 };
 
 TEST(ApiTest, ClassesThatCallersDeriveFromAreDeletedThroughTheirBase)
 {
-    int ends = 0;
-    std::unique_ptr<Request>(new Derived<Request>(ends)).reset();
-    std::unique_ptr<Response>(new Derived<Response>(ends)).reset();
-    std::unique_ptr<SqliteValueList>(new Derived<SqliteValueList>(ends)).reset();
-    std::unique_ptr<SqliteTableHandler>(new Derived<SqliteTableHandler>(ends)).reset();
-    std::unique_ptr<SqliteCommand>(new Derived<InsertCommand>(ends)).reset();
-    std::unique_ptr<SqliteCommand>(new Derived<UpdateCommand>(ends)).reset();
-    std::unique_ptr<SqliteCommand>(new Derived<SelectCommand>(ends)).reset();
-    EXPECT_EQ(ends, 7);
+    int destructions = 0;
+    std::unique_ptr<Request>(new Derived<Request>(destructions)).reset();
+    std::unique_ptr<Response>(new Derived<Response>(destructions)).reset();
+    std::unique_ptr<SqliteValueList>(new Derived<SqliteValueList>(destructions)).reset();
+    std::unique_ptr<SqliteTableHandler>(new Derived<SqliteTableHandler>(destructions)).reset();
+    std::unique_ptr<SqliteCommand>(new Derived<InsertCommand>(destructions)).reset();
+    std::unique_ptr<SqliteCommand>(new Derived<UpdateCommand>(destructions)).reset();
+    std::unique_ptr<SqliteCommand>(new Derived<SelectCommand>(destructions)).reset();
+    EXPECT_EQ(destructions, 7);
 }
 
 }  // namespace

@@ -18,7 +18,7 @@ struct NamedCode {
 
 constexpr NamedCode Codes[] = {
     {ERR::ERR_DR_MIN, 400, "ERR_DR_MIN"},
-    {ERR::BAD_PARAMETER, 401, "BAD_PARAMETER"},  // without the prefix, on purpose
+    {ERR::BAD_PARAMETER, 401, "BAD_PARAMETER"},  // the only error without the prefix ERR_
     {ERR::ERR_ALLOCATE_MEMORY, 402, "ERR_ALLOCATE_MEMORY"},
     {ERR::ERR_NULL_POINTER, 403, "ERR_NULL_POINTER"},
     {ERR::ERR_DATABASE_OPERATION, 404, "ERR_DATABASE_OPERATION"},
@@ -46,7 +46,7 @@ constexpr NamedCode Codes[] = {
     {ERR::ERR_GET_NODE_INFO, 519, "ERR_GET_NODE_INFO"},
     {ERR::ERR_INVALID_SENDER, 520, "ERR_INVALID_SENDER"},
     {ERR::ERR_INVALID_SESSION, 521, "ERR_INVALID_SESSION"},
-    {ERR::ERR_NOT_AVALIABLE_CONN, 522, "ERR_NOT_AVALIABLE_CONN"},  // spelled so on purpose
+    {ERR::ERR_NOT_AVALIABLE_CONN, 522, "ERR_NOT_AVALIABLE_CONN"},  // the contract spells it so
     {ERR::ERR_LOGIN_AUTH, 523, "ERR_LOGIN_AUTH"},
     {ERR::ERR_CREDENTIAL_OPERATION, 524, "ERR_CREDENTIAL_OPERATION"},
     {ERR::ERR_NO_PERMISSION, 525, "ERR_NO_PERMISSION"},
@@ -57,7 +57,7 @@ constexpr NamedCode Codes[] = {
     {ERR::ERR_DR_MAX, 673, "ERR_DR_MAX"},
 };
 
-// Naming a code logs nothing: the fixture would say so.
+// The fixture fails on any log line: ToString() must not log.
 class ErrorsTest : public LoggedTest {
   protected:
     ErrorsTest() : LoggedTest("errors.cpp") {}
@@ -69,7 +69,7 @@ TEST_F(ErrorsTest, EveryCodeHasItsNumber)
     for (const NamedCode& row : Codes) EXPECT_EQ(row.code, row.number) << row.name;
 }
 
-TEST_F(ErrorsTest, EveryCodeIsNamedAsItIsSpelled)
+TEST_F(ErrorsTest, EveryCodeHasTheNameOfItsEnumerator)
 {
     for (const NamedCode& row : Codes) EXPECT_EQ(ERR::ToString(row.number), row.name);
 }

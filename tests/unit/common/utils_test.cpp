@@ -18,11 +18,10 @@
 
 namespace {
 
-// While one lives, the programs that the tested code starts are noted and another command runs in
-// their place; afterwards all is as always.
+// While it lives, starting a program runs another command instead, and notes what was asked for.
 class ProgramStandIn {
   public:
-    // No program: starting one fails with `error`.
+    // Starting a program fails with `error`.
     explicit ProgramStandIn(int error)
     {
         faults.spawn = [this, error](const SpawnCall& call) {
@@ -44,7 +43,7 @@ class ProgramStandIn {
         };
     }
 
-    // The program that was asked for, followed by its arguments.
+    // The last program that was asked for, and its arguments.
     const std::vector<std::string>& Asked() const { return asked; }
 
   private:
@@ -71,7 +70,7 @@ class UtilsTest : public LoggedTest {
     UtilsTest() : LoggedTest("utils.cpp") {}
 };
 
-// A text whose zero bytes count, from a literal.
+// A literal as text, zero bytes included.
 template <std::size_t Size>
 std::string Bytes(const char (&literal)[Size])
 {
@@ -104,7 +103,7 @@ TEST_F(UtilsTest, AUuidProgramThatCannotBeStartedIsLogged)
     }
 }
 
-TEST_F(UtilsTest, TheUuidIsTheFirstLineWithoutBlanksAroundIt)
+TEST_F(UtilsTest, TheUuidIsTheTrimmedFirstLine)
 {
     struct Row {
         std::vector<std::string> command;
@@ -127,13 +126,13 @@ TEST_F(UtilsTest, TheUuidIsTheFirstLineWithoutBlanksAroundIt)
     }
 }
 
-TEST_F(UtilsTest, ALineThatAFailedReadCutsOffIsNoUuid)
+TEST_F(UtilsTest, ALineCutOffByAReadErrorIsNoUuid)
 {
     for (const std::size_t readable : {0U, 1U, 10U, 36U}) {
         SyscallFaults faults;
         bool failed = false;
         faults.read = [&](int fd, void* buffer, std::size_t size) -> ssize_t {
-            // What the program prints is read in large pieces, and nothing else.
+            // Only the program's output is read in large blocks.
             if (size < 100) return RealRead(fd, buffer, size);
             if (failed || readable == 0) return Failing(EIO)();
             failed = true;
@@ -143,7 +142,7 @@ TEST_F(UtilsTest, ALineThatAFailedReadCutsOffIsNoUuid)
     }
 }
 
-TEST_F(UtilsTest, TheUuidProgramIsWaitedFor)
+TEST_F(UtilsTest, TheUuidProgramIsReaped)
 {
     GenerateUUID();
     EXPECT_EQ(::waitpid(-1, nullptr, WNOHANG), -1);
@@ -158,7 +157,7 @@ TEST_F(UtilsTest, ARandomPauseLiesBetweenItsBounds)
     EXPECT_THAT(pauses.Taken(), Each(AllOf(Ge(500'000U), Le(1'000'000U))));
 }
 
-TEST_F(UtilsTest, BothBoundsOfARandomPauseAreDrawn)
+TEST_F(UtilsTest, BothBoundsOfARandomPauseOccur)
 {
     Pauses pauses;
     for (int count = 0; count < 200; ++count) EXPECT_TRUE(RandomSleepInMSec(200, 201));
@@ -173,8 +172,8 @@ TEST_F(UtilsTest, ARandomPauseTakesItsTime)
     EXPECT_GE(std::chrono::steady_clock::now() - begin, std::chrono::milliseconds(10));
 }
 
-// The microseconds are counted in 32 bits, on purpose.
-TEST_F(UtilsTest, APauseOfMoreThanAnHourWrapsRound)
+// The contract counts microseconds in 32 bits.
+TEST_F(UtilsTest, APauseOfMoreThanAnHourWrapsAround)
 {
     Pauses pauses;
     EXPECT_TRUE(RandomSleepInMSec(4'295'200, 4'295'201));
@@ -193,7 +192,7 @@ TEST_F(UtilsTest, BadBoundsAreRefusedAtOnce)
         {0, 10, "Invalid period [0 - 10] to sleep"},
         {10, 0, "Invalid period [10 - 0] to sleep"},
         {0, 0, "Invalid period [0 - 0] to sleep"},
-        {10, 10, "Invalid period [10 - 10] to sleep"},  // equal bounds, on purpose
+        {10, 10, "Invalid period [10 - 10] to sleep"},  // equal bounds are refused, too
         {20, 10, "Invalid period [20 - 10] to sleep"},
         {0, UINT_MAX, "Invalid period [0 - 4294967295] to sleep"},
         {1000, 1000, "Invalid period [1000 - 1000] to sleep"},
@@ -244,7 +243,7 @@ TEST_F(UtilsTest, SeparatorsStandBetweenTexts)
     const std::vector<Row> rows{
         {{"a"}, ",", "a"},          {{"a", "b", "c"}, ",", "a,b,c"},
         {{"a", "b"}, ", ", "a, b"}, {{"a", "b"}, "", "ab"},
-        {{"", "b"}, ",", "b"},  // the result is asked, not the position, on purpose
+        {{"", "b"}, ",", "b"},  // no separator while the result is empty
         {{"", "", "b"}, ",", "b"},  {{""}, ",", ""},
         {{"", ""}, ",", ""},        {{"a", "", "b"}, ",", "a,,b"},
         {{"a", ""}, ",", "a,"},     {{"", "a", ""}, ",", "a,"},
@@ -253,7 +252,7 @@ TEST_F(UtilsTest, SeparatorsStandBetweenTexts)
         EXPECT_EQ(Container::ToString(row.texts, row.separator), row.joined);
 }
 
-// Characters, not decimals, on purpose.
+// Characters, not digits: the contract says so.
 TEST_F(UtilsTest, AnIntBecomesTheCharacterOfItsLowBits)
 {
     EXPECT_EQ(Container::ToString<int>({65, 66}, ","), "A,B");
@@ -269,7 +268,7 @@ TEST_F(UtilsTest, ABoolBecomesTheCharacterOneOrZero)
     EXPECT_EQ(Container::ToString<bool>({false, true}, ""), Bytes("\0\1"));
 }
 
-TEST_F(UtilsTest, ADoubleBecomesTheCharacterOfItsWholeLowBits)
+TEST_F(UtilsTest, ADoubleBecomesTheCharacterOfItsIntegerPart)
 {
     struct Row {
         double number;

@@ -15,7 +15,7 @@ using OrvaDRCore::Request;
 
 using namespace std::string_literals;
 
-// What a request says of itself.
+// What the getters return.
 struct Fields {
     std::string api;
     std::string method;
@@ -31,7 +31,7 @@ void ExpectFields(const Request& request, const Fields& expected)
     EXPECT_TRUE(Same(request.getParams(), expected.params));
 }
 
-// A request with something in every field.
+// A request with every field set.
 Request FullRequest()
 {
     Request request("DR.Node", 9, "get", ParseJson(R"({"name":"backup","limit":5})"));
@@ -41,7 +41,7 @@ Request FullRequest()
     return request;
 }
 
-// Every kind, and nothing.
+// Every type of value, and null for none.
 std::vector<const JsonKind*> Choices()
 {
     std::vector<const JsonKind*> choices{nullptr};
@@ -49,7 +49,7 @@ std::vector<const JsonKind*> Choices()
     return choices;
 }
 
-// Values that can take parameters, and those that cannot.
+// Whether addParam() can add to parameters of this type.
 bool TakesParams(const JsonKind& kind)
 {
     return kind.text == "null" || kind.text.front() == '{';
@@ -74,7 +74,7 @@ TEST_F(RequestTest, ANewRequestHasTheDefaultsAndIsNotValid)
     EXPECT_EQ(request.toStr(), "//-1");
 }
 
-TEST_F(RequestTest, FieldsAreTakenAsTheyAreGiven)
+TEST_F(RequestTest, TheConstructorStoresItsArguments)
 {
     for (const JsonKind& kind : JsonKinds()) {
         const Request request("DR.Node", 2, "get", kind.value);
@@ -87,7 +87,7 @@ TEST_F(RequestTest, FieldsAreTakenAsTheyAreGiven)
     }
 }
 
-TEST_F(RequestTest, ReservedKeysOfGivenParametersStayAndAreOverwrittenInJson)
+TEST_F(RequestTest, ReservedKeysAmongTheParametersAreReplacedInJson)
 {
     const Json::Value params = ParseJson(R"({"api":"other","method":1,"version":7,"x":5})");
     const Request request("DR.Node", 2, "get", params);
@@ -96,7 +96,7 @@ TEST_F(RequestTest, ReservedKeysOfGivenParametersStayAndAreOverwrittenInJson)
         Same(request.toJson(), ParseJson(R"({"api":"DR.Node","method":"get","version":2,"x":5})")));
 }
 
-TEST_F(RequestTest, OneThatIsBuiltFromJsonHasDefaultsForWhatIsMissing)
+TEST_F(RequestTest, ARequestFromJsonHasDefaultsForMissingKeys)
 {
     const Request request(ParseJson(R"({"method":"get","timeout":7,"encryptRequired":true})"));
     ExpectFields(request, {"", "get", -1, ParseJson(R"({"timeout":7,"encryptRequired":true})")});
@@ -106,7 +106,7 @@ TEST_F(RequestTest, OneThatIsBuiltFromJsonHasDefaultsForWhatIsMissing)
 
 // ------------------------------------------------------------------------------------- setRequest
 
-TEST_F(RequestTest, TheJsonFormIsTakenApart)
+TEST_F(RequestTest, SetRequestSplitsTheJsonForm)
 {
     Request request;
     request.setRequest(ParseJson(R"({"api":"A","method":"m","version":1,"x":5})"));
@@ -114,14 +114,14 @@ TEST_F(RequestTest, TheJsonFormIsTakenApart)
     EXPECT_TRUE(request.isValid());
 }
 
-TEST_F(RequestTest, AVersionThatIsATextStaysAmongTheParameters)
+TEST_F(RequestTest, AVersionThatIsAStringStaysAParameter)
 {
     Request request;
     request.setRequest(ParseJson(R"({"api":"A","method":"m","version":"1"})"));
     ExpectFields(request, {"A", "m", -1, ParseJson(R"({"version":"1"})")});
 }
 
-TEST_F(RequestTest, AFieldWhoseKeyIsMissingKeepsItsValue)
+TEST_F(RequestTest, AMissingKeyLeavesItsFieldUnchanged)
 {
     Request request = FullRequest();
     request.setRequest(ParseJson(R"({"method":"set","version":2})"));
@@ -130,8 +130,8 @@ TEST_F(RequestTest, AFieldWhoseKeyIsMissingKeepsItsValue)
     ExpectFields(request, {"DR.Plan", "set", 2, Json::Value(Json::objectValue)});
 }
 
-// Each reserved key holds each kind, or is missing, in a request that had other values before.
-TEST_F(RequestTest, ReservedKeysMayHoldEveryKind)
+// Each reserved key has each type, or is missing. The request had other values before.
+TEST_F(RequestTest, ReservedKeysMayHoldAnyType)
 {
     for (const JsonKind* api : Choices()) {
         for (const JsonKind* method : Choices()) {
@@ -170,7 +170,7 @@ TEST_F(RequestTest, ReservedKeysMayHoldEveryKind)
     }
 }
 
-TEST_F(RequestTest, AVersionMayBeAnyNumberThatAJsonValueCanHold)
+TEST_F(RequestTest, TheVersionIsReadFromEveryNumericType)
 {
     const auto versionOf = [](const Json::Value& version) {
         Json::Value json;
@@ -179,14 +179,14 @@ TEST_F(RequestTest, AVersionMayBeAnyNumberThatAJsonValueCanHold)
     };
     EXPECT_EQ(versionOf(Json::Value(5U)), 5);
     EXPECT_EQ(versionOf(Json::Value(Json::Int64{5})), 5);
-    EXPECT_EQ(versionOf(Json::Value(3.0)), 3);  // the JSON library takes it for an integer
+    EXPECT_EQ(versionOf(Json::Value(3.0)), 3);  // jsoncpp counts it as an integer
     EXPECT_EQ(versionOf(Json::Value(3.5)), -1);
     EXPECT_EQ(versionOf(Json::Value(2147483648U)), -1);
     EXPECT_EQ(versionOf(Json::Value(std::numeric_limits<double>::infinity())), -1);
     EXPECT_EQ(versionOf(Json::Value(std::numeric_limits<double>::quiet_NaN())), -1);
 }
 
-TEST_F(RequestTest, OtherKeysAreParametersHoweverMuchTheyLookLikeReservedOnes)
+TEST_F(RequestTest, KeysThatOnlyResembleReservedOnesAreParameters)
 {
     const Json::Value json = ParseJson(R"({"API":"A","Method":"m","version ":1,"api\u0000":"A"})");
     Request request = FullRequest();
@@ -194,7 +194,7 @@ TEST_F(RequestTest, OtherKeysAreParametersHoweverMuchTheyLookLikeReservedOnes)
     ExpectFields(request, {"DR.Node", "get", 9, json});
 }
 
-TEST_F(RequestTest, TimeoutUploadFileAndEncryptionAreNeverTakenFromJson)
+TEST_F(RequestTest, TimeoutUploadFileAndEncryptionAreNeverReadFromJson)
 {
     Request request = FullRequest();
     request.setRequest(ParseJson(R"({"timeout":1,"uploadFile":{"name":"x","path":"y"},
@@ -205,7 +205,7 @@ TEST_F(RequestTest, TimeoutUploadFileAndEncryptionAreNeverTakenFromJson)
     EXPECT_TRUE(request.isEncryptRequired());
 }
 
-TEST_F(RequestTest, AWholeRequestMayBeOfEveryKindAndIsKeptAsParameters)
+TEST_F(RequestTest, AValueOfAnyTypeIsKeptAsTheParameters)
 {
     for (const JsonKind& kind : JsonKinds()) {
         SCOPED_TRACE(kind.text);
@@ -216,7 +216,7 @@ TEST_F(RequestTest, AWholeRequestMayBeOfEveryKindAndIsKeptAsParameters)
     }
 }
 
-TEST_F(RequestTest, PartsOfItsOwnParametersCanBecomeTheRequest)
+TEST_F(RequestTest, ItsOwnParametersCanBecomeTheRequest)
 {
     Request request(ParseJson(R"({"inner":{"api":"A","method":"m","version":1,"x":5}})"));
     request.setRequest(request.getParams()["inner"]);
@@ -271,7 +271,7 @@ TEST_F(RequestTest, ItsOwnFieldsCanBeSetAgain)
     ExpectFields(request, {"DR.Node", "get", 9, FullRequest().getParams()});
 }
 
-TEST_F(RequestTest, ClearGoesBackToTheDefaultsButKeepsEncryption)
+TEST_F(RequestTest, ClearRestoresTheDefaultsButKeepsEncryption)
 {
     for (const bool encrypted : {true, false}) {
         Request request = FullRequest();
@@ -281,11 +281,11 @@ TEST_F(RequestTest, ClearGoesBackToTheDefaultsButKeepsEncryption)
         EXPECT_EQ(request.getTimeout(), 300);
         EXPECT_EQ(request.getUploadFile().name, "");
         EXPECT_EQ(request.getUploadFile().path, "");
-        EXPECT_EQ(request.isEncryptRequired(), encrypted);  // kept, on purpose
+        EXPECT_EQ(request.isEncryptRequired(), encrypted);  // the contract keeps it
     }
 }
 
-TEST_F(RequestTest, ClearKeepsTheTypeOfObjectsAndArraysAndMakesAllElseNull)
+TEST_F(RequestTest, ClearEmptiesObjectsAndArraysAndMakesEverythingElseNull)
 {
     for (const JsonKind& kind : JsonKinds()) {
         Json::Value expected;
@@ -331,7 +331,7 @@ TEST_F(RequestTest, EveryKeyButTheReservedOnesIsValid)
     }
 }
 
-TEST_F(RequestTest, AParameterOfEveryKindIsAddedOrReplaced)
+TEST_F(RequestTest, AParameterOfAnyTypeIsAddedOrReplaced)
 {
     for (const JsonKind& kind : JsonKinds()) {
         Request request;
@@ -365,7 +365,7 @@ TEST_F(RequestTest, AReservedKeyIsRefusedAndNothingChanges)
     }
 }
 
-TEST_F(RequestTest, AReservedKeyThatStayedFromJsonIsNotReplacedEither)
+TEST_F(RequestTest, AReservedKeyKeptFromJsonCannotBeReplaced)
 {
     Request request(ParseJson(R"({"version":"1"})"));
     EXPECT_FALSE(request.addParam("version", 2));
@@ -373,7 +373,7 @@ TEST_F(RequestTest, AReservedKeyThatStayedFromJsonIsNotReplacedEither)
     EXPECT_TRUE(Same(request.getParams(), ParseJson(R"({"version":"1"})")));
 }
 
-TEST_F(RequestTest, ParametersThatAreNeitherNullNorAnObjectTakeNoOthers)
+TEST_F(RequestTest, ParametersThatAreNeitherNullNorAnObjectRefuseNewOnes)
 {
     for (const JsonKind& kind : JsonKinds()) {
         SCOPED_TRACE(kind.text);
@@ -395,7 +395,7 @@ TEST_F(RequestTest, ParametersThatAreNeitherNullNorAnObjectTakeNoOthers)
     }
 }
 
-TEST_F(RequestTest, MembersOfAnObjectAreMergedWithoutTheReservedOnes)
+TEST_F(RequestTest, AnObjectsMembersAreMergedExceptReservedKeys)
 {
     Request request(ParseJson(R"({"a":1,"k":0})"));
     EXPECT_TRUE(request.addParam(ParseJson(R"({"api":"z","k":1})")));
@@ -407,7 +407,7 @@ TEST_F(RequestTest, MembersOfAnObjectAreMergedWithoutTheReservedOnes)
         {"", "", -1, ParseJson(R"({"":[],"a":{"b":null},"API":"A","k":1,"version\u0000":2})")});
 }
 
-TEST_F(RequestTest, AnObjectOfReservedKeysAloneAddsNothing)
+TEST_F(RequestTest, AnObjectWithOnlyReservedKeysAddsNothing)
 {
     Request request;
     EXPECT_TRUE(request.addParam(ParseJson(R"({"api":"z","method":"m","version":1})")));
@@ -433,8 +433,8 @@ TEST_F(RequestTest, ValuesWithoutMembersAddNothing)
     }
 }
 
-// Values of its own parameters, which change while they are added to.
-TEST_F(RequestTest, PartsOfItsOwnParametersCanBeAdded)
+// The added value is part of the parameters, which change during the call.
+TEST_F(RequestTest, ItsOwnParametersCanBeAdded)
 {
     Request request(ParseJson(R"({"a":1})"));
     EXPECT_TRUE(request.addParam("x", request.getParams()));
@@ -446,7 +446,7 @@ TEST_F(RequestTest, PartsOfItsOwnParametersCanBeAdded)
     EXPECT_TRUE(Same(request.getParams(), ParseJson(R"({"a":1,"x":1})")));
 }
 
-TEST_F(RequestTest, AMemberCanBeMergedThatReplacesItself)
+TEST_F(RequestTest, AMergedMemberMayReplaceItself)
 {
     Request request(ParseJson(R"({"sub":{"a":1,"sub":{"sub":2},"z":3}})"));
     EXPECT_TRUE(request.addParam(request.getParams()["sub"]));
@@ -514,7 +514,7 @@ TEST_F(RequestTest, TheTextIsApiMethodAndVersion)
     EXPECT_EQ(Request("A", -2147483647 - 1, "m", params).toStr(), "A/m/-2147483648");
 }
 
-TEST_F(RequestTest, TheJsonFormOfEveryKindOfParametersIsAnObject)
+TEST_F(RequestTest, TheJsonFormIsAnObjectWhateverTheParametersAre)
 {
     for (const JsonKind& kind : JsonKinds()) {
         const Request request("DR.Node", 2, "get", kind.value);
@@ -530,7 +530,7 @@ TEST_F(RequestTest, TheJsonFormOfEveryKindOfParametersIsAnObject)
     }
 }
 
-TEST_F(RequestTest, TheJsonFormHoldsNothingButParametersAndReservedKeys)
+TEST_F(RequestTest, TheJsonFormHoldsOnlyParametersAndReservedKeys)
 {
     EXPECT_TRUE(
         Same(FullRequest().toJson(), ParseJson(R"({"api":"DR.Node","method":"get","version":9,
@@ -538,7 +538,7 @@ TEST_F(RequestTest, TheJsonFormHoldsNothingButParametersAndReservedKeys)
     EXPECT_TRUE(Same(Request().toJson(), ParseJson(R"({"api":"","method":"","version":-1})")));
 }
 
-TEST_F(RequestTest, ARequestComesBackFromItsJsonForm)
+TEST_F(RequestTest, ARequestCanBeRebuiltFromItsJsonForm)
 {
     for (const JsonKind& kind : JsonKinds()) {
         Json::Value params;
@@ -548,12 +548,12 @@ TEST_F(RequestTest, ARequestComesBackFromItsJsonForm)
     }
     const Request empty("DR.Node", 2, "get", Json::Value(Json::objectValue));
     ExpectFields(Request(empty.toJson()), {"DR.Node", "get", 2, Json::Value(Json::objectValue)});
-    // Null parameters have the same JSON form as none, and come back as an empty object.
+    // Null parameters come back as an empty object, because their JSON form is the same.
     const Request null("DR.Node", 2, "get", Json::Value());
     ExpectFields(Request(null.toJson()), {"DR.Node", "get", 2, Json::Value(Json::objectValue)});
 }
 
-TEST_F(RequestTest, ARequestThatIsNotValidComesBackToo)
+TEST_F(RequestTest, AnInvalidRequestCanBeRebuiltToo)
 {
     ExpectFields(Request(Request().toJson()), {"", "", -1, Json::Value(Json::objectValue)});
 }

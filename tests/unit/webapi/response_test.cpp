@@ -19,7 +19,7 @@ namespace {
 
 using OrvaDRCore::Response;
 
-// What is said of one key: whether it is there, and its value.
+// Whether a key exists, and its value.
 struct Field {
     bool has = false;
     Json::Value value;
@@ -27,7 +27,7 @@ struct Field {
     bool operator==(const Field& other) const { return has == other.has && value == other.value; }
 };
 
-// The answers to all questions, as those of a reply that says nothing.
+// The answers to every question. The defaults are those of an empty reply.
 struct Answers {
     bool isValid = false;
     bool isSuccess = false;
@@ -104,9 +104,8 @@ Answers Ask(const Response& response)
     return answers;
 }
 
-// A reply by what stands in each of its places; nothing does where there is null. A value for
-// `error` or `data` stands there instead of the object that holds the places below, and one for
-// `whole` instead of the whole reply.
+// A reply, as the value at each of its places; null means that the place is empty. A value for
+// `error` or `data` replaces the object with the places below it, a value for `whole` everything.
 struct Places {
     using Choice = const JsonKind*;
 
@@ -173,7 +172,7 @@ constexpr const JsonKind* Places::*AllPlaces[] = {
     &Places::data,  &Places::finish,  &Places::dataSuccess, &Places::taskId, &Places::additional,
 };
 
-// The settled answers to a reply, from what was put where.
+// The answers that the contract requires.
 Answers Expected(const Places& places)
 {
     Answers answers;
@@ -216,7 +215,7 @@ const JsonKind* Kind(const std::string& text)
     throw std::out_of_range(text);
 }
 
-// A reply that has something to say in every place.
+// A reply with a value in every place.
 Places FullReply(const char* success)
 {
     Places places;
@@ -230,7 +229,7 @@ Places FullReply(const char* success)
     return places;
 }
 
-// Every kind, and nothing.
+// Every type of value, and null for none.
 std::vector<const JsonKind*> Choices()
 {
     std::vector<const JsonKind*> choices{nullptr};
@@ -261,7 +260,7 @@ const char* const GoodReply =
 
 // ------------------------------------------------------------------------- every kind, everywhere
 
-TEST_F(ResponseTest, EveryQuestionHasAnAnswerToEveryKindInEveryPlace)
+TEST_F(ResponseTest, EveryQuestionIsAnsweredForAnyTypeInAnyPlace)
 {
     for (const Places& base : {FullReply("true"), FullReply("false"), Places()}) {
         for (const auto place : AllPlaces) {
@@ -274,10 +273,10 @@ TEST_F(ResponseTest, EveryQuestionHasAnAnswerToEveryKindInEveryPlace)
     }
 }
 
-TEST_F(ResponseTest, EveryTwoPlacesMayHoldEveryTwoKinds)
+TEST_F(ResponseTest, AnyTwoPlacesMayHoldAnyTwoTypes)
 {
     constexpr std::size_t Count = sizeof AllPlaces / sizeof *AllPlaces;
-    for (std::size_t first = 1; first < Count; ++first) {  // a whole reply leaves no second place
+    for (std::size_t first = 1; first < Count; ++first) {  // from 1: `whole` has no second place
         for (std::size_t second = first + 1; second < Count; ++second) {
             for (const JsonKind* one : Choices()) {
                 for (const JsonKind* other : Choices()) {
@@ -350,7 +349,7 @@ TEST_F(ResponseTest, ArraysAndObjectsWithoutSuccessAreNotValid)
     }
 }
 
-TEST_F(ResponseTest, TheErrorItselfNeedsNoValidReply)
+TEST_F(ResponseTest, AnInvalidReplyStillGivesItsError)
 {
     const Response response(R"({"error":{"code":1,"errors":"e"}})");
     EXPECT_TRUE(Same(response.getErr(), ParseJson(R"({"code":1,"errors":"e"})")));
@@ -364,7 +363,7 @@ TEST_F(ResponseTest, ErrorsOfASuccessfulReplyAreReadToo)
     EXPECT_TRUE(Same(response.getErrMsg(), Json::Value("e")));
 }
 
-TEST_F(ResponseTest, OnlyAnIntegerOfTheRangeOfIntIsACode)
+TEST_F(ResponseTest, OnlyA32BitIntegerIsACode)
 {
     struct Row {
         const char* code;
@@ -380,7 +379,7 @@ TEST_F(ResponseTest, OnlyAnIntegerOfTheRangeOfIntIsACode)
              Row{"2147483648", -1},
              Row{"-2147483649", -1},
              Row{"18446744073709551615", -1},
-             Row{"3.0", 3},  // the JSON library takes it for an integer
+             Row{"3.0", 3},  // jsoncpp counts it as an integer
              Row{"1e2", 100},
              Row{"3.5", -1},
              Row{"1e300", -1},
@@ -396,7 +395,7 @@ TEST_F(ResponseTest, OnlyAnIntegerOfTheRangeOfIntIsACode)
     }
 }
 
-TEST_F(ResponseTest, ACodeMayBeAnyNumberThatAJsonValueCanHold)
+TEST_F(ResponseTest, TheCodeIsReadFromEveryNumericType)
 {
     const auto codeOf = [](const Json::Value& code) {
         Json::Value reply;
@@ -411,7 +410,7 @@ TEST_F(ResponseTest, ACodeMayBeAnyNumberThatAJsonValueCanHold)
     EXPECT_EQ(codeOf(Json::Value(std::numeric_limits<double>::quiet_NaN())), -1);
 }
 
-TEST_F(ResponseTest, ErrorsAreCopiesOfTheirOwn)
+TEST_F(ResponseTest, ErrorsAreReturnedAsCopies)
 {
     Response response(R"({"success":false,"error":{"errors":["a"]}})");
     Json::Value errors = response.getErrMsg();
@@ -426,7 +425,7 @@ TEST_F(ResponseTest, ErrorsAreCopiesOfTheirOwn)
 
 // -------------------------------------------------------------------------------- data and fields
 
-TEST_F(ResponseTest, NoDataOfAFailedReplyIsGivenOut)
+TEST_F(ResponseTest, AFailedReplyGivesOutNoData)
 {
     const Response response(
         R"({"success":false,"data":{"finish":true,"success":true,"task_id":"t1","additional":1}})");
@@ -438,10 +437,10 @@ TEST_F(ResponseTest, NoDataOfAFailedReplyIsGivenOut)
     EXPECT_FALSE(response.isPollFinish());
     EXPECT_FALSE(response.isPollSuccess());
     EXPECT_FALSE(response.hasAdditional());
-    EXPECT_TRUE(response.hasField("data"));  // a question about the reply, not about its data
+    EXPECT_TRUE(response.hasField("data"));  // asks the reply, not its data
 }
 
-TEST_F(ResponseTest, PollingReadsSuccessInsideTheData)
+TEST_F(ResponseTest, PollResultsComeFromTheData)
 {
     EXPECT_FALSE(Response(R"({"success":true,"data":{}})").isPollSuccess());
     EXPECT_FALSE(Response(R"({"success":true,"data":{"success":false}})").isPollSuccess());
@@ -450,7 +449,7 @@ TEST_F(ResponseTest, PollingReadsSuccessInsideTheData)
     EXPECT_FALSE(Response(R"({"success":true,"finish":true,"data":{}})").isPollFinish());
 }
 
-TEST_F(ResponseTest, ATaskIdThatIsANumberIsConvertedAndAFieldThatIsOneIsNot)
+TEST_F(ResponseTest, ANumericTaskIdIsConvertedButANumericFieldIsNot)
 {
     const Response response(R"({"success":true,"data":{"task_id":42}})");
     EXPECT_TRUE(response.hasDataField("task_id"));
@@ -458,7 +457,7 @@ TEST_F(ResponseTest, ATaskIdThatIsANumberIsConvertedAndAFieldThatIsOneIsNot)
     EXPECT_EQ(response.getDataFieldtoStr("task_id"), "");
 }
 
-TEST_F(ResponseTest, TextsAreGivenOutByteForByte)
+TEST_F(ResponseTest, StringsAreReturnedByteForByte)
 {
     const Response response("{\"success\":true,\"data\":{\"task_id\":\"a\\u0000b\xff\xe2\x82\"}}");
     const std::string expected("a\0b\xff\xe2\x82", 6);
@@ -466,7 +465,7 @@ TEST_F(ResponseTest, TextsAreGivenOutByteForByte)
     EXPECT_EQ(response.getDataFieldtoStr("task_id"), expected);
 }
 
-TEST_F(ResponseTest, AMemberThatIsNullIsThere)
+TEST_F(ResponseTest, ANullMemberExists)
 {
     const Response response(R"({"success":true,"data":{"additional":null},"other":null})");
     EXPECT_TRUE(response.hasField("other"));
@@ -490,7 +489,7 @@ TEST_F(ResponseTest, EveryKeyCanBeAskedFor)
     EXPECT_FALSE(response.hasDataField("1"));
 }
 
-TEST_F(ResponseTest, NullIsNoKey)
+TEST_F(ResponseTest, ANullKeyIsMissing)
 {
     for (const char* data : {"{}", R"({"":1})", "null", "[1]", R"("text")"}) {
         const Response response(R"({"success":true,"":1,"data":)" + std::string(data) + "}");
@@ -510,7 +509,7 @@ TEST_F(ResponseTest, NullIsNoKey)
     }
 }
 
-TEST_F(ResponseTest, WhatIsAbsentIsTheSameNullOnEveryCall)
+TEST_F(ResponseTest, MissingMembersGiveTheSameNullOnEveryCall)
 {
     for (const char* text : {"null", "[]", "{}", R"({"success":false,"data":{"additional":1}})",
                              R"({"success":true})"}) {
@@ -531,7 +530,7 @@ TEST_F(ResponseTest, WhatIsAbsentIsTheSameNullOnEveryCall)
     }
 }
 
-TEST_F(ResponseTest, ReferencesPointIntoTheReplyAndStayGood)
+TEST_F(ResponseTest, ReferencesPointIntoTheReplyAndStayValid)
 {
     const Response response(
         R"({"success":true,"data":{"additional":{"a":1},"finish":true},"error":{"code":1}})");
@@ -562,7 +561,7 @@ TEST_F(ResponseTest, ATextThatDoesNotParseLeavesANullReply)
     }
 }
 
-TEST_F(ResponseTest, AReplyThatBreaksOffAnywhereIsNull)
+TEST_F(ResponseTest, ATruncatedReplyIsNull)
 {
     const std::string text = GoodReply;
     Response response;
@@ -576,7 +575,7 @@ TEST_F(ResponseTest, AReplyThatBreaksOffAnywhereIsNull)
     }
 }
 
-TEST_F(ResponseTest, AReplyThatGoesOnIsNull)
+TEST_F(ResponseTest, AReplyWithTrailingTextIsNull)
 {
     for (const char* tail : {" x", "}", ",", " {}", "\"", " null", "\n[", "/"}) {
         Response response(GoodReply);
@@ -608,7 +607,7 @@ TEST_F(ResponseTest, ANullPointerIsATextThatDoesNotParse)
     ExpectNull(response);
 }
 
-TEST_F(ResponseTest, ATextGivenAsAJsonValueIsNotParsed)
+TEST_F(ResponseTest, AJsonStringIsNotParsed)
 {
     const Response response{Json::Value(GoodReply)};
     EXPECT_TRUE(Same(response.getResp(), Json::Value(GoodReply)));
@@ -627,7 +626,7 @@ TEST_F(ResponseTest, APartOfTheReplyCanBecomeTheReply)
     EXPECT_TRUE(Same(response.getResp(), ParseJson(R"({"success":1})")));
 }
 
-TEST_F(ResponseTest, ClearEmptiesObjectsAndArraysAndMakesAllElseNull)
+TEST_F(ResponseTest, ClearEmptiesObjectsAndArraysAndMakesEverythingElseNull)
 {
     for (const JsonKind& kind : JsonKinds()) {
         Response response(kind.value);
@@ -646,7 +645,7 @@ TEST_F(ResponseTest, ClearEmptiesObjectsAndArraysAndMakesAllElseNull)
 
 // ----------------------------------------------------------------------------------------- copies
 
-TEST_F(ResponseTest, ACopyAnswersLikeItsSourceAndLivesOn)
+TEST_F(ResponseTest, ACopyAnswersLikeItsSourceAndOutlivesIt)
 {
     for (const JsonKind* choice : Choices()) {
         Places places = FullReply("true");
