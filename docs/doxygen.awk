@@ -1,18 +1,18 @@
-# What Doxygen reads in place of a header or page, so that both look right in the reference and the
-# sources stay as their readers want them:
+# Rewrites a header or page for Doxygen, so that the reference looks right and the sources stay easy
+# to read:
 #
-#     %s in words                %%s: Doxygen takes a "%" before a word away
-#     ERR, the log level         %ERR: it is not the class of that name
+#     %s in a sentence           %%s, because Doxygen removes a "%" before a word
+#     ERR, the log level         %ERR, or it would link to the class ERR
 #     ## Some words              ## Some words {#PAGE-some-words}
 #     [text](page.md#some-words) [text](@ref PAGE-some-words), PAGE being docs-page
 #     [text](../include/d/x.h)   [text](@ref d/x.h)
-#     [text](../src/x.cpp)       a link from build/docs/html to the file in the sources
-#     `it's`                     ``it's``, or the code would end at the quote
+#     [text](../src/x.cpp)       a link from build/docs/html to the source file
+#     `it's`                     ``it's``, or the quote would end the code
 #     **`code` first**           <b>`code` first</b>, or it would not be bold
 #
-# Code blocks, images and links to whole pages are passed on as they are.
+# Code blocks, images and links to whole pages do not change.
 
-# A path beside or above the page, from the top of the sources.
+# A link's path, relative to the top folder instead of the page.
 function from_top(link,    path, parts, count, at, kept) {
     path = (link ~ /^\// ? "" : folder) link
     count = split(path, parts, "/")
@@ -30,7 +30,7 @@ function label(page, heading) {
     return page "-" heading
 }
 
-# The anchor that the web view of a repository gives a heading.
+# The anchor that a repository's web view gives a heading.
 function anchor(heading) {
     heading = tolower(heading)
     gsub(/[^a-z0-9 _-]/, "", heading)
@@ -42,7 +42,7 @@ function in_reference(page) {
     return page ~ /^(README|CONTRIBUTING|CHANGELOG)\.md$/ || page ~ /^docs\/.*\.md$/
 }
 
-# `text` and `link` of [text](link), as Doxygen is to have it.
+# [text](link), written for Doxygen.
 function rewritten(text, link,    page, hash) {
     if (link ~ /^[a-z]+:/ || link ~ /^@ref /) return "[" text "](" link ")"
     hash = index(link, "#")
@@ -68,7 +68,7 @@ function with_links(line,    done, found, close_at) {
     return done line
 }
 
-# A single quote ends what one backtick begins; two backticks it leaves alone.
+# Doubles the backticks of code that contains a single quote, which would end it.
 function with_code(line,    done, span) {
     span = line
     if (index(line, "``") || gsub(/`/, "", span) % 2) return line
@@ -81,7 +81,7 @@ function with_code(line,    done, span) {
     return done line
 }
 
-# Bold text that begins with code; it may end on a later line.
+# Marks bold text that begins with code. It may end on a later line.
 function with_bold(line,    done, at) {
     done = ""
     while ((at = index(line, in_bold ? "**" : "**`")) > 0) {
@@ -92,7 +92,7 @@ function with_bold(line,    done, at) {
     return done line
 }
 
-# Between double quotes Doxygen leaves words alone.
+# Escapes "%" and ERR, except between double quotes, where Doxygen changes nothing.
 function with_marks(line,    parts, count, at, done) {
     count = split(line, parts, "\"")
     for (at = 1; at <= count; ++at) {
@@ -130,7 +130,7 @@ page_file && /^##+ / {
     $0 = $0 " {#" label(path, name (repeated ? "-" repeated : "")) "}"
 }
 
-# A link or image that goes on on the next line becomes one line.
+# Joins a link or image that is split over two lines.
 page_file {
     while ($0 ~ /\[[^]]*$/ && (getline following) > 0) {
         if (following ~ /^ *$/) {

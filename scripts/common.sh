@@ -1,19 +1,19 @@
-# What the scripts of this folder share; each begins with: source "$(dirname "$0")/common.sh"
+# Shared by all scripts in this folder, which begin with: source "$(dirname "$0")/common.sh"
 # shellcheck shell=bash
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")/.."
 
-# What the library and its examples are built with and run with.
+# To build and run the library and its examples.
 # shellcheck disable=SC2034  # used by the scripts that read this file
 build_packages=(g++ make cmake libsqlite3-dev libjsoncpp-dev uuid-runtime
     libcpp-httplib-dev pkg-config) # these two for examples/node_service
 # shellcheck disable=SC2034
 test_packages=(libgtest-dev libgmock-dev)
 # shellcheck disable=SC2034
-bench_packages=(libbenchmark-dev pkg-config)
+bench_packages=(libbenchmark-dev libcli11-dev pkg-config)
 # shellcheck disable=SC2034
 plot_packages=(gnuplot-nox)
-# What the benchmarks measure beside the library; they do without what is not to be had.
+# Other libraries that the benchmarks measure. Those that cannot be installed are left out.
 # shellcheck disable=SC2034
 peer_packages=(libsqlitecpp-dev libsoci-dev libinih-dev libglib2.0-dev libboost-dev)
 # shellcheck disable=SC2034
@@ -26,25 +26,25 @@ fail() {
     exit 1
 }
 
-# help_if_asked ARGUMENT...: for -h and --help prints the comment at the head of the script, and ends.
+# help_if_asked ARGUMENT...: for -h or --help, prints the comment at the top of the script and exits.
 help_if_asked() {
     [[ ${1:-} == -h || ${1:-} == --help ]] || return 0
     sed -n '2,/^$/s/^# \{0,1\}//p' "scripts/$(basename "$0")"
     exit
 }
 
-# quietly NAME COMMAND...: keeps the command's output in build/NAME.log, shows it when it fails.
+# quietly NAME COMMAND...: writes the output to build/NAME.log, and shows its end if the command fails.
 quietly() {
     local log=build/$1.log
     shift
     mkdir -p build
     if ! "$@" >"$log" 2>&1 </dev/null; then
         tail -n 60 "$log" >&2
-        fail "'$*' failed; all of its output is in $log"
+        fail "'$*' failed; the whole output is in $log"
     fi
 }
 
-# install_missing PACKAGE...: installs the Debian packages that are not there yet.
+# install_missing PACKAGE...: installs those Debian packages that are not installed yet.
 install_missing() {
     local package missing=() as_root=()
     for package; do
@@ -53,15 +53,15 @@ install_missing() {
         fi
     done
     if ((${#missing[@]} == 0)); then
-        step "packages: all there"
+        step "packages: all installed"
         return
     fi
-    command -v apt-get >/dev/null || fail "no apt-get here; install by hand: ${missing[*]}"
+    command -v apt-get >/dev/null || fail "apt-get not found; please install: ${missing[*]}"
     if ((EUID != 0)); then
-        command -v sudo >/dev/null || fail "neither root nor sudo; install as root: ${missing[*]}"
+        command -v sudo >/dev/null || fail "neither root nor sudo; please install as root: ${missing[*]}"
         as_root=(sudo)
     fi
-    step "packages: installing ${missing[*]} (once, takes a minute or two)"
+    step "packages: installing ${missing[*]} (only once; takes a minute or two)"
     quietly apt-update "${as_root[@]}" apt-get update
     quietly apt-install "${as_root[@]}" env DEBIAN_FRONTEND=noninteractive \
         apt-get install -y --no-install-recommends "${missing[@]}"
@@ -77,8 +77,8 @@ build() {
     quietly "$preset-build" cmake --build --preset "$preset" -j "$(nproc)"
 }
 
-# build_package: builds what is packaged, with the flags of Debian's own packages; CMake knows no
-# CPPFLAGS.
+# build_package: builds with the flags of Debian's own packages. CMake ignores CPPFLAGS, so they are
+# added to CXXFLAGS.
 build_package() (
     CXXFLAGS="$(dpkg-buildflags --get CXXFLAGS) $(dpkg-buildflags --get CPPFLAGS)"
     LDFLAGS="$(dpkg-buildflags --get LDFLAGS) -Wl,-z,now"
@@ -86,12 +86,12 @@ build_package() (
     build package
 )
 
-# read_by_tidy GREP-OPTION...: has clang-tidy read the sources whose paths grep picks.
+# read_by_tidy GREP-OPTION...: runs clang-tidy on the sources whose paths grep selects.
 read_by_tidy() {
     install_missing clang clang-tidy
     quietly tidy-configure cmake --preset tidy
     sed -n 's/^  "file": "\(.*\)",\{0,1\}$/\1/p' build/tidy/compile_commands.json |
         grep "$@" | sort >build/tidy-sources
-    step "reading $(wc -l <build/tidy-sources) sources"
+    step "checking $(wc -l <build/tidy-sources) sources"
     xargs -P "$(nproc)" -n 1 clang-tidy -p build/tidy --quiet <build/tidy-sources 2>build/tidy.log
 }
