@@ -1,12 +1,9 @@
-// Checks the contestants of each item against each other, measures them by turns, and prints a table.
-//
-//     orvadr_bench [--quick] [--curves | --writers] [--out NAME] [TEXT]
-//
-// TEXT picks the items whose name holds it. The figures go to NAME.csv, as a table to NAME.md, and
-// those of processes to NAME-processes.csv and .md. Files of the benchmarks lie in the working directory, in
-// /dev/shm and, for locks, in /tmp/.orvadr_lock; they are removed at the end.
+// Checks that the contestants of each item agree, measures them in turn, and prints a table: see
+// --help. The benchmarks keep their files in the working directory, in /dev/shm and, for locks, in
+// /tmp/.orvadr_lock, and remove them at the end.
 #include <benchmark/benchmark.h>
 
+#include <CLI/CLI.hpp>
 #include <cstdio>
 #include <exception>
 #include <string>
@@ -19,6 +16,8 @@ namespace {
 
 using Bench::Item;
 
+constexpr int ExitUsage = 2;
+
 struct Options {
     bool quick = false;
     bool curves = false;
@@ -27,28 +26,20 @@ struct Options {
     std::string text;
 };
 
-Options ParseOptions(const std::vector<std::string>& arguments)
+void AddOptions(CLI::App& app, Options& options)
 {
-    Options options;
-    for (auto at = arguments.begin(); at != arguments.end(); ++at) {
-        if (*at == "--quick") {
-            options.quick = true;
-        } else if (*at == "--curves") {
-            options.curves = true;
-        } else if (*at == "--writers") {
-            options.writers = true;
-        } else if (*at == "--out" && at + 1 != arguments.end()) {
-            options.out = *++at;
-        } else {
-            Bench::Require(at->compare(0, 2, "--") != 0, "unknown option");
-            options.text = *at;
-        }
-    }
-    return options;
+    app.add_flag("--quick", options.quick, "each item once and briefly");
+    auto* curves = app.add_flag("--curves", options.curves, "measure how the cost grows");
+    app.add_flag("--writers", options.writers, "measure many processes that write to one file")
+        ->excludes(curves);
+    app.add_option("--out", options.out,
+                   "write the figures to NAME.csv and NAME.md, and those of processes to "
+                   "NAME-processes.csv and NAME-processes.md")
+        ->type_name("NAME");
+    app.add_option("TEXT", options.text, "only items whose name contains this");
 }
 
-// The repetitions of an item's contestants are shuffled: what slows the machine down for a while
-// meets all of them.
+// Repetitions are shuffled, so that a machine that is slow for a while slows all contestants.
 void InitializeLibrary(bool quick)
 {
     std::vector<std::string> arguments{"orvadr_bench",
@@ -87,11 +78,11 @@ void NamePeersLeftOut()
     for (const Peer& peer : {Peer{"SQLiteCpp", BENCH_HAS_SQLITECPP}, Peer{"SOCI", BENCH_HAS_SOCI},
                              Peer{"inih", BENCH_HAS_INIH}, Peer{"GLib", BENCH_HAS_GLIB},
                              Peer{"Boost", BENCH_HAS_BOOST}}) {
-        if (!peer.there) std::printf("left out: %s is not on this system\n", peer.name);
+        if (!peer.there) std::printf("left out: %s is not installed\n", peer.name);
     }
 }
 
-// All contestants of an item give what the first one gives.
+// Every contestant must give the first one's result.
 void CheckResults(const Item& item)
 {
     std::string expected;
@@ -143,9 +134,15 @@ void Run(const Options& options)
 
 int main(int argc, char** argv)
 {
+    CLI::App app("Measures the library, the same work by hand, and other libraries.");
+    Options options;
+    AddOptions(app, options);
     try {
-        Run(ParseOptions({argv + 1, argv + argc}));
+        app.parse(argc, argv);
+        Run(options);
         return 0;
+    } catch (const CLI::ParseError& error) {  // --help is one, too
+        return app.exit(error) == 0 ? 0 : ExitUsage;
     } catch (const std::exception& failure) {
         (void)std::fprintf(stderr, "orvadr_bench: %s\n", failure.what());
         return 1;

@@ -117,8 +117,7 @@ bool Request::addParam(const Json::Value& object)
     for (auto member = members.begin(); member != members.end(); ++member) {
         const Json::Value key = member.key();
         if (!key.isConvertibleTo(Json::stringValue)) {
-            allTaken =
-                false;  // GCOVR_EXCL_LINE: jsoncpp's keys are names and numbers, which convert
+            allTaken = false;  // GCOVR_EXCL_LINE: a key is a name or a number, which convert
         } else if (isValidKey(key.asString())) {
             params_[key.asString()] = *member;
         }
