@@ -1,5 +1,5 @@
-// The library in one screen: makes a table, inserts two records and prints what is stored.
-#include <cstdio>
+// The library on one screen: creates a table, inserts two records and prints what is stored.
+// [readme]
 #include <cstdlib>
 #include <iostream>
 #include <string>
@@ -8,32 +8,24 @@
 #include <orvadrcore/sqlite_command.h>
 #include <orvadrcore/sqlite_db.h>
 
-using OrvaDRCore::InsertCommand;
-using OrvaDRCore::SelectCommand;
-using OrvaDRCore::SqliteDB;
-using OrvaDRCore::SqliteTableHandler;
-using OrvaDRCore::SqliteValue;
-using OrvaDRCore::SqliteValueList;
-
 int main()
 {
-    static_cast<void>(std::remove("quick_start.db"));  // so that the program may run again
-    // [readme]
-    SqliteDB db("quick_start.db", 3);
-    const SqliteTableHandler nodes("nodes", "name TEXT PRIMARY KEY, port INTEGER");
+    OrvaDRCore::SqliteDB db("quick_start.db", 3);
+    const OrvaDRCore::SqliteTableHandler nodes("nodes", "name TEXT PRIMARY KEY, port INTEGER");
     for (const std::string name : {"backup-01", "O'Brien's NAS"}) {
-        InsertCommand insert;
+        OrvaDRCore::InsertCommand insert;
         insert.SetTable(nodes);
-        insert.AddFieldValue("name", SqliteValue::EscapeText(name));
+        insert.SetReplacable(true);
+        insert.AddFieldValue("name", OrvaDRCore::SqliteValue::EscapeText(name));
         insert.AddFieldValue("port", 5001);
         if (!db.InsertRecord(insert)) return EXIT_FAILURE;
     }
-    SelectCommand select;
+    OrvaDRCore::SelectCommand select;
     select.SetTable(nodes);
     select.SelectAll();
-    std::vector<SqliteValueList> rows;
+    std::vector<OrvaDRCore::SqliteValueList> rows;
     if (!db.SelectRecords(select, rows)) return EXIT_FAILURE;
-    for (const SqliteValueList& row : rows) std::cout << row.ToStr() << '\n';
-    // [/readme]
+    for (const auto& row : rows) std::cout << row.ToStr() << '\n';
     return EXIT_SUCCESS;
 }
+// [/readme]

@@ -1,5 +1,5 @@
-// A cache that two processes share: the first reader asks the nodes, the other takes what is there.
-// For root.
+// A cache that two processes share: the first reader asks the nodes, the other gets stored data.
+// Needs root.
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -23,7 +23,7 @@ class NodeStatus : public Cache {
 
     Json::Value GetInfo() const override { return "node status"; }
 
-    // May run in a child: it uses nothing that the caller has open.
+    // May run in a child process, so it uses nothing that the caller has open.
     bool GetUpdatedData(Json::Value& data) const override
     {
         std::cout << "asking the nodes" << std::endl;

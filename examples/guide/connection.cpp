@@ -1,4 +1,4 @@
-// A connection that meets a lock, a directory that is not there, and a child made by fork.
+// A connection that meets a lock, a missing directory and a forked child.
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -34,10 +34,10 @@ InsertCommand Insert(const std::string& name)
 }
 
 // [constraint]
-// SQLite's result code for a row that the schema refuses, SQLITE_CONSTRAINT in <sqlite3.h>.
+// SQLite's code for a row that the schema refuses: SQLITE_CONSTRAINT in <sqlite3.h>.
 constexpr int SqliteConstraint = 19;
 
-// SQLite's result code of the last try; 0 when the failure was none of SQLite's.
+// SQLite's code of the last attempt; 0 if SQLite did not fail.
 int LastSqliteCode(const SqliteDB& db)
 {
     const Json::Value& tries = db.GetErr();
@@ -53,10 +53,10 @@ bool AddFromChild(const std::string& name)
     if (child == 0) {
         bool isAdded = false;
         {
-            SqliteDB own(Database, 5);  // never the parent's object
+            SqliteDB own(Database, 5);  // never use the parent's object
             isAdded = own.InsertRecord(Insert(name));
         }
-        ::_exit(isAdded ? EXIT_SUCCESS : EXIT_FAILURE);  // no destructor of the parent's objects
+        ::_exit(isAdded ? EXIT_SUCCESS : EXIT_FAILURE);  // skips the parent's destructors
     }
     // [/fork]
     int status = -1;
@@ -69,7 +69,7 @@ int main()
 {
     // [open]
     SqliteDB nowhere("no/such/directory/nodes.db", 5);
-    if (!nowhere.InsertRecord(Insert("backup-01"))) {  // at once: opening is not retried
+    if (!nowhere.InsertRecord(Insert("backup-01"))) {  // fails at once: opening is not retried
         std::cout << "code " << nowhere.GetErrCode() << ", tries " << nowhere.GetErr().size()
                   << '\n';
     }
@@ -80,7 +80,7 @@ int main()
     SqliteDB db(Database, 1);
     if (!db.InsertRecord(Insert("backup-01"))) return EXIT_FAILURE;
     if (!other.Open() || !other.Exec("BEGIN IMMEDIATE")) return EXIT_FAILURE;
-    if (!db.InsertRecord(Insert("backup-02"))) {  // two tries, each waits for a second
+    if (!db.InsertRecord(Insert("backup-02"))) {  // two attempts, each waits for a second
         std::cout << "code " << db.GetErrCode() << ", tries " << db.GetErr().size()
                   << ", SQLite's code " << LastSqliteCode(db) << '\n';
     }

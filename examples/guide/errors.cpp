@@ -1,4 +1,4 @@
-// Error codes, their names, and the error record of a connection.
+// Error codes, their names, and a connection's error record.
 #include <cstdlib>
 #include <iostream>
 #include <string>
@@ -34,14 +34,14 @@ int main()
     // [/names]
 
     // [record]
-    SqliteDB db("nodes.db", 1);  // a statement that fails is tried once more
+    SqliteDB db("nodes.db", 1);  // one retry after a failed attempt
     InsertCommand insert;
     insert.SetTable(SqliteTableHandler("nodes", "name TEXT PRIMARY KEY"));
     insert.AddFieldValue("name", "backup-01");
     if (!db.InsertRecord(insert)) return EXIT_FAILURE;
     std::cout << db.GetErrCode() << ' ' << (db.GetErr().isNull() ? "null" : "?") << '\n';
 
-    if (db.InsertRecord(insert)) return EXIT_FAILURE;  // the name is there already
+    if (db.InsertRecord(insert)) return EXIT_FAILURE;  // the name exists already
     std::cout << db.GetErrCode() << ", " << db.GetErr().size() << " tries\n";
     Print(db.GetErr()[0]);
     // [/record]

@@ -1,4 +1,4 @@
-// JSON documents by path and by descriptor, a document replaced whole, and directories.
+// JSON documents by path and by descriptor, replacing a document atomically, and directories.
 #include <fcntl.h>
 #include <unistd.h>
 
@@ -34,7 +34,7 @@ bool ReadWithDefaults()
 {
     // [defaults]
     Json::Value limits;
-    limits["timeout"] = 30;  // holds when there is no file
+    limits["timeout"] = 30;  // the default if there is no file
     if (!File::Read("limits.json", limits)) {
         std::cout << "limits.json is no JSON document\n";
         return false;
@@ -45,7 +45,7 @@ bool ReadWithDefaults()
 }
 
 // [descriptor]
-// A new file that nobody but its owner may read, and no link to somewhere else.
+// A new file that only its owner may read; fails if the path is a link.
 bool WritePrivate(const std::string& path, const Json::Value& session)
 {
     const int fd = ::open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0600);
@@ -64,13 +64,13 @@ bool ReadPrivate(const std::string& path, Json::Value& session)
 // [/descriptor]
 
 // [replace]
-// Whoever opens the file sees the old document or the new one, never a part. One writer at a time.
+// Readers see the old document or the new one, never a part. Only one process may write at a time.
 bool Replace(const std::string& path, const Json::Value& value)
 {
     const std::string next = path + ".new";
     const int fd = ::open(next.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0644);
     if (fd < 0) return false;
-    const int kept = ::fcntl(fd, F_DUPFD_CLOEXEC, 0);  // Write closes the other one
+    const int kept = ::fcntl(fd, F_DUPFD_CLOEXEC, 0);  // Write() closes the other one
     const bool stored = File::Write(fd, value) && ::fsync(kept) == 0;
     if (kept >= 0) ::close(kept);
     if (stored && std::rename(next.c_str(), path.c_str()) == 0) return true;
@@ -85,7 +85,7 @@ bool UseDirectories()
     const std::string path = "state/nodes/backup-01.json";
     if (!File::CreateDir(File::GetParentDir(path), 0750)) return false;
     if (!File::Write(path, Json::Value("ready"))) return false;
-    if (!File::RemoveDir("state")) return false;  // with all that is in it
+    if (!File::RemoveDir("state")) return false;  // and everything in it
     // [/directories]
     return ::access("state", F_OK) != 0;
 }

@@ -1,4 +1,4 @@
-// What the library leaves on disk: a JSON document's bytes, and the table of a database.
+// What the library writes to disk: the bytes of a JSON document, and a database table.
 #include <cstdlib>
 #include <fstream>
 #include <iostream>

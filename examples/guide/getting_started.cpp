@@ -1,5 +1,4 @@
-// What a failure looks like: an insert that the schema refuses, and what the connection tells of
-// it.
+// A failure: an insert that the schema refuses, and what the connection says about it.
 #include <cstdlib>
 #include <iostream>
 

@@ -1,4 +1,4 @@
-// What a "key=value" file gives as texts, as integers and as real numbers, odd lines included.
+// Reads a "key=value" file as texts, as integers and as real numbers. Some of its lines are odd.
 #include <cstdlib>
 #include <fstream>
 #include <iomanip>

@@ -1,4 +1,4 @@
-// Named locks: alone, shared, with several tries, across a fork and between threads. For root.
+// Named locks: exclusive, shared, with retries, across a fork and between threads. Needs root.
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -18,10 +18,10 @@ namespace {
 bool ChangeRegistry(const std::string& name)
 {
     FileLock lock(name);
-    if (!lock.lock(LOCK_EX | LOCK_NB, 5)) return false;  // six tries, a second apart
-    // What is done here is done by one process at a time.
+    if (!lock.lock(LOCK_EX | LOCK_NB, 5)) return false;  // six attempts, a second apart
+    // Only one process at a time gets here.
     std::cout << "changed\n";
-    return true;  // the object goes, and the lock with it
+    return true;  // the lock object's destructor frees the lock
 }
 // [/alone]
 
@@ -42,14 +42,14 @@ bool Share(const std::string& name)
 }
 
 // [fork]
-// A lock that the child is to have for itself is taken by an object that the child makes.
+// A child that needs the lock for itself takes it with an object of its own.
 bool LockInChild(const std::string& name)
 {
     const pid_t child = ::fork();
     if (child == 0) {
         FileLock lock(name);
         const bool locked = lock.lock(LOCK_EX | LOCK_NB, 0);
-        ::_exit(locked ? EXIT_SUCCESS : EXIT_FAILURE);  // a process that ends leaves no lock
+        ::_exit(locked ? EXIT_SUCCESS : EXIT_FAILURE);  // exiting frees the lock
     }
     int status = 0;
     return child > 0 && ::waitpid(child, &status, 0) == child && status == 0;
@@ -57,7 +57,7 @@ bool LockInChild(const std::string& name)
 // [/fork]
 
 // [threads]
-// Each thread has an object of its own. Two objects exclude each other within a process, too.
+// One object per thread. Objects exclude each other within one process, too.
 int CountInTwoThreads(const std::string& name)
 {
     int count = 0;
@@ -89,7 +89,7 @@ int main()
 
     FileLock mine(name);
     done = done && mine.lock(LOCK_EX, 0) && !LockInChild(name);
-    // Nobody else knows this name. A lock file that others may use must stay.
+    // Safe only because nobody else uses this name: a lock file in use must stay.
     ::unlink(FileLock::getLockFilePath(name).c_str());
     return done ? EXIT_SUCCESS : EXIT_FAILURE;
 }

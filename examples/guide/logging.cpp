@@ -1,4 +1,4 @@
-// Makes the library log, on standard error as well, and takes the lines apart.
+// Makes the library log, also to standard error, and splits the lines into their parts.
 #include <syslog.h>
 #include <unistd.h>
 
@@ -19,7 +19,7 @@ using OrvaDRCore::File;
 namespace {
 
 // [apart]
-// The text before a mark, which both go off the line.
+// Removes the text before `mark`, and the mark, from the line; returns the text.
 std::string Take(std::string& line, const std::string& mark)
 {
     const std::size_t at = std::min(line.find(mark), line.size());
@@ -31,7 +31,7 @@ std::string Take(std::string& line, const std::string& mark)
 // Of "guide: file.cpp:60(Write)[ERR][4242]: Empty path to write."
 void PrintParts(std::string line)
 {
-    Take(line, ": ");  // what syslog puts first
+    Take(line, ": ");  // added by syslog
     const std::string file = Take(line, ":");
     const std::string number = Take(line, "(");
     const std::string function = Take(line, ")[");
@@ -47,11 +47,11 @@ void PrintParts(std::string line)
 
 int main()
 {
-    // Standard error becomes a file, to be read again below.
+    // Redirects standard error to a file, which is read below.
     if (std::freopen("lines.txt", "w", stderr) == nullptr) return EXIT_FAILURE;
 
     // [setup]
-    ::openlog("guide", LOG_PERROR, LOG_DAEMON);  // in service: LOG_PID, without LOG_PERROR
+    ::openlog("guide", LOG_PERROR, LOG_DAEMON);  // a daemon would use LOG_PID
     // [/setup]
 
     File::Write("", Json::Value());

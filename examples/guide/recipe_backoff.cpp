@@ -1,5 +1,5 @@
-// A cache whose producer may fail: after a failure it is left alone for a while, and then longer.
-// Needs root, as every cache does; ends with 77 without it.
+// A cache whose producer may fail. After each failure it waits longer before it asks again.
+// Needs root, like every cache; exits with 77 otherwise.
 #include <unistd.h>
 
 #include <algorithm>
@@ -23,16 +23,16 @@ constexpr int ExitSkipped = 77;
 
 // [cache]
 // Holds {"value": the last good one or null, "failures": in a row, "retry_at": seconds}. A failure
-// is stored like a value, so that all processes know of it.
+// is stored like a value, so that every process learns of it.
 class NodeStatus : public Cache {
   public:
     using Producer = std::function<bool(Json::Value& ret_value)>;
     using Clock = std::function<std::time_t()>;
 
-    NodeStatus(const std::string& dir, Producer ask, Clock now)
+    NodeStatus(const std::string& dir, Producer produce, Clock clock)
         : Cache(dir, "status", TimeoutSeconds, true, SingleTry),
-          produce(std::move(ask)),
-          clock(std::move(now))
+          produce_(std::move(produce)),
+          clock_(std::move(clock))
     {
     }
 
@@ -43,7 +43,7 @@ class NodeStatus : public Cache {
         const Json::Value last = GetCachedData();
         Json::Value value;
         int failures = 0;
-        if (!produce(value)) {
+        if (!produce_(value)) {
             failures = 1;
             if (IsValidData(last)) {
                 failures = std::min(last["failures"].asInt() + 1, MostFailures);
@@ -53,31 +53,31 @@ class NodeStatus : public Cache {
         data = Json::Value(Json::objectValue);
         data["value"] = value;
         data["failures"] = failures;
-        data["retry_at"] = Json::Int64{clock() + (PauseSeconds << failures)};
+        data["retry_at"] = Json::Int64{clock_() + (PauseSeconds << failures)};
         return true;
     }
 
-    // A failure counts as data, or else each read would ask again.
+    // A failure is valid data, or each read would ask again.
     bool IsValidData(const Json::Value& data) const override
     {
         return data.isObject() && data.isMember("value") && data["failures"].isInt() &&
                data["retry_at"].isInt64();
     }
 
-    // After a failure: not before the pause is over, but then at once.
+    // After a failure, ask again as soon as the pause is over.
     bool IsNeedUpdate(const Json::Value& data) const override
     {
-        return data["failures"].asInt() > 0 && clock() >= data["retry_at"].asInt64();
+        return data["failures"].asInt() > 0 && clock_() >= data["retry_at"].asInt64();
     }
 
   private:
     static constexpr std::time_t PauseSeconds = 5;  // doubled by each failure: 10, 20, ...
     static constexpr int MostFailures = 5;          // ... 160
-    static constexpr long TimeoutSeconds = 300;     // longer than the longest pause
+    static constexpr long TimeoutSeconds = 300;     // must be longer than the longest pause
     static constexpr int SingleTry = -1;
 
-    Producer produce;
-    Clock clock;
+    Producer produce_;
+    Clock clock_;
 };
 // [/cache]
 
@@ -87,7 +87,7 @@ int main()
 {
     if (::geteuid() != 0) return ExitSkipped;
     const std::string dir = std::filesystem::current_path();
-    std::time_t now = 1700000000;  // a clock that can be put forward
+    std::time_t now = 1700000000;  // a clock that the program can advance
     bool isUp = false;
     int asked = 0;
     const auto ask = [&](Json::Value& ret_value) {

@@ -1,4 +1,4 @@
-// Columns that records cannot carry, 64-bit, real, blob and null ones, written and read as texts.
+// Columns that records cannot hold (64-bit, real, blob, NULL), written and read as text.
 #include <cstdint>
 #include <cstdlib>
 #include <iostream>
@@ -27,7 +27,7 @@ int main()
     insert.AddFieldValue("path", "/volume1");
     insert.AddFieldValue("bytes", std::to_string(bytes));  // INTEGER and REAL columns turn
     insert.AddFieldValue("load", "0.25");                  // such texts into numbers
-    if (!db.InsertRecord(insert)) return EXIT_FAILURE;     // key and note: null
+    if (!db.InsertRecord(insert)) return EXIT_FAILURE;     // key and note stay NULL
     if (!db.Exec("UPDATE volumes SET key=x'00ff27' WHERE path='/volume1'")) return EXIT_FAILURE;
     // [/write]
 

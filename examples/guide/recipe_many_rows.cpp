@@ -1,4 +1,4 @@
-// Many rows at once: all of them or none.
+// Inserts many rows at once: all or none.
 #include <cstdlib>
 #include <iostream>
 #include <string>
@@ -40,7 +40,7 @@ int main()
     // [/insert]
     if (!PrintCount(db)) return EXIT_FAILURE;
 
-    // One of these two is there already: neither comes in.
+    // One of these two exists already, so neither is inserted.
     // [refused]
     records.resize(2);
     records.front().AddValue("name", "new");

@@ -1,4 +1,4 @@
-// Texts that hold quotes and patterns, in values, in conditions and in LIKE.
+// Texts with quotes and wildcards, in values, conditions and LIKE.
 #include <cstdlib>
 #include <iostream>
 #include <string>
@@ -21,7 +21,7 @@ using OrvaDRCore::SqliteValueList;
 namespace {
 
 // [like]
-// The condition that a column's text begins with `prefix`, taken literally.
+// The condition that a column begins with `prefix`, in which wildcards are ordinary characters.
 SqliteCondition BeginsWith(const std::string& column, const std::string& prefix)
 {
     std::string pattern;

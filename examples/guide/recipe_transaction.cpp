@@ -1,4 +1,4 @@
-// Several operations that happen all or not at all, also when one of them fails.
+// Several operations that happen all or not at all, even if one of them fails.
 #include <cstddef>
 #include <cstdlib>
 #include <iostream>
@@ -22,7 +22,7 @@ using OrvaDRCore::UpdateCommand;
 namespace {
 
 // [work]
-// Moves a volume and notes it. On failure nothing has happened, and db.GetErr() tells why.
+// Moves a volume and records the move. On failure nothing has changed; db.GetErr() says why.
 bool MoveVolume(SqliteDB& db, const std::string& volume, const std::string& node)
 {
     UpdateCommand move;
@@ -38,12 +38,12 @@ bool MoveVolume(SqliteDB& db, const std::string& volume, const std::string& node
     SqliteTransaction transaction(db);
     return transaction.Begin() && db.UpdateRecord(move) && db.InsertRecord(note) &&
            transaction.Commit();
-    // What is not committed is rolled back here.
+    // Without a commit, the destructor rolls back here.
 }
 // [/work]
 
 // [decide]
-// Moves all volumes away from a node, unless more than `most` are there.
+// Moves all volumes away from a node, unless it has more than `most`.
 bool Evacuate(SqliteDB& db, const std::string& from, const std::string& to, std::size_t most)
 {
     SqliteTransaction transaction(db);
@@ -52,7 +52,7 @@ bool Evacuate(SqliteDB& db, const std::string& from, const std::string& to, std:
     const std::string isThere = SqliteEqual("node", SqliteValue::EscapeText(from)).GetCondition();
     if (!db.SelectByCommand("SELECT name FROM volumes WHERE " + isThere, rows)) return false;
     if (rows.size() > most) {
-        transaction.Rollback();  // at once: others may write again while we go on
+        transaction.Rollback();  // now, so that others can write while we continue
         std::cout << "too many volumes: " << rows.size() << '\n';
         return false;
     }
@@ -92,14 +92,14 @@ int main()
     if (!MoveVolume(db, "replica", "backup-02") || !Print(db)) return EXIT_FAILURE;
     if (!db.Exec("UPDATE volumes SET node='backup-03'")) return EXIT_FAILURE;
 
-    // The second operation of this one is refused; the first must not stay.
+    // Its second operation is refused, so its first must be undone.
     // [fails]
     if (MoveVolume(db, "replica", "backup-02")) return EXIT_FAILURE;
     std::cout << db.GetErr()[0]["err_msg"]["sqlite_errmsg"].asString() << '\n';
     // [/fails]
     if (!Print(db)) return EXIT_FAILURE;
 
-    // The connection is as good as before.
+    // The connection can be used as before.
     if (!MoveVolume(db, "replica", "backup-04") || !Print(db)) return EXIT_FAILURE;
     if (Evacuate(db, "backup-04", "backup-05", 0) || !Print(db)) return EXIT_FAILURE;
     if (!Evacuate(db, "backup-04", "backup-05", 1) || !Print(db)) return EXIT_FAILURE;

@@ -1,4 +1,4 @@
-// A table whose schema has changed since older files were made: each file is upgraded once.
+// A schema that changed between releases: each old file is upgraded once.
 #include <cstdlib>
 #include <iostream>
 #include <string>
@@ -19,7 +19,7 @@ constexpr int SchemaVersion = 2;
 constexpr const char* Schema =
     "name TEXT PRIMARY KEY, port INTEGER, enabled INTEGER NOT NULL DEFAULT 1, note TEXT";
 
-// What leads from one version to the next. Never change a step that has been given out; add one.
+// From one version to the next. Never change a step that was released; add a new one.
 const std::vector<std::string>& Steps()
 {
     static const std::vector<std::string> steps = {
@@ -35,7 +35,7 @@ bool ReadNumber(SqliteDB& db, const std::string& select, int& ret_number)
     return db.DoSelectSqliteRecord(select, row) && row.GetValue("number", ret_number);
 }
 
-// Inside the transaction, hence single tries only.
+// Uses operations without retries, because it runs inside the transaction.
 bool UpgradeAlone(SqliteDB& db)
 {
     int version = 0;
@@ -46,7 +46,7 @@ bool UpgradeAlone(SqliteDB& db)
         return false;
     }
     if (version == SchemaVersion) return true;
-    if (version > SchemaVersion) return false;  // made by a later program: leave it alone
+    if (version > SchemaVersion) return false;  // created by a newer program: leave it alone
     if (tables == 0) {
         const std::string create = std::string("CREATE TABLE nodes (") + Schema + ")";
         if (!db.DoExecSqliteCommand(create)) return false;
@@ -58,7 +58,7 @@ bool UpgradeAlone(SqliteDB& db)
     return db.DoExecSqliteCommand("PRAGMA user_version=" + std::to_string(SchemaVersion));
 }
 
-// To be called once, before anything else is done with the file.
+// Call this once, before anything else uses the file.
 bool Upgrade(SqliteDB& db)
 {
     if (!db.Open() || !db.Exec("BEGIN IMMEDIATE")) return false;
@@ -87,7 +87,7 @@ bool Print(SqliteDB& db)
 
 int main()
 {
-    // A file as the first release left it, before anybody thought of versions.
+    // A file as the first release left it, when there were no versions.
     SqliteDB old("recipe_upgrade.db", 3);
     if (!old.Open() || !old.Exec("CREATE TABLE nodes (name TEXT PRIMARY KEY, port INTEGER)") ||
         !old.Exec("INSERT INTO nodes VALUES ('backup-01', 5001)")) {
@@ -96,7 +96,7 @@ int main()
     old.Close();
 
     SqliteDB db("recipe_upgrade.db", 3);
-    for (int start = 1; start <= 2; ++start) {  // the second one finds nothing to do
+    for (int start = 1; start <= 2; ++start) {  // the second start finds nothing to do
         if (!Upgrade(db)) return EXIT_FAILURE;
     }
     if (!db.Exec("UPDATE nodes SET note='first'") || !Print(db)) return EXIT_FAILURE;

@@ -1,5 +1,4 @@
-// Values, records, statements and conditions as texts: what the builders make of what they are
-// given.
+// Values, records, statements and conditions, printed as the text that the builders make.
 #include <cstdlib>
 #include <iostream>
 #include <string>
@@ -34,7 +33,7 @@ struct Node : SqliteRecord {
         return {"name", "port", "enabled"};
     }
 
-    // On the way in: texts are escaped here, and nowhere else.
+    // To the database: the only place where texts are escaped.
     SqliteValueList BuildRecord(const std::vector<std::string>& fields) const override
     {
         SqliteValueList all;
@@ -46,7 +45,7 @@ struct Node : SqliteRecord {
         return record;
     }
 
-    // On the way out: all fields or none.
+    // From the database: all fields or none.
     bool LoadRecord(const SqliteValueList& record) override
     {
         Node node;
@@ -72,9 +71,9 @@ void ShowValues()
 
     int number = 0;
     bool truth = false;
-    std::cout << SqliteValue("12").GetValue(number);      // a text is no number
-    std::cout << SqliteValue(true).GetValue(number);      // true is no 1
-    std::cout << SqliteValue(1).GetValue(truth) << '\n';  // but 1 is a bool: columns hold no other
+    std::cout << SqliteValue("12").GetValue(number);      // a text is not a number
+    std::cout << SqliteValue(true).GetValue(number);      // true is not 1
+    std::cout << SqliteValue(1).GetValue(truth) << '\n';  // but 1 is a bool: columns have no other
     // [/values]
 
     // [invalid]
@@ -135,7 +134,7 @@ void ShowStatements(const SqliteTableHandler& nodes)
 }
 
 // [checked]
-// Fails instead of selecting everything when the list holds what cannot be written.
+// Fails, instead of selecting everything, if a value cannot be written.
 bool SelectByName(const std::vector<SqliteValue>& names, SelectCommand& select)
 {
     SqliteIn among;
@@ -176,7 +175,7 @@ int main()
     const bool isAsTold = ShowConditions(nodes);
 
     SqliteValueList row;
-    row.AddValue("name", "O'Brien's NAS");  // as a select gives it
+    row.AddValue("name", "O'Brien's NAS");  // as returned by a select
     row.AddValue("port", 5001);
     row.AddValue("enabled", 1);
     Node node;

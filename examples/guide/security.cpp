@@ -1,4 +1,4 @@
-// A text that tries to be SQL, with and without EscapeText, and column names that are checked.
+// An SQL injection, with and without EscapeText, and column names that are checked.
 #include <algorithm>
 #include <cstdlib>
 #include <iostream>
@@ -17,7 +17,7 @@ using OrvaDRCore::SqliteValue;
 namespace {
 
 // [names]
-// Names are not values: nothing quotes them. A caller picks one of ours.
+// Names are not quoted, unlike values. So a caller may only pick one of ours.
 bool IsColumn(const std::string& name)
 {
     const std::vector<std::string> columns = {"id", "name", "port"};
@@ -39,7 +39,7 @@ std::string Select(const SqliteEqual& condition)
 int main()
 {
     // [quoting]
-    const std::string given = "x' OR '1'='1";  // what a caller sent
+    const std::string given = "x' OR '1'='1";  // sent by a caller
     const SqliteEqual wrong("name", given);
     const SqliteEqual right("name", SqliteValue::EscapeText(given));
     // [/quoting]

@@ -1,4 +1,4 @@
-// A web-API handler of one method, and a caller who asks it and looks at the replies.
+// A web-API handler with one method, and a caller that reads its replies.
 #include <cstdlib>
 #include <iostream>
 #include <memory>
@@ -19,10 +19,10 @@ using OrvaDRCore::Response;
 namespace {
 
 // [parse]
-// One whole JSON document and nothing behind it. Null for everything else.
+// One whole JSON document; null if the text is anything else.
 Json::Value Parse(const std::string& text)
 {
-    if (text.find('\0') != std::string::npos) return {};  // the reader would stop there
+    if (text.find('\0') != std::string::npos) return {};  // where jsoncpp would stop reading
     Json::CharReaderBuilder builder;
     Json::CharReaderBuilder::strictMode(&builder.settings_);
     builder["failIfExtra"] = true;
@@ -84,7 +84,7 @@ std::string ToLine(const Json::Value& value)
 }
 
 // [caller]
-// What a node says in reply. Text from elsewhere may be anything.
+// Prints a node's reply. Never trust text from another machine.
 void Tell(const std::string& text)
 {
     const Response response(text);
