@@ -42,7 +42,7 @@ int main()
     std::cout << db.GetErrCode() << ' ' << (db.GetErr().isNull() ? "null" : "?") << '\n';
 
     if (db.InsertRecord(insert)) return EXIT_FAILURE;  // the name exists already
-    std::cout << db.GetErrCode() << ", " << db.GetErr().size() << " tries\n";
+    std::cout << db.GetErrCode() << ", " << db.GetErr().size() << " attempts\n";
     Print(db.GetErr()[0]);
     // [/record]
 

@@ -45,7 +45,7 @@ bool ReadWithDefaults()
 }
 
 // [descriptor]
-// A new file that only its owner may read; fails if the path is a link.
+// A new file that only its owner may read. Fails if the path exists, even as a link.
 bool WritePrivate(const std::string& path, const Json::Value& session)
 {
     const int fd = ::open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0600);
