@@ -4,7 +4,7 @@
 
 namespace NodeRegistry {
 
-// A part of a program's help.
+// Part of both programs' --help.
 extern const char* const ApiHelp;
 
 }  // namespace NodeRegistry

@@ -28,7 +28,7 @@ std::vector<int> OpenDescriptors()
     return descriptors;
 }
 
-// The socket of the log is none: syslog() goes on using it.
+// The log's socket is not TCP, so it stays open for syslog().
 bool IsTcp(int descriptor)
 {
     int protocol = 0;

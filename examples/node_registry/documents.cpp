@@ -17,7 +17,7 @@ std::string ToText(const Json::Value& reason)
     return reason["name"].asString() + " " + reason["reason"].asString();
 }
 
-// A number where the whole text is one; otherwise the text, which no port may be.
+// A number if the whole text is one; otherwise the text, which is refused as a port later.
 Json::Value ToPort(const std::string& text)
 {
     int port = 0;
@@ -26,7 +26,7 @@ Json::Value ToPort(const std::string& text)
     return error == std::errc() && rest == end ? Json::Value(port) : Json::Value(text);
 }
 
-// Whether one more node can be told from those before it.
+// Whether the node's id and name differ from all before it.
 bool IsNew(const Node& node, std::set<std::string>& ids, std::set<std::string>& names)
 {
     return ids.insert(node.id).second && names.insert(node.name).second;

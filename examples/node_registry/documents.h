@@ -17,15 +17,15 @@
 
 namespace NodeRegistry {
 
-// Reads the node of a line: `endpoint` is what follows "=". False, with what is wrong with which
-// field in `ret_reason`, for a node that could not be created by a request either.
+// Reads the node of one line; `endpoint` is the part after "=". A node that a create request would
+// refuse is refused here, too: false, and `ret_reason` names the field and the error.
 bool FromLine(const std::string& name, const std::string& endpoint, const std::string& volume,
               Node& ret_node, std::string& ret_reason);
 
 Json::Value ToDocument(const std::vector<Node>& nodes);
 
-// Reads a document. False, `ret_nodes` untouched and the reason in `ret_reason`, for anything else,
-// for a bad node, and for two nodes with the same id or name.
+// Reads such a document. False, with the reason in `ret_reason` and `ret_nodes` unchanged, if it is
+// anything else, has a bad node, or has two nodes with the same id or name.
 bool FromDocument(const Json::Value& document, std::vector<Node>& ret_nodes,
                   std::string& ret_reason);
 

@@ -59,7 +59,7 @@ bool CompareEnabled(const Json::Value& enabled, std::string& ret_condition)
     return true;
 }
 
-// `left` counts down how many more filters the request may hold.
+// `left` is the number of filters that the request may still have.
 bool Build(const Json::Value& filter, int& left, std::string& ret_condition)
 {
     if (!filter.isObject() || filter.size() != 1 || left-- == 0) return false;

@@ -1,4 +1,4 @@
-// The filter of a list request, turned into a condition.
+// Turns the filter of a list request into a condition.
 //
 //     {"enabled":true}                              enabled=1
 //     {"not_enabled":true}                          enabled!=1
@@ -15,11 +15,11 @@
 
 namespace NodeRegistry {
 
-// How many filters one request may hold, those inside "and" and "or" counted. SQLite refuses
-// conditions that nest too deep, and what it refuses is retried for seconds: this stays below.
+// The most filters of one request, including those inside "and" and "or". SQLite refuses conditions
+// that nest too deeply, after retries that take seconds; this many it accepts.
 constexpr int MaxFilters = 32;
 
-// False, `ret_condition` untouched, for anything that is not as shown above.
+// False, with `ret_condition` unchanged, if the filter has any other form.
 bool ToCondition(const Json::Value& filter, std::string& ret_condition);
 
 }  // namespace NodeRegistry

@@ -32,7 +32,7 @@ constexpr int ApiVersion = 1;
 
 constexpr const char* ImportVolume = "/volume1/replica";
 
-// How an export or a restore keeps others away, and how often it tries to; a second apart.
+// How an export or restore takes its lock. Attempts are a second apart.
 constexpr int LockAlone = LOCK_EX | LOCK_NB;
 constexpr unsigned int LockRetries = 3;
 
@@ -77,14 +77,14 @@ Json::Value NotAlone(int code)
     return Failure(code, Reason("lock", "is held by another handler, or may not be opened"));
 }
 
-// A missing file would read as an empty one, and a pipe or a device perhaps without end.
+// A missing file would count as empty, and a pipe or device might never end.
 bool IsReadable(const std::string& file)
 {
     std::error_code ignored;
     return std::filesystem::is_regular_file(file, ignored);
 }
 
-// What is there already is overwritten when it is a file, but not the database.
+// An existing file is overwritten, unless it is the database.
 bool IsWritable(const std::string& file, const std::string& database)
 {
     std::error_code ignored;
@@ -93,7 +93,7 @@ bool IsWritable(const std::string& file, const std::string& database)
             !std::filesystem::equivalent(file, database, ignored));
 }
 
-// Links resolved, so that all handlers of a file have one name for it.
+// Resolves links, so that all handlers of a file use the same name.
 std::string ToFullPath(const std::string& path)
 {
     std::error_code error;
@@ -102,7 +102,7 @@ std::string ToFullPath(const std::string& path)
     return error ? path : full.string();
 }
 
-// The status of a database, beside it unless a directory is given.
+// Where the status of a database is stored: next to it, or in `directory` if that is given.
 std::string StatusPathOf(const std::string& database, const std::string& directory)
 {
     const std::filesystem::path file(database);
@@ -111,35 +111,35 @@ std::string StatusPathOf(const std::string& database, const std::string& directo
     return place / (file.filename().string() + ".status");
 }
 
-// The lock that keeps other exports and restores away. It is freed by name: closing the file alone
-// would leave it to a child of another thread's that was forked meanwhile.
+// Excludes other exports and restores. The destructor calls unlock(), because closing the file is not
+// enough: a child that another thread has just forked has the file open, too.
 class Exclusion {
   public:
     explicit Exclusion(const std::string& name)
-        : lock(name), isHeld(lock.lock(LockAlone, LockRetries))
+        : lock_(name), isHeld_(lock_.lock(LockAlone, LockRetries))
     {
     }
     Exclusion(const Exclusion&) = delete;
     Exclusion& operator=(const Exclusion&) = delete;
     ~Exclusion()
     {
-        if (isHeld) lock.unlock();
+        if (isHeld_) lock_.unlock();
     }
 
-    bool IsHeld() const { return isHeld; }
+    bool IsHeld() const { return isHeld_; }
 
   private:
-    FileLock lock;
-    bool isHeld;
+    FileLock lock_;
+    bool isHeld_;
 };
 
 }  // namespace
 
 Handler::Handler(const Settings& settings)
-    : registry(settings.database),
-      fullPath(ToFullPath(settings.database)),
-      statusPath(StatusPathOf(fullPath, settings.statusDirectory)),
-      statusTimeout(settings.statusTimeout)
+    : registry_(settings.database),
+      fullPath_(ToFullPath(settings.database)),
+      statusPath_(StatusPathOf(fullPath_, settings.statusDirectory)),
+      statusTimeout_(settings.statusTimeout)
 {
 }
 
@@ -175,7 +175,7 @@ Json::Value Handler::Create(const Json::Value& params)
         !parameters.ReadFields(fields, node)) {
         return BadParameter(parameters);
     }
-    if (!registry.Create(node)) return RegistryFailure();
+    if (!registry_.Create(node)) return RegistryFailure();
     return DoneWith(node.id);
 }
 
@@ -187,11 +187,11 @@ Json::Value Handler::Get(const Json::Value& params)
         return BadParameter(parameters);
     }
     Node node;
-    if (!registry.Find(key, node)) return RegistryFailure();
+    if (!registry_.Find(key, node)) return RegistryFailure();
     return Success(node.ToJson());
 }
 
-// With an id a name is the new name; without one it says which node is meant.
+// With an id, "name" is the new name; without one, it says which node is meant.
 Json::Value Handler::Set(const Json::Value& params)
 {
     Parameters parameters(params);
@@ -212,17 +212,17 @@ Json::Value Handler::Set(const Json::Value& params)
         return BadParameter(parameters);
     }
 
-    // Whether a statement changed a row is not told, so the node is looked for first. One that
-    // another handler removes in between is as if it had been removed right after this request.
+    // Change() does not say whether the node exists, so find it first. If another handler removes it
+    // in between, that counts as removed right after this request.
     Node node;
-    if (!registry.Find(key, node)) return RegistryFailure();
+    if (!registry_.Find(key, node)) return RegistryFailure();
     changes.id = node.id;
-    if (!registry.Change(changes, changed)) return RegistryFailure();
+    if (!registry_.Change(changes, changed)) return RegistryFailure();
     return DoneWith(node.id);
 }
 
-// The node is looked for first, as in Set(). Of two handlers that remove it at the same time both
-// may answer that they did.
+// Finds the node first, as in Set(). If two handlers remove it at the same time, both may report
+// success.
 Json::Value Handler::Delete(const Json::Value& params)
 {
     Parameters parameters(params);
@@ -231,7 +231,7 @@ Json::Value Handler::Delete(const Json::Value& params)
         return BadParameter(parameters);
     }
     Node node;
-    if (!registry.Find(key, node) || !registry.Remove(node.id)) return RegistryFailure();
+    if (!registry_.Find(key, node) || !registry_.Remove(node.id)) return RegistryFailure();
     return DoneWith(node.id);
 }
 
@@ -243,7 +243,7 @@ Json::Value Handler::List(const Json::Value& params)
         return BadParameter(parameters);
     }
     std::vector<Node> nodes;
-    if (!registry.List(condition, nodes)) return RegistryFailure();
+    if (!registry_.List(condition, nodes)) return RegistryFailure();
 
     Json::Value data(Json::objectValue);
     data["nodes"] = Json::Value(Json::arrayValue);
@@ -255,11 +255,11 @@ Json::Value Handler::Status(const Json::Value& params)
 {
     Parameters parameters(params);
     if (!parameters.AreOnly({})) return BadParameter(parameters);
-    if (!StatusCache::IsUsable(statusPath)) {
+    if (!StatusCache::IsUsable(statusPath_)) {
         return Failure(ERR::ERR_NO_PERMISSION,
                        Reason("status", "has no directory or no lock that may be used"));
     }
-    const StatusCache cache(statusPath, statusTimeout, registry);
+    const StatusCache cache(statusPath_, statusTimeout_, registry_);
     Json::Value status = cache.Read();
     if (cache.IsValidData(status)) {
         const Json::Int64 age = std::time(nullptr) - status["time"].asInt64();
@@ -270,7 +270,8 @@ Json::Value Handler::Status(const Json::Value& params)
     return Failure(ERR::ERR_NODE_GET, Reason("status", "could not be taken or stored"));
 }
 
-// Node by node, as that many create requests: those that are refused keep no other one out.
+// Creates the nodes one by one, like that many create requests. A refused node does not affect the
+// others.
 Json::Value Handler::Import(const Json::Value& params)
 {
     Parameters parameters(params);
@@ -290,11 +291,11 @@ Json::Value Handler::Import(const Json::Value& params)
         Node node;
         std::string reason = "name belongs to another node";
         if (FromLine(name, endpoint, common.volume, node, reason)) {
-            if (registry.Create(node)) {
+            if (registry_.Create(node)) {
                 ++created;
                 continue;
             }
-            if (registry.GetErrCode() != ERR::ERR_NODE_EXIST) return RegistryFailure();
+            if (registry_.GetErrCode() != ERR::ERR_NODE_EXIST) return RegistryFailure();
         }
         refused[ToPrintable(name, MaxNameBytes)] = reason;
     }
@@ -304,8 +305,8 @@ Json::Value Handler::Import(const Json::Value& params)
     return Success(data);
 }
 
-// The lock keeps other exports and restores away, nobody else: the file is written in place, and
-// who reads it without the lock may see a part of it.
+// The lock only excludes other exports and restores. The file is written in place, so a reader without
+// the lock may see a partial document.
 Json::Value Handler::Export(const Json::Value& params)
 {
     Parameters parameters(params);
@@ -313,12 +314,12 @@ Json::Value Handler::Export(const Json::Value& params)
     if (!parameters.AreOnly({"file"}) || !parameters.ReadFile(file)) {
         return BadParameter(parameters);
     }
-    if (!IsWritable(file, fullPath)) return BadFile("is the database, or no regular file");
-    const Exclusion exclusion(fullPath + ".lock");
+    if (!IsWritable(file, fullPath_)) return BadFile("is the database, or no regular file");
+    const Exclusion exclusion(fullPath_ + ".lock");
     if (!exclusion.IsHeld()) return NotAlone(ERR::ERR_NODE_GET);
 
     std::vector<Node> nodes;
-    if (!registry.List("", nodes)) return RegistryFailure();
+    if (!registry_.List("", nodes)) return RegistryFailure();
     if (!File::Write(file, ToDocument(nodes))) {
         return Failure(ERR::ERR_NODE_GET, Reason("file", "cannot be written"));
     }
@@ -333,7 +334,7 @@ Json::Value Handler::Restore(const Json::Value& params)
         return BadParameter(parameters);
     }
     if (!IsReadable(file)) return BadFile("cannot be read");
-    const Exclusion exclusion(fullPath + ".lock");
+    const Exclusion exclusion(fullPath_ + ".lock");
     if (!exclusion.IsHeld()) return NotAlone(ERR::ERR_NODE_SET);
 
     Json::Value document;
@@ -341,13 +342,13 @@ Json::Value Handler::Restore(const Json::Value& params)
     std::vector<Node> nodes;
     std::string reason;
     if (!FromDocument(document, nodes, reason)) return BadFile(reason);
-    if (!registry.Replace(nodes)) return RegistryFailure();
+    if (!registry_.Replace(nodes)) return RegistryFailure();
     return DoneWith(nodes.size());
 }
 
 Json::Value Handler::RegistryFailure() const
 {
-    return Failure(registry.GetErrCode(), registry.GetErr());
+    return Failure(registry_.GetErrCode(), registry_.GetErr());
 }
 
 }  // namespace NodeRegistry

@@ -1,4 +1,4 @@
-// The API DR.Node: from a request line to its reply.
+// The API DR.Node: takes a request line, returns the reply.
 #ifndef NODE_REGISTRY_HANDLER_H
 #define NODE_REGISTRY_HANDLER_H
 
@@ -11,12 +11,12 @@
 
 namespace NodeRegistry {
 
-// A handler is used by one thread at a time; each thread of a service has its own.
+// Not thread-safe: each thread of a service has its own handler.
 class Handler {
   public:
     explicit Handler(const Settings& settings);
 
-    // Answers every line, whatever it holds.
+    // Every line gets a reply, whatever it contains.
     Json::Value Answer(const std::string& line);
 
   private:
@@ -32,10 +32,10 @@ class Handler {
 
     Json::Value RegistryFailure() const;
 
-    Registry registry;
-    std::string fullPath;    // of the database; the lock of exports is called after it
-    std::string statusPath;  // of the status, without what the cache adds
-    long statusTimeout;
+    Registry registry_;
+    std::string fullPath_;    // of the database; exports are locked under a name made from it
+    std::string statusPath_;  // of the status, without the suffix that the cache adds
+    long statusTimeout_;
 };
 
 }  // namespace NodeRegistry

@@ -9,7 +9,7 @@ namespace NodeRegistry {
 
 bool ParseLine(const std::string& line, Json::Value& ret_object)
 {
-    // The reader takes a zero byte for the end of the text and passes over what follows it.
+    // jsoncpp would stop at a zero byte and ignore the rest.
     if (line.find('\0') != std::string::npos) return false;
 
     Json::CharReaderBuilder builder;
@@ -18,7 +18,7 @@ bool ParseLine(const std::string& line, Json::Value& ret_object)
     builder["strictRoot"] = true;
     const std::unique_ptr<Json::CharReader> reader(builder.newCharReader());
 
-    // A document that breaks off leaves its first members behind in the reader's output.
+    // Parse into a temporary, because jsoncpp leaves the first members of a broken document behind.
     Json::Value document;
     try {
         if (!reader->parse(line.data(), line.data() + line.size(), &document, nullptr)) {

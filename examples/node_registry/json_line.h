@@ -1,4 +1,4 @@
-// JSON documents on one line each, as requests come in and replies go out.
+// JSON documents of one line each: requests and replies.
 #ifndef NODE_REGISTRY_JSON_LINE_H
 #define NODE_REGISTRY_JSON_LINE_H
 
@@ -8,13 +8,12 @@
 
 namespace NodeRegistry {
 
-// Parses a line that is one whole JSON object. False, `ret_object` untouched, for anything else: no
-// JSON, another type, a key given twice, text behind the object, nesting deeper than the reader's
+// Parses a line that is one whole JSON object. Anything else is refused, and `ret_object` keeps its
+// value: invalid JSON, another type, a repeated key, text after the object, nesting beyond jsoncpp's
 // limit, a zero byte.
 bool ParseLine(const std::string& line, Json::Value& ret_object);
 
-// A document without line breaks and without blanks between its parts; text in UTF-8 stays as it
-// stands.
+// The document without newlines and spaces. UTF-8 text is not escaped.
 std::string ToLine(const Json::Value& value);
 
 }  // namespace NodeRegistry

@@ -8,25 +8,25 @@
 namespace NodeRegistry {
 
 LineReader::LineReader(const std::string& file)
-    : stream(file == "-" ? stdin : std::fopen(file.c_str(), "re"))
+    : stream_(file == "-" ? stdin : std::fopen(file.c_str(), "re"))
 {
-    if (stream == nullptr) error = errno;
+    if (stream_ == nullptr) error_ = errno;
 }
 
 LineReader::~LineReader()
 {
-    if (stream != nullptr && stream != stdin) static_cast<void>(std::fclose(stream));
-    std::free(buffer);
+    if (stream_ != nullptr && stream_ != stdin) static_cast<void>(std::fclose(stream_));
+    std::free(buffer_);
 }
 
 bool LineReader::Read(std::string& ret_line)
 {
-    if (stream == nullptr) return false;
-    const ssize_t length = ::getline(&buffer, &size, stream);
-    // Also where getline gives the beginning of a line that a failed read has cut off.
-    if (std::ferror(stream) != 0) error = errno;
-    if (length < 0 || error != 0) return false;
-    ret_line.assign(buffer, static_cast<std::size_t>(length));
+    if (stream_ == nullptr) return false;
+    const ssize_t length = ::getline(&buffer_, &size_, stream_);
+    // Checked first: after a read error getline() returns what it got of the line.
+    if (std::ferror(stream_) != 0) error_ = errno;
+    if (length < 0 || error_ != 0) return false;
+    ret_line.assign(buffer_, static_cast<std::size_t>(length));
     if (ret_line.back() == '\n') ret_line.pop_back();
     return true;
 }

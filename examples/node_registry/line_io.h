@@ -1,4 +1,4 @@
-// Lines in and out, each failure of the system noticed.
+// Reading lines and writing text, with every system error reported.
 #ifndef NODE_REGISTRY_LINE_IO_H
 #define NODE_REGISTRY_LINE_IO_H
 
@@ -16,22 +16,22 @@ class LineReader {
     LineReader& operator=(const LineReader&) = delete;
     ~LineReader();
 
-    // The next line, without its end. False when there is none: at the end of the file, or because
-    // of GetErrno().
+    // The next line, without its newline. False at the end of the file and on an error: see
+    // GetErrno().
     bool Read(std::string& ret_line);
 
-    // Why the file could not be opened or read; 0 when nothing failed.
-    int GetErrno() const { return error; }
+    // The errno of a failed open or read; otherwise 0.
+    int GetErrno() const { return error_; }
 
   private:
-    std::FILE* stream;
-    char* buffer = nullptr;
-    std::size_t size = 0;
-    int error = 0;
+    std::FILE* stream_;
+    char* buffer_ = nullptr;
+    std::size_t size_ = 0;
+    int error_ = 0;
 };
 
-// Writes a text to standard output, at once: whoever listens on a pipe waits for it. Answers 0 or
-// an errno code.
+// Writes to standard output and flushes, because a reader at the other end of a pipe may be waiting.
+// Returns 0 or an errno value.
 int WriteText(const std::string& text);
 
 }  // namespace NodeRegistry

@@ -63,7 +63,7 @@ int main(int argc, char** argv)
         std::cerr << NodeRegistry::UsageText;
         return ExitUsage;
     }
-    // A reader who has gone is a failed write like any other, not the end by a signal.
+    // A reader that has gone makes a write fail; it must not end the program by a signal.
     static_cast<void>(std::signal(SIGPIPE, SIG_IGN));
     if (options.wantsHelp) {
         return Print(NodeRegistry::HelpText());

@@ -12,24 +12,24 @@
 
 namespace NodeRegistry {
 
-// The longest texts that a node may have.
+// The longest texts of a node.
 constexpr std::size_t MaxIdBytes = 64;
 constexpr std::size_t MaxNameBytes = 64;
 constexpr std::size_t MaxAddressBytes = 253;  // a host name
 constexpr std::size_t MaxVolumeBytes = 4096;  // a path
 
 struct Node : OrvaDRCore::SqliteRecord {
-    std::string id;       // a UUID, given when the node is created
-    std::string name;     // what people call it; no two nodes share one
+    std::string id;       // a UUID, assigned by Registry::Create()
+    std::string name;     // for people; unique
     std::string address;  // host name or IP address
     int port = 0;
-    std::string volume;  // where replicas lie on the node
+    std::string volume;  // where the node stores replicas
     bool enabled = true;
 
-    // The named fields, their texts escaped: fit to be written into a statement.
+    // The named fields, with texts escaped for a statement.
     OrvaDRCore::SqliteValueList BuildRecord(const std::vector<std::string>& fields) const override;
 
-    // Takes a row. False, nothing changed, when a field is missing or of another kind.
+    // Reads a row. False, with nothing changed, if a field is missing or has another type.
     bool LoadRecord(const OrvaDRCore::SqliteValueList& record) override;
 
     std::vector<std::string> GetRecordFields() const override;
@@ -37,7 +37,7 @@ struct Node : OrvaDRCore::SqliteRecord {
     Json::Value ToJson() const;
 };
 
-// Which node is meant: a column without duplicates, "id" or "name", and its value.
+// Identifies a node by a unique column, "id" or "name".
 struct NodeKey {
     std::string field;
     std::string text;

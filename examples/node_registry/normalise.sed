@@ -1,5 +1,4 @@
-# Takes out of the program's output what differs from run to run: ids, process ids, files of the run,
-# times, ages and sizes.
+# Removes what differs from run to run: ids, process ids, temporary files, times, ages and sizes.
 s/[0-9a-f]\{8\}-[0-9a-f]\{4\}-[0-9a-f]\{4\}-[0-9a-f]\{4\}-[0-9a-f]\{12\}/<uuid>/g
 s/\[[0-9][0-9]*\]:/[<pid>]:/g
 s|/tmp/[^] "]*\.db|<db>|g

@@ -16,10 +16,10 @@ struct Options {
     bool wantsHelp = false;
 };
 
-// False for a command line that the usage does not allow.
+// False if the command line is wrong.
 bool ReadOptions(int argc, const char* const* argv, Options& ret_options);
 
-// How the program is called: in short, for those who called it wrongly, and in full.
+// The short help after a wrong command line, and the full one.
 extern const char* const UsageText;
 std::string HelpText();
 

@@ -15,7 +15,7 @@ using OrvaDRCore::Validator;
 
 namespace {
 
-constexpr std::size_t MaxFileBytes = 4095;  // what the system takes for a path
+constexpr std::size_t MaxFileBytes = 4095;  // the system's limit for a path
 
 bool TakeText(const Json::Value& value, std::size_t maxBytes, std::string& ret_text)
 {
@@ -59,7 +59,7 @@ bool TakeEnabled(const Json::Value& value, Node& node)
     return true;
 }
 
-// What a field must look like.
+// The rule for a field.
 struct Rule {
     const char* field;
     bool (*take)(const Json::Value& value, Node& node);
@@ -81,12 +81,12 @@ constexpr Rule Rules[] = {
 
 bool Parameters::Has(const std::string& name) const
 {
-    return params.isMember(name);
+    return params_.isMember(name);
 }
 
 bool Parameters::AreOnly(const std::vector<std::string>& names)
 {
-    for (const std::string& member : params.getMemberNames()) {
+    for (const std::string& member : params_.getMemberNames()) {
         if (std::find(names.begin(), names.end(), member) == names.end()) {
             return Refuse("parameters", names.empty() ? "none can be given"
                                                       : "only these can be given: " +
@@ -117,19 +117,19 @@ bool Parameters::ReadField(const std::string& name, Node& node)
     if (!Has(name)) return Refuse(name, "is missing");
     const auto* rule = std::find_if(std::begin(Rules), std::end(Rules),
                                     [&](const Rule& each) { return each.field == name; });
-    return rule->take(params[name], node) || Refuse(name, rule->words);
+    return rule->take(params_[name], node) || Refuse(name, rule->words);
 }
 
 bool Parameters::ReadFile(std::string& ret_path)
 {
     if (!Has("file")) return Refuse("file", "is missing");
-    return TakeText(params["file"], MaxFileBytes, ret_path) ||
+    return TakeText(params_["file"], MaxFileBytes, ret_path) ||
            Refuse("file", "must be a path of at most 4095 bytes without control characters");
 }
 
 bool Parameters::ReadFilter(std::string& ret_condition)
 {
-    if (!Has("filter") || ToCondition(params["filter"], ret_condition)) return true;
+    if (!Has("filter") || ToCondition(params_["filter"], ret_condition)) return true;
     return Refuse("filter",
                   "must be an object with one of and, or, ids, not_ids, enabled, not_enabled, "
                   "holding at most 32 filters in all");
@@ -137,7 +137,7 @@ bool Parameters::ReadFilter(std::string& ret_condition)
 
 bool Parameters::Refuse(const std::string& name, const std::string& reason)
 {
-    err = Reason(name, reason);
+    err_ = Reason(name, reason);
     return false;
 }
 

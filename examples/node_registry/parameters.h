@@ -1,5 +1,5 @@
-// The parameters of a request, checked while they are read. Every operation answers true, or false
-// with the reason in GetErr(), so that a caller reads on and on and looks once:
+// Reads and checks the parameters of a request. Every operation returns true, or false with the
+// reason in GetErr(), so that a caller can chain them and check once:
 //
 //     Parameters parameters(request.getParams());
 //     Node node;
@@ -21,36 +21,36 @@ namespace NodeRegistry {
 
 class Parameters {
   public:
-    // `object` must outlive the reader.
-    explicit Parameters(const Json::Value& object) : params(object) {}
+    // `object` must outlive this.
+    explicit Parameters(const Json::Value& object) : params_(object) {}
 
     bool Has(const std::string& name) const;
 
-    // Refuses parameters of other names: a misspelt filter must not list everything.
+    // Refuses any other parameter, because a misspelt "filter" would list every node.
     bool AreOnly(const std::vector<std::string>& names);
 
-    // The node by its "id", or without one by its "name".
+    // The node's "id" or, if there is none, its "name".
     bool ReadKey(NodeKey& ret_key);
 
-    // Fills the named fields of a node. All must be there; on failure some may be filled.
+    // Reads the named fields into `node`. All are required; on failure some may have been set.
     bool ReadFields(const std::vector<std::string>& names, Node& node);
 
-    // The path "file".
+    // The parameter "file".
     bool ReadFile(std::string& ret_path);
 
-    // The condition of a list; empty, for all nodes, without a "filter".
+    // The condition of "filter"; empty, which means all nodes, if there is none.
     bool ReadFilter(std::string& ret_condition);
 
-    // Notes why the parameters are no good; always false.
+    // Records why the parameters are refused. Returns false.
     bool Refuse(const std::string& name, const std::string& reason);
 
-    const Json::Value& GetErr() const { return err; }
+    const Json::Value& GetErr() const { return err_; }
 
   private:
     bool ReadField(const std::string& name, Node& node);
 
-    const Json::Value& params;
-    Json::Value err;
+    const Json::Value& params_;
+    Json::Value err_;
 };
 
 }  // namespace NodeRegistry

@@ -1,4 +1,4 @@
-// Requests and replies for people, for the option --pretty.
+// Requests and replies in a form for people: the option --pretty.
 //
 //     DR.Node/get/1 {"name":"backup-02"}
 //       <- {"error":{"code":507,"errors":{...}},"success":false} (ERR_NODE_NOT_EXIST)
@@ -11,10 +11,10 @@
 
 namespace NodeRegistry {
 
-// The request and its parameters, or the line itself when it is no request; shortened when long.
+// The request and its parameters, or the line itself if it is not a request. Cut if too long.
 std::string DescribeRequest(const std::string& line);
 
-// The reply, with the name of its error; the nodes of a list one on each line.
+// The reply with the name of its error code. A list has one node per line.
 std::string DescribeReply(const Json::Value& reply);
 
 }  // namespace NodeRegistry

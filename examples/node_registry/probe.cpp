@@ -19,8 +19,8 @@ struct Endpoint {
     socklen_t size = 0;
 };
 
-// Fills `endpoint` from a numeric address. No name is looked up, not even "localhost", and no lock
-// is taken, which getaddrinfo() does: this may run in a forked child.
+// Converts a numeric address or "localhost". Not by getaddrinfo(), which takes locks: this may run in
+// a forked child.
 bool ToEndpoint(const std::string& address, int port, Endpoint& endpoint)
 {
     const std::string host = address == "localhost" ? "127.0.0.1" : address;
@@ -42,7 +42,7 @@ bool ToEndpoint(const std::string& address, int port, Endpoint& endpoint)
     return false;
 }
 
-// Whether a connection that is being made comes about in time.
+// Waits for a connection that is in progress; false if it fails or takes too long.
 bool IsMade(int fd)
 {
     pollfd waiting{fd, POLLOUT, 0};

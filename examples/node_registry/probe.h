@@ -1,4 +1,4 @@
-// What can be found out about a node from here.
+// Looks at a node from this machine.
 #ifndef NODE_REGISTRY_PROBE_H
 #define NODE_REGISTRY_PROBE_H
 
@@ -8,14 +8,14 @@
 
 namespace NodeRegistry {
 
-// How long a node has to accept a connection.
+// How long to wait until a node accepts a connection.
 constexpr int ProbeTimeoutMSec = 300;
 
-// "reachable" when a TCP connection is accepted in time, otherwise "unreachable". Null for a host
-// name other than "localhost": looking it up may take far longer than any probe.
+// "reachable" if a TCP connection is accepted in time, otherwise "unreachable". Null for any host
+// name but "localhost", because a DNS lookup may take far longer than a probe.
 Json::Value ProbeAddress(const std::string& address, int port);
 
-// {"used":bytes,"free":bytes} of the file system that a path lies on; null when it is not there.
+// {"used":bytes,"free":bytes} of the file system that contains the path; null if it does not exist.
 Json::Value MeasureVolume(const std::string& path);
 
 }  // namespace NodeRegistry

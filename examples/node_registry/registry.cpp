@@ -29,7 +29,7 @@ constexpr const char* Schema =
     "id TEXT PRIMARY KEY, name TEXT NOT NULL UNIQUE, address TEXT NOT NULL, "
     "port INTEGER NOT NULL, volume TEXT NOT NULL, enabled INTEGER NOT NULL";
 
-// SQLite's result code for a row that the schema refuses.
+// SQLITE_CONSTRAINT: the schema refuses the row.
 constexpr int SqliteConstraint = 19;
 
 Json::Value NameTaken()
@@ -42,7 +42,7 @@ SqliteEqual Matches(const NodeKey& key)
     return {key.field, SqliteValue::EscapeText(key.text)};
 }
 
-// Whether a statement's only or last try met a row that the schema refuses.
+// Whether the last attempt failed because the schema refuses the row.
 bool IsConstraintFailure(const Json::Value& record)
 {
     const bool isList = record.isArray() && !record.empty();
@@ -52,14 +52,14 @@ bool IsConstraintFailure(const Json::Value& record)
 
 }  // namespace
 
-Registry::Registry(const std::string& file) : table(Table, Schema), db(file, RetryLimit) {}
+Registry::Registry(const std::string& file) : table_(Table, Schema), db_(file, RetryLimit) {}
 
 bool Registry::Create(Node& node)
 {
     if (!IsNameFree(node)) return false;
     node.id = GenerateUUID();
     if (node.id.empty()) return Fail(ERR::ERR_NODE_CREATE, Reason("id", "cannot be made"));
-    return db.InsertRecord(Insertion(node)) || FailAsWrite();
+    return db_.InsertRecord(Insertion(node)) || FailAsWrite();
 }
 
 bool Registry::Find(const NodeKey& key, Node& ret_node)
@@ -76,14 +76,13 @@ bool Registry::Find(const NodeKey& key, Node& ret_node)
 bool Registry::List(const std::string& condition, std::vector<Node>& ret_nodes)
 {
     SelectCommand select;
-    select.SetTable(table);
+    select.SetTable(table_);
     for (const std::string& field : Node().GetRecordFields()) select.AddField(field);
     if (!condition.empty()) select.SetCondition(condition);
     std::vector<SqliteValueList> records;
-    if (!db.SelectRecords(select, records)) return FailAsDb();
+    if (!db_.SelectRecords(select, records)) return FailAsDb();
 
-    // By name, which sorts them; and a select that failed half-way and was tried again has given
-    // some rows twice.
+    // A map sorts them by name and drops duplicates: a select that was retried may return rows twice.
     std::map<std::string, Node> nodes;
     for (const SqliteValueList& record : records) {
         Node node;
@@ -103,22 +102,22 @@ bool Registry::Change(const Node& node, const std::vector<std::string>& fields)
     if (changes.HasField("name") && !IsNameFree(node)) return false;
 
     UpdateCommand update;
-    update.SetTable(table);
+    update.SetTable(table_);
     update.SetFieldValues(changes);
     update.SetCondition(Matches({"id", node.id}));
-    return db.UpdateRecord(update) || FailAsWrite();
+    return db_.UpdateRecord(update) || FailAsWrite();
 }
 
 bool Registry::Remove(const std::string& id)
 {
-    return db.DeleteRecord(Matches({"id", id}).GetCondition(), table) || FailAsDb();
+    return db_.DeleteRecord(Matches({"id", id}).GetCondition(), table_) || FailAsDb();
 }
 
 bool Registry::Replace(const std::vector<Node>& nodes)
 {
-    if (!db.Open()) return Fail(ERR::ERR_DATABASE_OPERATION, Json::Value());
-    if (!db.CreateTable(table)) return FailAsDb();
-    SqliteTransaction transaction(db);
+    if (!db_.Open()) return Fail(ERR::ERR_DATABASE_OPERATION, Json::Value());
+    if (!db_.CreateTable(table_)) return FailAsDb();
+    SqliteTransaction transaction(db_);
     if (!transaction.Begin()) return FailAsDb();
     return (FillAnew(nodes) && transaction.Commit()) || FailAsWrite();
 }
@@ -126,32 +125,32 @@ bool Registry::Replace(const std::vector<Node>& nodes)
 InsertCommand Registry::Insertion(const Node& node) const
 {
     InsertCommand insert;
-    insert.SetTable(table);
+    insert.SetTable(table_);
     insert.SetFieldValues(node.ToSqliteRecord());
     return insert;
 }
 
-// Single tries alone: where SQLite has ended the transaction, another try would stay outside it.
+// Without retries: if SQLite has ended the transaction, a retry would run outside of it.
 bool Registry::FillAnew(const std::vector<Node>& nodes)
 {
     const auto insert = [&](const Node& node) {
-        return db.DoExecSqliteCommand(Insertion(node).GetCommand());
+        return db_.DoExecSqliteCommand(Insertion(node).GetCommand());
     };
-    return db.DoExecSqliteCommand(db.GenerateDeleteCommand(table.GetName(), "")) &&
+    return db_.DoExecSqliteCommand(db_.GenerateDeleteCommand(table_.GetName(), "")) &&
            std::all_of(nodes.begin(), nodes.end(), insert);
 }
 
 bool Registry::SelectFirst(const NodeKey& key, SqliteValueList& ret_record)
 {
     SelectCommand select;
-    select.SetTable(table);
+    select.SetTable(table_);
     select.SelectAll();
     select.SetCondition(Matches(key));
-    return db.SelectRecord(select, ret_record) || FailAsDb();
+    return db_.SelectRecord(select, ret_record) || FailAsDb();
 }
 
-// Asked before a statement that would fail: a refused row is tried again for seconds. The answer
-// may be old by the time of the statement, where the schema has the last word: see FailAsWrite().
+// Checked before the statement, because a refused row would be retried for seconds. Another handler
+// may take the name after the check; then the schema refuses the row: see FailAsWrite().
 bool Registry::IsNameFree(const Node& node)
 {
     SqliteValueList holder;
@@ -163,21 +162,21 @@ bool Registry::IsNameFree(const Node& node)
 
 bool Registry::Fail(int code, const Json::Value& errors)
 {
-    errCode = code;
-    err = errors;
+    errCode_ = code;
+    err_ = errors;
     return false;
 }
 
 bool Registry::FailAsDb()
 {
-    return Fail(db.GetErrCode(), db.GetErr());
+    return Fail(db_.GetErrCode(), db_.GetErr());
 }
 
-// Ids are new and no column is left empty: what the schema can refuse is a name that another
-// handler has taken since IsNameFree().
+// Ids are new and no column is NULL, so the schema only refuses a name that another handler has taken
+// since IsNameFree().
 bool Registry::FailAsWrite()
 {
-    if (IsConstraintFailure(db.GetErr())) return Fail(ERR::ERR_NODE_EXIST, NameTaken());
+    if (IsConstraintFailure(db_.GetErr())) return Fail(ERR::ERR_NODE_EXIST, NameTaken());
     return FailAsDb();
 }
 

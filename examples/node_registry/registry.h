@@ -1,7 +1,7 @@
-// The nodes table. Several handlers may work on one file at the same time.
+// The table of nodes. Several handlers may use one file at the same time.
 //
-// Operations answer true, or false with the reason in GetErrCode() and GetErr(), as SqliteDB does:
-// a failure of the database is handed on with its own code and record.
+// Like those of SqliteDB, operations return true, or false with the reason in GetErrCode() and
+// GetErr(). A database failure keeps SqliteDB's code and record.
 #ifndef NODE_REGISTRY_REGISTRY_H
 #define NODE_REGISTRY_REGISTRY_H
 
@@ -20,31 +20,31 @@ namespace NodeRegistry {
 
 class Registry {
   public:
-    // The file is opened, and made when it is missing, by the first operation.
+    // The first operation opens the file, and creates it if it is missing.
     explicit Registry(const std::string& file);
 
-    // Adds a node under a new id, which is put into `node`. ERR_NODE_EXIST when its name is taken.
+    // Adds a node and sets its new id. ERR_NODE_EXIST if the name is taken.
     bool Create(Node& node);
 
-    // ERR_NODE_NOT_EXIST when there is no such node.
+    // ERR_NODE_NOT_EXIST if there is no such node.
     bool Find(const NodeKey& key, Node& ret_node);
 
-    // The nodes that meet a condition, or all for an empty one, sorted by name.
+    // The nodes that match the condition, sorted by name. An empty condition matches all.
     bool List(const std::string& condition, std::vector<Node>& ret_nodes);
 
-    // Changes the named fields of the node whose id `node` has. ERR_NODE_EXIST when it would get
-    // the name of another one. The node must exist: nothing is changed otherwise, and nobody told.
+    // Changes the named fields of the node with the id of `node`. ERR_NODE_EXIST if another node has
+    // the new name. If no node has the id, nothing happens, and this is not reported.
     bool Change(const Node& node, const std::vector<std::string>& fields);
 
-    // Removes a node. That it is not there is no failure.
+    // Removes a node. It need not exist.
     bool Remove(const std::string& id);
 
-    // Makes these the nodes, with the ids that they have, in one transaction: on failure all is as
-    // it was. No two may have the same id or name.
+    // Replaces all nodes by these, with their ids, in one transaction: a failure changes nothing. Ids
+    // and names must be unique.
     bool Replace(const std::vector<Node>& nodes);
 
-    int GetErrCode() const { return errCode; }
-    const Json::Value& GetErr() const { return err; }
+    int GetErrCode() const { return errCode_; }
+    const Json::Value& GetErr() const { return err_; }
 
   private:
     bool SelectFirst(const NodeKey& key, OrvaDRCore::SqliteValueList& ret_record);
@@ -55,10 +55,10 @@ class Registry {
     bool FailAsDb();
     bool FailAsWrite();
 
-    OrvaDRCore::SqliteTableHandler table;
-    OrvaDRCore::SqliteDB db;
-    int errCode = 0;
-    Json::Value err;
+    OrvaDRCore::SqliteTableHandler table_;
+    OrvaDRCore::SqliteDB db_;
+    int errCode_ = 0;
+    Json::Value err_;
 };
 
 }  // namespace NodeRegistry

@@ -14,7 +14,7 @@ Json::Value Success(const Json::Value& data);
 // {"success":false,"error":{"code":code,"errors":errors}}
 Json::Value Failure(int code, const Json::Value& errors);
 
-// What "errors" holds when no database is involved: {"name":what is wrong,"reason":why}.
+// The "errors" of a failure outside the database: {"name":what is wrong,"reason":why}.
 Json::Value Reason(const std::string& name, const std::string& reason);
 
 }  // namespace NodeRegistry

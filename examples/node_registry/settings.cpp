@@ -7,7 +7,7 @@ namespace NodeRegistry {
 
 namespace {
 
-// An empty path is a mistake: SQLite would take it for a temporary database.
+// Refuses an empty path, which SQLite would take for a temporary database.
 bool ReadPath(const std::string& text, std::string& ret_path)
 {
     if (text.empty()) return false;

@@ -1,4 +1,4 @@
-// What every program of the registry is told on its command line.
+// The settings that every program of the registry takes from its command line.
 #ifndef NODE_REGISTRY_SETTINGS_H
 #define NODE_REGISTRY_SETTINGS_H
 
@@ -8,21 +8,21 @@ namespace NodeRegistry {
 
 struct Settings {
     std::string database = "./node_registry.db";
-    std::string statusDirectory;  // that of the database when empty
+    std::string statusDirectory;  // empty: the directory of the database
     int statusTimeout = 30;       // in seconds
 };
 
-// The options that ReadSetting() knows, for a program's help.
+// The help text for the options of ReadSetting().
 extern const char* const SettingsHelp;
 
 enum class Reading { Taken, Refused, Unknown };
 
-// Reads the option argv[index] and its value; `index` is moved to the last word that was taken.
-// Refused means a value that is missing or wrong, Unknown an option of the program's own.
+// Reads the option argv[index] and its value, and moves `index` to the value. Refused: the value is
+// missing or wrong. Unknown: not a setting, but perhaps an option of the program.
 Reading ReadSetting(int argc, const char* const* argv, int& index, Settings& settings);
 
-// A decimal number from `least` to `most`, and nothing else. False, `ret_number` untouched,
-// otherwise.
+// Accepts only a decimal number from `least` to `most`. Otherwise false, and `ret_number` keeps its
+// value.
 bool ReadNumber(const std::string& text, int least, int most, int& ret_number);
 
 }  // namespace NodeRegistry

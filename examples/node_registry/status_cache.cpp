@@ -17,10 +17,9 @@ using OrvaDRCore::FileLock;
 
 namespace {
 
-// A registry retries by itself.
-constexpr int SingleTry = -1;
+constexpr int SingleAttempt = -1;  // the registry itself retries
 
-// Others hold the lock exclusively for moments only; a second apart.
+// Attempts are a second apart. Others hold the lock exclusively only for moments.
 constexpr unsigned int LockRetries = 3;
 
 std::string DirectoryOf(const std::string& path)
@@ -39,50 +38,50 @@ bool StatusCache::IsUsable(const std::string& path)
 {
     std::error_code ignored;
     if (!std::filesystem::is_directory(DirectoryOf(path), ignored)) return false;
-    // The cache opens its lock file again and again. An ordinary user can make the file, but not
-    // open it a second time.
+    // Two objects, because the cache opens its lock file repeatedly: an ordinary user can create the
+    // file, but not open it a second time.
     const std::string name = path + ".cached.lock";
     FileLock maker(name);
     FileLock lock(name);
     if (!maker.openLockedFile() || !lock.lock(LOCK_SH | LOCK_NB, LockRetries)) return false;
-    lock.unlock();  // closing is not enough: a child that was just forked has the file open, too
+    lock.unlock();  // closing is not enough: a child that was just forked has the file open
     return true;
 }
 
-StatusCache::StatusCache(const std::string& file, long timeoutSeconds, Registry& nodes)
-    : Cache(DirectoryOf(file), NameOf(file), timeoutSeconds, false, SingleTry),
-      path(file),
-      isAlwaysOld(timeoutSeconds == 0),
-      owner(::getpid()),
-      registry(nodes)
+StatusCache::StatusCache(const std::string& path, long timeoutSeconds, Registry& registry)
+    : Cache(DirectoryOf(path), NameOf(path), timeoutSeconds, false, SingleAttempt),
+      path_(path),
+      isAlwaysStale_(timeoutSeconds == 0),
+      owner_(::getpid()),
+      registry_(registry)
 {
 }
 
 Json::Value StatusCache::GetInfo() const
 {
-    return "node status " + path;
+    return "node status " + path_;
 }
 
 bool StatusCache::IsUpdatedDataRequired() const
 {
-    listing = registry.List("", listed) ? Listing::Done : Listing::Failed;
+    listing_ = registry_.List("", listed_) ? Listing::Done : Listing::Failed;
     return Cache::IsUpdatedDataRequired();
 }
 
-// The nodes are probed one after the other: those that are silent cost ProbeTimeoutMSec each.
+// Probes one node after the other. Each silent node takes ProbeTimeoutMSec.
 bool StatusCache::GetUpdatedData(Json::Value& data) const
 {
-    if (::getpid() != owner) LeaveServer();
-    if (listing != Listing::Done) return false;
+    if (::getpid() != owner_) LeaveServer();
+    if (listing_ != Listing::Done) return false;
     const std::time_t begin = std::time(nullptr);
     Json::Value volumes(Json::objectValue);
     Json::Value probes(Json::objectValue);
-    for (const Node& node : listed) {
+    for (const Node& node : listed_) {
         if (!volumes.isMember(node.volume)) volumes[node.volume] = MeasureVolume(node.volume);
         if (node.enabled) probes[node.name] = ProbeAddress(node.address, node.port);
     }
     data["time"] = Json::Int64{begin};
-    data["total"] = static_cast<Json::UInt>(listed.size());
+    data["total"] = static_cast<Json::UInt>(listed_.size());
     data["enabled"] = probes.size();
     data["volumes"] = volumes;
     data["probes"] = probes;
@@ -97,7 +96,7 @@ bool StatusCache::IsValidData(const Json::Value& data) const
 
 bool StatusCache::IsNeedUpdate(const Json::Value& /*data*/) const
 {
-    return isAlwaysOld;
+    return isAlwaysStale_;
 }
 
 }  // namespace NodeRegistry

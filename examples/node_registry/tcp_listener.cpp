@@ -1,6 +1,6 @@
-// tcp_listener PORT: a node that can be reached, for the demo. Listens on 127.0.0.1, says so once
-// it does, and accepts connections until it is killed or its standard input ends, as it does when
-// whoever holds the other end of the pipe is gone.
+// tcp_listener PORT: plays a reachable node in the demo. Listens on 127.0.0.1, prints that it does, and
+// accepts connections until its standard input ends, because the process at the other end of the pipe
+// is gone.
 #include <arpa/inet.h>
 #include <netinet/in.h>
 #include <poll.h>

@@ -4,8 +4,8 @@ namespace NodeRegistry {
 
 namespace {
 
-// The length of the character that a text begins with; 0 for a control character and for bytes that
-// are no UTF-8. The text must not be empty.
+// The length of the text's first character; 0 if that is a control character or not UTF-8. The text
+// must not be empty.
 std::size_t PlainCharacterLength(std::string_view text)
 {
     const auto byte = [text](std::size_t index) -> unsigned int {
@@ -21,9 +21,9 @@ std::size_t PlainCharacterLength(std::string_view text)
     }
     const unsigned int second = byte(1);
     if (lead == 0xc2 && second < 0xa0) return 0;  // control characters U+0080 to U+009F
-    if (lead == 0xe0 && second < 0xa0) return 0;  // longer than need be
-    if (lead == 0xed && second > 0x9f) return 0;  // half a surrogate pair
-    if (lead == 0xf0 && second < 0x90) return 0;  // longer than need be
+    if (lead == 0xe0 && second < 0xa0) return 0;  // overlong form
+    if (lead == 0xed && second > 0x9f) return 0;  // a surrogate
+    if (lead == 0xf0 && second < 0x90) return 0;  // overlong form
     if (lead == 0xf4 && second > 0x8f) return 0;  // beyond the last character
     return length;
 }

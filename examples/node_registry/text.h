@@ -1,4 +1,4 @@
-// Texts that come from outside: which are accepted, and how any may be shown.
+// Text from outside: what is accepted, and how to show any of it safely.
 #ifndef NODE_REGISTRY_TEXT_H
 #define NODE_REGISTRY_TEXT_H
 
@@ -8,11 +8,11 @@
 
 namespace NodeRegistry {
 
-// Whether a text has 1 to `maxBytes` bytes, all of them UTF-8, and no control characters.
+// Whether the text is valid UTF-8 of 1 to `maxBytes` bytes without control characters.
 bool IsPlainText(std::string_view text, std::size_t maxBytes);
 
-// The text for a terminal: a question mark for every byte that IsPlainText would refuse, and "..."
-// for what is beyond `maxBytes`.
+// The text, safe for a terminal: each byte that IsPlainText() refuses becomes a question mark, and
+// text beyond `maxBytes` becomes "...".
 std::string ToPrintable(std::string_view text, std::size_t maxBytes);
 
 }  // namespace NodeRegistry

@@ -4,39 +4,40 @@
 
 namespace NodeService {
 
-ConnectionQueue::ConnectionQueue(std::size_t threadCount, std::size_t most) : mostWaiting(most)
+ConnectionQueue::ConnectionQueue(std::size_t threadCount, std::size_t mostWaiting)
+    : mostWaiting_(mostWaiting)
 {
-    while (threads.size() < threadCount) threads.emplace_back([this] { Work(); });
+    while (threads_.size() < threadCount) threads_.emplace_back([this] { Work(); });
 }
 
 void ConnectionQueue::enqueue(std::function<void()> serve)
 {
-    std::unique_lock<std::mutex> lock(mutex);
-    changed.wait(lock, [this] { return waiting.size() < mostWaiting; });
-    waiting.push_back(std::move(serve));
-    changed.notify_all();
+    std::unique_lock<std::mutex> lock(mutex_);
+    changed_.wait(lock, [this] { return waiting_.size() < mostWaiting_; });
+    waiting_.push_back(std::move(serve));
+    changed_.notify_all();
 }
 
 void ConnectionQueue::shutdown()
 {
     {
-        const std::lock_guard<std::mutex> lock(mutex);
-        isEnding = true;
+        const std::lock_guard<std::mutex> lock(mutex_);
+        isEnding_ = true;
     }
-    changed.notify_all();
-    for (std::thread& thread : threads) thread.join();
+    changed_.notify_all();
+    for (std::thread& thread : threads_) thread.join();
 }
 
 void ConnectionQueue::Work()
 {
-    std::unique_lock<std::mutex> lock(mutex);
+    std::unique_lock<std::mutex> lock(mutex_);
     while (true) {
-        changed.wait(lock, [this] { return !waiting.empty() || isEnding; });
-        if (waiting.empty()) return;
-        const std::function<void()> serve = std::move(waiting.front());
-        waiting.pop_front();
+        changed_.wait(lock, [this] { return !waiting_.empty() || isEnding_; });
+        if (waiting_.empty()) return;
+        const std::function<void()> serve = std::move(waiting_.front());
+        waiting_.pop_front();
         lock.unlock();
-        changed.notify_all();
+        changed_.notify_all();
         serve();
         lock.lock();
     }

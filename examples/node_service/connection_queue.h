@@ -1,4 +1,4 @@
-// The threads of the service, and the connections that wait for one of them.
+// The threads of the service, and the connections that wait for a thread.
 #ifndef NODE_SERVICE_CONNECTION_QUEUE_H
 #define NODE_SERVICE_CONNECTION_QUEUE_H
 
@@ -14,27 +14,27 @@
 
 namespace NodeService {
 
-// Serves connections in the order in which they came. When too many wait, no more are accepted: those
-// wait in the kernel, and cost the service no descriptor, which its database needs as well.
+// Serves connections in the order of arrival. If too many wait, no more are accepted. The others wait
+// in the kernel, where they use none of the descriptors that the database needs, too.
 class ConnectionQueue : public httplib::TaskQueue {
   public:
     ConnectionQueue(std::size_t threadCount, std::size_t mostWaiting);
 
-    // Called by the thread that accepts connections, and holds it up while the queue is full.
+    // Called by the accepting thread; blocks it while the queue is full.
     void enqueue(std::function<void()> serve) override;
 
-    // Returns when all connections are served and the threads have ended.
+    // Waits until all connections are served and all threads have ended.
     void shutdown() override;
 
   private:
     void Work();
 
-    const std::size_t mostWaiting;
-    std::mutex mutex;  // guards `waiting` and `isEnding`
-    std::condition_variable changed;
-    std::list<std::function<void()>> waiting;
-    bool isEnding = false;
-    std::vector<std::thread> threads;
+    const std::size_t mostWaiting_;
+    std::mutex mutex_;  // guards waiting_ and isEnding_
+    std::condition_variable changed_;
+    std::list<std::function<void()>> waiting_;
+    bool isEnding_ = false;
+    std::vector<std::thread> threads_;
 };
 
 }  // namespace NodeService

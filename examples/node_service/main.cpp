@@ -28,7 +28,7 @@ std::string ToText(const Address& address, int port)
     return (isIpv6 ? "[" + address.host + "]" : address.host) + ":" + std::to_string(port);
 }
 
-// The signals that end the service. Blocked in every thread: the main thread takes them out.
+// The signals that end the service, blocked in every thread. The main thread waits for them.
 sigset_t BlockEndSignals()
 {
     sigset_t signals;
@@ -83,7 +83,7 @@ int main(int argc, char** argv)
         std::cerr << NodeService::UsageText;
         return ExitUsage;
     }
-    // A client that has gone is a failed write like any other, not the end by a signal.
+    // A client that has gone makes a write fail; it must not end the service by a signal.
     static_cast<void>(std::signal(SIGPIPE, SIG_IGN));
     if (options.wantsHelp) return Print(NodeService::HelpText()) ? EXIT_SUCCESS : EXIT_FAILURE;
     ::openlog("node_service", LOG_PID | (options.isVerbose ? LOG_PERROR : 0), LOG_DAEMON);

@@ -49,7 +49,7 @@ Exit codes:
   2  wrong options
 )";
 
-// Takes "127.0.0.1:8470" or "[::1]:8470" apart.
+// Splits "127.0.0.1:8470" or "[::1]:8470".
 bool ReadAddress(const std::string& text, Address& ret_address)
 {
     const std::size_t colon = text.rfind(':');

@@ -8,7 +8,7 @@
 
 namespace NodeService {
 
-// Where to listen. Port 0 is any that is free.
+// Where to listen. Port 0 means any free port.
 struct Address {
     std::string host = "127.0.0.1";
     int port = 8470;
@@ -22,10 +22,10 @@ struct Options {
     bool wantsHelp = false;
 };
 
-// False for a command line that the usage does not allow.
+// False if the command line is wrong.
 bool ReadOptions(int argc, const char* const* argv, Options& ret_options);
 
-// How the program is called: in short, for those who called it wrongly, and in full.
+// The short help after a wrong command line, and the full one.
 extern const char* const UsageText;
 std::string HelpText();
 

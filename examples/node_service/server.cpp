@@ -31,12 +31,12 @@ namespace {
 
 constexpr const char* Path = "/webapi";
 
-// The largest request, and up to where a larger one is read and thrown away: a client that is still
-// sending when the connection is closed may never see the reply.
+// The largest request. A larger one is read and dropped up to MaxReadBytes, because a client that is
+// still sending when the connection is closed may never see the reply.
 constexpr std::size_t MaxBodyBytes = 1'048'576;
 constexpr std::size_t MaxReadBytes = 8 * MaxBodyBytes;
 
-// How long a client may take to begin its request, and between two parts of it or of the reply.
+// How long a client may take to start its request, and between two parts of the request or reply.
 constexpr std::time_t BeginSeconds = 2;
 constexpr std::time_t PartSeconds = 5;
 
@@ -68,20 +68,20 @@ void RefuseTooLarge(httplib::Response& response)
     Refuse(response, TooLarge, "request", "must have at most 1048576 bytes");
 }
 
-// Before the body is read. A size that the client does not tell is found out while reading.
+// Checked before the body is read. If the client sends no size, Answer() counts.
 bool IsTooLarge(const httplib::Request& request, std::size_t limit)
 {
     return request.get_header_value<uint64_t>("Content-Length") > limit;
 }
 
-// The handler of the calling thread, with a database connection of its own; it goes with the thread.
+// The calling thread's handler, with its own database connection. It lives as long as the thread.
 Handler& OwnHandler(const Settings& settings)
 {
     thread_local Handler handler(settings);
     return handler;
 }
 
-// For what httplib refuses by itself, before or instead of the functions below.
+// Replies to requests that httplib itself refuses.
 void ExplainError(const httplib::Request& /*request*/, httplib::Response& response)
 {
     if (response.body.empty()) {
@@ -106,69 +106,69 @@ void Log(const httplib::Request& request, const httplib::Response& response)
 
 }  // namespace
 
-Server::Server(const Options& given) : options(given)
+Server::Server(const Options& options) : options_(options)
 {
-    http.set_keep_alive_max_count(1);
-    http.set_keep_alive_timeout(BeginSeconds);
-    http.set_read_timeout(PartSeconds);
-    http.set_write_timeout(PartSeconds);
-    http.set_tcp_nodelay(true);
-    // httplib would share the port: two services on it would each get some of the connections.
-    http.set_socket_options([this](int socket) {
+    http_.set_keep_alive_max_count(1);
+    http_.set_keep_alive_timeout(BeginSeconds);
+    http_.set_read_timeout(PartSeconds);
+    http_.set_write_timeout(PartSeconds);
+    http_.set_tcp_nodelay(true);
+    // By default httplib shares the port: two services would each get some of the connections.
+    http_.set_socket_options([this](int socket) {
         const int yes = 1;
         ::setsockopt(socket, SOL_SOCKET, SO_REUSEADDR, &yes, sizeof yes);
-        listener = socket;
+        listener_ = socket;
     });
-    http.new_task_queue = [this] {
-        return new ConnectionQueue(static_cast<std::size_t>(options.threads), MostWaiting);
+    http_.new_task_queue = [this] {
+        return new ConnectionQueue(static_cast<std::size_t>(options_.threads), MostWaiting);
     };
-    http.set_pre_routing_handler(
+    http_.set_pre_routing_handler(
         [this](const Request& request, Response& response) { return Route(request, response); });
-    http.Post(Path, [this](const Request& /*request*/, Response& response,
-                           const ContentReader& content) { Answer(content, response); });
-    http.set_expect_100_continue_handler([](const Request& request, Response& response) {
+    http_.Post(Path, [this](const Request& /*request*/, Response& response,
+                            const ContentReader& content) { Answer(content, response); });
+    http_.set_expect_100_continue_handler([](const Request& request, Response& response) {
         if (!IsTooLarge(request, MaxBodyBytes)) return 100;
         RefuseTooLarge(response);
         return response.status;
     });
-    http.set_error_handler(ExplainError);
-    http.set_exception_handler(ExplainException);
-    http.set_logger(Log);
+    http_.set_error_handler(ExplainError);
+    http_.set_exception_handler(ExplainException);
+    http_.set_logger(Log);
 }
 
 bool Server::Bind()
 {
-    const Address& address = options.address;
+    const Address& address = options_.address;
     errno = 0;
     if (address.port == 0) {
-        port = http.bind_to_any_port(address.host);
-        if (port < 0) return false;
+        port_ = http_.bind_to_any_port(address.host);
+        if (port_ < 0) return false;
     } else {
-        if (!http.bind_to_port(address.host, address.port)) return false;
-        port = address.port;
+        if (!http_.bind_to_port(address.host, address.port)) return false;
+        port_ = address.port;
     }
-    // httplib listens with a queue of five, which many clients that begin together overflow: they
-    // would try again after a second.
-    return ::listen(listener, SOMAXCONN) == 0;
+    // httplib listens with a queue of five. Many clients at once would overflow it, and try again only
+    // after a second.
+    return ::listen(listener_, SOMAXCONN) == 0;
 }
 
 bool Server::Run()
 {
-    const bool wasStopped = http.listen_after_bind();
-    hasEnded = true;
+    const bool wasStopped = http_.listen_after_bind();
+    hasEnded_ = true;
     return wasStopped;
 }
 
-// httplib passes over a stop that comes before it runs.
+// Waits, because httplib ignores a stop before it runs.
 void Server::Stop()
 {
-    while (!http.is_running() && !hasEnded) {
+    while (!http_.is_running() && !hasEnded_) {
         std::this_thread::sleep_for(std::chrono::milliseconds(1));
     }
-    http.stop();
+    http_.stop();
 }
 
-// Answers what is no request to the registry, without reading its body.
+// Answers requests that are not for the registry, without reading their body.
 HandlerResponse Server::Route(const Request& request, Response& response) const
 {
     if (request.path != Path) {
@@ -196,8 +196,8 @@ void Server::Answer(const ContentReader& content, Response& response) const
         return size <= MaxReadBytes;
     });
     if (size > MaxBodyBytes) return RefuseTooLarge(response);
-    if (!isWhole) return;  // the client has gone or said nonsense; httplib has set the status
-    SetReply(response, Ok, OwnHandler(options.settings).Answer(body));
+    if (!isWhole) return;  // the client has gone or sent nonsense; httplib has set the status
+    SetReply(response, Ok, OwnHandler(options_.settings).Answer(body));
 }
 
 }  // namespace NodeService

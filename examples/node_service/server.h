@@ -7,9 +7,9 @@
 //     server.Stop();
 //     accepting.join();
 //
-// A connection carries one request: httplib keeps a thread for each open connection, so that a few
-// idle clients would keep all threads from the others. That also makes whatever follows a refused
-// body harmless: it is never read as another request.
+// A connection carries one request, because httplib keeps a thread for each open connection: a few
+// idle clients would occupy all threads. It also means that bytes after a refused body are never read
+// as another request.
 #ifndef NODE_SERVICE_SERVER_H
 #define NODE_SERVICE_SERVER_H
 
@@ -25,18 +25,18 @@ class Server {
   public:
     explicit Server(const Options& options);
 
-    // Takes the address, from which on connections are queued. False when it cannot be had, with
-    // errno where that says why, otherwise 0.
+    // Binds the address; from now on connections are queued. On failure false, with errno or, if
+    // that says nothing, 0.
     bool Bind();
 
-    // The port, which the system has chosen when 0 was asked for. After Bind().
-    int GetPort() const { return port; }
+    // The port, which the system has chosen if the options say 0. Call after Bind().
+    int GetPort() const { return port_; }
 
-    // Accepts connections until Stop(), and returns when all requests are answered. False when
-    // accepting failed before.
+    // Accepts connections until Stop(), and returns when all requests are answered. False if
+    // accepting connections failed.
     bool Run();
 
-    // Ends Run(), whether it has begun or not. From another thread, once.
+    // Ends Run(), even if it has not started yet. Call once, from another thread.
     void Stop();
 
   private:
@@ -46,11 +46,11 @@ class Server {
     httplib::Server::HandlerResponse Route(const Request& request, Response& response) const;
     void Answer(const httplib::ContentReader& content, Response& response) const;
 
-    const Options options;
-    httplib::Server http;
-    int listener = -1;
-    int port = 0;
-    std::atomic<bool> hasEnded{false};
+    const Options options_;
+    httplib::Server http_;
+    int listener_ = -1;
+    int port_ = 0;
+    std::atomic<bool> hasEnded_{false};
 };
 
 }  // namespace NodeService
