@@ -1,4 +1,4 @@
-// A cache whose data is fresh, read; and new data, written.
+// Reading a cache with fresh data, and writing new data.
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -30,7 +30,7 @@ class Status : public OrvaDRCore::Cache {
     bool IsValidData(const Json::Value& data) const override { return data.isObject(); }
 };
 
-// The cache file as the library writes it.
+// The cache file in the library's format.
 Json::Value MakeCacheFile(const Json::Value& data)
 {
     Json::Value document(Json::objectValue);
@@ -69,7 +69,7 @@ struct OurRead : ReadCache {
     Status cache{dir.Path()};
 };
 
-// Whether the file is the one that was read last and is not too old.
+// Whether the file has not changed since it was read and is not too old.
 bool IsFresh(const std::string& path, std::time_t loaded)
 {
     struct stat status {};
@@ -83,7 +83,7 @@ std::time_t ModifyTime(const std::string& path)
     return ::stat(path.c_str(), &status) == 0 ? status.st_mtime : -1;
 }
 
-// The caller gets the document that lies in memory, not a copy of it.
+// Returns the document in memory, not a copy.
 struct BareRead : ReadCache {
     using ReadCache::ReadCache;
     void Run() { given = IsFresh(path, loaded) ? &data : nullptr; }
@@ -113,7 +113,7 @@ struct ContractRead : ReadCache {
     std::time_t loaded = ModifyTime(path);
 };
 
-// Without a cache: the file is read each time.
+// Without a cache: reads the file each time.
 struct StreamRead : ReadCache {
     using ReadCache::ReadCache;
     void Run()
@@ -136,7 +136,7 @@ struct OurWrite : WriteCache {
     Status cache{dir.Path()};
 };
 
-// Replaces the file: written beside it, flushed to disk, renamed.
+// Replaces the file: writes a new one, flushes it to disk and renames it.
 void Replace(const std::string& path, const std::string& text)
 {
     const std::string temporary = path + ".new";
@@ -154,8 +154,7 @@ struct BareWrite : WriteCache {
     void Run() { Replace(path, ToLine(MakeCacheFile(data))); }
 };
 
-// The longest refresh is taken over from the old file, as are its permissions; what was written is
-// kept in memory.
+// Keeps the old file's permissions and longest refresh time, and the new document in memory.
 struct ContractWrite : WriteCache {
     using WriteCache::WriteCache;
     void Run()

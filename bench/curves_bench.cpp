@@ -1,5 +1,5 @@
-// How the cost grows: with rows, columns, tables in the file, values in a list, and processes that
-// insert into one file.
+// How the cost grows with the number of rows, columns, tables in the file, values in a list, and
+// processes that insert into one file.
 #include <sqlite3.h>
 #include <sys/mman.h>
 #include <sys/wait.h>
@@ -43,7 +43,7 @@ struct SelectRows {
     std::unique_ptr<Engine> engine;
 };
 
-// In a file with that many tables, within a transaction.
+// Inserts, in one transaction, into a file with that many tables.
 template <class Engine>
 struct InsertBesideTables {
     explicit InsertBesideTables(int tables)
@@ -69,7 +69,7 @@ struct InsertBesideTables {
     Node node = MakeNode(0);
 };
 
-// A hundred rows of that many columns of numbers.
+// A hundred rows with that many numeric columns.
 struct Wide {
     static constexpr int Rows = 100;
 
@@ -149,7 +149,7 @@ struct BareWide : Wide {
     std::vector<std::vector<int>> rows;
 };
 
-// A condition on a table of 1,000 rows, from the numbers to the rows.
+// Selects by a list of numbers from a table of 1,000 rows.
 struct InList {
     explicit InList(int count) : ids(static_cast<std::size_t>(count))
     {
@@ -222,15 +222,15 @@ struct Waits {
     double worst = 0;
 };
 
-constexpr std::size_t MaxInserts = 1'000'000;  // of all processes of a crowd
+constexpr std::size_t MaxInserts = 1'000'000;  // by all processes together
 
-// Numbers in memory that processes share; the count comes first.
+// Numbers in shared memory; the first is their count.
 struct Board {
     std::size_t count;
     std::array<float, MaxInserts> msec;
 };
 
-// Inserts until the time is over and notes how long each insert took.
+// Inserts until the time is up, and records how long each insert took.
 template <class Engine>
 void InsertUntil(const std::string& path, Clock::time_point end, int process, Board& board)
 {
@@ -257,7 +257,7 @@ Waits Summarize(const Board& board, double seconds)
             all[count * 99 / 100], all.back()};
 }
 
-// The rows that are there, counted behind the back of the engines.
+// The number of rows, counted without the engines.
 std::size_t CountRows(const std::string& path)
 {
     const Database db = OpenDatabase(path);
@@ -307,19 +307,19 @@ Waits RunCrowd(Place place, int processes, int seconds)
     return waits;
 }
 
-// Our connection, with a retry limit that is not reached.
+// Our connection, with a retry limit that is high enough.
 struct PatientEngine : OurEngine {
     explicit PatientEngine(const std::string& path) : OurEngine(path, CrowdRetries) {}
     static constexpr unsigned int CrowdRetries = 100;
 };
 
-// Waits within SQLite for as long as it takes.
+// SQLite's busy timeout, which waits as long as it takes.
 struct WaitingEngine : BareEngine {
     explicit WaitingEngine(const std::string& path) : BareEngine(path, CrowdTimeoutMSec) {}
     static constexpr int CrowdTimeoutMSec = 600'000;
 };
 
-// What a place, a number of processes and a contestant gave.
+// The results for one place, number of processes and contestant.
 struct Crowd {
     Place place = Place::Disk;
     int processes = 0;
@@ -345,7 +345,7 @@ Waits Summarize(const Crowd& crowd)
     return waits;
 }
 
-// A line for each crowd: place, who, processes, and the four figures.
+// One line per run: place, contestant, processes, and the four figures.
 void PrintCrowds(std::FILE* file, const char* format, const std::vector<Crowd>& crowds)
 {
     for (const Crowd& crowd : crowds) {

@@ -1,4 +1,5 @@
-// JSON documents, read and written by path. The files lie in memory: a disk would hide the rest.
+// Reading and writing JSON documents by path. The files are in memory, because a disk would hide
+// everything else.
 #include <unistd.h>
 
 #include <fstream>
@@ -41,7 +42,7 @@ struct OurRead : ReadJson {
     void Run() { Require(OrvaDRCore::File::Read(path, read), "cannot read"); }
 };
 
-// jsoncpp at its fastest: the reader is made once and passes over comments.
+// jsoncpp at its fastest: creates the reader once and ignores comments.
 struct BareRead : ReadJson {
     explicit BareRead(std::size_t bytes) : ReadJson(bytes)
     {
@@ -58,8 +59,8 @@ struct BareRead : ReadJson {
     std::unique_ptr<Json::CharReader> reader;
 };
 
-// A missing file is none to complain of; the lines are joined; comments, trailing commas and a
-// second document are refused, as are zero bytes; what fails leaves the caller's document alone.
+// A missing file is not an error. Joins the lines. Refuses comments, trailing commas, a second
+// document and zero bytes. A failure leaves the caller's document unchanged.
 struct ContractRead : ReadJson {
     explicit ContractRead(std::size_t bytes) : ReadJson(bytes)
     {
@@ -102,7 +103,7 @@ struct OurWrite : WriteJson {
     void Run() { Require(OrvaDRCore::File::Write(path, document), "cannot write"); }
 };
 
-// The writer is made once.
+// Creates the writer once.
 struct BareWrite : WriteJson {
     explicit BareWrite(std::size_t bytes) : WriteJson(bytes)
     {
@@ -159,7 +160,7 @@ struct BoostRead : JsonFile {
     Tree tree;
 };
 
-// Its numbers and booleans become texts.
+// It stores numbers and booleans as texts.
 struct BoostWrite : WriteJson {
     explicit BoostWrite(std::size_t bytes) : WriteJson(bytes)
     {

@@ -1,4 +1,5 @@
-// Files of "key=value" lines, read into a map. The files lie in memory: a disk would hide the rest.
+// Reading files of "key=value" lines into a map. The files are in memory, because a disk would hide
+// everything else.
 #include <unistd.h>
 
 #include <charconv>
@@ -88,7 +89,7 @@ V ToValue(std::string_view text)
     }
 }
 
-// Calls `take` with each line, without its end.
+// Calls `take` with each line, without its newline.
 template <class Take>
 void ForEachLine(std::string_view text, Take take)
 {
@@ -122,8 +123,8 @@ std::string_view FirstWord(std::string_view text)
     return text.substr(begin, std::min(text.find_first_of(Blanks, begin), text.size()) - begin);
 }
 
-// Of both sides the first word counts; an empty side makes no pair; a missing file is none to
-// complain of.
+// Takes the first word of each side. A line with an empty side is skipped. A missing file is not an
+// error.
 template <class V>
 struct ContractPairs : KeyValue<V> {
     using KeyValue<V>::KeyValue;
@@ -159,7 +160,7 @@ struct InihPairs : KeyValue<V> {
 #endif
 
 #if BENCH_HAS_GLIB
-// Its files need a group, which is one line more.
+// Its files need a group: one more line.
 template <class V>
 struct GlibPairs : KeyValue<V> {
     explicit GlibPairs(int count) : KeyValue<V>(count, "[all]\n") {}

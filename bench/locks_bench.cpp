@@ -1,4 +1,4 @@
-// Locks between processes, free at the time.
+// Locks between processes that nobody else holds.
 #include <fcntl.h>
 #include <sys/file.h>
 #include <sys/stat.h>
@@ -23,8 +23,7 @@ namespace {
 
 constexpr int Exclusive = LOCK_EX | LOCK_NB;
 
-// A name of this process's own in the lock directory, and the file behind it, made at the beginning
-// and removed at the end.
+// A lock name of this process and its file, which exists as long as this object.
 struct LockFile {
     LockFile()
     {
@@ -58,7 +57,7 @@ struct BareLock {
     int fd;
 };
 
-// Before each lock: the directory is there, and the file, if it is open, is a regular one.
+// Before each lock, checks that the directory exists and that an open file is a regular one.
 struct ContractLock {
     explicit ContractLock(const LockFile& file) : path(file.path) {}
     ContractLock(const ContractLock&) = delete;
@@ -83,7 +82,7 @@ struct ContractLock {
 };
 
 #if BENCH_HAS_BOOST
-// Its locks are those of fcntl: they exclude other processes only.
+// Uses fcntl() locks, which do not exclude threads of the same process.
 struct BoostLock {
     explicit BoostLock(const LockFile& file) : lock(Writable(file).c_str()) {}
     static const std::string& Writable(const LockFile& file)

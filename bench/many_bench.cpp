@@ -1,4 +1,4 @@
-// A thousand rows at once: by one call, and row by row.
+// Inserting a thousand rows in one call, and row by row.
 #include "support/bench.h"
 #include "support/engines.h"
 
@@ -20,7 +20,7 @@ struct Many {
     std::vector<Node> nodes;
 };
 
-// SQLite numbers the rows, so that the same records can be inserted again.
+// SQLite assigns the ids, so that the same records can be inserted again.
 struct OurMany : Many {
     explicit OurMany(Place place) : Many(place)
     {

@@ -25,8 +25,7 @@ namespace Bench {
 
 namespace {
 
-// What an action writes to the log, with each number as N: the library's lines hold process ids and
-// line numbers.
+// What an action logs, with N for each number, because process ids and line numbers differ.
 template <class Action>
 std::string LinesOf(Action action)
 {
@@ -50,7 +49,7 @@ std::string LinesOf(Action action)
     return lines;
 }
 
-// One line at ERR, which reaches the system's logger when there is one.
+// One line at ERR, which reaches the system logger if there is one.
 struct OurLine {
     void Run() { path = OrvaDRCore::FileLock::getLockFilePath(""); }
     std::string Result()
@@ -61,7 +60,7 @@ struct OurLine {
     std::string path;
 };
 
-// The line is ready.
+// The line is formatted in advance.
 struct BareLine {
     void Run() { ::syslog(LOG_ERR, "%s", line.c_str()); }
     std::string Result()
@@ -87,7 +86,7 @@ struct ContractLine {
     std::string name;
 };
 
-// A line at DEBUG in a program that does not want those. There are no other threads.
+// A line at DEBUG in a program that masks that level. No other threads are running.
 // NOLINTBEGIN(concurrency-mt-unsafe)
 struct Masked {
     Masked() : before(::setlogmask(LOG_UPTO(LOG_INFO))) {}
@@ -129,7 +128,7 @@ struct OurName : ErrorName {
     }
 };
 
-// A table of the names by hand, of as many as the item needs.
+// A table with the names that the item needs.
 struct BareName : ErrorName {
     void Run()
     {
@@ -150,7 +149,7 @@ struct BareName : ErrorName {
     }
 };
 
-// Starts a program and waits for it. Its output goes to the descriptor, unless that is -1.
+// Starts a program and waits for it. Redirects its output to the descriptor, unless that is -1.
 void Spawn(std::vector<std::string> arguments, int output)
 {
     std::vector<char*> pointers;
@@ -168,7 +167,7 @@ void Spawn(std::vector<std::string> arguments, int output)
     Require(::waitpid(pid, &status, 0) == pid && status == 0, "a program failed");
 }
 
-// No two UUIDs are the same: what they have in common is their form.
+// UUIDs differ, so only their form can be compared.
 struct Uuid {
     std::string Result() const
     {
@@ -214,7 +213,7 @@ struct PopenUuid : Uuid {
     }
 };
 
-// The directory is removed first, which is a system call and counts for all alike.
+// Each run first removes the directory: one system call more for all contestants.
 struct NewDir {
     std::string Result() const
     {

@@ -1,4 +1,4 @@
-// Rows of a table: inserted, selected, changed and deleted.
+// Inserting, selecting, changing and deleting rows.
 #include <sqlite3.h>
 
 #include <map>
@@ -11,11 +11,12 @@ namespace Bench {
 namespace {
 
 constexpr int Rows = 10000;
-constexpr benchmark::IterationCount Deletes = 5000;  // of the rows, so that each finds one
+constexpr benchmark::IterationCount Deletes =
+    5000;  // at most the number of rows, so that each deletes one
 
 enum class Mode { Autocommit, Transaction };
 
-// A new database and an engine on it.
+// A new database, and an engine that uses it.
 template <class Engine>
 struct Connection {
     Connection(Place place, int rows, Mode wanted) : dir(place), mode(wanted)
@@ -73,7 +74,7 @@ struct SelectAll {
     Connection<Engine> connection{Place::Memory, Rows, Mode::Autocommit};
 };
 
-// The loop that a careful programmer writes who wants rows by column name, with values of any type.
+// What a careful programmer writes to get rows by column name, with values of any type.
 class LoopEngine {
   public:
     explicit LoopEngine(const std::string& path)

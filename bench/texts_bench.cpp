@@ -1,4 +1,4 @@
-// Statement texts, made and thrown away.
+// Building statement texts.
 #include <sqlite3.h>
 
 #include <map>
@@ -69,7 +69,7 @@ struct BareInsert : InsertText {
     }
 };
 
-// The columns stand in the order of their names.
+// Columns are sorted by name.
 std::string WriteInsert(const std::string& table, const std::map<std::string, Value>& fields)
 {
     std::string made = "INSERT INTO " + table + " (";
@@ -104,7 +104,7 @@ struct ContractInsert : InsertText {
     std::map<std::string, Value> fields = MakeFields(row);
 };
 
-// The columns are named one by one; the builder owns copies.
+// Columns are added one by one; the builder copies them.
 struct ContractMadeInsert : InsertText {
     void Run()
     {
@@ -124,7 +124,7 @@ struct SqliteInsert : InsertText {
     }
 };
 
-// The way that is written first: a stream for the whole, and one for each value.
+// The obvious way: a stream for the statement, and one for each value.
 template <class T>
 std::string StreamLiteral(const T& value)
 {
@@ -184,7 +184,7 @@ struct BareIn : InText {
     }
 };
 
-// The list is one of typed values.
+// A list of typed values.
 struct ContractIn : InText {
     explicit ContractIn(int count) : InText(count), values(ids.begin(), ids.end()) {}
     void Run()
@@ -220,7 +220,7 @@ struct StreamIn : InText {
 
 }  // namespace
 
-// The aims are 400 ns and 30 us where the streams need 2 us and 230 us.
+// The targets are 400 ns and 30 us where streams take 2 us and 230 us.
 void AddTexts()
 {
     constexpr double InsertOfStream = 0.2;

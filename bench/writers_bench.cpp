@@ -1,5 +1,5 @@
-// Processes that insert row by row into one file at the same time, some with readers between them:
-// how much they store together, who of them is served least, who gives up, and what waiting costs.
+// Processes that insert row by row into one file at the same time, sometimes with readers: how many
+// rows they store, how fair it is, who gives up, and what waiting costs.
 #include <sys/mman.h>
 #include <sys/resource.h>
 #include <sys/wait.h>
@@ -24,11 +24,10 @@ using Milliseconds = std::chrono::duration<double, std::milli>;
 
 constexpr std::size_t MaxProcesses = 128;
 
-// A daemon that reads now and then.
+// Like a daemon that reads now and then.
 constexpr useconds_t ReaderPauseUSec = 5000;
 
-// The patience of ours is that of six tries of a second with pauses between them; that of the others
-// is their busy timeout.
+// How long they wait: we make six attempts of a second, with pauses; the others use a busy timeout.
 constexpr unsigned int Retries = 5;
 constexpr int PeersTimeoutMSec = 10'000;
 
@@ -41,7 +40,7 @@ struct PatientPeer : Engine {
     explicit PatientPeer(const std::string& path) : Engine(path, PeersTimeoutMSec) {}
 };
 
-// What a process did.
+// The results of one process.
 struct Work {
     int done;
     int givenUp;
@@ -49,7 +48,7 @@ struct Work {
     double processorSeconds;
 };
 
-// What the processes share.
+// In memory that the processes share.
 struct Board {
     std::atomic<int> ready;
     std::atomic<bool> isOpen;
@@ -79,10 +78,10 @@ struct Scene {
 
 struct Figures {
     double insertsPerSecond = 0;
-    double leastShare = 0;  // of the mean of all writers
+    double leastShare = 0;  // compared with the mean of all writers
     int givenUp = 0;
     double worstMSec = 0;
-    double processorPercent = 0;  // of a core, of the writer that used most
+    double processorPercent = 0;  // of a core; the writer that used most
     double readsPerSecond = 0;
     double worstReadMSec = 0;
 };
@@ -97,7 +96,7 @@ double ProcessorSeconds()
     return seconds(usage.ru_utime) + seconds(usage.ru_stime);
 }
 
-// Repeats `act`, with pauses, until the end and notes how it went.
+// Repeats `act`, with pauses, until the time is up, and records the results.
 template <class Act>
 void WorkUntil(Clock::time_point end, Work& work, useconds_t pause, Act act)
 {
@@ -137,7 +136,7 @@ void RunProcess(const std::string& path, std::size_t process, bool isWriter, int
     }
 }
 
-// A process that runs `body` and ends. Its id.
+// Starts a process that runs `body`; returns its id.
 pid_t Fork(const std::function<void()>& body)
 {
     const pid_t child = ::fork();
@@ -221,7 +220,7 @@ struct Library {
     Figures (*run)(const Scene&, int);
 };
 
-// A file with its caption; none when the path is empty.
+// Opens a file and writes the caption; null if the path is empty.
 using OpenFile = std::unique_ptr<std::FILE, int (*)(std::FILE*)>;
 OpenFile OpenTable(const std::string& path, const char* caption)
 {

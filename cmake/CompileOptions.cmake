@@ -1,5 +1,5 @@
-# What every target of this project is compiled with. Nothing is set for a project that includes this
-# one: the settings are those of a target that only our own targets link to.
+# Compiler settings, as a target that only our own targets link to. A project that includes this one is
+# not affected.
 add_library(orvadr_compile_options INTERFACE)
 target_compile_features(orvadr_compile_options INTERFACE cxx_std_17)
 target_compile_options(orvadr_compile_options INTERFACE
@@ -13,7 +13,7 @@ if(ORVADR_SANITIZE)
     target_link_options(orvadr_compile_options INTERFACE ${sanitizers})
 endif()
 if(ORVADR_BUILD_FUZZ)
-    # The fuzzer sees which ways an input takes.
+    # Tells the fuzzer which code an input reaches.
     target_compile_options(orvadr_compile_options INTERFACE -fsanitize=fuzzer-no-link)
 endif()
 if(ORVADR_COVERAGE)

@@ -1,5 +1,5 @@
-# What `cmake --install` lays out, in three components: Runtime is the library, Development what a
-# compiler needs for it, Examples their sources. All of it may be moved to another prefix.
+# `cmake --install`, in three components: Runtime (the library), Development (headers, files for CMake
+# and pkg-config) and Examples (sources). The installed tree may be moved.
 include(GNUInstallDirs)
 include(CMakePackageConfigHelpers)
 
@@ -11,7 +11,7 @@ install(TARGETS orvadrcore EXPORT OrvaDRCoreTargets
         COMPONENT Runtime
         NAMELINK_COMPONENT Development
     INCLUDES DESTINATION ${CMAKE_INSTALL_INCLUDEDIR})
-# Has the lock directory made at boot. systemd-tmpfiles looks below /usr and /usr/local.
+# Creates the lock directory at boot. systemd-tmpfiles reads this below /usr and /usr/local.
 install(FILES cmake/orvadrcore.tmpfiles.conf
     DESTINATION lib/tmpfiles.d
     RENAME orvadrcore.conf
@@ -34,7 +34,7 @@ install(FILES
     DESTINATION ${package_dir}
     COMPONENT Development)
 
-# The prefix is told from the place of the file, as in the CMake package.
+# The prefix is relative to the file, as in the CMake package.
 file(RELATIVE_PATH prefix_from_pc
     ${CMAKE_INSTALL_FULL_LIBDIR}/pkgconfig ${CMAKE_INSTALL_PREFIX})
 configure_file(cmake/orvadrcore.pc.in orvadrcore.pc @ONLY)

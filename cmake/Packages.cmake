@@ -1,5 +1,5 @@
-# Debian packages, made by `cpack -G DEB` in a build whose prefix is /usr: one for each component of
-# the installation.
+# Debian packages, one per component of the installation. `cpack -G DEB` builds them; the prefix must
+# be /usr.
 set(CPACK_GENERATOR DEB)
 set(CPACK_PACKAGE_NAME orvadrcore)
 set(CPACK_PACKAGE_DESCRIPTION_SUMMARY "")  # each package has its own
@@ -16,8 +16,8 @@ set(about "The common services of a storage appliance's disaster recovery progra
 object layer over SQLite, JSON and key=value files, lock files and a cache that
 processes share, and the envelope of the web API.")
 
-# orvadr_debian_package(COMPONENT NAME SECTION MULTI-ARCH SUMMARY DESCRIPTION). CPack knows no field
-# Multi-Arch before CMake 3.31; it goes behind the section's line.
+# orvadr_debian_package(COMPONENT NAME SECTION MULTI-ARCH SUMMARY DESCRIPTION). CPack supports the field
+# Multi-Arch only since CMake 3.31, so it is appended to the section.
 macro(orvadr_debian_package component name section multi_arch summary description)
     string(TOUPPER ${component} upper)
     set(CPACK_DEBIAN_${upper}_PACKAGE_NAME ${name})
@@ -39,13 +39,13 @@ orvadr_debian_package(Examples liborvadrcore-examples doc foreign
     "common services of disaster recovery programs - examples"
     "This package holds programs that use the library, to read and to build.")
 
-# The library runs uuidgen, which no shared library tells of.
+# The library runs uuidgen, which the list of shared libraries does not show.
 set(CPACK_DEBIAN_RUNTIME_PACKAGE_DEPENDS uuid-runtime)
 set(CPACK_DEBIAN_RUNTIME_PACKAGE_SHLIBDEPS ON)
 set(CPACK_DEBIAN_PACKAGE_GENERATE_SHLIBS ON)
 set(CPACK_DEBIAN_PACKAGE_GENERATE_SHLIBS_POLICY ">=")
-# CPack has ldconfig called by scripts, for which lintian warns; policy wants the trigger. The postinst
-# makes the lock directory.
+# Debian's policy wants a trigger for ldconfig; CPack would write scripts, of which lintian warns. The
+# postinst creates the lock directory.
 set(CPACK_DEBIAN_RUNTIME_PACKAGE_CONTROL_EXTRA
     ${PROJECT_SOURCE_DIR}/cmake/debian/triggers
     ${PROJECT_SOURCE_DIR}/cmake/debian/postinst)

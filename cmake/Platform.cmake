@@ -1,5 +1,5 @@
-# The targets OrvaPlatform::core and OrvaPlatform::random: the appliance's platform libraries, or our
-# stand-ins for them.
+# Defines OrvaPlatform::core and OrvaPlatform::random: the appliance's platform libraries, or our
+# stand-ins.
 if(ORVADR_PLATFORM STREQUAL "bundled")
     add_subdirectory(platform)
 elseif(ORVADR_PLATFORM STREQUAL "system")

@@ -24,15 +24,15 @@ void Aim(const std::vector<std::string>& of, double most)
 }
 
 TempDir::TempDir(Place place)
-    : path(place == Place::Disk ? "./orvadr-bench-XXXXXX" : "/dev/shm/orvadr-bench-XXXXXX")
+    : path_(place == Place::Disk ? "./orvadr-bench-XXXXXX" : "/dev/shm/orvadr-bench-XXXXXX")
 {
-    Require(::mkdtemp(path.data()) != nullptr, "cannot make a directory");
+    Require(::mkdtemp(path_.data()) != nullptr, "cannot make a directory");
 }
 
 TempDir::~TempDir()
 {
     std::error_code ignored;
-    std::filesystem::remove_all(path, ignored);
+    std::filesystem::remove_all(path_, ignored);
 }
 
 }  // namespace Bench

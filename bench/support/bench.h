@@ -1,18 +1,17 @@
-// How a family of benchmarks says what it measures.
+// How to define a benchmark.
 //
 //     struct Ours {
 //         void Run() { text = ERR::ToString(404); }       // what is measured
-//         std::string Result() const { return text; }     // what it gave, as text
+//         std::string Result() const { return text; }     // its result, as text
 //         std::string text;
 //     };
 //     Add<Ours>("error name", "ours");
 //     ...
-//     Aim({Bare}, 1.1);                                   // where we want to be
+//     Aim({Bare}, 1.1);                                   // the target
 //
-// An item is one task, named without characters that are special in a regular expression. Its
-// contestants are "ours", "bare", "contract" and peers by name. The first contestant of an item gives
-// the result that all others have to give, too. Further arguments of Add go to the contestant's
-// constructor, which is not measured.
+// An item is one task; its name must not contain special characters of regular expressions. Its
+// contestants are "ours", "bare", "contract" and other libraries by name. All must give the result of
+// the first. Further arguments of Add go to the contestant's constructor, which is not measured.
 #ifndef ORVADRCORE_BENCH_SUPPORT_BENCH_H
 #define ORVADRCORE_BENCH_SUPPORT_BENCH_H
 
@@ -27,18 +26,18 @@
 
 namespace Bench {
 
-// The library itself; the least work by hand that gives the same result; and the least work by hand
-// that does what the library's documents promise as well.
+// The library; the least work by hand that gives the same result; and the least work by hand that
+// also keeps the promises of the library's documents.
 inline constexpr const char* Ours = "ours";
 inline constexpr const char* Bare = "bare";
 inline constexpr const char* Contract = "contract";
 
-// What a contestant throws when it cannot do its work.
+// Thrown by a contestant that cannot do its work.
 struct Failure : std::runtime_error {
     using std::runtime_error::runtime_error;
 };
 
-// Throws a Failure unless it is so.
+// Throws a Failure unless `holds`.
 inline void Require(bool holds, const char* what)
 {
     if (!holds) throw Failure(what);
@@ -46,10 +45,10 @@ inline void Require(bool holds, const char* what)
 
 struct Contestant {
     std::string name;
-    std::function<std::string()> result;  // of a single run
+    std::function<std::string()> result;  // of one run
 };
 
-// Ours is to take at most `most` times as long as each of those.
+// We may take at most `most` times as long as each of these contestants.
 struct Target {
     std::vector<std::string> of;
     double most = 0;
@@ -61,19 +60,19 @@ struct Item {
     std::vector<Target> targets;
 };
 
-// All items, in the order in which they were added.
+// All items, in the order of Add.
 std::vector<Item>& Items();
 
-// Adds a contestant to its item, which is made when it is the first.
+// Adds a contestant to an item. The first one creates the item.
 void AddContestant(const std::string& item, Contestant contestant);
 
-// Sets the item that was added last a target, by one contestant or by several. One that is not on
-// this system does not count.
+// Sets the target of the last item, compared with one or more contestants. Those that are not
+// installed do not count.
 void Aim(const std::vector<std::string>& of, double most);
 
-// The bounds that an item may set itself.
+// Limits that an item may set.
 struct Bounds {
-    benchmark::IterationCount iterations = 0;  // 0: as many as the minimal time needs
+    benchmark::IterationCount iterations = 0;  // 0: as many as the minimum time takes
 };
 
 template <class Type, class... Arguments>
@@ -105,8 +104,8 @@ void Add(const std::string& item, const std::string& name, Arguments... argument
     AddBounded<Type>(Bounds{}, item, name, arguments...);
 }
 
-// A directory of the contestant's own, removed with all that is in it: on the disk that holds the
-// working directory, or in memory.
+// A temporary directory, removed with its content: on the disk of the working directory, or in
+// memory.
 enum class Place { Disk, Memory };
 
 class TempDir {
@@ -116,11 +115,11 @@ class TempDir {
     TempDir& operator=(const TempDir&) = delete;
     ~TempDir();
 
-    std::string File(const std::string& name) const { return path + "/" + name; }
-    const std::string& Path() const { return path; }
+    std::string File(const std::string& name) const { return path_ + "/" + name; }
+    const std::string& Path() const { return path_; }
 
   private:
-    std::string path;
+    std::string path_;
 };
 
 // The families.
@@ -134,12 +133,12 @@ void AddCache();
 void AddMisc();
 void AddCurves();
 
-// Processes that insert into one file at the same time, in so many runs of so many seconds; prints a
-// table of its own and writes it to `out`.csv and `out`.md, unless that is empty.
+// Processes that insert into one file at the same time: `runs` runs of `seconds` each. Prints a table
+// and, unless `out` is empty, writes it to `out`.csv and `out`.md.
 void RunCrowds(const std::string& out, int runs, int seconds);
 
-// Processes that insert row by row into one file, and those that read between them, for so many
-// seconds each; prints and writes as above.
+// Processes that insert row by row into one file, with and without readers, for `seconds` each. Prints
+// and writes as above.
 void RunWriters(const std::string& out, int seconds);
 
 }  // namespace Bench

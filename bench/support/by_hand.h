@@ -1,5 +1,5 @@
-// What the contestants by hand share: SQLite's C interface and files at the level of system calls,
-// each call answered for.
+// Helpers for the work by hand: SQLite's C interface, and files by system calls. Every call's result
+// is checked.
 #ifndef ORVADRCORE_BENCH_SUPPORT_BY_HAND_H
 #define ORVADRCORE_BENCH_SUPPORT_BY_HAND_H
 
@@ -17,7 +17,7 @@ struct sqlite3_stmt;
 
 namespace Bench {
 
-// What a typed value of a statement or a row needs at least.
+// The minimum of a typed value in a statement or row.
 using Value = std::variant<int, unsigned int, bool, std::string>;
 
 // Appends a value as an SQL literal.
@@ -35,27 +35,28 @@ struct Finalize {
 };
 using Statement = std::unique_ptr<sqlite3_stmt, Finalize>;
 
-inline constexpr int BusyTimeoutMSec = 1000;  // as long as the library waits
+inline constexpr int BusyTimeoutMSec = 1000;  // the library's
 
 Database OpenDatabase(const std::string& path, int busyTimeoutMSec = BusyTimeoutMSec);
 void ExecText(sqlite3* handle, const std::string& text);
 Statement Prepare(sqlite3* handle, const std::string& text);
 
-// The text of a column of the current row.
+// A column of the current row, as text.
 std::string ColumnText(sqlite3_stmt* statement, int column);
 
-// A file's whole content, and a file that is emptied and written.
+// Reads a whole file; truncates and writes a file.
 std::string ReadFile(const std::string& path);
 void WriteFile(const std::string& path, std::string_view text);
 
-// A document of about that size: nodes with numbers, texts and booleans.
+// A document of about that size, with numbers, texts and booleans.
 Json::Value MakeDocument(std::size_t bytes);
 
 // The document on one line.
 std::string ToLine(const Json::Value& document);
 Json::Value Parse(const std::string& text);
 
-// Every leaf of a document with its path, without the types: what any reader of JSON can give.
+// Every leaf of a document with its path but without its type, so that any JSON reader can be
+// compared.
 std::string Flatten(const Json::Value& document);
 
 }  // namespace Bench

@@ -18,7 +18,7 @@ void CreateNodes(sqlite3* handle)
     ExecText(handle, std::string("CREATE TABLE IF NOT EXISTS nodes (") + NodesSchema + ")");
 }
 
-// Tables that the benchmarks do not use, numbered from `first` to before `end`.
+// Creates unused tables, numbered from `first` to `end` - 1.
 void CreateOthers(const std::string& path, int first, int end)
 {
     const Database db = OpenDatabase(path);
@@ -64,7 +64,7 @@ void CollectNodes(sqlite3_stmt* statement, std::vector<Node>& nodes)
     Require(code == SQLITE_DONE, "a select failed");
 }
 
-// For rows by column name: `get(row, name, out)` reads a column.
+// A row by column names: `get(row, name, out)` reads a column.
 template <class Row, class Get>
 std::vector<Node> ToNodes(const std::vector<Row>& rows, Get get)
 {
@@ -250,7 +250,7 @@ void BareEngine::Delete(int id)
 ContractEngine::ContractEngine(const std::string& path) : handle(OpenDatabase(path))
 {
     CreateNodes(handle.get());
-    look = Prepare(handle.get(), "SELECT 1 FROM sqlite_master WHERE type='table' AND name=?;");
+    find = Prepare(handle.get(), "SELECT 1 FROM sqlite_master WHERE type='table' AND name=?;");
 }
 
 void ContractEngine::Exec(const char* statement)
@@ -258,16 +258,16 @@ void ContractEngine::Exec(const char* statement)
     ExecText(handle.get(), statement);
 }
 
-void ContractEngine::LookForTable()
+void ContractEngine::FindTable()
 {
-    BindText(look.get(), 1, name);
-    Require(sqlite3_step(look.get()) == SQLITE_ROW, "no table");
-    Finish(look.get());  // a failure behind the row would be one, too
+    BindText(find.get(), 1, name);
+    Require(sqlite3_step(find.get()) == SQLITE_ROW, "no table");
+    Finish(find.get());  // an error after the row counts, too
 }
 
 void ContractEngine::Insert(const Node& node)
 {
-    LookForTable();
+    FindTable();
     std::string text = "INSERT INTO " + name + " (address,id,name,port,state) VALUES (";
     AppendLiteral(text, std::string_view(node.address));
     AppendLiteral(text += ',', node.id);
@@ -277,7 +277,7 @@ void ContractEngine::Insert(const Node& node)
     ExecText(handle.get(), text += ");");
 }
 
-// Reads all rows of a select. The names are read once for each row, as rows are made one by one.
+// Reads all rows of a select. Reads the names for each row, because rows are built one by one.
 void ContractEngine::Collect(const std::string& text)
 {
     rows.clear();
@@ -300,7 +300,7 @@ void ContractEngine::Collect(const std::string& text)
 
 void ContractEngine::Select(int id)
 {
-    LookForTable();
+    FindTable();
     std::string text = "SELECT  * FROM " + name + " WHERE id=";
     AppendLiteral(text, id);
     Collect(text);
@@ -308,13 +308,13 @@ void ContractEngine::Select(int id)
 
 void ContractEngine::SelectAll()
 {
-    LookForTable();
+    FindTable();
     Collect("SELECT  * FROM " + name);
 }
 
 void ContractEngine::Update(int id, int state)
 {
-    LookForTable();
+    FindTable();
     std::string text = "UPDATE " + name + " SET state=";
     AppendLiteral(text, state);
     AppendLiteral(text += " WHERE id=", id);
@@ -323,7 +323,7 @@ void ContractEngine::Update(int id, int state)
 
 void ContractEngine::Delete(int id)
 {
-    LookForTable();
+    FindTable();
     std::string text = "DELETE FROM " + name + " WHERE id=";
     AppendLiteral(text, id);
     ExecText(handle.get(), text += ';');

@@ -1,6 +1,5 @@
-// The ways to the same rows: ours, SQLite's C interface by hand, and other libraries. Each engine has
-// the same operations on the table `nodes`, and keeps what it selected in the form that its users
-// get.
+// Engines: our library, SQLite's C interface by hand, and other libraries. All have the same operations
+// on the table `nodes`, and keep what they select in the form that their users get.
 #ifndef ORVADRCORE_BENCH_SUPPORT_ENGINES_H
 #define ORVADRCORE_BENCH_SUPPORT_ENGINES_H
 
@@ -32,19 +31,19 @@ Node MakeNode(int id);
 std::string ToText(const Node& node);
 std::string ToText(const std::vector<Node>& nodes);
 
-// Rows as those want them who do not know the columns: values of any type by column name.
+// Rows for users who do not know the columns: values of any type by column name.
 using NamedRows = std::vector<std::map<std::string, Json::Value>>;
 std::string ToText(const NamedRows& rows);
 
-// A new database with nodes 1 to `rows`, and `tables` - 1 other tables, half of them older than nodes.
+// Creates a database with nodes 1 to `rows`, and `tables` - 1 other tables, half of them before it.
 void FillNodes(const std::string& path, int rows, int tables = 1);
 
-// All nodes of a file, as text, in the order of their ids.
+// All nodes of a file as text, ordered by id.
 std::string DumpNodes(const std::string& path);
 
 class OurEngine {
   public:
-    // The retry limit is that of the connection.
+    // The retry limit of the connection.
     explicit OurEngine(const std::string& path, unsigned int retries = 0);
     void Exec(const char* statement);
     void Insert(const Node& node);
@@ -60,7 +59,7 @@ class OurEngine {
     std::vector<OrvaDRCore::SqliteValueList> rows;
 };
 
-// Statements that are prepared once, rows as a struct.
+// Prepares statements once; rows are structs.
 class BareEngine {
   public:
     explicit BareEngine(const std::string& path, int busyTimeoutMSec = BusyTimeoutMSec);
@@ -82,8 +81,8 @@ class BareEngine {
     std::vector<Node> rows;
 };
 
-// What our documents promise, by hand: before each statement the look for the table, by a query that
-// stays prepared; the statement as a text with literals; rows as values by column name.
+// By hand, what our documents promise: a table lookup before each statement, by a query that stays
+// prepared; statements as text with literals; rows as values by column name.
 class ContractEngine {
   public:
     explicit ContractEngine(const std::string& path);
@@ -96,17 +95,17 @@ class ContractEngine {
     std::string Selected() const;
 
   private:
-    void LookForTable();
+    void FindTable();
     void Collect(const std::string& text);
 
     Database handle;
     std::string name = "nodes";
-    Statement look;
+    Statement find;
     std::vector<std::map<std::string, Value>> rows;
 };
 
-// Another library's way. What it is made of stands in the library's own source: the headers of two
-// of them cannot be included together.
+// Another library. Each has its own source, because the headers of two of them cannot be included
+// together.
 template <class Library>
 class Peer {
   public:
@@ -177,7 +176,7 @@ std::string Peer<Library>::Selected() const
     return ToText(library->rows);
 }
 
-// Each library by its structs, and by rows with values by column name.
+// Each library with structs, and with values by column name.
 struct SqliteCpp;
 struct SqliteCppByName;
 struct Soci;

@@ -48,8 +48,7 @@ bool IsPeer(const std::string& name)
     return name != Ours && name != Bare && name != Contract;
 }
 
-// How many times as long as the fastest of those in the target ours takes; nothing when none of them
-// was measured.
+// Our time divided by that of the fastest contestant of the target; nothing if none was measured.
 std::optional<double> Reached(const Item& item, const Target& target, const Collector& collected)
 {
     const auto ours = MedianOf(item.name, Ours, collected);
@@ -61,7 +60,7 @@ std::optional<double> Reached(const Item& item, const Target& target, const Coll
     return most;
 }
 
-// An item's row as texts, for both kinds of tables.
+// An item's row as texts, for both tables.
 struct Row {
     std::string ours;
     std::string bare;
@@ -129,7 +128,7 @@ void Collector::ReportRuns(const std::vector<Run>& runs)
         if (run.run_type != Run::RT_Iteration) continue;
         Require(!run.error_occurred, run.error_message.c_str());
         const double seconds = run.real_accumulated_time / static_cast<double>(run.iterations);
-        times[run.run_name.function_name].push_back(seconds * NSecPerSec);
+        times_[run.run_name.function_name].push_back(seconds * NSecPerSec);
     }
 }
 

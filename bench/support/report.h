@@ -1,4 +1,4 @@
-// What the repetitions gave: a table on the screen and one for a page, and a CSV file for programs.
+// Reports the results: a table on the screen, one in Markdown, and a CSV file.
 #ifndef ORVADRCORE_BENCH_SUPPORT_REPORT_H
 #define ORVADRCORE_BENCH_SUPPORT_REPORT_H
 
@@ -12,20 +12,20 @@
 
 namespace Bench {
 
-// Keeps the time of each repetition, in nanoseconds for one run, by the name "item/contestant".
+// Collects the time of each repetition, in nanoseconds per run, by "item/contestant".
 class Collector : public benchmark::BenchmarkReporter {
   public:
     bool ReportContext(const Context& context) override;
     void ReportRuns(const std::vector<Run>& runs) override;
 
-    const std::map<std::string, std::vector<double>>& Times() const { return times; }
+    const std::map<std::string, std::vector<double>>& Times() const { return times_; }
 
   private:
-    std::map<std::string, std::vector<double>> times;
+    std::map<std::string, std::vector<double>> times_;
 };
 
-// The caption of the table, and an item's row: medians, their ratios to the floors, the target and
-// whether it is met, the peers.
+// The table's caption, and an item's row: medians, their ratios to the work by hand, the target and
+// whether it is met, other libraries.
 void PrintCaption();
 void PrintItem(const Item& item, const Collector& collected);
 
@@ -33,11 +33,11 @@ void PrintItem(const Item& item, const Collector& collected);
 void WriteMarkdown(const std::string& path, const std::vector<Item>& items,
                    const Collector& collected);
 
-// Every contestant with its median, fastest and slowest repetition and its ratios to the floors and
-// to ours.
+// Each contestant's median, fastest and slowest repetition, and its ratios to the work by hand and to
+// us.
 void WriteCsv(const std::string& path, const std::vector<Item>& items, const Collector& collected);
 
-// A time with three digits and its unit.
+// A time as text: three digits and a unit.
 std::string ToTime(double nanoseconds);
 
 }  // namespace Bench

@@ -1,6 +1,6 @@
 #if BENCH_HAS_SOCI
 
-// Its header takes that of SQLite into a namespace: neither may be included together with the other.
+// Its header includes SQLite's inside a namespace, so nothing here may include sqlite3.h.
 #include <soci/soci.h>
 #include <soci/sqlite3/soci-sqlite3.h>
 
@@ -8,7 +8,7 @@
 
 namespace Bench {
 
-// As its documents advise: statements are prepared once, with variables bound to them.
+// As its documentation recommends: prepares statements once, with bound variables.
 struct Soci {
     Soci(const std::string& path, int busyTimeoutMSec)
         : session(soci::sqlite3,
@@ -31,7 +31,7 @@ struct Soci {
     void Delete(int id);
 
     soci::session session;
-    bool created;  // before the statements, which need the table
+    bool created;  // declared before the statements, which need the table
     Node bound;
     int key = 0;
     soci::statement insert =

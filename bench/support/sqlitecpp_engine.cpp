@@ -18,7 +18,7 @@ Node NodeOfRow(SQLite::Statement& statement)
 
 }  // namespace
 
-// As its documents advise: statements are prepared once and reset.
+// As its documentation recommends: prepares statements once and resets them.
 struct SqliteCpp {
     SqliteCpp(const std::string& path, int busyTimeoutMSec)
         : db(path, SQLite::OPEN_READWRITE | SQLite::OPEN_CREATE, busyTimeoutMSec),
@@ -34,7 +34,7 @@ struct SqliteCpp {
     void Delete(int id);
 
     SQLite::Database db;
-    int created;  // before the statements, which need the table
+    int created;  // declared before the statements, which need the table
     SQLite::Statement insert{db, "INSERT INTO nodes VALUES (?,?,?,?,?)"};
     SQLite::Statement select{db, "SELECT * FROM nodes WHERE id=?"};
     SQLite::Statement selectAll{db, "SELECT * FROM nodes"};
@@ -50,7 +50,7 @@ void SqliteCpp::Exec(const char* statement)
 
 void SqliteCpp::Insert(const Node& node)
 {
-    insert.reset();  // first, because one that failed needs it, too
+    insert.reset();  // before the insert, because a failed one needs it, too
     insert.bind(1, node.id);
     insert.bindNoCopy(2, node.name);
     insert.bindNoCopy(3, node.address);
