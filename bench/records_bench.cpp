@@ -78,45 +78,45 @@ struct SelectAll {
 class LoopEngine {
   public:
     explicit LoopEngine(const std::string& path)
-        : handle(OpenDatabase(path)), select(Prepare(handle.get(), "SELECT * FROM nodes"))
+        : handle_(OpenDatabase(path)), select_(Prepare(handle_.get(), "SELECT * FROM nodes"))
     {
     }
-    void Exec(const char* statement) { ExecText(handle.get(), statement); }
+    void Exec(const char* statement) { ExecText(handle_.get(), statement); }
     void SelectAll()
     {
-        rows.clear();
-        const int columns = sqlite3_column_count(select.get());
+        rows_.clear();
+        const int columns = sqlite3_column_count(select_.get());
         std::vector<std::string> fields;
         fields.reserve(static_cast<std::size_t>(columns));
         for (int column = 0; column < columns; ++column) {
-            fields.emplace_back(sqlite3_column_name(select.get(), column));
+            fields.emplace_back(sqlite3_column_name(select_.get(), column));
         }
-        while (sqlite3_step(select.get()) == SQLITE_ROW) AppendRow(fields);
-        sqlite3_reset(select.get());
+        while (sqlite3_step(select_.get()) == SQLITE_ROW) AppendRow(fields);
+        sqlite3_reset(select_.get());
     }
-    std::string Selected() const { return ToText(rows); }
+    std::string Selected() const { return ToText(rows_); }
 
   private:
     void AppendRow(const std::vector<std::string>& fields)
     {
-        auto& row = rows.emplace_back();
+        auto& row = rows_.emplace_back();
         int column = 0;
         for (const std::string& field : fields) {
-            if (sqlite3_column_type(select.get(), column) == SQLITE_INTEGER) {
-                row.emplace(field, sqlite3_column_int(select.get(), column));
+            if (sqlite3_column_type(select_.get(), column) == SQLITE_INTEGER) {
+                row.emplace(field, sqlite3_column_int(select_.get(), column));
             } else {
                 const auto* text =
-                    reinterpret_cast<const char*>(sqlite3_column_text(select.get(), column));
+                    reinterpret_cast<const char*>(sqlite3_column_text(select_.get(), column));
                 row.emplace(field,
-                            Json::Value(text, text + sqlite3_column_bytes(select.get(), column)));
+                            Json::Value(text, text + sqlite3_column_bytes(select_.get(), column)));
             }
             ++column;
         }
     }
 
-    Database handle;
-    Statement select;
-    NamedRows rows;
+    Database handle_;
+    Statement select_;
+    NamedRows rows_;
 };
 
 template <class Engine>

@@ -132,159 +132,159 @@ std::string DumpNodes(const std::string& path)
 }
 
 OurEngine::OurEngine(const std::string& path, unsigned int retries)
-    : table("nodes", NodesSchema), db(path, retries)
+    : table_("nodes", NodesSchema), db_(path, retries)
 {
-    Require(db.Open(), "cannot open a database");
-    Require(db.CreateTable(table), "cannot make a table");
+    Require(db_.Open(), "cannot open a database");
+    Require(db_.CreateTable(table_), "cannot make a table");
 }
 
 void OurEngine::Exec(const char* statement)
 {
-    Require(db.Exec(statement), statement);
+    Require(db_.Exec(statement), statement);
 }
 
 void OurEngine::Insert(const Node& node)
 {
     OrvaDRCore::InsertCommand command;
-    command.SetTable(table);
+    command.SetTable(table_);
     command.AddFieldValue("id", node.id);
     command.AddFieldValue("name", node.name);
     command.AddFieldValue("address", node.address);
     command.AddFieldValue("port", node.port);
     command.AddFieldValue("state", node.state);
-    Require(db.InsertRecord(command), "an insert failed");
+    Require(db_.InsertRecord(command), "an insert failed");
 }
 
 void OurEngine::Select(int id)
 {
     OrvaDRCore::SelectCommand command;
-    command.SetTable(table);
+    command.SetTable(table_);
     command.SelectAll();
     command.SetCondition(SqliteEqual("id", id));
-    rows.clear();
+    rows_.clear();
     SqliteValueList row;
-    Require(db.SelectRecord(command, row), "a select failed");
-    rows.push_back(std::move(row));
+    Require(db_.SelectRecord(command, row), "a select failed");
+    rows_.push_back(std::move(row));
 }
 
 void OurEngine::SelectAll()
 {
     OrvaDRCore::SelectCommand command;
-    command.SetTable(table);
+    command.SetTable(table_);
     command.SelectAll();
-    rows.clear();
-    Require(db.SelectRecords(command, rows), "a select failed");
+    rows_.clear();
+    Require(db_.SelectRecords(command, rows_), "a select failed");
 }
 
 void OurEngine::Update(int id, int state)
 {
     OrvaDRCore::UpdateCommand command;
-    command.SetTable(table);
+    command.SetTable(table_);
     command.AddFieldValue("state", state);
     command.SetCondition(SqliteEqual("id", id));
-    Require(db.UpdateRecord(command), "an update failed");
+    Require(db_.UpdateRecord(command), "an update failed");
 }
 
 void OurEngine::Delete(int id)
 {
-    Require(db.DeleteRecord(SqliteEqual("id", id).GetCondition(), table), "a delete failed");
+    Require(db_.DeleteRecord(SqliteEqual("id", id).GetCondition(), table_), "a delete failed");
 }
 
 std::string OurEngine::Selected() const
 {
-    return ToText(ToNodes(rows, [](const SqliteValueList& row, const char* name, auto& out) {
+    return ToText(ToNodes(rows_, [](const SqliteValueList& row, const char* name, auto& out) {
         Require(row.GetValue(name, out), name);
     }));
 }
 
 BareEngine::BareEngine(const std::string& path, int busyTimeoutMSec)
-    : handle(OpenDatabase(path, busyTimeoutMSec))
+    : handle_(OpenDatabase(path, busyTimeoutMSec))
 {
-    CreateNodes(handle.get());
-    insert = Prepare(handle.get(), "INSERT INTO nodes VALUES (?,?,?,?,?)");
-    select = Prepare(handle.get(), "SELECT * FROM nodes WHERE id=?");
-    selectAll = Prepare(handle.get(), "SELECT * FROM nodes");
-    update = Prepare(handle.get(), "UPDATE nodes SET state=? WHERE id=?");
-    remove = Prepare(handle.get(), "DELETE FROM nodes WHERE id=?");
+    CreateNodes(handle_.get());
+    insert_ = Prepare(handle_.get(), "INSERT INTO nodes VALUES (?,?,?,?,?)");
+    select_ = Prepare(handle_.get(), "SELECT * FROM nodes WHERE id=?");
+    selectAll_ = Prepare(handle_.get(), "SELECT * FROM nodes");
+    update_ = Prepare(handle_.get(), "UPDATE nodes SET state=? WHERE id=?");
+    remove_ = Prepare(handle_.get(), "DELETE FROM nodes WHERE id=?");
 }
 
 void BareEngine::Exec(const char* statement)
 {
-    ExecText(handle.get(), statement);
+    ExecText(handle_.get(), statement);
 }
 
 void BareEngine::Insert(const Node& node)
 {
-    BindNode(insert.get(), node);
-    Finish(insert.get());
+    BindNode(insert_.get(), node);
+    Finish(insert_.get());
 }
 
 void BareEngine::Select(int id)
 {
-    rows.clear();
-    sqlite3_bind_int(select.get(), 1, id);
-    Require(sqlite3_step(select.get()) == SQLITE_ROW, "no row");
-    rows.push_back(NodeOfRow(select.get()));
-    sqlite3_reset(select.get());
+    rows_.clear();
+    sqlite3_bind_int(select_.get(), 1, id);
+    Require(sqlite3_step(select_.get()) == SQLITE_ROW, "no row");
+    rows_.push_back(NodeOfRow(select_.get()));
+    sqlite3_reset(select_.get());
 }
 
 void BareEngine::SelectAll()
 {
-    rows.clear();
-    CollectNodes(selectAll.get(), rows);
+    rows_.clear();
+    CollectNodes(selectAll_.get(), rows_);
 }
 
 void BareEngine::Update(int id, int state)
 {
-    sqlite3_bind_int(update.get(), 1, state);
-    sqlite3_bind_int(update.get(), 2, id);
-    Finish(update.get());
+    sqlite3_bind_int(update_.get(), 1, state);
+    sqlite3_bind_int(update_.get(), 2, id);
+    Finish(update_.get());
 }
 
 void BareEngine::Delete(int id)
 {
-    sqlite3_bind_int(remove.get(), 1, id);
-    Finish(remove.get());
+    sqlite3_bind_int(remove_.get(), 1, id);
+    Finish(remove_.get());
 }
 
-ContractEngine::ContractEngine(const std::string& path) : handle(OpenDatabase(path))
+ContractEngine::ContractEngine(const std::string& path) : handle_(OpenDatabase(path))
 {
-    CreateNodes(handle.get());
-    find = Prepare(handle.get(), "SELECT 1 FROM sqlite_master WHERE type='table' AND name=?;");
+    CreateNodes(handle_.get());
+    find_ = Prepare(handle_.get(), "SELECT 1 FROM sqlite_master WHERE type='table' AND name=?;");
 }
 
 void ContractEngine::Exec(const char* statement)
 {
-    ExecText(handle.get(), statement);
+    ExecText(handle_.get(), statement);
 }
 
 void ContractEngine::FindTable()
 {
-    BindText(find.get(), 1, name);
-    Require(sqlite3_step(find.get()) == SQLITE_ROW, "no table");
-    Finish(find.get());  // an error after the row counts, too
+    BindText(find_.get(), 1, name_);
+    Require(sqlite3_step(find_.get()) == SQLITE_ROW, "no table");
+    Finish(find_.get());  // an error after the row counts, too
 }
 
 void ContractEngine::Insert(const Node& node)
 {
     FindTable();
-    std::string text = "INSERT INTO " + name + " (address,id,name,port,state) VALUES (";
+    std::string text = "INSERT INTO " + name_ + " (address,id,name,port,state) VALUES (";
     AppendLiteral(text, std::string_view(node.address));
     AppendLiteral(text += ',', node.id);
     AppendLiteral(text += ',', std::string_view(node.name));
     AppendLiteral(text += ',', node.port);
     AppendLiteral(text += ',', node.state);
-    ExecText(handle.get(), text += ");");
+    ExecText(handle_.get(), text += ");");
 }
 
 // Reads all rows of a select. Reads the names for each row, because rows are built one by one.
 void ContractEngine::Collect(const std::string& text)
 {
-    rows.clear();
-    const Statement statement = Prepare(handle.get(), text);
+    rows_.clear();
+    const Statement statement = Prepare(handle_.get(), text);
     int code = SQLITE_OK;
     while ((code = sqlite3_step(statement.get())) == SQLITE_ROW) {
-        std::map<std::string, Value>& row = rows.emplace_back();
+        std::map<std::string, Value>& row = rows_.emplace_back();
         const int columns = sqlite3_column_count(statement.get());
         for (int column = 0; column < columns; ++column) {
             const char* field = sqlite3_column_name(statement.get(), column);
@@ -301,7 +301,7 @@ void ContractEngine::Collect(const std::string& text)
 void ContractEngine::Select(int id)
 {
     FindTable();
-    std::string text = "SELECT  * FROM " + name + " WHERE id=";
+    std::string text = "SELECT  * FROM " + name_ + " WHERE id=";
     AppendLiteral(text, id);
     Collect(text);
 }
@@ -309,30 +309,30 @@ void ContractEngine::Select(int id)
 void ContractEngine::SelectAll()
 {
     FindTable();
-    Collect("SELECT  * FROM " + name);
+    Collect("SELECT  * FROM " + name_);
 }
 
 void ContractEngine::Update(int id, int state)
 {
     FindTable();
-    std::string text = "UPDATE " + name + " SET state=";
+    std::string text = "UPDATE " + name_ + " SET state=";
     AppendLiteral(text, state);
     AppendLiteral(text += " WHERE id=", id);
-    ExecText(handle.get(), text);
+    ExecText(handle_.get(), text);
 }
 
 void ContractEngine::Delete(int id)
 {
     FindTable();
-    std::string text = "DELETE FROM " + name + " WHERE id=";
+    std::string text = "DELETE FROM " + name_ + " WHERE id=";
     AppendLiteral(text, id);
-    ExecText(handle.get(), text += ';');
+    ExecText(handle_.get(), text += ';');
 }
 
 std::string ContractEngine::Selected() const
 {
     using Row = std::map<std::string, Value>;
-    return ToText(ToNodes(rows, [](const Row& row, const char* field, auto& out) {
+    return ToText(ToNodes(rows_, [](const Row& row, const char* field, auto& out) {
         out = std::get<std::decay_t<decltype(out)>>(row.at(field));
     }));
 }

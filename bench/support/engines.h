@@ -54,9 +54,9 @@ class OurEngine {
     std::string Selected() const;
 
   private:
-    OrvaDRCore::SqliteTableHandler table;
-    OrvaDRCore::SqliteDB db;
-    std::vector<OrvaDRCore::SqliteValueList> rows;
+    OrvaDRCore::SqliteTableHandler table_;
+    OrvaDRCore::SqliteDB db_;
+    std::vector<OrvaDRCore::SqliteValueList> rows_;
 };
 
 // Prepares statements once; rows are structs.
@@ -69,16 +69,16 @@ class BareEngine {
     void SelectAll();
     void Update(int id, int state);
     void Delete(int id);
-    std::string Selected() const { return ToText(rows); }
+    std::string Selected() const { return ToText(rows_); }
 
   private:
-    Database handle;
-    Statement insert;
-    Statement select;
-    Statement selectAll;
-    Statement update;
-    Statement remove;
-    std::vector<Node> rows;
+    Database handle_;
+    Statement insert_;
+    Statement select_;
+    Statement selectAll_;
+    Statement update_;
+    Statement remove_;
+    std::vector<Node> rows_;
 };
 
 // By hand, what our documents promise: a table lookup before each statement, by a query that stays
@@ -98,10 +98,10 @@ class ContractEngine {
     void FindTable();
     void Collect(const std::string& text);
 
-    Database handle;
-    std::string name = "nodes";
-    Statement find;
-    std::vector<std::map<std::string, Value>> rows;
+    Database handle_;
+    std::string name_ = "nodes";
+    Statement find_;
+    std::vector<std::map<std::string, Value>> rows_;
 };
 
 // Another library. Each has its own source, because the headers of two of them cannot be included
@@ -122,12 +122,12 @@ class Peer {
     std::string Selected() const;
 
   private:
-    std::unique_ptr<Library> library;
+    std::unique_ptr<Library> library_;
 };
 
 template <class Library>
 Peer<Library>::Peer(const std::string& path, int busyTimeoutMSec)
-    : library(std::make_unique<Library>(path, busyTimeoutMSec))
+    : library_(std::make_unique<Library>(path, busyTimeoutMSec))
 {
 }
 
@@ -137,43 +137,43 @@ Peer<Library>::~Peer() = default;
 template <class Library>
 void Peer<Library>::Exec(const char* statement)
 {
-    library->Exec(statement);
+    library_->Exec(statement);
 }
 
 template <class Library>
 void Peer<Library>::Insert(const Node& node)
 {
-    library->Insert(node);
+    library_->Insert(node);
 }
 
 template <class Library>
 void Peer<Library>::Select(int id)
 {
-    library->Select(id);
+    library_->Select(id);
 }
 
 template <class Library>
 void Peer<Library>::SelectAll()
 {
-    library->SelectAll();
+    library_->SelectAll();
 }
 
 template <class Library>
 void Peer<Library>::Update(int id, int state)
 {
-    library->Update(id, state);
+    library_->Update(id, state);
 }
 
 template <class Library>
 void Peer<Library>::Delete(int id)
 {
-    library->Delete(id);
+    library_->Delete(id);
 }
 
 template <class Library>
 std::string Peer<Library>::Selected() const
 {
-    return ToText(library->rows);
+    return ToText(library_->rows);
 }
 
 // Each library with structs, and with values by column name.

@@ -36,7 +36,7 @@ void AddOptions(CLI::App& app, Options& options)
                    "write the figures to NAME.csv and NAME.md, and those of processes to "
                    "NAME-processes.csv and NAME-processes.md")
         ->type_name("NAME");
-    app.add_option("TEXT", options.text, "only items whose name contains this");
+    app.add_option("TEXT", options.text, "only items whose name contains this")->type_name("");
 }
 
 // Repetitions are shuffled, so that a machine that is slow for a while slows all contestants.

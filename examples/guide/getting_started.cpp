@@ -23,8 +23,8 @@ int main()
     // [failure]
     if (!db.InsertRecord(insert)) {
         std::cout << "code " << db.GetErrCode() << ", " << ERR::ToString(db.GetErrCode()) << '\n';
-        for (const Json::Value& failedTry : db.GetErr()) {
-            const Json::Value& message = failedTry["err_msg"]["sqlite_errmsg"];
+        for (const Json::Value& attempt : db.GetErr()) {
+            const Json::Value& message = attempt["err_msg"]["sqlite_errmsg"];
             std::cout << "SQLite says: " << message.asString() << '\n';
         }
     }

@@ -30,7 +30,7 @@ class NodeStatus : public Cache {
     using Clock = std::function<std::time_t()>;
 
     NodeStatus(const std::string& dir, Producer produce, Clock clock)
-        : Cache(dir, "status", TimeoutSeconds, true, SingleTry),
+        : Cache(dir, "status", TimeoutSeconds, true, SingleAttempt),
           produce_(std::move(produce)),
           clock_(std::move(clock))
     {
@@ -74,7 +74,7 @@ class NodeStatus : public Cache {
     static constexpr std::time_t PauseSeconds = 5;  // doubled by each failure: 10, 20, ...
     static constexpr int MostFailures = 5;          // ... 160
     static constexpr long TimeoutSeconds = 300;     // must be longer than the longest pause
-    static constexpr int SingleTry = -1;
+    static constexpr int SingleAttempt = -1;
 
     Producer produce_;
     Clock clock_;
