@@ -130,19 +130,26 @@ void Run(const Options& options)
     }
 }
 
-}  // namespace
-
-int main(int argc, char** argv)
+int Main(int argc, char** argv)
 {
     CLI::App app("Measures the library, the same work by hand, and other libraries.");
     Options options;
     AddOptions(app, options);
     try {
         app.parse(argc, argv);
-        Run(options);
-        return 0;
     } catch (const CLI::ParseError& error) {  // --help is one, too
         return app.exit(error) == 0 ? 0 : ExitUsage;
+    }
+    Run(options);
+    return 0;
+}
+
+}  // namespace
+
+int main(int argc, char** argv)
+{
+    try {
+        return Main(argc, argv);
     } catch (const std::exception& failure) {
         (void)std::fprintf(stderr, "orvadr_bench: %s\n", failure.what());
         return 1;
