@@ -51,4 +51,5 @@ install(DIRECTORY docs
     FILES_MATCHING PATTERN *.md PATTERN *.svg)
 install(DIRECTORY examples
     DESTINATION ${CMAKE_INSTALL_DATADIR}/doc/liborvadrcore-examples
-    COMPONENT Examples)
+    COMPONENT Examples
+    PATTERN tests EXCLUDE)

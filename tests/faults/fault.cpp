@@ -3,7 +3,6 @@
 #include <json/value.h>
 #include <sqlite3.h>
 #include <sys/prctl.h>
-#include <syslog.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -21,6 +20,7 @@
 
 #include "base/json_helpers.h"
 #include "support/fakes/allocation_faults.h"
+#include "support/fakes/log_sink.h"
 #include "support/fakes/pauses.h"
 #include "support/fakes/process_faults.h"
 #include "support/fakes/syscall_faults.h"
@@ -186,6 +186,12 @@ int CloseAnyway(int fd)
     return -1;
 }
 
+void CountLine(int priority, const char* format, std::va_list arguments)
+{
+    DropLine(priority, format, arguments);
+    ++ThePlan().lines;
+}
+
 // All that fails by system calls; pauses and sleeps are passed over.
 class System {
   public:
@@ -226,6 +232,7 @@ class System {
         Json::Value document;
         EXPECT_TRUE(OrvaDRCore::fromString(document, OrvaDRCore::toString(document)));
         faults.sleep = [](unsigned int /*seconds*/) { return 0U; };
+        SendLogTo(CountLine);
         AskBeforeAllocating(AllocationFails);
     }
     System(const System&) = delete;
@@ -377,34 +384,7 @@ void EveryCallFails(const std::string& operation, Call first, Call end,
     ::testing::Test::RecordProperty("faults", plan.faults);
 }
 
-void NoteLine(const char* format, va_list arguments)
-{
-    static std::array<char, 4096> line;
-    (void)std::vsnprintf(line.data(), line.size(), format, arguments);
-    ++ThePlan().lines;
-}
-
 }  // namespace
-
-// What the library calls: the first in plain builds, the second in optimised ones.
-extern "C" void syslog(int /*priority*/, const char* format, ...)
-{
-    va_list arguments;
-    va_start(arguments, format);
-    NoteLine(format, arguments);
-    va_end(arguments);
-}
-
-// NOLINTNEXTLINE(bugprone-reserved-identifier)
-extern "C" void __syslog_chk(int priority, int flag, const char* format, ...);
-// NOLINTNEXTLINE(bugprone-reserved-identifier)
-extern "C" void __syslog_chk(int /*priority*/, int /*flag*/, const char* format, ...)
-{
-    va_list arguments;
-    va_start(arguments, format);
-    NoteLine(format, arguments);
-    va_end(arguments);
-}
 
 int Strike(Call call)
 {

@@ -1,10 +1,10 @@
 #!/usr/bin/env python3
-"""Puts small faults into src/, one at a time, and tells those that no test notices.
+"""Puts small faults into src/, one at a time, and lists those that no test notices.
 
-Works in copies of the tree, build/mutation/0 and so on, one for each worker. A fault is met by the
-unit tests of its source, then by all unit tests, then by the quick process tests; the first failure
-catches it, and so does a time-out. A fault that does not compile is not counted. Faults that change
-nothing that could be seen are listed, with the reason, in tests/mutation/accepted.txt.
+Each worker has a copy of the tree: build/mutation/0 and so on. A fault is tried by the unit tests of
+its source, then by all unit tests, then by the quick process tests and example tests. The first test
+that fails or times out has caught it. Faults that do not compile are not counted. Faults that change
+nothing a test could see are listed, with the reason, in tests/mutation/accepted.txt.
 """
 
 import argparse
@@ -33,7 +33,8 @@ ACCEPTED = ROOT / "tests" / "mutation" / "accepted.txt"
 NOBODY = 65534
 CHUNK = 10  # faults that a worker takes at once
 SHARDS = 2  # processes of one test run
-QUICK_SECONDS = 1.0  # what a process test may take to be run here
+PROGRAMS = ["unit_tests", "process_tests", "example_tests"]
+QUICK_SECONDS = 1.0  # slower process tests and example tests are not run here
 FOLDERS = ["cmake", "docs", "examples", "include", "platform", "src", "tests"]
 MIB = 1 << 20
 PR_SET_CHILD_SUBREAPER = 36
@@ -153,7 +154,7 @@ class Copy:
         if not (self.command("cmake", "-S", self.tree, "-B", self.build,
                              "-DCMAKE_BUILD_TYPE=Debug", "-DCMAKE_CXX_FLAGS_DEBUG=-O0 -w",
                              "-DORVADR_PRECOMPILE=ON")
-                and self.make("unit_tests", "process_tests")):
+                and self.make(*PROGRAMS)):
             sys.exit(f"error: the build fails without a fault; see {self.build}.log")
 
     def make(self, *targets):
@@ -191,15 +192,17 @@ def suites_of(source):
             for suite in re.findall(r"^(?:TYPED_)?TEST(?:_[FP])?\((\w+),", file.read_text(), re.M)}
 
 
-def stages_of(source, unit, process):
-    """The tests that a fault of this source meets, one after the other."""
+def stages_of(source, seconds):
+    """The tests that try a fault of this source, in this order."""
     suites = suites_of(source)
+    unit = seconds["unit_tests"]
     own = {name: took for name, took in unit.items() if suites & set(re.split("[./]", name))}
-    quick = {name: took for name, took in process.items() if took <= QUICK_SECONDS}
     if own:
         yield Tests("own tests", "unit_tests", ":".join(own), sum(own.values()))
     yield Tests("unit tests", "unit_tests", "*", sum(unit.values()))
-    yield Tests("process tests", "process_tests", ":".join(quick), sum(quick.values()))
+    for program in PROGRAMS[1:]:
+        quick = {name: took for name, took in seconds[program].items() if took <= QUICK_SECONDS}
+        yield Tests(program.replace("_", " "), program, ":".join(quick), sum(quick.values()))
 
 
 def shares(count, sizes):
@@ -234,14 +237,14 @@ def known(path):
             for result in results if result.caught_by != ""}
 
 
-def work(number, jobs, results, unit, process, caught_before):
+def work(number, jobs, results, seconds, caught_before):
     become_subreaper()
     copy = Copy(number)
     copy.prepare()
     while (job := jobs.get()) is not None:
         source, some, quota = job
         text = (ROOT / source).read_text()
-        stages = list(stages_of(source, unit, process))
+        stages = list(stages_of(source, seconds))
         for fault in some:
             if quota == 0:
                 break
@@ -255,7 +258,7 @@ def work(number, jobs, results, unit, process, caught_before):
     results.put(None)
 
 
-def run(arguments, unit, process):
+def run(arguments, seconds):
     """Gives the faults that compile, each with what caught it."""
     record = WORK / "results.jsonl"
     caught_before = known(record) if arguments.resume else {}
@@ -263,7 +266,7 @@ def run(arguments, unit, process):
     planned = plan(arguments)
     for job in planned + [None] * arguments.jobs:
         jobs.put(job)
-    workers = [multiprocessing.Process(target=work, args=(number, jobs, results, unit, process,
+    workers = [multiprocessing.Process(target=work, args=(number, jobs, results, seconds,
                                                           caught_before))
                for number in range(arguments.jobs)]
     for worker in workers:
@@ -342,9 +345,8 @@ def main():
     WORK.mkdir(parents=True, exist_ok=True)
     first = Copy(0)
     first.prepare()
-    unit = durations(first.build, "unit_tests")
-    process = durations(first.build, "process_tests")
-    score = report(run(arguments, unit, process), accepted)
+    seconds = {program: durations(first.build, program) for program in PROGRAMS}
+    score = report(run(arguments, seconds), accepted)
     print(f"seed {arguments.seed}, {time.monotonic() - begin:.0f} s: {score:.1f} %")
     sys.exit(score < arguments.minimum)
 

@@ -13,8 +13,8 @@
 #include <string>
 #include <utility>
 
-#include "support/fakes/log_capture.h"
 #include "support/fakes/syscall_faults.h"
+#include "support/fixtures/log_capture.h"
 #include "support/fixtures/special_file.h"
 #include "support/fixtures/temp_dir.h"
 #include "support/fixtures/test_files.h"

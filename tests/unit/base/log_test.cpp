@@ -5,7 +5,7 @@
 
 #include <fstream>
 
-#include "support/fakes/log_capture.h"
+#include "support/fixtures/log_capture.h"
 
 namespace {
 

@@ -23,9 +23,9 @@
 #include <vector>
 
 #include "base/process_status.h"
-#include "support/fakes/log_capture.h"
 #include "support/fakes/process_faults.h"
 #include "support/fakes/syscall_faults.h"
+#include "support/fixtures/log_capture.h"
 #include "support/fixtures/special_file.h"
 #include "support/fixtures/temp_dir.h"
 #include "support/fixtures/test_files.h"

@@ -4,7 +4,7 @@
 #include <iterator>
 #include <set>
 
-#include "support/fakes/log_capture.h"
+#include "support/fixtures/log_capture.h"
 
 namespace {
 

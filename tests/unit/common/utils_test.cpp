@@ -12,9 +12,9 @@
 #include <utility>
 
 #include "base/json_helpers.h"
-#include "support/fakes/log_capture.h"
 #include "support/fakes/pauses.h"
 #include "support/fakes/syscall_faults.h"
+#include "support/fixtures/log_capture.h"
 
 namespace {
 

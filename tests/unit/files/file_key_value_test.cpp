@@ -14,8 +14,8 @@
 #include <vector>
 
 #include "support/fakes/global_locale.h"
-#include "support/fakes/log_capture.h"
 #include "support/fakes/syscall_faults.h"
+#include "support/fixtures/log_capture.h"
 #include "support/fixtures/temp_dir.h"
 #include "support/fixtures/test_files.h"
 #include "support/processes/child_checks.h"

@@ -4,7 +4,7 @@
 #include <locale>
 #include <type_traits>
 
-#include "support/fakes/log_capture.h"
+#include "support/fixtures/log_capture.h"
 
 // Conditions have no virtual destructor by contract, so those derived here have none either.
 #pragma GCC diagnostic ignored "-Wnon-virtual-dtor"

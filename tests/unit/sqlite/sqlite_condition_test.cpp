@@ -2,7 +2,7 @@
 
 #include <type_traits>
 
-#include "support/fakes/log_capture.h"
+#include "support/fixtures/log_capture.h"
 
 // Conditions have no virtual destructor by contract, so the one derived here has none either.
 #pragma GCC diagnostic ignored "-Wnon-virtual-dtor"

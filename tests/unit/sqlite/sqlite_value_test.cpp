@@ -7,7 +7,7 @@
 #include <type_traits>
 #include <utility>
 
-#include "support/fakes/log_capture.h"
+#include "support/fixtures/log_capture.h"
 
 namespace {
 

@@ -6,8 +6,8 @@
 #include <string>
 #include <vector>
 
-#include "support/fakes/log_capture.h"
 #include "support/fixtures/json_kinds.h"
+#include "support/fixtures/log_capture.h"
 
 namespace {
 

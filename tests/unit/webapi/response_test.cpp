@@ -12,8 +12,8 @@
 #include <utility>
 #include <vector>
 
-#include "support/fakes/log_capture.h"
 #include "support/fixtures/json_kinds.h"
+#include "support/fixtures/log_capture.h"
 
 namespace {
 

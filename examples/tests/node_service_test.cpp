@@ -18,9 +18,9 @@
 
 #include <orvadrcore/response.h>
 
-#include "support/fixtures/node_registry.h"
+#include "listener.h"
+#include "node_registry.h"
 #include "support/processes/http_client.h"
-#include "support/processes/listener.h"
 #include "support/processes/program.h"
 
 namespace {

@@ -20,8 +20,8 @@
 #include <orvadrcore/response.h>
 #include <orvadrcore/sqlite_db.h>
 
-#include "support/fixtures/node_registry.h"
-#include "support/processes/listener.h"
+#include "listener.h"
+#include "node_registry.h"
 #include "support/processes/program.h"
 
 namespace {
