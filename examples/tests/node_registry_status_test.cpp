@@ -22,6 +22,7 @@
 
 #include "listener.h"
 #include "node_registry.h"
+#include "support/processes/await.h"
 #include "support/processes/program.h"
 
 namespace {

@@ -5,7 +5,6 @@
 #include <signal.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
@@ -20,6 +19,7 @@
 
 #include "listener.h"
 #include "node_registry.h"
+#include "support/processes/await.h"
 #include "support/processes/http_client.h"
 #include "support/processes/program.h"
 
@@ -132,15 +132,7 @@ class NodeServiceTest : public NodeRegistryTest {
         EXPECT_EQ(result.err, "");
     }
 
-    std::vector<std::string> Files() const
-    {
-        std::vector<std::string> names;
-        for (const auto& entry : std::filesystem::directory_iterator(dir.Path())) {
-            names.push_back(entry.path().filename());
-        }
-        std::sort(names.begin(), names.end());
-        return names;
-    }
+    std::set<std::string> Files() const { return NamesIn(dir.Path()); }
 };
 
 // ------------------------------------------------------------------------------------ requests

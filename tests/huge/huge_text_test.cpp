@@ -1,7 +1,6 @@
 // Texts of 2 GiB and more, which no JSON value can hold: they are refused whole, never cut, and
 // nothing throws. Each case makes its text once, shortens it, and lets it go at its end.
 #include <json/value.h>
-#include <orvadrcore/cache.h>
 #include <orvadrcore/request.h>
 #include <orvadrcore/response.h>
 #include <orvadrcore/sqlite_command.h>
@@ -14,6 +13,7 @@
 #include "base/json_helpers.h"
 #include "sqlite/sqlite_internals.h"
 #include "support/fixtures/sqlite_fixture.h"
+#include "support/fixtures/test_cache.h"
 
 namespace {
 
@@ -130,17 +130,9 @@ TEST_F(HugeTextTest, WhatIsTooLongForJsonIsNullOrRefused)
     EXPECT_EQ(OrvaDRCore::toString(Container::ToJsonArray(elements)), R"(["e",null,"e"])");
 }
 
-class PlainCache : public OrvaDRCore::Cache {
-  public:
-    using Cache::Cache;
-    Json::Value GetInfo() const override { return {}; }
-    bool GetUpdatedData(Json::Value& /*data*/) const override { return false; }
-    bool IsValidData(const Json::Value& /*data*/) const override { return true; }
-};
-
 TEST_F(HugeTextTest, ADocumentThatIsTooLongToBeLoadedAgainIsNotCached)
 {
-    const PlainCache cache(dir.Path(), "status", 30, false, 2);
+    const TestCache cache(dir.Path(), "status", 30, false, 2);
     ASSERT_TRUE(cache.UpdateWithData("old"));
     {
         const Json::Value data(std::string(TooLong / 6 + 1, '\1'));  // each is written as \u0001

@@ -31,6 +31,7 @@
 #include "support/processes/await.h"
 #include "support/processes/child_process.h"
 #include "support/processes/crowd.h"
+#include "support/processes/reap.h"
 #include "support/processes/rights.h"
 #include "support/processes/shared_memory.h"
 
@@ -169,7 +170,7 @@ void ManyReadersTest::ReadAtOnce(int number, const std::function<Mode(int)>& mod
     travellers.Arrive();
     ASSERT_TRUE(crowd.Start());
     EXPECT_TRUE(crowd.Join());
-    AwaitDescendants();
+    ReapAll();
 
     EXPECT_EQ(round->overlaps, 0);
     EXPECT_EQ(NumberInFile(), number);
@@ -258,7 +259,7 @@ class CacheProcessTest : public ProcessTest {
 
     // A process that does something with a cache and tells when it has begun to wait for another
     // updater.
-    ChildProcess StartWaiter(const std::function<void(const TestCache&)>& action)
+    ChildProcess StartWaiter(const std::function<void(const DocumentCache&)>& action)
     {
         return ChildProcess([this, action](ChildProcess::Link& link) {
             const NotedPauses pauses([&link] { link.Tell(); });
@@ -286,7 +287,7 @@ TEST_F(CacheProcessTest, ABackgroundReaderHasItsAnswerAtOnce)
         firstTook.push_back(first.took);
         secondTook.push_back(second.took);
     }
-    AwaitDescendants();
+    ReapAll();
     for (const std::string& name : names) EXPECT_EQ(NumberInFile(name), New);
     EXPECT_EQ(Productions(), static_cast<int>(names.size()));
 
@@ -305,7 +306,7 @@ TEST_F(CacheProcessTest, AWaitingReaderGetsWhatTheOtherUpdaterWrites)
     ASSERT_TRUE(updater.Await());
     const SharedMemory<std::atomic<int>> number;
     ChildProcess waiter =
-        StartWaiter([&](const TestCache& cache) { *number = NumberOf(cache.Read()); });
+        StartWaiter([&](const DocumentCache& cache) { *number = NumberOf(cache.Read()); });
     ASSERT_TRUE(waiter.Await());
     ASSERT_TRUE(waiter.Await()) << "the wait ended although the updater has not written";
     EXPECT_EQ(NumberInFile(), Old);
@@ -345,8 +346,9 @@ TEST_F(CacheProcessTest, AWaitingReaderGetsWhatIsThereWhenTheUpdaterIsKilled)
     const SharedMemory<std::atomic<int>> number;
     const SharedMemory<std::atomic<bool>> updated;
     ChildProcess reader =
-        StartWaiter([&](const TestCache& cache) { *number = NumberOf(cache.Read()); });
-    ChildProcess other = StartWaiter([&](const TestCache& cache) { *updated = cache.Update(); });
+        StartWaiter([&](const DocumentCache& cache) { *number = NumberOf(cache.Read()); });
+    ChildProcess other =
+        StartWaiter([&](const DocumentCache& cache) { *updated = cache.Update(); });
     ASSERT_TRUE(reader.Await());
     ASSERT_TRUE(other.Await());
 
@@ -363,7 +365,7 @@ TEST_F(CacheProcessTest, ReadersNeverSeeAPartOfADocument)
     constexpr int Readers = 4;
     if (!HasLocks()) return;
     const int rewrites = Scaled(300, 2000);
-    const TestCache writer = MakeCache(Mode::Background, nullptr);
+    const DocumentCache writer = MakeCache(Mode::Background, nullptr);
     ASSERT_TRUE(writer.UpdateWithData(DocumentOf(Old)));
 
     const SharedMemory<std::atomic<bool>> done;
@@ -395,13 +397,10 @@ TEST_F(CacheProcessTest, BackgroundRefreshesCostALongLivedProcessNothing)
     constexpr int WarmUp = 5;
     constexpr std::size_t SmallChange = 4096;
     struct State {
-        std::ptrdiff_t descriptors;
+        std::size_t descriptors;
         std::size_t heap;
     };
-    const auto look = [] {
-        const std::filesystem::directory_iterator descriptors("/proc/self/fd");
-        return State{std::distance(begin(descriptors), end(descriptors)), ::mallinfo2().uordblks};
-    };
+    const auto look = [] { return State{CountDescriptors(), ::mallinfo2().uordblks}; };
     if (!HasLocks()) return;
     const int refreshes = Scaled(20, 300);
     WriteStale(Old);
@@ -410,7 +409,7 @@ TEST_F(CacheProcessTest, BackgroundRefreshesCostALongLivedProcessNothing)
     const SharedMemory<std::atomic<int>> children;
     ChildProcess process([&](ChildProcess::Link& /*link*/) {
         ::alarm(600);
-        const TestCache cache = MakeCache(Mode::Background, Gives(Old));
+        const DocumentCache cache = MakeCache(Mode::Background, Gives(Old));
         for (int i = 0; i < WarmUp + refreshes; ++i) {
             if (i == WarmUp) states->at(0) = look();
             MakeStale();
@@ -444,7 +443,7 @@ TEST_F(EditTest, AnEditRightAfterAWriteIsSeenOnAFileSystemOfCoarseTimes)
         (void)(BecomeRoot() && MountCoarseDisk(dir.Path()));
         int seen = 0;
         for (int round = 0; round < rounds; ++round) {
-            const TestCache cache = MakeCache(Mode::Background, nullptr);
+            const DocumentCache cache = MakeCache(Mode::Background, nullptr);
             if (!cache.UpdateWithData(DocumentOf(New), 1, 6)) break;
             std::string text;
             std::getline(std::ifstream(CacheFile()), text);
@@ -502,11 +501,11 @@ void FailingRefreshTest::ExpectTheOldDocument(Mode mode, bool updated,
     ChildProcess reader([&](ChildProcess::Link& /*link*/) {
         ::prctl(PR_SET_CHILD_SUBREAPER, 1);
         if (!spoil()) ::_exit(2);
-        const TestCache cache = MakeCache(mode, produce);
+        const DocumentCache cache = MakeCache(mode, produce);
         outcome->updated = cache.Update();
         outcome->read = NumberOf(cache.Read());
-        AwaitDescendants();
-        const std::vector<std::string> files = Files();
+        ReapAll();
+        const std::set<std::string> files = Files();
         outcome->inFile = NumberInFile();
         outcome->temporaries = std::count_if(files.begin(), files.end(), [](const auto& name) {
             return name.find("orvadr-tmp") != std::string::npos;
@@ -613,7 +612,7 @@ TEST_F(FailingRefreshTest, ADirectoryInTheFilesPlaceGivesTheDefault)
 {
     if (!HasLocks()) return;
     ASSERT_TRUE(std::filesystem::create_directories(CacheFile()));
-    const TestCache cache = MakeCache(Mode::Background, Gives(New));
+    const DocumentCache cache = MakeCache(Mode::Background, Gives(New));
     EXPECT_FALSE(cache.Update());
     EXPECT_EQ(cache.Read(), cache.GetDefaultValue());
     EXPECT_TRUE(std::filesystem::is_directory(CacheFile()));

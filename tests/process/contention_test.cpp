@@ -75,6 +75,15 @@ constexpr int Absent = 0;
 constexpr int Made = 1;
 constexpr int Changed = 2;
 
+bool Insert(SqliteDB& db, int id)
+{
+    InsertCommand insert;
+    insert.SetTable(Jobs());
+    insert.AddFieldValue("id", id);
+    insert.AddFieldValue("state", Made);
+    return db.InsertRecord(insert);
+}
+
 struct Writer {
     std::array<std::atomic<unsigned char>, MaxRecords> states;
     std::atomic<int> records;  // that it has tried to make
@@ -104,7 +113,7 @@ class Work {
         const int record = writer.records++;
         const int id = firstId + record;
         std::atomic<unsigned char>& state = writer.states.at(static_cast<std::size_t>(record));
-        if (Take([&] { return Insert(id); })) state = Made;
+        if (Take([&] { return Insert(db, id); })) state = Made;
         // True also when there is nothing to change.
         if (Take([&] { return Change(id); }, &Writer::statementWait) && state == Made)
             state = Changed;
@@ -133,15 +142,6 @@ class Work {
     {
         const auto count = std::chrono::duration_cast<milliseconds>(time).count();
         longest = std::max<int>(longest, static_cast<int>(count));
-    }
-
-    bool Insert(int id)
-    {
-        InsertCommand insert;
-        insert.SetTable(Jobs());
-        insert.AddFieldValue("id", id);
-        insert.AddFieldValue("state", Made);
-        return db.InsertRecord(insert);
     }
 
     // Without a schema no table is looked for.
@@ -366,13 +366,7 @@ class QueueTest : public ProcessTest,
 
 bool QueueTest::DoOnce(SqliteDB& db, bool isWriter, int id) const
 {
-    if (isWriter) {
-        InsertCommand insert;
-        insert.SetTable(Jobs());
-        insert.AddFieldValue("id", id);
-        insert.AddFieldValue("state", Made);
-        return db.InsertRecord(insert);
-    }
+    if (isWriter) return Insert(db, id);
     SelectCommand select;
     select.SetTable(Jobs());
     select.SelectAll();

@@ -22,6 +22,7 @@
 #include "support/processes/await.h"
 #include "support/processes/child_process.h"
 #include "support/processes/kills.h"
+#include "support/processes/reap.h"
 #include "support/processes/traced_process.h"
 
 namespace {
@@ -97,7 +98,7 @@ void KillTest::KillRefreshes(const Action& prepare, const Action& inspect)
         TracedProcess updater([this] { Refresh(); });
         for (int stop = 0; stop < last; ++stop) updater.Step();
         updater.Kill();
-        AwaitDescendants();  // a program that it had started
+        ReapAll();  // a program that it had started
         inspect();
     }
     ReportCount("kills", kills);
@@ -168,7 +169,7 @@ TEST_F(KillTest, WhatAKilledWriterLeftBesideAnotherIsRemovedByALaterOne)
     };
     // Temporary files that something is written to.
     const auto countWritten = [this] {
-        const std::vector<std::string> files = Files();
+        const std::set<std::string> files = Files();
         return std::count_if(files.begin(), files.end(), [this](const std::string& name) {
             return name != "x.cached" && std::filesystem::file_size(dir.File(name)) > 0;
         });
@@ -195,7 +196,7 @@ TEST_F(KillTest, WritersThatAreKilledAtAnyMomentPublishWholeDocumentsOnly)
     const int kills = Scaled(100, 2000);
     const auto start = [this](int number) {
         return std::make_unique<ChildProcess>([this, number](ChildProcess::Link& /*link*/) {
-            const TestCache cache = MakeCache(Mode::Background, nullptr);
+            const DocumentCache cache = MakeCache(Mode::Background, nullptr);
             for (int next = number; cache.UpdateWithData(DocumentOf(next)); next += 7) {
             }
         });
@@ -266,7 +267,7 @@ TEST_F(KillTest, AKilledBackgroundUpdaterIsFollowedByAnother)
 
     // The old data, or the new where the child is quicker than its parent.
     EXPECT_THAT(NumberOf(MakeCache(Mode::Background, Gives(New)).Read()), AnyOf(Old, New));
-    AwaitDescendants();
+    ReapAll();
     EXPECT_EQ(NumberInFile(), New);
     EXPECT_THAT(Files(), ElementsAre("x.cached"));
 }

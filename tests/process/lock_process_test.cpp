@@ -22,6 +22,7 @@
 #include "support/processes/await.h"
 #include "support/processes/child_process.h"
 #include "support/processes/crowd.h"
+#include "support/processes/reap.h"
 #include "support/processes/shared_memory.h"
 #include "support/processes/traced_process.h"
 
@@ -210,7 +211,7 @@ TEST_F(FileLockProcessTest, AStartedProgramDoesNotHoldTheLockOfAKilledProcess)
         EXPECT_EQ(::kill(program, 0), 0) << "the program has ended too early";
         EXPECT_TRUE(IsFree());
         TracedProcess::Release(program);
-        AwaitDescendants();
+        ReapAll();
     }
     // The programs did what they were started for.
     EXPECT_TRUE(std::filesystem::is_directory(dir.File("made")));

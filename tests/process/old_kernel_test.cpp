@@ -17,6 +17,7 @@
 #include "support/fixtures/process_test.h"
 #include "support/processes/await.h"
 #include "support/processes/child_process.h"
+#include "support/processes/reap.h"
 
 namespace {
 
@@ -72,7 +73,7 @@ TEST_F(OldKernelTest, CachesAreRefreshed)
         // The child may be quicker than its caller.
         EXPECT_THAT(NumberOf(MakeCache(Mode::Background, Gives(New)).Read()), AnyOf(Old, New));
         EXPECT_TRUE(AwaitUntil([this] { return NumberInFile() == New; }));
-        AwaitDescendants();
+        ReapAll();
         EXPECT_TRUE(MakeCache(Mode::Blocking, Gives(Old)).Update());
         EXPECT_EQ(NumberInFile(), Old);
     });

@@ -31,6 +31,7 @@
 #include "support/fixtures/scale.h"
 #include "support/processes/await.h"
 #include "support/processes/child_process.h"
+#include "support/processes/reap.h"
 
 namespace {
 
@@ -116,7 +117,7 @@ class ThreadedCallerTest : public ProcessTest {
     // Refreshes a cache in the background so many times, one after the other. Says what went wrong.
     std::string Refresh(int times)
     {
-        const TestCache cache = MakeCache(Mode::Background, Gives(New));
+        const DocumentCache cache = MakeCache(Mode::Background, Gives(New));
         for (int i = 0; i < times; ++i) {
             MakeStale();
             if (!cache.Update()) return "no child was made";
@@ -148,7 +149,7 @@ class ThreadedCallerTest : public ProcessTest {
             if (HasFailure()) ::_exit(2);
         });
         EXPECT_EQ(process.Join(), 0);
-        AwaitDescendants();
+        ReapAll();
         EXPECT_EQ(NumberInFile(), New);
         ReportCount("refreshes", times);
     }
@@ -221,7 +222,7 @@ TEST_F(ThreadedCallerTest, ProgramsThatAreStartedMeanwhileDoNotKeepTheCachesLock
 {
     constexpr int ProgramsAtOnce = 20;
     if (!HasLocks()) return;
-    const TestCache cache = MakeCache(Mode::Blocking, Gives(New));
+    const DocumentCache cache = MakeCache(Mode::Blocking, Gives(New));
     const int updates = Scaled(30, 1000);
     for (int i = 0; i < updates && !HasFailure(); ++i) {
         Sleepers sleepers;

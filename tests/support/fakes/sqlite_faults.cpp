@@ -1,23 +1,14 @@
 #include "support/fakes/sqlite_faults.h"
 
-#include <dlfcn.h>
-
 #include <cstdlib>
 #include <cstring>
+
+#include "support/fakes/real_function.h"
 
 namespace {
 
 SqliteFaults* current = nullptr;
 SqliteConnections connections{};
-
-// The function of that name in the SQLite library.
-template <class Function>
-Function* Real(const char* name)
-{
-    void* symbol = ::dlsym(RTLD_NEXT, name);
-    if (symbol == nullptr) std::abort();
-    return reinterpret_cast<Function*>(symbol);
-}
 
 }  // namespace
 
@@ -39,25 +30,25 @@ SqliteConnections CountConnections()
 
 int RealStep(sqlite3_stmt* statement)
 {
-    return Real<decltype(sqlite3_step)>("sqlite3_step")(statement);
+    return RealFunction<decltype(sqlite3_step)>("sqlite3_step")(statement);
 }
 
 int RealPrepare(sqlite3* db, const char* sql, sqlite3_stmt** statement)
 {
-    return Real<decltype(sqlite3_prepare_v2)>("sqlite3_prepare_v2")(db, sql, -1, statement,
-                                                                    nullptr);
+    return RealFunction<decltype(sqlite3_prepare_v2)>("sqlite3_prepare_v2")(db, sql, -1, statement,
+                                                                            nullptr);
 }
 
 extern "C" int sqlite3_open(const char* filename, sqlite3** db)
 {
-    const int code = Real<decltype(sqlite3_open)>("sqlite3_open")(filename, db);
+    const int code = RealFunction<decltype(sqlite3_open)>("sqlite3_open")(filename, db);
     if (*db != nullptr) ++connections.opened;
     return code;
 }
 
 extern "C" int sqlite3_close(sqlite3* db)
 {
-    const int code = Real<decltype(sqlite3_close)>("sqlite3_close")(db);
+    const int code = RealFunction<decltype(sqlite3_close)>("sqlite3_close")(db);
     if (db != nullptr && code == SQLITE_OK) ++connections.closed;  // not one with statements
     return code;
 }
@@ -65,7 +56,7 @@ extern "C" int sqlite3_close(sqlite3* db)
 extern "C" int sqlite3_busy_timeout(sqlite3* db, int milliseconds)
 {
     if (current != nullptr && current->busyTimeout) return current->busyTimeout(db, milliseconds);
-    return Real<decltype(sqlite3_busy_timeout)>("sqlite3_busy_timeout")(db, milliseconds);
+    return RealFunction<decltype(sqlite3_busy_timeout)>("sqlite3_busy_timeout")(db, milliseconds);
 }
 
 extern "C" int sqlite3_prepare_v2(sqlite3* db, const char* sql, int length,
@@ -75,8 +66,8 @@ extern "C" int sqlite3_prepare_v2(sqlite3* db, const char* sql, int length,
         if (tail != nullptr) *tail = sql + std::strlen(sql);  // sqlite3_exec calls this, too
         return current->prepare(db, sql, statement);
     }
-    return Real<decltype(sqlite3_prepare_v2)>("sqlite3_prepare_v2")(db, sql, length, statement,
-                                                                    tail);
+    return RealFunction<decltype(sqlite3_prepare_v2)>("sqlite3_prepare_v2")(db, sql, length,
+                                                                            statement, tail);
 }
 
 extern "C" int sqlite3_step(sqlite3_stmt* statement)
@@ -88,11 +79,11 @@ extern "C" int sqlite3_step(sqlite3_stmt* statement)
 extern "C" const unsigned char* sqlite3_column_text(sqlite3_stmt* statement, int column)
 {
     if (current != nullptr && current->columnText) return current->columnText(statement, column);
-    return Real<decltype(sqlite3_column_text)>("sqlite3_column_text")(statement, column);
+    return RealFunction<decltype(sqlite3_column_text)>("sqlite3_column_text")(statement, column);
 }
 
 extern "C" const char* sqlite3_column_name(sqlite3_stmt* statement, int column)
 {
     if (current != nullptr && current->columnName) return current->columnName(statement, column);
-    return Real<decltype(sqlite3_column_name)>("sqlite3_column_name")(statement, column);
+    return RealFunction<decltype(sqlite3_column_name)>("sqlite3_column_name")(statement, column);
 }

@@ -3,13 +3,16 @@
 #include <fcntl.h>
 #include <poll.h>
 #include <signal.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <array>
-#include <cerrno>
-#include <chrono>
 #include <cstdlib>
+#include <utility>
+
+#include "base/errno.h"
+#include "support/processes/reap.h"
+
+using OrvaDRCore::RetryOnEintr;
 
 namespace {
 
@@ -21,8 +24,7 @@ constexpr int DeadlineMSec = 60'000;
 void ChildProcess::Link::Tell() const
 {
     const char byte = 0;
-    while (::write(out, &byte, 1) < 0 && errno == EINTR) {
-    }
+    (void)RetryOnEintr([&] { return ::write(out, &byte, 1); });
 }
 
 bool ChildProcess::Link::Await() const
@@ -83,10 +85,5 @@ void ChildProcess::Kill(int signal) const
 
 int ChildProcess::Join()
 {
-    int status = 0;
-    while (::waitpid(pid, &status, 0) < 0) {
-        if (errno != EINTR) std::abort();
-    }
-    pid = -1;
-    return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+    return Reap(std::exchange(pid, -1));
 }

@@ -3,13 +3,15 @@
 #include <fcntl.h>
 #include <poll.h>
 #include <spawn.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <array>
 #include <cerrno>
 #include <csignal>
 #include <cstdlib>
+#include <utility>
+
+#include "support/processes/reap.h"
 
 namespace {
 
@@ -100,7 +102,7 @@ Program::~Program()
     Close(err);
     if (pid < 0) return;
     ::kill(pid, SIGKILL);
-    Join();
+    Reap(pid);
 }
 
 void Program::Send(const std::string& text)
@@ -139,7 +141,7 @@ ProgramResult Program::Finish()
         ::kill(pid, SIGKILL);
         break;
     }
-    return {Join(), unread, errors};
+    return {Reap(std::exchange(pid, -1)), unread, errors};
 }
 
 // Writes what the pipe takes; a program that reads no more gets nothing.
@@ -170,16 +172,6 @@ bool Program::Pump()
     if (pipes[1].revents != 0) Receive(out, unread);
     if (pipes[2].revents != 0) Receive(err, errors);
     return true;
-}
-
-int Program::Join()
-{
-    int status = 0;
-    while (::waitpid(pid, &status, 0) < 0) {
-        if (errno != EINTR) std::abort();
-    }
-    pid = -1;
-    return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
 }
 
 ProgramResult RunProgram(const std::vector<std::string>& arguments, const std::string& input)

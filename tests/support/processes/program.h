@@ -55,7 +55,6 @@ class Program {
   private:
     void WriteUnsent();
     bool Pump();
-    int Join();
 
     pid_t pid = -1;
     int in = -1;  // our ends of the pipes; -1 when closed

@@ -7,10 +7,14 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <cerrno>
 #include <cstdlib>
 #include <map>
 #include <set>
+
+#include "base/errno.h"
+#include "support/processes/reap.h"
+
+using OrvaDRCore::RetryOnEintr;
 
 namespace {
 
@@ -184,9 +188,9 @@ bool TracedProcess::KillBefore(int member, int call)
     family.Go(pid, 0);
     while (family.IsAlive()) {
         int news = 0;
-        const pid_t who = ::waitpid(-1, &news, __WALL);
-        if (who < 0 && errno != EINTR) std::abort();
-        if (who > 0) family.Take(who, news);
+        const pid_t who = RetryOnEintr([&] { return ::waitpid(-1, &news, __WALL); });
+        if (who < 0) std::abort();
+        family.Take(who, news);
         if (who == pid) status = news;
     }
     pid = -1;
@@ -225,14 +229,12 @@ void TracedProcess::Kill()
 
 int TracedProcess::ExitCode() const
 {
-    return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+    return ExitCodeOf(status);
 }
 
 // Waits for the next stop. False when there is none any more.
 bool TracedProcess::Await(pid_t whom)
 {
-    while (::waitpid(whom, &status, __WALL) < 0) {
-        if (errno != EINTR) std::abort();
-    }
+    if (RetryOnEintr([&] { return ::waitpid(whom, &status, __WALL); }) < 0) std::abort();
     return WIFSTOPPED(status);
 }
