@@ -80,7 +80,7 @@ void operator delete(void* memory, const std::nothrow_t& /*tag*/) noexcept
 
 #else
 
-// The C library's own, under the names that it keeps for whoever takes the place of malloc.
+// The C library's own functions, under the names that it keeps for those who replace malloc.
 // NOLINTBEGIN(bugprone-reserved-identifier)
 extern "C" void* __libc_malloc(std::size_t size);
 extern "C" void* __libc_calloc(std::size_t count, std::size_t size);

@@ -1,15 +1,14 @@
-// Memory that runs out, as it cannot be had at will, and a count of what is in use. All of malloc,
-// calloc, realloc and free of the test program and the libraries behind it goes through here. In
-// builds with the address sanitizer, which has its own, it is operator new alone, and nothing is
-// counted: the sanitizer finds what is not given back.
+// Makes allocations fail, and counts those that are live. Replaces malloc, calloc, realloc and free for
+// the test program and its libraries. The address sanitizer has its own malloc: under it only operator
+// new is replaced and nothing is counted, since the sanitizer finds leaks.
 #ifndef ORVADRCORE_TESTS_ALLOCATION_FAULTS_H
 #define ORVADRCORE_TESTS_ALLOCATION_FAULTS_H
 
-// From now on asks before each allocation whether it is to fail; null never asks. What is asked
-// must not allocate.
+// From now on `fails` decides for each allocation whether it fails; with null none does. It must not
+// allocate.
 void AskBeforeAllocating(bool (*fails)());
 
-// The allocations of this process that were not freed yet.
+// How many allocations of this process are not freed yet.
 long CountLiveAllocations();
 
 #endif

@@ -1,4 +1,4 @@
-// Locales that need none of the system's: a facet put into that of C, as the program's own.
+// Makes the C locale with one facet replaced the program's locale. No installed locale is needed.
 #ifndef ORVADRCORE_TESTS_GLOBAL_LOCALE_H
 #define ORVADRCORE_TESTS_GLOBAL_LOCALE_H
 
@@ -13,7 +13,7 @@ class CommaDecimals : public std::numpunct<char> {
     std::string do_grouping() const override { return "\3"; }
 };
 
-// As long as it lives, the program's locale has that facet, which it owns.
+// While it lives the program's locale has this facet. The locale owns the facet.
 class GlobalLocale {
   public:
     template <class Facet>

@@ -1,5 +1,5 @@
-// Kernels that lack what newer ones have, by a filter of system calls. It cannot be taken off again:
-// for processes that end with their test.
+// Pretends to run on an older kernel, by a filter that refuses system calls. The filter cannot be removed
+// again: use it in child processes.
 #ifndef ORVADRCORE_TESTS_OLD_KERNEL_H
 #define ORVADRCORE_TESTS_OLD_KERNEL_H
 
@@ -12,8 +12,8 @@
 #include <cerrno>
 #include <cstddef>
 
-// From now on the calls with these numbers fail with this error, in this process and in those that
-// it starts. False where the system does not allow filters.
+// From now on the calls with the numbers `first` to `last` fail with `error`, in this process and its
+// children. False where the system does not allow filters.
 inline bool RefuseCalls(unsigned int first, unsigned int last, unsigned int error)
 {
     std::array<sock_filter, 5> filter{{
@@ -34,9 +34,9 @@ struct OldKernel {
 };
 
 constexpr std::array<OldKernel, 2> OldKernels{{
-    // bpf() came with Linux 3.18. Calls are numbered in the order of their coming.
+    // Calls are numbered in the order in which they were added. bpf() came with Linux 3.18.
     {"Linux 3.17", [] { return RefuseCalls(SYS_bpf, 0xffff, ENOSYS); }},
-    {"a container that refuses what it does not know",
+    {"a container that refuses calls it does not know",
      [] { return RefuseCalls(SYS_close_range, SYS_close_range, EPERM); }},
 }};
 

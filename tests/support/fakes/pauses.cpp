@@ -10,7 +10,7 @@ namespace {
 
 constexpr unsigned int ShortestOwnPause = 100'001;
 
-constexpr std::size_t EnoughRoom = 64;  // for most tests, so that noting a pause takes no memory
+constexpr std::size_t EnoughRoom = 64;  // for most tests: recording a pause allocates nothing
 
 Pauses* current = nullptr;
 Slept slept{};

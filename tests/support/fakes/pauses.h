@@ -1,7 +1,7 @@
-// The pauses that the tested code asks for, counted and not waited for. While a Pauses object
-// lives, usleep returns at once, in the library and in SQLite alike; afterwards it sleeps as always.
-// Pauses of more than 100 milliseconds are those between the tries of the library; shorter ones are
-// those within a try that waits for a lock, by the library's busy handler or by SQLite's own.
+// Counts the pauses of the tested code instead of sleeping. While a Pauses object lives, usleep returns
+// at once, in the library and in SQLite; otherwise it sleeps. Pauses of more than 100 milliseconds are
+// those between the library's attempts. Shorter ones are those of an attempt that waits for a lock, in the
+// library's busy handler or in SQLite's.
 #ifndef ORVADRCORE_TESTS_PAUSES_H
 #define ORVADRCORE_TESTS_PAUSES_H
 
@@ -15,13 +15,13 @@ class Pauses {
     Pauses& operator=(const Pauses&) = delete;
     ~Pauses();
 
-    // The pauses between tries so far, in microseconds.
+    // The pauses between attempts so far, in microseconds.
     const std::vector<unsigned int>& Taken() const { return taken; }
 
-    // Calls `action` with the number of each pause between tries, from 1, in place of the sleep.
+    // At each pause between attempts calls `action` with its number, from 1, instead of sleeping.
     void OnPause(std::function<void(std::size_t)> action) { onPause = std::move(action); }
 
-    // The same for the pauses within a try, which are kept from the first call of OnWait() on.
+    // The same for the pauses within an attempt. They are recorded after the first call of OnWait().
     const std::vector<unsigned int>& Waits() const { return waits; }
     void OnWait(std::function<void(std::size_t)> action);
     void ForgetWaits() { waits.clear(); }
@@ -35,11 +35,11 @@ class Pauses {
     std::function<void(std::size_t)> onWait;
 };
 
-// What this process has really slept by usleep, while no such object lived; what its parent had slept
-// before the fork counts, too.
+// What this process has really slept in usleep, while no Pauses object lived. Includes what its parent
+// had slept before the fork.
 struct Slept {
-    int pauses;              // between tries
-    long long microseconds;  // as asked for, within tries, too
+    int pauses;              // between attempts
+    long long microseconds;  // as requested; pauses within attempts included
 };
 Slept CountSlept();
 

@@ -1,6 +1,6 @@
-// Answers of fork and of the clock that cannot be had at will, as syscall_faults.h gives them for
-// files. While a ProcessFaults object lives, the functions that are set here answer in the system's
-// place, in this process and in those that it forks; afterwards both are the real ones.
+// Replaces fork and time, as syscall_faults.h replaces the calls for files. While a ProcessFaults object
+// lives, the functions that are set here are called instead of the system's, in this process and its
+// children.
 //
 //     ProcessFaults faults;
 //     faults.time = [] { return 1'700'000'000; };
@@ -22,7 +22,7 @@ struct ProcessFaults {
     ~ProcessFaults();
 };
 
-// The real function, for answers that begin with the system's own.
+// The real function.
 pid_t RealFork();
 
 #endif

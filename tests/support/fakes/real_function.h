@@ -1,4 +1,4 @@
-// The way from a function of the test program to the one whose place it takes.
+// From a fake to the function that it replaces.
 #ifndef ORVADRCORE_TESTS_REAL_FUNCTION_H
 #define ORVADRCORE_TESTS_REAL_FUNCTION_H
 
@@ -6,7 +6,7 @@
 
 #include <cstdlib>
 
-// The function of that name in the libraries behind the program.
+// The function of that name in the shared libraries.
 template <class Function>
 Function* RealFunction(const char* name)
 {

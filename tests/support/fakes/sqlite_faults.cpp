@@ -49,7 +49,8 @@ extern "C" int sqlite3_open(const char* filename, sqlite3** db)
 extern "C" int sqlite3_close(sqlite3* db)
 {
     const int code = RealFunction<decltype(sqlite3_close)>("sqlite3_close")(db);
-    if (db != nullptr && code == SQLITE_OK) ++connections.closed;  // not one with statements
+    if (db != nullptr && code == SQLITE_OK)
+        ++connections.closed;  // fails while statements are open
     return code;
 }
 
@@ -63,7 +64,7 @@ extern "C" int sqlite3_prepare_v2(sqlite3* db, const char* sql, int length,
                                   sqlite3_stmt** statement, const char** tail)
 {
     if (current != nullptr && current->prepare) {
-        if (tail != nullptr) *tail = sql + std::strlen(sql);  // sqlite3_exec calls this, too
+        if (tail != nullptr) *tail = sql + std::strlen(sql);  // sqlite3_exec asks for it
         return current->prepare(db, sql, statement);
     }
     return RealFunction<decltype(sqlite3_prepare_v2)>("sqlite3_prepare_v2")(db, sql, length,

@@ -1,6 +1,5 @@
-// Answers of SQLite that cannot be had from a real database. While a SqliteFaults object lives, the
-// functions that are set here answer in SQLite's place; all others, and all of them afterwards, are
-// the real ones.
+// Results of SQLite that no real database can provoke. While a SqliteFaults object lives, the functions
+// that are set here are called instead of SQLite's. All others are the real ones.
 #ifndef ORVADRCORE_TESTS_SQLITE_FAULTS_H
 #define ORVADRCORE_TESTS_SQLITE_FAULTS_H
 
@@ -28,7 +27,7 @@ struct SqliteConnections {
 };
 SqliteConnections CountConnections();
 
-// The real functions, for answers that begin with SQLite's own.
+// The real functions.
 int RealStep(sqlite3_stmt* statement);
 int RealPrepare(sqlite3* db, const char* sql, sqlite3_stmt** statement);
 

@@ -11,7 +11,7 @@ namespace {
 
 bool isSteady = false;
 
-// As long as a good disk takes.
+// Takes as long as a good disk.
 int Flush(const char* real, int descriptor)
 {
     if (!isSteady) return RealFunction<int(int)>(real)(descriptor);

@@ -18,7 +18,7 @@ namespace {
 
 SyscallFaults* current = nullptr;
 
-// The answer of what is set in the function's place, or the function's own.
+// Calls the function that a test has set, or the real one.
 template <class Result, class... Arguments>
 Result Answer(std::function<Result(Arguments...)> SyscallAnswers::*set,
               Result (*real)(Arguments...), Arguments... arguments)
@@ -27,7 +27,7 @@ Result Answer(std::function<Result(Arguments...)> SyscallAnswers::*set,
     return isSet ? (current->*set)(arguments...) : real(arguments...);
 }
 
-// The third argument of open, which is there only where a file may be made.
+// The third argument of open, which callers pass only if a file may be created.
 mode_t TakeMode(int flags, va_list rest)
 {
     const bool makesFile = (flags & O_CREAT) != 0 || (flags & O_TMPFILE) == O_TMPFILE;
@@ -227,7 +227,7 @@ extern "C" int fcntl(int fd, int command, ...)
 {
     va_list rest;
     va_start(rest, command);
-    void* const argument = va_arg(rest, void*);  // as the C library takes it, whatever is behind it
+    void* const argument = va_arg(rest, void*);  // as the C library does, whatever its type
     va_end(rest);
     return Answer(&SyscallAnswers::fcntl, RealFcntl, fd, command, argument);
 }
@@ -297,7 +297,7 @@ extern "C" FILE* fdopen(int fd, const char* mode) noexcept
     return Answer(&SyscallAnswers::fdopen, RealFdopen, fd, mode);
 }
 
-// The six arguments that every system call may have.
+// Passes on six arguments, the most that a system call has.
 extern "C" long syscall(long number, ...) noexcept
 {
     va_list rest;

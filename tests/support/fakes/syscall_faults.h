@@ -1,6 +1,6 @@
-// Answers of the system that cannot be had at will. While a SyscallFaults object lives, the
-// functions that are set here answer in the system's place, in this process and in those that it
-// forks; all others, and all of them afterwards, are the real ones.
+// Results of system calls that a test cannot provoke. While a SyscallFaults object lives, the functions
+// that are set here are called instead of the system's, in this process and its children. All others are
+// the real ones.
 //
 //     SyscallFaults faults;
 //     faults.fsync = Failing(EIO);
@@ -17,7 +17,7 @@
 #include <string>
 #include <vector>
 
-// A call of posix_spawn. Whoever hands it on may replace path and arguments.
+// A call of posix_spawn. Path and arguments may be replaced before it is passed on.
 struct SpawnCall {
     pid_t* pid;
     const char* path;
@@ -30,7 +30,7 @@ struct SpawnCall {
 };
 
 struct SyscallAnswers {
-    std::function<int(const char*, int, mode_t)> open;  // of open64, too
+    std::function<int(const char*, int, mode_t)> open;  // open64, too
     std::function<ssize_t(int, void*, std::size_t)> read;
     std::function<ssize_t(int, const void*, std::size_t)> write;
     std::function<int(int, mode_t)> fchmod;
@@ -53,10 +53,10 @@ struct SyscallAnswers {
     std::function<FILE*(int, const char*)> fdopen;
     std::function<unsigned int(unsigned int)> sleep;
 
-    // Of the clone that the platform layer calls by number; all other numbers are the system's.
+    // The clone that the platform layer calls by number. All other numbers go to the system.
     std::function<long(long)> clone;
 
-    // Of posix_spawn: gets the program's path and arguments. Answers an error, as posix_spawn does.
+    // posix_spawn. Returns an error number, as that does.
     std::function<int(const SpawnCall&)> spawn;
 };
 
@@ -66,11 +66,11 @@ struct SyscallFaults : SyscallAnswers {
     SyscallFaults& operator=(const SyscallFaults&) = delete;
     ~SyscallFaults();
 
-    // From here on all are the real ones again.
+    // From now on all functions are the real ones again.
     void Clear() { SyscallAnswers::operator=({}); }
 };
 
-// Answers -1 with that errno, whatever it is asked.
+// Fails with -1 and this errno, whatever the arguments.
 inline auto Failing(int error)
 {
     return [error](const auto&... /*arguments*/) {
@@ -79,13 +79,13 @@ inline auto Failing(int error)
     };
 }
 
-// The same for posix_spawn, which answers the error.
+// The same for posix_spawn, which returns the error.
 inline auto FailingToStart(int error)
 {
     return [error](const SpawnCall& /*call*/) { return error; };
 }
 
-// The real functions, for answers that begin with the system's own.
+// The real functions.
 int RealOpen(const char* path, int flags, mode_t mode);
 ssize_t RealRead(int fd, void* buffer, std::size_t size);
 ssize_t RealWrite(int fd, const void* buffer, std::size_t size);

@@ -5,8 +5,7 @@
 #include <chrono>
 #include <thread>
 
-// Waits until `condition` holds. False when it does not before a deadline that is far longer than
-// anything a test waits for.
+// Waits until `condition` holds. False after a minute, far longer than any test has to wait.
 template <class Condition>
 bool AwaitUntil(Condition condition)
 {

@@ -32,7 +32,7 @@ void CheckInChild(const std::function<void()>& checks)
     (void)std::fflush(stdout);
     ChildProcess child([&](ChildProcess::Link& /*link*/) {
         checks();
-        (void)std::fflush(stdout);  // what failed, which would go with the process
+        (void)std::fflush(stdout);  // or the messages would be lost with the process
         if (::testing::Test::HasFailure()) throw std::runtime_error("a check failed");
     });
     EXPECT_EQ(child.Join(), 0);

@@ -16,7 +16,7 @@ using OrvaDRCore::RetryOnEintr;
 
 namespace {
 
-// Far longer than anything a test waits for: it ends runs that hang, it paces none.
+// Far longer than any test has to wait: it only ends what hangs.
 constexpr int DeadlineMSec = 60'000;
 
 }  // namespace

@@ -1,18 +1,17 @@
-// A second process for tests in which processes meet. It runs a function and says with its exit
-// code whether all was well; what goes on inside is told and awaited through pipes, never by
-// sleeping.
+// A child process that runs a function. Its exit code says whether all went well. Test and child tell
+// each other through pipes how far they are; neither sleeps.
 //
 //     ChildProcess holder([&](ChildProcess::Link& link) {
 //         TakeTheLock();
 //         link.Tell();       // the lock is held
-//         link.Await();      // until the test has seen enough
+//         link.Await();      // until the test is done
 //     });
 //     holder.Await();
 //     ...
 //     holder.Tell();
 //     EXPECT_EQ(holder.Join(), 0);
 //
-// Every wait ends after a deadline: the child is killed and the test fails.
+// Every wait has a deadline: then the child is killed and the test fails.
 #ifndef ORVADRCORE_TESTS_CHILD_PROCESS_H
 #define ORVADRCORE_TESTS_CHILD_PROCESS_H
 
@@ -22,15 +21,15 @@
 
 class ChildProcess {
   public:
-    // One side of the two pipes between test and child.
+    // One end of the connection between test and child.
     class Link {
       public:
         Link(int readEnd, int writeEnd) : in(readEnd), out(writeEnd) {}
 
-        // Wakes the other side, once for each call.
+        // Ends one Await() of the other side.
         void Tell() const;
 
-        // Waits until the other side has told. False when it is gone or the deadline has passed.
+        // Waits for a Tell() of the other side. False when that has ended, or after the deadline.
         bool Await() const;
 
         void Close();
@@ -40,8 +39,8 @@ class ChildProcess {
         int out;
     };
 
-    // Starts a process that runs `body` and ends, with code 0, or 1 when `body` throws. Nothing of
-    // the test's own exit handlers or destructors runs in it.
+    // Forks a process that runs `body` and exits with code 0, or 1 when `body` throws. It runs no exit
+    // handlers and no destructors of the test.
     explicit ChildProcess(const std::function<void(Link&)>& body);
     ChildProcess(const ChildProcess&) = delete;
     ChildProcess& operator=(const ChildProcess&) = delete;
@@ -51,10 +50,9 @@ class ChildProcess {
     bool Await() const { return link.Await(); }
     pid_t Pid() const { return pid; }
 
-    // Sends a signal.
     void Kill(int signal) const;
 
-    // Waits for the end. The exit code; 128 plus the number of the signal that ended it.
+    // Waits until it ends. Returns its exit code, or 128 plus the number of the signal that ended it.
     int Join();
 
   private:

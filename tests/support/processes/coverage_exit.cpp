@@ -1,6 +1,6 @@
-// Linked into coverage builds: processes that end at once leave their figures, too. Those that are
-// traced do not: their system calls are counted, and who is killed while writing spoils the figures.
-// Writing them is no part of what a test lets fail.
+// For coverage builds: replaces _exit, so that processes which end with it write their figures, too.
+// Traced processes do not: a test counts their system calls, and one that is killed while writing spoils
+// the figures. No allocation fails while they are written.
 #include <sys/syscall.h>
 #include <unistd.h>
 
@@ -8,7 +8,7 @@
 
 #include "support/fakes/allocation_faults.h"
 
-// Not every test program has it.
+// Only the fault tests have it.
 [[gnu::weak]] void AskBeforeAllocating(bool (*fails)());
 
 extern "C" void __gcov_dump();  // NOLINT(bugprone-reserved-identifier)

@@ -1,4 +1,4 @@
-// A number of processes that begin at the same moment.
+// Several processes that start working at the same moment.
 #ifndef ORVADRCORE_TESTS_CROWD_H
 #define ORVADRCORE_TESTS_CROWD_H
 
@@ -12,10 +12,10 @@
 #include "support/processes/child_process.h"
 
 class Crowd {
-    static constexpr unsigned int DeadlineSeconds = 600;  // for what is done very often
+    static constexpr unsigned int DeadlineSeconds = 600;  // for long runs
 
   public:
-    // Makes the processes; each is to run `body` with a number of its own, from 0.
+    // Forks the processes. Each will run `body` with its number, from 0.
     Crowd(int size, const std::function<void(int)>& body)
     {
         children.reserve(static_cast<std::size_t>(size));
@@ -29,7 +29,7 @@ class Crowd {
         }
     }
 
-    // Lets all of them begin. False when one is not ready to.
+    // Lets all of them start. False when one has not come up.
     bool Start() const
     {
         const bool ready = std::all_of(children.begin(), children.end(),
@@ -38,7 +38,7 @@ class Crowd {
         return ready;
     }
 
-    // Waits for their ends. False when one has failed.
+    // Waits until all have ended. False when one has failed.
     bool Join() const
     {
         int failed = 0;

@@ -6,13 +6,16 @@
 #include <unistd.h>
 
 #include <array>
-#include <cerrno>
 #include <cstdint>
 #include <cstdlib>
 
+#include "base/errno.h"
+
+using OrvaDRCore::RetryOnEintr;
+
 namespace {
 
-// A socket whose calls end in time; -1 when there is none.
+// A connected socket whose calls time out; -1 without a connection.
 int Connect(int port, std::chrono::seconds patience)
 {
     const int fd = ::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
@@ -28,7 +31,7 @@ int Connect(int port, std::chrono::seconds patience)
     return -1;
 }
 
-// The number after a header's name; -1 when there is none.
+// The number that follows a header's name; -1 without the header.
 long NumberAfter(const std::string& head, const std::string& name)
 {
     const std::size_t at = head.find(name);
@@ -51,8 +54,8 @@ void HttpConnection::Send(const std::string& part) const
 {
     std::size_t sent = 0;
     while (sent < part.size()) {
-        const ssize_t count = ::send(fd, part.data() + sent, part.size() - sent, MSG_NOSIGNAL);
-        if (count < 0 && errno == EINTR) continue;
+        const ssize_t count = RetryOnEintr(
+            [&] { return ::send(fd, part.data() + sent, part.size() - sent, MSG_NOSIGNAL); });
         if (count <= 0) return;
         sent += static_cast<std::size_t>(count);
     }
@@ -61,10 +64,7 @@ void HttpConnection::Send(const std::string& part) const
 std::string HttpConnection::ReceiveSome() const
 {
     std::array<char, 16384> buffer{};
-    ssize_t count = 0;
-    do {
-        count = ::recv(fd, buffer.data(), buffer.size(), 0);
-    } while (count < 0 && errno == EINTR);
+    const ssize_t count = RetryOnEintr([&] { return ::recv(fd, buffer.data(), buffer.size(), 0); });
     return {buffer.data(), count > 0 ? static_cast<std::size_t>(count) : 0};
 }
 

@@ -1,5 +1,5 @@
-// A small HTTP client for the services that tests start: each connection to 127.0.0.1 carries one
-// request, in any parts and however broken.
+// A small HTTP client for services on 127.0.0.1. A connection carries one request, which may be sent in
+// parts and may be malformed.
 //
 //     EXPECT_EQ(Post(port, "/webapi", "{}").status, 200);
 //
@@ -14,14 +14,14 @@
 #include <string>
 
 struct HttpReply {
-    int status = 0;  // 0 when no whole reply came
+    int status = 0;  // 0 without a complete reply
     std::string head;
     std::string body;
 };
 
 class HttpConnection {
   public:
-    // Connects. What cannot be done in time counts as a connection that has ended.
+    // Connects. A call that takes longer than `patience` counts as the end of the connection.
     explicit HttpConnection(int port, std::chrono::seconds patience = std::chrono::seconds(60));
     HttpConnection(const HttpConnection&) = delete;
     HttpConnection& operator=(const HttpConnection&) = delete;
@@ -29,20 +29,19 @@ class HttpConnection {
 
     bool IsOpen() const { return fd >= 0; }
 
-    // Sends a part of a request. A server that has gone is noticed by Receive().
+    // Sends a part of a request. Receive() notices when the server has closed the connection.
     void Send(const std::string& part) const;
 
-    // What comes next, as far as it has come.
+    // The next bytes of the reply, as many as have arrived.
     std::string ReceiveSome() const;
 
-    // The whole reply, which ends with the connection.
+    // The whole reply: everything until the connection ends.
     HttpReply Receive() const;
 
   private:
     int fd;
 };
 
-// A request of a method with a body.
 std::string HttpRequest(const std::string& method, const std::string& path,
                         const std::string& body);
 

@@ -11,7 +11,7 @@
 
 namespace {
 
-// Kills one of the processes before each of its calls. Their number.
+// Kills one of the processes before each of its calls. Returns how often.
 int KillMember(const Scene& scene, int member)
 {
     for (int call = 1;; ++call) {
@@ -23,7 +23,7 @@ int KillMember(const Scene& scene, int member)
         EXPECT_EQ(process.ExitCode(), killed && member == 0 ? 128 + SIGKILL : 0);
         const long long slept = CountSlept().microseconds;
         scene.inspect();
-        EXPECT_EQ(CountSlept().microseconds, slept) << "the dead are waited for";
+        EXPECT_EQ(CountSlept().microseconds, slept) << "something waits for the killed process";
         if (!killed || ::testing::Test::HasFailure()) return call - 1;
     }
 }

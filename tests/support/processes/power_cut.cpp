@@ -35,7 +35,7 @@ std::size_t ToSize(std::uint64_t argument)
     return static_cast<std::size_t>(argument);
 }
 
-// The changes that a process makes, from its system calls.
+// Turns the system calls of a process into changes.
 class Recorder {
   public:
     Recorder(std::string path, const TracedProcess& traced) : dir(std::move(path)), process(traced)
@@ -43,7 +43,7 @@ class Recorder {
         for (const auto& [name, file] : ReadDirectory(dir)) names[name] = files++;
     }
 
-    // A call that has begun: texts are read now, while they are there.
+    // A call begins. Its paths are read now, before the process can overwrite them.
     void Begin(const SystemCall& begun)
     {
         call = begun;
@@ -74,7 +74,7 @@ class Recorder {
         return call.arguments.at(static_cast<std::size_t>(place));
     }
 
-    // Which arguments are paths.
+    // Which arguments of a call are paths; -1 for none.
     static std::pair<int, int> PathsOf(const SystemCall& call)
     {
         switch (call.number) {
@@ -82,7 +82,7 @@ class Recorder {
             case SYS_unlinkat: return {1, -1};
             case SYS_renameat:
             case SYS_renameat2: return {1, 3};
-#ifdef SYS_open  // newer machines have the calls above alone
+#ifdef SYS_open  // newer architectures have only the calls above
             case SYS_open:
             case SYS_unlink: return {0, -1};
             case SYS_rename: return {0, 1};
@@ -91,7 +91,7 @@ class Recorder {
         }
     }
 
-    // The name in the directory; "." for itself, none for what lies elsewhere.
+    // The path's name in the directory; "." for the directory itself, none for paths elsewhere.
     std::optional<std::string> NameIn(std::uint64_t address) const
     {
         const std::string path = process.Text(address);
@@ -205,19 +205,19 @@ class Recorder {
 
     std::string dir;
     const TracedProcess& process;
-    std::map<std::string, int> names;  // the files that have them now
+    std::map<std::string, int> names;  // to files, as they are now
     int files = 0;
     std::map<int, Open> descriptors;
     Record record;
 
     SystemCall call{};
-    std::optional<std::string> first;  // the names that it is given
+    std::optional<std::string> first;  // the names in its arguments
     std::optional<std::string> second;
 };
 
 // ---------------------------------------------------------------------------------- forgetting
 
-// What a disk can hold of a file that was changed since it was synced.
+// What the disk can hold of a file that was changed since its last sync.
 std::set<StoredFile> Remains(const StoredFile& synced, const StoredFile& now)
 {
     if (synced == now) return {now};
@@ -240,7 +240,7 @@ std::set<StoredFile> Remains(const StoredFile& synced, const StoredFile& now)
     return remains;
 }
 
-// A disk, as it was synced and as the processes see it.
+// What is synced to a disk, and what processes see.
 class Disk {
   public:
     explicit Disk(const Directory& before)
@@ -261,7 +261,7 @@ class Disk {
     };
     struct NewName {
         std::string name;
-        std::optional<int> file;  // none when it is removed
+        std::optional<int> file;  // none for a removed name
     };
     using Names = std::map<std::string, int>;
 
@@ -269,8 +269,8 @@ class Disk {
     void AddStates(const Names& found, std::set<Directory>& states) const;
 
     std::vector<File> files;
-    Names names;                    // those that are synced
-    std::vector<NewName> unsynced;  // in order
+    Names names;                    // synced
+    std::vector<NewName> unsynced;  // in the order of the changes
 };
 
 void Disk::Do(const Change& change)
@@ -300,7 +300,7 @@ void Disk::Do(const Change& change)
     }
 }
 
-// The names when of those that are not synced some have reached the disk, one for each bit.
+// The names on the disk, when those unsynced changes have reached it whose bits are set.
 Disk::Names Disk::NamesAfterCut(std::size_t reached) const
 {
     Names found = names;
@@ -317,7 +317,7 @@ Disk::Names Disk::NamesAfterCut(std::size_t reached) const
     return found;
 }
 
-// Adds what can stand under these names: of each file each of its remains, beside all of the others.
+// Adds all combinations of what the disk can hold of the files with these names.
 void Disk::AddStates(const Names& found, std::set<Directory>& states) const
 {
     std::set<Directory> all{{}};
@@ -390,7 +390,7 @@ Record RecordChanges(const std::string& path, const std::function<void()>& body)
             recorder.Begin(call);
         }
     }
-    if (process.ExitCode() != 0) throw std::runtime_error("the recorded process has failed");
+    if (process.ExitCode() != 0) throw std::runtime_error("the recorded process failed");
     return recorder.Take();
 }
 

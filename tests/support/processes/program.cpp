@@ -15,7 +15,7 @@
 
 namespace {
 
-// Far longer than anything a test waits for: it ends runs that hang, it paces none.
+// Far longer than any test has to wait: it only ends what hangs.
 constexpr std::chrono::seconds Deadline{100};
 
 struct Pipe {
@@ -36,7 +36,7 @@ void Close(int& descriptor)
     descriptor = -1;
 }
 
-// Appends what has come through a pipe and closes it at its end.
+// Appends what has arrived in a pipe, and closes the pipe at its end.
 void Receive(int& descriptor, std::string& text)
 {
     std::array<char, 65536> buffer{};
@@ -53,7 +53,7 @@ void Receive(int& descriptor, std::string& text)
 Program::Program(const std::vector<std::string>& arguments)
     : deadline(std::chrono::steady_clock::now() + Deadline)
 {
-    // A program that ends early is no reason to end with it.
+    // When the program ends early, writing to it must not end the test.
     static_cast<void>(std::signal(SIGPIPE, SIG_IGN));
 
     const Pipe toIn = MakePipe();
@@ -65,7 +65,7 @@ Program::Program(const std::vector<std::string>& arguments)
     ::posix_spawn_file_actions_adddup2(&actions, fromOut.writeEnd, STDOUT_FILENO);
     ::posix_spawn_file_actions_adddup2(&actions, fromErr.writeEnd, STDERR_FILENO);
 
-    // The program gets the signal as a shell would leave it.
+    // The program starts with the default action, as from a shell.
     posix_spawnattr_t attributes;
     sigset_t defaults;
     ::sigemptyset(&defaults);
@@ -92,7 +92,7 @@ Program::Program(const std::vector<std::string>& arguments)
     in = toIn.writeEnd;
     out = fromOut.readEnd;
     err = fromErr.readEnd;
-    ::fcntl(in, F_SETFL, O_NONBLOCK);  // so that a full pipe never keeps us from reading
+    ::fcntl(in, F_SETFL, O_NONBLOCK);  // a full pipe must not keep us from reading
 }
 
 Program::~Program()
@@ -144,7 +144,7 @@ ProgramResult Program::Finish()
     return {Reap(std::exchange(pid, -1)), unread, errors};
 }
 
-// Writes what the pipe takes; a program that reads no more gets nothing.
+// Writes as much as fits into the pipe. Gives up when the program has closed it.
 void Program::WriteUnsent()
 {
     const ssize_t count = ::write(in, unsent.data(), unsent.size());
@@ -155,11 +155,11 @@ void Program::WriteUnsent()
     }
 }
 
-// Waits for one event on the pipes and answers it. False when the deadline has passed.
+// Waits for an event on the pipes and handles it. False after the deadline.
 bool Program::Pump()
 {
     if (isInputComplete && unsent.empty()) Close(in);
-    // A closed pipe is -1, which poll passes over; so is an input that has nothing to take.
+    // poll ignores -1: a closed pipe, or the input when nothing is left to write.
     std::array<pollfd, 3> pipes{pollfd{unsent.empty() ? -1 : in, POLLOUT, 0},
                                 pollfd{out, POLLIN, 0}, pollfd{err, POLLIN, 0}};
     const auto left = std::chrono::duration_cast<std::chrono::milliseconds>(

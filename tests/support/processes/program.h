@@ -1,8 +1,6 @@
-// A program run from outside, as its users run it: through its standard input, output and error
-// and by its exit code.
+// Runs a program as its users do: through its standard input, output, error and exit code.
 //
-//     const ProgramResult result = RunProgram({"/usr/bin/sort"}, "b\na\n");   // result.out
-//     "a\nb\n"
+//     EXPECT_EQ(RunProgram({"/usr/bin/sort"}, "b\na\n").out, "a\nb\n");
 //
 //     Program handler({path, "--db", file});
 //     handler.Send(request + "\n");
@@ -20,7 +18,7 @@
 #include <vector>
 
 struct ProgramResult {
-    int code;  // the exit code; 128 plus the number of the signal that ended it
+    int code;  // the exit code, or 128 plus the number of the signal that ended it
     std::string out;
     std::string err;
 };
@@ -31,25 +29,24 @@ class Program {
     explicit Program(const std::vector<std::string>& arguments);
     Program(const Program&) = delete;
     Program& operator=(const Program&) = delete;
-    ~Program();  // kills a program that was not finished
+    ~Program();  // kills the program if it still runs
 
-    // Writes a text to standard input. What does not fit into the pipe follows while ReadLine and
-    // Finish wait.
+    // Writes to standard input. What does not fit into the pipe is written while ReadLine() and
+    // Finish() wait.
     void Send(const std::string& text);
 
-    // Waits for a line of standard output and takes it, without its end. Empty when there is none
-    // before the output ends or the deadline passes.
+    // Waits for a line of standard output and takes it, without the newline. Empty when the output
+    // ends or the deadline passes first.
     std::string ReadLine();
 
-    // Closes our end of its standard output.
+    // Closes our end of its standard output, so that it can write no more.
     void CloseOutput();
 
     pid_t Pid() const { return pid; }
 
-    // Sends it a signal.
     void Kill(int signal) const;
 
-    // Ends its input and waits for its end. The result has the output that no ReadLine took.
+    // Closes its input and waits until it ends. The result has the output that no ReadLine() took.
     ProgramResult Finish();
 
   private:
@@ -67,7 +64,7 @@ class Program {
     std::chrono::steady_clock::time_point deadline;
 };
 
-// One run from beginning to end.
+// Runs a program with this input to its end.
 ProgramResult RunProgram(const std::vector<std::string>& arguments, const std::string& input = "");
 
 #endif

@@ -24,7 +24,7 @@ bool Put(const std::string& path, const std::string& text)
     return file.good();
 }
 
-// Mounts of this process are its own from now on.
+// From now on mounts of this process are visible to itself and its children only.
 bool KeepMounts()
 {
     return ::mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr) == 0;
@@ -54,7 +54,7 @@ bool BecomeRoot()
 
 bool LoseRights()
 {
-    // In a user namespace there is nobody else to become.
+    // A user namespace has no other user to become.
     const bool changed = ::setgroups(0, nullptr) == 0 && ::setresgid(Nobody, Nobody, Nobody) == 0 &&
                          ::setresuid(Nobody, Nobody, Nobody) == 0;
     return DropCapabilities() || changed;

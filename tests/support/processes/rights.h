@@ -1,23 +1,21 @@
-// The rights of the test program and of its children.
+// Changes the rights of this process and its children.
 #ifndef ORVADRCORE_TESTS_RIGHTS_H
 #define ORVADRCORE_TESTS_RIGHTS_H
 
 #include <string>
 
-// Makes this process able to open any lock file, as root is. An ordinary user becomes root in a
-// user namespace, with a lock directory of its own in place of the machine's. False when the kernel
-// does not allow that.
+// Lets this process open any lock file, as root can. An ordinary user becomes root in a user namespace
+// with its own lock directory. False when the kernel does not allow that.
 bool BecomeRoot();
 
-// Makes this process an ordinary user, for good. False when that fails.
+// Makes this process an ordinary user, without a way back. False when that fails.
 bool LoseRights();
 
-// Whether this process could mount a file system of `bytes` bytes on a directory, which nobody else
-// sees.
+// Mounts a file system of `bytes` bytes on a directory, visible to this process and its children only.
+// False when that fails.
 bool MountSmallDisk(const std::string& directory, int bytes);
 
-// Whether this process could mount a file system in memory on a directory, which nobody else sees,
-// and whose times go on in the kernel's clock ticks.
+// The same with a file system in memory whose times advance in the kernel's clock ticks.
 bool MountCoarseDisk(const std::string& directory);
 
 #endif

@@ -1,4 +1,4 @@
-// An object that a test and the processes it forks have in common.
+// An object that a test shares with the processes that it forks.
 #ifndef ORVADRCORE_TESTS_SHARED_MEMORY_H
 #define ORVADRCORE_TESTS_SHARED_MEMORY_H
 
@@ -13,7 +13,7 @@ class SharedMemory {
   public:
     SharedMemory()
     {
-        static_assert(std::is_trivially_destructible_v<T>, "it goes with the mapping");
+        static_assert(std::is_trivially_destructible_v<T>, "no destructor runs");
         void* memory =
             ::mmap(nullptr, sizeof(T), PROT_READ | PROT_WRITE, MAP_SHARED | MAP_ANONYMOUS, -1, 0);
         if (memory == MAP_FAILED) std::abort();

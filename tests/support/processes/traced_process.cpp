@@ -18,7 +18,7 @@ using OrvaDRCore::RetryOnEintr;
 
 namespace {
 
-constexpr unsigned int DeadlineSeconds = 60;  // ends a child that hangs, and so the wait for it
+constexpr unsigned int DeadlineSeconds = 60;  // ends a child that hangs
 
 constexpr int SystemCallStop = SIGTRAP | 0x80;
 constexpr int UsualOptions = PTRACE_O_EXITKILL | PTRACE_O_TRACESYSGOOD;
@@ -29,13 +29,13 @@ bool Trace(__ptrace_request request, pid_t pid, long data)
     return ::ptrace(request, pid, nullptr, data) == 0;
 }
 
-// Which of the PTRACE_EVENT_... a wait has told of; 0 for none.
+// The PTRACE_EVENT_... of a stop; 0 for none.
 int EventOf(int status)
 {
     return WIFSTOPPED(status) ? status >> 16 : 0;
 }
 
-// The process that a stop at one of the StartEvents tells of.
+// The new process at a stop for one of the StartEvents.
 pid_t ForkedBy(pid_t pid)
 {
     unsigned long forked = 0;
@@ -58,7 +58,7 @@ SystemCall CallOf(pid_t pid)
     return call;
 }
 
-// A process and all that comes of its forks, of whom one is to be killed.
+// A process and all processes forked from it, one of which is to be killed.
 class Family {
   public:
     Family(pid_t first, int member, int call)
@@ -76,36 +76,36 @@ class Family {
         Trace(isWatched ? PTRACE_SYSCALL : PTRACE_CONT, pid, signal);
     }
 
-    // A member has stopped or ended.
+    // Handles a stop or the end of a member.
     void Take(pid_t pid, int status)
     {
         if (!WIFSTOPPED(status)) {
-            living.erase(pid);  // told of once more where the killed left it behind unreaped
+            living.erase(pid);  // reported twice if its parent was killed before reaping it
             return;
         }
         Meet(pid);
         const int event = EventOf(status);
         const int signal = WSTOPSIG(status);
         if (event != 0) {
-            Meet(ForkedBy(pid));  // itself, at the start of a program
+            Meet(ForkedBy(pid));  // when a program is started, the process itself
         } else if (signal == SystemCallStop && !CallOf(pid).hasEnded && --callsLeft == 0) {
             killed = true;
             ::kill(pid, SIGKILL);
             return;
         }
-        // A new member begins with a stop, which is not to last.
+        // A new member starts with a SIGSTOP, which is not passed on.
         const bool isSent = event == 0 && signal != SystemCallStop && signal != SIGSTOP;
         Go(pid, isSent ? signal : 0);
     }
 
   private:
-    // A fork is told of by both sides, in any order, and the forked may have ended by then.
+    // Parent and child both report a fork, in any order. The child may have ended by then.
     void Meet(pid_t pid)
     {
         if (pid > 0 && members.emplace(pid, members.size()).second) living.insert(pid);
     }
 
-    std::map<pid_t, std::size_t> members;  // also those who have ended
+    std::map<pid_t, std::size_t> members;  // those that have ended, too
     std::set<pid_t> living;
     std::size_t victim;
     int callsLeft;
@@ -182,7 +182,7 @@ std::string TracedProcess::Text(std::uint64_t address) const
 
 bool TracedProcess::KillBefore(int member, int call)
 {
-    // Without the event a new program would begin with a signal that ends it.
+    // Without PTRACE_O_TRACEEXEC a started program gets a SIGTRAP, which ends it.
     Trace(PTRACE_SETOPTIONS, pid, UsualOptions | PTRACE_O_TRACEEXEC | StartEvents);
     Family family(pid, member, call);
     family.Go(pid, 0);
@@ -206,7 +206,7 @@ pid_t TracedProcess::RunToStartedProgram()
         const int event = EventOf(status);
         if (event == PTRACE_EVENT_EXEC) return newest;
         const pid_t forked = event != 0 ? ForkedBy(newest) : -1;
-        // A process between the child and the program is let go: nobody here waits for its end.
+        // An intermediate process is released, because nobody here waits for its end.
         Trace(forked > 0 && newest != pid ? PTRACE_DETACH : PTRACE_CONT, newest, 0);
         if (forked > 0) newest = forked;
     }
@@ -232,7 +232,7 @@ int TracedProcess::ExitCode() const
     return ExitCodeOf(status);
 }
 
-// Waits for the next stop. False when there is none any more.
+// Waits for the next stop. False when the process has ended.
 bool TracedProcess::Await(pid_t whom)
 {
     if (RetryOnEintr([&] { return ::waitpid(whom, &status, __WALL); }) < 0) std::abort();
