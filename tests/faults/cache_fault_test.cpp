@@ -1,5 +1,5 @@
-// Caches, with every call failing once: in the reader, in the child that refreshes, and in the
-// process between them.
+// Cache, with every call failing once: in the reader, in the child that refreshes, and in the
+// intermediate process.
 #include <orvacore/orvacore.h>
 #include <orvadrcore/cache.h>
 #include <orvadrcore/file_lock.h>
@@ -38,11 +38,11 @@ class Texts : public Cache {
     bool IsNeedUpdate(const Json::Value& data) const override { return data != New; }
 };
 
-// A directory with a cache file, whose lock an ordinary user can open more than once.
+// A directory for a cache, with a lock file that an ordinary user can open more than once.
 struct Place {
     Place() { WriteFile(PlaceOfLock(FileLock::getLockFilePath(path + ".lock")), ""); }
 
-    // As old as a minute: a write in the same second would look like none.
+    // A minute old, because a write within the same second would go unnoticed.
     void WriteOld() const
     {
         WriteFile(path, std::string(R"({"cached_data":")") + Old + R"("})");
@@ -50,7 +50,7 @@ struct Place {
             path, std::filesystem::file_time_type::clock::now() - std::chrono::minutes(1));
     }
 
-    // What is in the file, which is never a part of something.
+    // The data in the file, which must never be damaged.
     std::string Data() const
     {
         Json::Value document;
@@ -58,7 +58,8 @@ struct Place {
         return document["cached_data"].asString();
     }
 
-    // A mark that could not be looked after stays, on purpose; for want of memory none does.
+    // Removes the mark of the updater. It stays when a system call failed that was needed to remove it,
+    // but never because an allocation failed.
     void RemoveMark() const
     {
         const std::string mark = path + ".pid";
@@ -77,7 +78,7 @@ struct Place {
     std::string path = dir.File("texts.cached");
 };
 
-// An operation on old data that may refresh it. A later reader gets new data in any case.
+// Runs an operation on old data that may refresh it. A later reader must get new data in any case.
 void RefreshWithFault(bool updatedRequired, const std::function<bool(const Texts&)>& operation)
 {
     const Place place;
@@ -88,7 +89,7 @@ void RefreshWithFault(bool updatedRequired, const std::function<bool(const Texts
     place.RemoveMark();
 
     EXPECT_EQ(Texts(place.dir.Path(), true).Read().asString(), New);
-    EXPECT_EQ(cache.Read().asString(), New) << "the object is of no use any more";
+    EXPECT_EQ(cache.Read().asString(), New) << "the object is unusable";
     place.ExpectClean();
 }
 
@@ -135,15 +136,15 @@ TEST(CacheFaults, Load)
         place.WriteOld();
         const Texts cache(place.dir.Path(), false);
         const Outcome outcome = WithFault([&] { return cache.Load(); });
-        outcome.ExpectSpoken();
+        outcome.ExpectLogged();
         EXPECT_TRUE(cache.Load());
         EXPECT_EQ(cache.GetCachedData().asString(), Old);
     });
 }
 
-TEST(CacheFaults, Questions)
+TEST(CacheFaults, Getters)
 {
-    EveryCallFails("Cache's questions", [] {
+    EveryCallFails("Cache's getters", [] {
         const Place place;
         place.WriteOld();
         const Texts cache(place.dir.Path(), false);
@@ -166,7 +167,7 @@ TEST(CacheFaults, UpdateWithData)
         const Texts cache(place.dir.Path(), false);
         ASSERT_TRUE(cache.Load());
         const Outcome outcome = WithFault([&] { return cache.UpdateWithData(New); });
-        outcome.ExpectSpoken();
+        outcome.ExpectLogged();
         EXPECT_EQ(place.Data(), outcome.succeeded ? New : Old);
         EXPECT_EQ(cache.GetCachedData().asString(), outcome.succeeded ? New : Old);
         EXPECT_TRUE(cache.UpdateWithData(New));
@@ -187,9 +188,9 @@ TEST(CacheFaults, Remove)
     });
 }
 
-TEST(CacheFaults, UpdateHere)
+TEST(CacheFaults, UpdateInTheCaller)
 {
-    EveryCallFails("Cache::Update, here", [] { RefreshWithFault(true, UpdateTexts); });
+    EveryCallFails("Cache::Update, in the caller", [] { RefreshWithFault(true, UpdateTexts); });
 }
 
 TEST(CacheFaults, UpdateInAChild)
@@ -197,17 +198,17 @@ TEST(CacheFaults, UpdateInAChild)
     EveryCallFails("Cache::Update, in a child", [] { RefreshWithFault(false, UpdateTexts); });
 }
 
-TEST(CacheFaults, ReadHere)
+TEST(CacheFaults, ReadThatRefreshesInTheCaller)
 {
     EveryCallFails("Cache::Read, refreshing", [] { RefreshWithFault(true, ReadTexts); });
 }
 
-TEST(CacheFaults, ReadInAChild)
+TEST(CacheFaults, ReadThatRefreshesInAChild)
 {
     EveryCallFails("Cache::Read, a child refreshing", [] { RefreshWithFault(false, ReadTexts); });
 }
 
-TEST(CacheFaults, ViewHere)
+TEST(CacheFaults, ViewThatRefreshesInTheCaller)
 {
     EveryCallFails("Cache::View, refreshing", [] { RefreshWithFault(true, ViewTexts); });
 }

@@ -1,4 +1,4 @@
-// Values, statements, requests and replies: they ask nothing of the system but memory.
+// Values, statements, requests and replies, with every allocation failing once. They make no system calls.
 #include <orvadrcore/request.h>
 #include <orvadrcore/response.h>
 #include <orvadrcore/sqlite_command.h>
@@ -28,7 +28,7 @@ const char* const Reply =
 const char* const Refusal =
     R"({"error":{"code":507,"errors":["no node has a name that long"]},"success":false})";
 
-// Makes a text twice: with a fault, which gives this text or none, and without.
+// Makes a text with a fault, which must give this text or none, and again without.
 void ExpectText(const std::string& expected, const std::function<std::string()>& make)
 {
     std::string text;
@@ -61,7 +61,7 @@ TEST(EnvelopeFaults, Insert)
     });
 }
 
-TEST(EnvelopeFaults, InsertForAReader)
+TEST(EnvelopeFaults, InsertAsLogText)
 {
     EveryCallFails("InsertCommand::ToStr", [] {
         const InsertCommand insert = MakeInsert();
@@ -69,7 +69,7 @@ TEST(EnvelopeFaults, InsertForAReader)
     });
 }
 
-TEST(EnvelopeFaults, UpdateForAReader)
+TEST(EnvelopeFaults, UpdateAsLogText)
 {
     EveryCallFails("UpdateCommand::ToStr", [] {
         UpdateCommand update;
@@ -80,7 +80,7 @@ TEST(EnvelopeFaults, UpdateForAReader)
     });
 }
 
-TEST(EnvelopeFaults, SelectForAReader)
+TEST(EnvelopeFaults, SelectAsLogText)
 {
     EveryCallFails("SelectCommand::ToStr", [] {
         SelectCommand select;
@@ -151,20 +151,20 @@ TEST(EnvelopeFaults, RequestToJson)
     });
 }
 
-TEST(EnvelopeFaults, ReplyThatIsParsed)
+TEST(EnvelopeFaults, ParsedReply)
 {
     EveryCallFails("Response::setResp", [] {
         const std::string text = Reply;
         Response response(Refusal);
         const Outcome outcome = WithFault([&] { return response.setResp(text); });
-        // One that did not parse is none, and the one before it is past.
+        // After a text that does not parse there is no reply, not even the one before.
         EXPECT_EQ(toString(response.getResp()), outcome.succeeded ? Reply : "null");
         EXPECT_TRUE(response.setResp(Reply));
         EXPECT_EQ(toString(response.getResp()), Reply);
     });
 }
 
-TEST(EnvelopeFaults, ReplyThatIsCopied)
+TEST(EnvelopeFaults, CopiedReply)
 {
     EveryCallFails("Response's copy", [] {
         const Response reply(Reply);
@@ -172,7 +172,7 @@ TEST(EnvelopeFaults, ReplyThatIsCopied)
     });
 }
 
-TEST(EnvelopeFaults, AnswersOfAReply)
+TEST(EnvelopeFaults, GettersOfAReply)
 {
     EveryCallFails("Response's answers", [] {
         const Response reply(Reply);

@@ -30,12 +30,12 @@
 #include "support/processes/child_checks.h"
 #include "support/processes/shared_memory.h"
 
-// In builds with the address sanitizer: whether what is in use can still be reached.
+// In builds with the address sanitizer: looks for leaks.
 extern "C" __attribute__((weak)) int __lsan_do_recoverable_leak_check();  // NOLINT
 
 namespace {
 
-constexpr unsigned int DeadlineSeconds = 60;  // of one trial: ends what hangs
+constexpr unsigned int DeadlineSeconds = 60;  // of one trial: only ends what hangs
 constexpr const char* LockDir = "/tmp/.orvadr_lock";
 
 struct Kind {
@@ -43,7 +43,7 @@ struct Kind {
     std::vector<int> errors;
 };
 
-// The errors that the manual has for each call, of those that are looked at.
+// The errors to try for each call: documented ones.
 const std::array<Kind, static_cast<std::size_t>(Call::None)>& Kinds()
 {
     static const std::array<Kind, static_cast<std::size_t>(Call::None)> kinds{{
@@ -69,7 +69,7 @@ const std::array<Kind, static_cast<std::size_t>(Call::None)>& Kinds()
         {"fdopen", {ENOMEM, EMFILE}},
         {"memory", {ENOMEM}},
         {"all memory", {ENOMEM}},
-        // Those that SQLite's own way to files may answer, and no others.
+        // Only errors that SQLite's own file system can return.
         {"db open", {SQLITE_CANTOPEN, SQLITE_IOERR, SQLITE_NOMEM}},
         {"db access", {SQLITE_IOERR_ACCESS}},
         {"db delete", {SQLITE_IOERR_DELETE}},
@@ -79,14 +79,14 @@ const std::array<Kind, static_cast<std::size_t>(Call::None)>& Kinds()
         {"db truncate", {SQLITE_IOERR_TRUNCATE}},
         {"db file size", {SQLITE_IOERR_FSTAT}},
         {"db lock", {SQLITE_BUSY, SQLITE_IOERR_LOCK}},
-        {"db look at lock", {SQLITE_IOERR_CHECKRESERVEDLOCK}},
+        {"db check lock", {SQLITE_IOERR_CHECKRESERVEDLOCK}},
         {"db shared memory", {SQLITE_IOERR_SHMMAP, SQLITE_CANTOPEN, SQLITE_NOMEM}},
         {"db shared lock", {SQLITE_BUSY, SQLITE_IOERR_SHMLOCK}},
     }};
     return kinds;
 }
 
-// The sums of all operations, printed at the end of the program.
+// Totals of all operations, printed at the end of the program.
 struct Sums : ::testing::Environment {
     int operations = 0;
     int calls = 0;
@@ -99,11 +99,12 @@ struct Sums : ::testing::Environment {
 };
 Sums& sums = static_cast<Sums&>(*::testing::AddGlobalTestEnvironment(new Sums));
 
-// What the trials and all processes that they fork have in common.
+// Shared by the trials and all processes that they fork: of the calls `call` number `at`, counted from 1,
+// fails with `error`.
 struct Plan {
-    Call call;  // of these calls
-    int at;     // the one of this number, from 1,
-    int error;  // fails with this
+    Call call;
+    int at;
+    int error;
     pid_t caller;
     bool isRunning;
     bool hasEscaped;
@@ -127,7 +128,7 @@ bool AllocationFails()
     return Strike(Call::Memory) != 0 || Strike(Call::AllMemory) != 0;
 }
 
-// The path as it is, or that of the file that is kept elsewhere. Takes no memory.
+// A path, below /tmp/.orvadr_lock replaced by where the test keeps the file. Allocates nothing.
 struct Placed {
     explicit Placed(const char* given) : path(given)
     {
@@ -170,13 +171,13 @@ int SpawnPlaced(SpawnCall call)
     return RealSpawn(call);
 }
 
-// No trial is about power cuts, and disks are slow.
+// Syncs nothing: no trial is about power cuts, and disks are slow.
 int NoSync(int /*fd*/)
 {
     return 0;
 }
 
-// The descriptor is gone whatever close answers.
+// The descriptor is closed even if close fails.
 int CloseAnyway(int fd)
 {
     const int result = RealClose(fd);
@@ -192,7 +193,7 @@ void CountLine(int priority, const char* format, std::va_list arguments)
     ++ThePlan().lines;
 }
 
-// All that fails by system calls; pauses and sleeps are passed over.
+// Makes system calls and allocations fail as planned, and sleeps take no time.
 class System {
   public:
     System()
@@ -221,14 +222,14 @@ class System {
         Let(processes.fork, RealFork, Call::Fork);
         faults.close = CloseAnyway;
         faults.spawn = SpawnPlaced;
-        // What the C library keeps for the texts of errors is there before anything is counted.
+        // The C library allocates for the texts of errors once. It does so now, before we count.
         for (const Kind& kind : Kinds()) {
             for (const int error : kind.errors) {
                 std::array<char, 128> text{};
                 static_cast<void>(::strerror_r(error, text.data(), text.size()));
             }
         }
-        // And so is what the library makes for JSON once in a process.
+        // So does our library for JSON.
         Json::Value document;
         EXPECT_TRUE(OrvaDRCore::fromString(document, OrvaDRCore::toString(document)));
         faults.sleep = [](unsigned int /*seconds*/) { return 0U; };
@@ -270,13 +271,13 @@ void AwaitChildren()
     int status = 0;
     pid_t child = 0;
     while ((child = RealWaitpid(-1, &status, __WALL)) > 0 || errno == EINTR) {
-        // A companion ends as its program did: by this signal.
+        // A process that waits for a program ends as the program did: by this signal.
         EXPECT_TRUE(child < 0 || !WIFSIGNALED(status) || WTERMSIG(status) == SIGKILL)
             << "a child was ended by signal " << WTERMSIG(status);
     }
 }
 
-// Runs the trial with what is planned. What it leaves behind is a failure.
+// Runs the trial as planned. Whatever it leaves behind is a failure.
 void RunTrial(const std::function<void()>& trial)
 {
     Plan& plan = ThePlan();
@@ -292,21 +293,21 @@ void RunTrial(const std::function<void()>& trial)
         trial();
     }
     if (!::testing::Test::HasFailure()) {
-        EXPECT_EQ(CountLiveAllocations(), allocations) << "memory is left behind";
-        EXPECT_EQ(CountDescriptors(), descriptors) << "descriptors are left behind";
+        EXPECT_EQ(CountLiveAllocations(), allocations) << "memory leaks";
+        EXPECT_EQ(CountDescriptors(), descriptors) << "descriptors leak";
         EXPECT_FALSE(plan.hasEscaped) << "a child went on with its parent's work";
     }
     ::alarm(0);
     plan.isRunning = false;
 }
 
-// The next call to fail: with memory, of which there is much, some are left out unless the test is
-// a long one.
+// The number of the next call to fail. There are many allocations: after the first 30 only some fail,
+// unless the test is a long one.
 int Next(Call call, int at)
 {
-    constexpr int ThatMany = 30;
-    const bool isMuch = call == Call::Memory || call == Call::AllMemory;
-    return isMuch && at > ThatMany ? at + Scaled(7, 1) : at + 1;
+    constexpr int Always = 30;
+    const bool isAllocation = call == Call::Memory || call == Call::AllMemory;
+    return isAllocation && at > Always ? at + Scaled(7, 1) : at + 1;
 }
 
 std::string Describe(const std::string& operation)
@@ -316,7 +317,7 @@ std::string Describe(const std::string& operation)
            std::to_string(plan.at) + " failing with error " + std::to_string(plan.error);
 }
 
-// Lets each call of a kind fail with each of some errors. Runs in a process of its own.
+// Makes each call of a kind fail with each of these errors. Runs in a child process.
 void Sweep(const std::string& operation, Call call, const std::vector<int>& errors,
            const std::function<void()>& trial)
 {
@@ -339,7 +340,7 @@ void Sweep(const std::string& operation, Call call, const std::vector<int>& erro
     }
 }
 
-// The errors that are tried: two of them, unless the test is a long one.
+// The errors to try: two of them, unless the test is a long one.
 std::vector<int> ErrorsOf(Call call)
 {
     std::vector<int> errors = Kinds()[static_cast<std::size_t>(call)].errors;
@@ -356,7 +357,7 @@ void EveryCallFails(const std::string& operation, Call first, Call end,
     plan.call = Call::None;
     plan.faults = 0;
     RunTrial(trial);
-    // Once more: what is made once in a process is there by now.
+    // The second run no longer allocates what is allocated once per process.
     RunTrial(trial);
     if (::testing::Test::HasFailure()) return;
 
@@ -369,7 +370,7 @@ void EveryCallFails(const std::string& operation, Call first, Call end,
         const Call call = static_cast<Call>(kind);
         const int before = plan.faults;
         CheckInChild([&] { Sweep(operation, call, ErrorsOf(call), trial); });
-        if (plan.isRunning) ADD_FAILURE() << Describe(operation) << ": the process has ended";
+        if (plan.isRunning) ADD_FAILURE() << Describe(operation) << ": the process died";
         list += std::string(", ") + Kinds()[kind].name + " " + std::to_string(seen[kind]) + "/" +
                 std::to_string(plan.faults - before);
         calls += seen[kind];
@@ -415,7 +416,7 @@ Outcome WithFault(const std::function<bool()>& operation)
     } catch (const std::bad_alloc&) {
         outcome.threw = true;
     } catch (const Json::RuntimeError&) {
-        outcome.threw = true;  // what jsoncpp says when it finds no memory for a text
+        outcome.threw = true;  // jsoncpp's exception when it cannot allocate a text
     } catch (...) {
         isOurs = false;
     }
@@ -427,7 +428,7 @@ Outcome WithFault(const std::function<bool()>& operation)
     plan.isArmed = false;
     outcome.lines = plan.lines;
     const bool isOfMemory = plan.call == Call::Memory || plan.call == Call::AllMemory;
-    EXPECT_TRUE(isOurs && (isOfMemory || !outcome.threw)) << "an exception got out";
+    EXPECT_TRUE(isOurs && (isOfMemory || !outcome.threw)) << "an unexpected exception escaped";
     return outcome;
 }
 

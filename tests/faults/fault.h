@@ -1,7 +1,6 @@
-// Every call fails once. A trial prepares what an operation needs, runs it with a fault set, looks
-// at what the fault has left behind and runs it again without. It is repeated for each system call
-// and each allocation that the operation makes, in this process or in those that it forks, until
-// there is none left to fail:
+// Makes every call of an operation fail once. A trial prepares what the operation needs, runs it with a
+// fault, checks what the fault has left behind, and runs it again without. It is repeated for each system
+// call and each allocation of the operation, in this process and in those that it forks:
 //
 //     EveryCallFails("toFile", [] {
 //         const TempDir dir;
@@ -10,10 +9,9 @@
 //         EXPECT_TRUE(toFile(Json::Value(1), path));
 //     });
 //
-// What holds for all operations is looked at here: no crash, no hang, no exception but those of
-// memory running out, no child that goes on with its parent's work, no descriptor, no memory and no
-// process left behind. Pauses and sleeps are passed over, and what belongs below /tmp/.orvadr_lock
-// lies in a directory of the test's own.
+// For all operations it checks: no crash, no hang, no exception except when memory runs out, no child that
+// goes on with its parent's work, no leaked descriptor, memory or process. Pauses and sleeps take no time,
+// and a directory of the test stands in for /tmp/.orvadr_lock.
 #ifndef ORVADRCORE_TESTS_FAULT_H
 #define ORVADRCORE_TESTS_FAULT_H
 
@@ -32,7 +30,7 @@ enum class Call {
     Rename,
     Unlink,
     Close,
-    Stat,  // lstat, too
+    Stat,  // and lstat
     Fstat,
     Flock,
     Fcntl,
@@ -45,8 +43,8 @@ enum class Call {
     Getrandom,
     Fdopen,
     Memory,     // one allocation
-    AllMemory,  // an allocation and all behind it
-    // Of SQLite's way to its files: see faulty_vfs.h.
+    AllMemory,  // an allocation and all after it
+    // SQLite's access to its files: see faulty_vfs.h.
     DbOpen,
     DbAccess,
     DbDelete,
@@ -56,35 +54,38 @@ enum class Call {
     DbTruncate,
     DbFileSize,
     DbLock,
-    DbLookAtLock,
+    DbCheckLock,
     DbSharedMemory,
     DbSharedLock,
     None
 };
 
-// How an operation with a fault went.
+// The result of an operation with a fault.
 struct Outcome {
-    bool succeeded;  // it answered true
+    bool succeeded;  // it returned true
     bool threw;      // it ran out of memory
-    int lines;       // that it wrote
+    int lines;       // written to the log
 
-    // A failure has to be told in the log.
-    void ExpectSpoken() const { EXPECT_TRUE(succeeded || threw || lines > 0) << "nothing is told"; }
+    // A failure must be logged.
+    void ExpectLogged() const
+    {
+        EXPECT_TRUE(succeeded || threw || lines > 0) << "nothing is logged";
+    }
 };
 
-// Runs an operation with the fault set, and waits for the processes that it leaves behind.
+// Runs an operation with the fault, and waits for the processes that it started.
 Outcome WithFault(const std::function<bool()>& operation);
 
-// Counts a call. Answers the error that it is to fail with; 0 for none.
+// Counts a call. Returns the error with which it must fail, or 0.
 int Strike(Call call);
 
-// Whether it is these calls that fail in this trial.
+// Whether this trial makes one of these calls fail.
 bool IsFailing(Call call);
 
-// Where the file of a name below /tmp/.orvadr_lock lies, in a directory that is there.
+// Where the test keeps a file that belongs below /tmp/.orvadr_lock. Its directory exists.
 std::string PlaceOfLock(const std::string& path);
 
-// Repeats a trial for all system calls and allocations, or for all calls of SQLite's.
+// Repeats a trial for all system calls and allocations, or for all of SQLite's file accesses.
 void EveryCallFails(const std::string& operation, const std::function<void()>& trial);
 void EveryDatabaseCallFails(const std::string& operation, const std::function<void()>& trial);
 

@@ -6,7 +6,7 @@ namespace {
 
 sqlite3_vfs* theirs = nullptr;
 
-// What SQLite is given. The system's own file stands behind it in the same memory.
+// SQLite's view of a file. The real file follows it in the same memory.
 struct File {
     sqlite3_file base;
     alignas(sqlite3_int64) char real[1];  // as SQLite aligns it
@@ -17,7 +17,7 @@ sqlite3_file* RealOf(sqlite3_file* file)
     return reinterpret_cast<sqlite3_file*>(reinterpret_cast<File*>(file)->real);
 }
 
-// The answer of a fault, or that of the system's own file.
+// Fails with a fault's error, or calls the real file.
 template <class... Parameters, class... Arguments>
 int Answer(Call call, int (*sqlite3_io_methods::*method)(sqlite3_file*, Parameters...),
            sqlite3_file* file, Arguments... arguments)
@@ -38,7 +38,7 @@ int Read(sqlite3_file* file, void* buffer, int size, sqlite3_int64 offset)
     return Answer(Call::DbRead, &sqlite3_io_methods::xRead, file, buffer, size, offset);
 }
 
-// One that fails has written a part.
+// A failed write has written a part.
 int Write(sqlite3_file* file, const void* buffer, int size, sqlite3_int64 offset)
 {
     const int error = Strike(Call::DbWrite);
@@ -52,7 +52,7 @@ int Truncate(sqlite3_file* file, sqlite3_int64 size)
     return Answer(Call::DbTruncate, &sqlite3_io_methods::xTruncate, file, size);
 }
 
-// No trial is about power cuts, and disks are slow.
+// Syncs nothing: no trial is about power cuts, and disks are slow.
 int Sync(sqlite3_file* /*file*/, int /*flags*/)
 {
     return Strike(Call::DbSync);
@@ -76,7 +76,7 @@ int Unlock(sqlite3_file* file, int lock)
 
 int CheckReservedLock(sqlite3_file* file, int* result)
 {
-    return Answer(Call::DbLookAtLock, &sqlite3_io_methods::xCheckReservedLock, file, result);
+    return Answer(Call::DbCheckLock, &sqlite3_io_methods::xCheckReservedLock, file, result);
 }
 
 int FileControl(sqlite3_file* file, int operation, void* argument)
@@ -103,7 +103,7 @@ int ShmMap(sqlite3_file* file, int page, int pageSize, int extend, void volatile
                   memory);
 }
 
-// To give a lock back never fails.
+// Only taking a lock can fail, not releasing it.
 int ShmLock(sqlite3_file* file, int offset, int count, int flags)
 {
     const int error = (flags & SQLITE_SHM_LOCK) != 0 ? Strike(Call::DbSharedLock) : 0;

@@ -1,6 +1,5 @@
-// SQLite's way to its files, with faults: a file system of SQLite's that passes everything on to the
-// system's own, unless Strike() has a fault for it. It is the default one as long as the object
-// lives.
+// An SQLite file system (VFS) with faults: it passes everything on to SQLite's own, unless Strike() has a
+// fault for it. It is SQLite's default while the object lives.
 #ifndef ORVADRCORE_TESTS_FAULTY_VFS_H
 #define ORVADRCORE_TESTS_FAULTY_VFS_H
 

@@ -1,4 +1,4 @@
-// Files, with every call failing once.
+// File and the JSON files, with every call failing once.
 #include <fcntl.h>
 #include <orvadrcore/file.h>
 #include <unistd.h>
@@ -20,7 +20,7 @@ using OrvaDRCore::toString;
 
 namespace {
 
-// Large enough to be kept outside of a std::string.
+// Too long for a std::string without an allocation.
 const char* const Old = R"({"name":"the document that was there before"})";
 const char* const New = R"({"name":"the document that takes its place"})";
 
@@ -39,7 +39,8 @@ struct Place {
     std::string path = dir.File("document.json");
 };
 
-// Replaces the file with a fault and again without: it is old or new, and alone, afterwards.
+// Replaces the file with a fault and again without. Afterwards the directory holds the old or the new
+// file and nothing else.
 void ExpectReplacement(const Place& place)
 {
     const Json::Value value = Document(New);
@@ -60,7 +61,7 @@ TEST(FileFaults, ToFile)
     });
 }
 
-TEST(FileFaults, ToFileBesideALeftOver)
+TEST(FileFaults, ToFileBesideALeftoverTemporaryFile)
 {
     EveryCallFails("toFile beside a left-over", [] {
         const Place place(Old);
@@ -89,7 +90,7 @@ TEST(FileFaults, ReadByPath)
         const Place place(New);
         Json::Value value = Document(Old);
         const Outcome outcome = WithFault([&] { return File::Read(place.path, value); });
-        // A file that cannot be found counts as missing, which is a success that reads nothing.
+        // Without the file, reading succeeds and reads nothing.
         EXPECT_TRUE(toString(value) == Old || (outcome.succeeded && toString(value) == New));
         EXPECT_TRUE(File::Read(place.path, value));
         EXPECT_EQ(toString(value), New);
@@ -104,9 +105,9 @@ TEST(FileFaults, ReadByDescriptor)
         const int fd = OpenFile(place.path, O_RDONLY);
         const Outcome outcome = WithFault([&] { return File::Read(fd, value); });
         EXPECT_EQ(toString(value), outcome.succeeded ? New : Old);
-        // The descriptor stays open where no stream could be made of it.
+        // The descriptor stays open when no stream can be made from it.
         if (IsDescriptorOpen(fd)) {
-            outcome.ExpectSpoken();
+            outcome.ExpectLogged();
             ::close(fd);
         }
         EXPECT_TRUE(File::Read(OpenFile(place.path, O_RDONLY), value));
@@ -120,7 +121,7 @@ TEST(FileFaults, WriteByPath)
         const Place place(Old);
         const Json::Value value = Document(New);
         const Outcome outcome = WithFault([&] { return File::Write(place.path, value); });
-        outcome.ExpectSpoken();
+        outcome.ExpectLogged();
         if (outcome.succeeded) {
             EXPECT_EQ(ReadFile(place.path), New + std::string("\n"));
         }
@@ -136,7 +137,7 @@ TEST(FileFaults, WriteByDescriptor)
         const Json::Value value = Document(New);
         const int fd = OpenFile(place.path, O_WRONLY);
         const Outcome outcome = WithFault([&] { return File::Write(fd, value); });
-        outcome.ExpectSpoken();
+        outcome.ExpectLogged();
         if (outcome.succeeded) {
             EXPECT_EQ(ReadFile(place.path), New);
         }
@@ -162,9 +163,9 @@ TEST(FileFaults, ReadPairs)
             count = File::Read(place.path, pairs);
             return count >= 0;
         });
-        outcome.ExpectSpoken();
+        outcome.ExpectLogged();
         if (outcome.succeeded) {
-            // Reading that fails counts as the end, and a file that cannot be found as missing.
+            // A read error counts as the end of the file, and ENOENT as a missing file.
             EXPECT_TRUE(pairs == all || (count == 0 && (pairs.empty() || pairs == old)));
         } else if (!outcome.threw) {
             EXPECT_EQ(pairs, old);
@@ -180,7 +181,7 @@ TEST(FileFaults, CreateDir)
         const TempDir dir;
         const std::string path = dir.File("a directory with a long name/in another one");
         const Outcome outcome = WithFault([&] { return File::CreateDir(path, 0700); });
-        outcome.ExpectSpoken();
+        outcome.ExpectLogged();
         if (outcome.succeeded) {
             EXPECT_EQ(ModeOf(path), 0700U);
         }
@@ -189,7 +190,7 @@ TEST(FileFaults, CreateDir)
     });
 }
 
-TEST(FileFaults, CreateDirThatIsThere)
+TEST(FileFaults, CreateDirThatExists)
 {
     EveryCallFails("File::CreateDir of one that is there", [] {
         const TempDir dir;
@@ -204,7 +205,7 @@ TEST(FileFaults, RemoveDir)
     EveryCallFails("File::RemoveDir", [] {
         const Place place(Old);
         const std::string& path = place.dir.Path();
-        // One that cannot be found counts as removed.
+        // A missing directory counts as removed.
         WithFault([&] { return File::RemoveDir(path); });
         EXPECT_TRUE(File::RemoveDir(path));
         EXPECT_FALSE(std::filesystem::exists(path));

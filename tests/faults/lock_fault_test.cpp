@@ -1,4 +1,4 @@
-// Locks, with every call failing once.
+// FileLock, with every call failing once.
 #include <orvadrcore/file_lock.h>
 
 #include "fault.h"
@@ -9,7 +9,7 @@ using OrvaDRCore::FileLock;
 
 namespace {
 
-// A lock file of its own, which an ordinary user can open more than once.
+// A lock file that an ordinary user can open more than once.
 struct Place {
     Place() { WriteFile(file, ""); }
 
@@ -74,7 +74,7 @@ TEST(LockFaults, Unlock)
     });
 }
 
-TEST(LockFaults, MakeAndDestroy)
+TEST(LockFaults, ConstructorAndDestructor)
 {
     EveryCallFails("FileLock's life", [] {
         const Place place;

@@ -1,5 +1,4 @@
-// The platform layer as the library uses it, and what is built on it alone, with every call failing
-// once.
+// The platform layer as the library uses it, and what needs nothing else, with every call failing once.
 #include <orvacore/orvacore.h>
 #include <orvadrcore/utils.h>
 #include <orvarandom/orvarandom.h>
@@ -97,7 +96,7 @@ TEST(PlatformFaults, ForkDetached)
             if (pid == 0) ::_exit(::mkdir(path.c_str(), 0700));
             return pid > 0;
         });
-        // Where the caller cannot hear of the child, it may run all the same.
+        // After a failure the child may have run all the same: only its report was lost.
         if (outcome.succeeded) {
             EXPECT_EQ(ModeOf(path), 0700U);
         }

@@ -1,5 +1,4 @@
-// Statements that SQLite refuses, while memory runs out as well: what tells of the failure needs
-// memory, too.
+// Statements that SQLite refuses while memory runs out, too: reporting a failure needs memory.
 #include <orvadrcore/sqlite_db.h>
 #include <orvadrcore/sqlite_transaction.h>
 
@@ -28,7 +27,7 @@ struct Place {
 
     std::string Names() const { return PlainDb(path).Run("SELECT name FROM nodes"); }
 
-    // Nothing is open any more, and another transaction can do its work.
+    // No transaction is open, and another one can do its work.
     void ExpectUsable()
     {
         EXPECT_TRUE(db.Open());
@@ -42,7 +41,7 @@ struct Place {
     SqliteDB db;
 };
 
-// While it lives SQLite refuses the first statements that have this text.
+// While it lives SQLite refuses the first `count` statements with this text.
 class Refusal {
   public:
     Refusal(const std::string& text, int count)
@@ -71,7 +70,7 @@ void RefuseInTransaction(const std::string& text, int count)
                 isCommitted = transaction.Begin() && place.db.Exec(Update) && transaction.Commit();
                 return isCommitted && transaction.Rollback();
             });
-            outcome.ExpectSpoken();
+            outcome.ExpectLogged();
         }
         const std::string names = place.Names();
         EXPECT_TRUE(names == "old" || names == "a name that is long enough") << names;
@@ -154,7 +153,7 @@ TEST(SqliteFailureFaults, Rollback)
     });
 }
 
-// The destructor has nobody to throw to.
+// The destructor must not throw.
 TEST(SqliteFailureFaults, Destructor)
 {
     EveryCallFails("a transaction that is left and whose ROLLBACK fails", [] {

@@ -1,6 +1,6 @@
-// Every operation of a connection, with every call failing once that it makes: system calls,
-// allocations, and SQLite's own way to its files in both journal modes.
-#include <json/writer.h>  // for the words of failed checks
+// Every operation of SqliteDB, with every call failing once: system calls, allocations, and SQLite's file
+// accesses in both journal modes.
+#include <json/writer.h>  // for the messages of failed checks
 #include <orvadrcore/sqlite_condition.h>
 #include <orvadrcore/sqlite_db.h>
 #include <orvadrcore/sqlite_transaction.h>
@@ -25,10 +25,10 @@ namespace {
 const SqliteTableHandler Nodes("nodes", "id INTEGER PRIMARY KEY, name TEXT");
 const SqliteTableHandler Others("others", "id INTEGER");
 
-// For transactions: the look for a table is a statement, too, at which SQLite may end them.
-const SqliteTableHandler NodesThatAreThere("nodes", "");
+// Without a schema there is no table lookup, at which SQLite could end a transaction.
+const SqliteTableHandler ExistingNodes("nodes", "");
 
-// Texts that fill more than a page of the file.
+// A text that fills more than a page of the file.
 std::string Long(char letter)
 {
     return std::string(5000, letter);
@@ -65,29 +65,29 @@ const char* const Before = "1a,2b,3c";
 struct Operation {
     const char* name;
     std::function<bool(SqliteDB&)> run;
-    std::string after;   // what is in the file then
-    bool opens = false;  // by hand: a failure of Open() alone leaves the error code as it is
+    std::string after;   // what is in the file afterwards
+    bool opens = false;  // calls Open(), whose failure leaves the error code unchanged
 };
 
-bool Work(SqliteDB& db)
+bool CommitWork(SqliteDB& db)
 {
     SqliteTransaction transaction(db);
-    return transaction.Begin() && db.UpdateRecord(UpdateOfAll('x', NodesThatAreThere)) &&
-           db.InsertRecords(NodesThatAreThere, {Record(4, 'x'), Record(5, 'x')}) &&
-           db.DeleteRecord("id=1", NodesThatAreThere) && transaction.Commit();
+    return transaction.Begin() && db.UpdateRecord(UpdateOfAll('x', ExistingNodes)) &&
+           db.InsertRecords(ExistingNodes, {Record(4, 'x'), Record(5, 'x')}) &&
+           db.DeleteRecord("id=1", ExistingNodes) && transaction.Commit();
 }
 
-bool WorkThatIsRolledBack(SqliteDB& db)
+bool RollBackWork(SqliteDB& db)
 {
     SqliteTransaction transaction(db);
-    return transaction.Begin() && db.UpdateRecord(UpdateOfAll('x', NodesThatAreThere)) &&
+    return transaction.Begin() && db.UpdateRecord(UpdateOfAll('x', ExistingNodes)) &&
            transaction.Rollback();
 }
 
-bool WorkThatIsLeft(SqliteDB& db)
+bool AbandonWork(SqliteDB& db)
 {
     SqliteTransaction transaction(db);
-    return transaction.Begin() && db.UpdateRecord(UpdateOfAll('x', NodesThatAreThere));
+    return transaction.Begin() && db.UpdateRecord(UpdateOfAll('x', ExistingNodes));
 }
 
 bool Select(SqliteDB& db)
@@ -136,14 +136,14 @@ const std::vector<Operation>& Operations()
         {"SelectByCommand of an INSERT with RETURNING", InsertWithRow, "1a,2b,3c,4d", true},
         {"CreateTable", [](SqliteDB& db) { return db.Open() && db.CreateTable(Others); }, Before,
          true},
-        {"a transaction that is committed", Work, "2x,3x,4x,5x"},
-        {"a transaction that is rolled back", WorkThatIsRolledBack, Before},
-        {"a transaction that is left", WorkThatIsLeft, Before},
+        {"a transaction that is committed", CommitWork, "2x,3x,4x,5x"},
+        {"a transaction that is rolled back", RollBackWork, Before},
+        {"a transaction that is abandoned", AbandonWork, Before},
     };
     return operations;
 }
 
-// Files to begin with, one for each journal mode.
+// The initial files, one for each journal mode.
 class Originals {
   public:
     Originals()
@@ -174,8 +174,7 @@ std::string Content(const std::string& path)
     return rows == "NULL" ? "" : rows;
 }
 
-// The file holds what was there before or all of the change; where the operation says that it has
-// been done, the change.
+// Afterwards the file holds the old content or the whole change. After a success it holds the change.
 void TryOnce(const Operation& operation, const std::string& original, unsigned int retries)
 {
     const TempDir dir;
@@ -183,7 +182,7 @@ void TryOnce(const Operation& operation, const std::string& original, unsigned i
     std::filesystem::copy_file(original, path);
     SqliteDB db(path, retries);
     const Outcome outcome = WithFault([&] { return operation.run(db); });
-    outcome.ExpectSpoken();
+    outcome.ExpectLogged();
     EXPECT_TRUE(outcome.succeeded || outcome.threw || db.GetErrCode() != 0 || operation.opens);
 
     const std::string content = Content(path);
@@ -192,34 +191,32 @@ void TryOnce(const Operation& operation, const std::string& original, unsigned i
         EXPECT_EQ(content, operation.after);
     }
 
-    // A file that SQLite could not open for writing it has opened for reading alone, until it is
-    // closed.
+    // A file that SQLite could not open for writing stays open for reading only.
     if (IsFailing(Call::Open)) db.Close();
     if (content == Before) {
         EXPECT_TRUE(operation.run(db)) << db.GetErr()[0U]["err_msg"]["sqlite_errmsg"];
         EXPECT_EQ(Content(path), operation.after);
     }
-    EXPECT_TRUE(db.Open() && db.Exec("DELETE FROM nodes"))
-        << "the connection is of no use any more";
+    EXPECT_TRUE(db.Open() && db.Exec("DELETE FROM nodes")) << "the connection is unusable";
     EXPECT_EQ(Content(path), "");
 }
 
 }  // namespace
 
-// One test for each operation: they run side by side.
+// One test for each operation, so that they can run in parallel.
 class DatabaseFaults : public ::testing::TestWithParam<std::size_t> {
   protected:
     const Operation& operation = Operations()[GetParam()];
     const Originals originals;
 };
 
-TEST_P(DatabaseFaults, OfTheSystem)
+TEST_P(DatabaseFaults, SystemCallsAndAllocations)
 {
     EveryCallFails(std::string("SqliteDB: ") + operation.name,
                    [&] { TryOnce(operation, originals.Of("delete"), 0); });
 }
 
-TEST_P(DatabaseFaults, OfTheFile)
+TEST_P(DatabaseFaults, FileAccesses)
 {
     const FaultyVfs vfs;
     for (const char* mode : {"delete", "wal"}) {

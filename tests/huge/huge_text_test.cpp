@@ -1,5 +1,5 @@
-// Texts of 2 GiB and more, which no JSON value can hold: they are refused whole, never cut, and
-// nothing throws. Each case makes its text once, shortens it, and lets it go at its end.
+// Texts of 2 GiB and more, which no JSON value can hold: they are refused as a whole, never cut, and
+// nothing throws. Each test makes its text once, shortens it, and frees it at its end.
 #include <json/value.h>
 #include <orvadrcore/request.h>
 #include <orvadrcore/response.h>
@@ -27,9 +27,9 @@ using OrvaDRCore::SqliteValue;
 using OrvaDRCore::SqliteValueList;
 using OrvaDRCore::UpdateCommand;
 
-constexpr std::size_t Longest = 2'147'483'642;  // that a JSON value holds
+constexpr std::size_t Longest = 2'147'483'642;  // text that a JSON value can hold
 constexpr std::size_t TooLong = Longest + 1;
-constexpr std::size_t CutToThreeBytes = (std::size_t{1} << 32U) + 3;  // as jsoncpp would
+constexpr std::size_t CutToThreeBytes = (std::size_t{1} << 32U) + 3;  // as jsoncpp would cut it
 constexpr std::size_t LongestName = (std::size_t{1} << 30U) - 1;
 
 std::string TooLongFor(const std::string& text)
@@ -58,7 +58,7 @@ class HugeTextTest : public SqliteFixture {
     }
 };
 
-TEST_F(HugeTextTest, ATextThatIsTooLongMakesNoValue)
+TEST_F(HugeTextTest, ATextThatIsTooLongGivesAnInvalidValue)
 {
     std::string text(CutToThreeBytes, 'x');
     for (const std::size_t length : {CutToThreeBytes, TooLong}) {
@@ -108,7 +108,7 @@ TEST_F(HugeTextTest, AColumnWhoseTextIsTooLongIsLeftOut)
         {NoValue(text), Err("AddValue", "Bad Field[name] or value []").In("sqlite_value.cpp")});
 }
 
-TEST_F(HugeTextTest, WhatIsTooLongForJsonIsNullOrRefused)
+TEST_F(HugeTextTest, ATextTooLongForJsonIsNullOrRefused)
 {
     std::string text(TooLong, 'x');
     Json::Value value(7);
@@ -146,7 +146,7 @@ TEST_F(HugeTextTest, ADocumentThatIsTooLongToBeLoadedAgainIsNotCached)
     EXPECT_EQ(cache.GetCachedData(), "old");
 }
 
-TEST_F(HugeTextTest, ANameThatIsTooLongForJsonIsNoParameterAndNoField)
+TEST_F(HugeTextTest, ANameTooLongForJsonIsNoParameterAndNoDataField)
 {
     std::string name(LongestName + 2, 'k');  // jsoncpp would cut it to "k"
     Request request;
@@ -158,10 +158,10 @@ TEST_F(HugeTextTest, ANameThatIsTooLongForJsonIsNoParameterAndNoField)
     EXPECT_EQ(request.getParams().begin().name().size(), LongestName);
 }
 
-TEST_F(HugeTextTest, AStatementThatIsTooLongFailsAndIsLeftOutOfTheErrorRecord)
+TEST_F(HugeTextTest, AStatementThatIsTooLongFailsAndIsOmittedFromTheErrorRecord)
 {
     const std::string record = R"({"sqlite_errcode":18,"sqlite_errmsg":"statement too long"})";
-    // At a literal of so many bytes SQLite crashes.
+    // SQLite crashes on a literal of this size.
     std::string statement = "SELECT '";
     statement.resize(TooLong + 100, 'x');
     ASSERT_TRUE(db.Open());
