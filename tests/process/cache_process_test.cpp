@@ -1,4 +1,4 @@
-// Caches that many processes read at once.
+// Many processes that read one cache.
 #include <gmock/gmock.h>
 #include <malloc.h>
 #include <poll.h>
@@ -53,10 +53,10 @@ Producer TakesTwoSeconds(const Producer& produce)
     };
 }
 
-// Sleeps as long as the library does, but calls `action` before each of its pauses.
-class NotedPauses {
+// Calls `action` before each pause of the library, which then sleeps as usual.
+class ObservedPauses {
   public:
-    explicit NotedPauses(const std::function<void()>& action)
+    explicit ObservedPauses(const std::function<void()>& action)
     {
         pauses.OnPause([this, action](std::size_t /*count*/) {
             action();
@@ -70,17 +70,17 @@ class NotedPauses {
 
 // ------------------------------------------------------------------------------ many at once
 
-// A number of processes, forked while this object lives, that are on their way to somewhere. One
-// arrives when it says so or ends; what it forks is on its way, too.
-class Travellers {
+// A barrier for all processes that are forked while this object lives, and for their children. A process
+// arrives with Arrive() or when it ends.
+class Barrier {
   public:
-    Travellers()
+    Barrier()
     {
         if (::pipe2(ends.data(), O_CLOEXEC) < 0) std::abort();
     }
-    Travellers(const Travellers&) = delete;
-    Travellers& operator=(const Travellers&) = delete;
-    ~Travellers()
+    Barrier(const Barrier&) = delete;
+    Barrier& operator=(const Barrier&) = delete;
+    ~Barrier()
     {
         Arrive();
         ::close(ends[0]);
@@ -92,7 +92,7 @@ class Travellers {
         ends[1] = -1;
     }
 
-    // Waits for all others. False when one does not arrive before a deadline.
+    // Arrives and waits until all others have arrived. False after the deadline.
     bool AwaitOthers()
     {
         constexpr int DeadlineMSec = 60'000;
@@ -102,24 +102,24 @@ class Travellers {
     }
 
   private:
-    std::array<int, 2> ends{};  // of a pipe; whoever travels holds the writing end
+    std::array<int, 2> ends{};  // a pipe; processes that have not arrived hold its write end
 };
 
 class ManyReadersTest : public ProcessTest {
   protected:
     static constexpr int Readers = 32;
 
-    // What producing does besides; false when it fails.
-    using Action = std::function<bool(Travellers&)>;
+    // Called while data is produced. False makes the production fail.
+    using Action = std::function<bool(Barrier&)>;
 
-    // One round: all readers read at the same moment, each with a mode of its own. A reader has
-    // arrived when it has its answer or waits for it.
+    // One round: all readers read at the same moment, each in its own mode. A reader arrives at the
+    // barrier when it has its data or waits for it.
     void ReadAtOnce(int number, const std::function<Mode(int)>& modeOf,
                     const Action& whileProducing);
 
-    // Counts of the last round.
+    // The productions of the last round, and the documents that readers got which waited or did not.
     int RoundProductions() const { return Productions() - productionsBefore; }
-    std::vector<int> NumbersOfWaiters(bool waited) const;
+    std::vector<int> NumbersRead(bool waited) const;
 
   private:
     struct Reader {
@@ -132,18 +132,18 @@ class ManyReadersTest : public ProcessTest {
         std::atomic<int> overlaps;
     };
 
-    void ReadInRound(Mode mode, Reader& reader, const Producer& produce, Travellers& travellers);
+    void ReadInRound(Mode mode, Reader& reader, const Producer& produce, Barrier& barrier);
 
     SharedMemory<Round> round;
     int productionsBefore = 0;
 };
 
 void ManyReadersTest::ReadInRound(Mode mode, Reader& reader, const Producer& produce,
-                                  Travellers& travellers)
+                                  Barrier& barrier)
 {
-    const NotedPauses pauses([&] {
+    const ObservedPauses pauses([&] {
         reader.waited = true;
-        travellers.Arrive();
+        barrier.Arrive();
     });
     reader.number = NumberOf(MakeCache(mode, produce).Read());
 }
@@ -152,10 +152,10 @@ void ManyReadersTest::ReadAtOnce(int number, const std::function<Mode(int)>& mod
                                  const Action& whileProducing)
 {
     productionsBefore = Productions();
-    Travellers travellers;
+    Barrier barrier;
     const auto produce = [&](Json::Value& data) {
         if (round->producing++ != 0) ++round->overlaps;
-        const bool succeeded = whileProducing(travellers);
+        const bool succeeded = whileProducing(barrier);
         --round->producing;
         return succeeded && Gives(number)(data);
     };
@@ -165,9 +165,9 @@ void ManyReadersTest::ReadAtOnce(int number, const std::function<Mode(int)>& mod
         reader.waited = false;
     }
     const Crowd crowd(Readers, [&](int i) {
-        ReadInRound(modeOf(i), round->readers.at(static_cast<std::size_t>(i)), produce, travellers);
+        ReadInRound(modeOf(i), round->readers.at(static_cast<std::size_t>(i)), produce, barrier);
     });
-    travellers.Arrive();
+    barrier.Arrive();
     ASSERT_TRUE(crowd.Start());
     EXPECT_TRUE(crowd.Join());
     ReapAll();
@@ -177,7 +177,7 @@ void ManyReadersTest::ReadAtOnce(int number, const std::function<Mode(int)>& mod
     EXPECT_THAT(Files(), ElementsAre("x.cached"));
 }
 
-std::vector<int> ManyReadersTest::NumbersOfWaiters(bool waited) const
+std::vector<int> ManyReadersTest::NumbersRead(bool waited) const
 {
     std::vector<int> numbers;
     for (const Reader& reader : round->readers) {
@@ -186,7 +186,7 @@ std::vector<int> ManyReadersTest::NumbersOfWaiters(bool waited) const
     return numbers;
 }
 
-TEST_F(ManyReadersTest, InTheBackgroundOneProducesAndAllGetTheOldDocument)
+TEST_F(ManyReadersTest, InTheBackgroundOneReaderProducesAndAllGetTheOldDocument)
 {
     if (!HasLocks()) return;
     const int rounds = Scaled(3, 50);
@@ -194,15 +194,15 @@ TEST_F(ManyReadersTest, InTheBackgroundOneProducesAndAllGetTheOldDocument)
         WriteStale(i);
         ReadAtOnce(
             i + 1, [](int) { return Mode::Background; },
-            [](Travellers& travellers) { return travellers.AwaitOthers(); });
+            [](Barrier& barrier) { return barrier.AwaitOthers(); });
         EXPECT_EQ(RoundProductions(), 1);
-        EXPECT_THAT(NumbersOfWaiters(false), Each(i));
-        EXPECT_THAT(NumbersOfWaiters(true), ElementsAre());
+        EXPECT_THAT(NumbersRead(false), Each(i));
+        EXPECT_THAT(NumbersRead(true), ElementsAre());
     }
     ReportCount("rounds", rounds);
 }
 
-TEST_F(ManyReadersTest, OneProducesAndAllWhoWaitGetTheNewDocument)
+TEST_F(ManyReadersTest, OneReaderProducesAndAllThatWaitGetTheNewDocument)
 {
     if (!HasLocks()) return;
     const int rounds = Scaled(3, 50);
@@ -210,16 +210,16 @@ TEST_F(ManyReadersTest, OneProducesAndAllWhoWaitGetTheNewDocument)
         WriteStale(i);
         ReadAtOnce(
             i + 1, [](int) { return Mode::Blocking; },
-            [](Travellers& travellers) { return travellers.AwaitOthers(); });
+            [](Barrier& barrier) { return barrier.AwaitOthers(); });
         EXPECT_EQ(RoundProductions(), 1);
-        EXPECT_THAT(NumbersOfWaiters(true), Each(i + 1));
-        // The one that produced, and those that found it in their way when they wanted to begin.
-        EXPECT_THAT(NumbersOfWaiters(false), Each(AnyOf(i, i + 1)));
+        EXPECT_THAT(NumbersRead(true), Each(i + 1));
+        // The one that produced, and those that could not mark themselves because of it.
+        EXPECT_THAT(NumbersRead(false), Each(AnyOf(i, i + 1)));
     }
     ReportCount("rounds", rounds);
 }
 
-TEST_F(ManyReadersTest, LateComersMayProduceAgainButNeverTwoAtATime)
+TEST_F(ManyReadersTest, LateReadersMayProduceAgainButNeverTwoAtATime)
 {
     if (!HasLocks()) return;
     const int rounds = Scaled(1, 50);
@@ -228,14 +228,14 @@ TEST_F(ManyReadersTest, LateComersMayProduceAgainButNeverTwoAtATime)
         WriteStale(i);
         ReadAtOnce(
             i + 1, [](int reader) { return reader % 2 == 0 ? Mode::Background : Mode::Blocking; },
-            [](Travellers& /*travellers*/) {
+            [](Barrier& /*barrier*/) {
                 std::this_thread::sleep_for(std::chrono::milliseconds(20));
                 return true;
             });
         EXPECT_GE(RoundProductions(), 1);
         all += RoundProductions();
-        EXPECT_THAT(NumbersOfWaiters(true), Each(i + 1));
-        EXPECT_THAT(NumbersOfWaiters(false), Each(AnyOf(i, i + 1)));
+        EXPECT_THAT(NumbersRead(true), Each(i + 1));
+        EXPECT_THAT(NumbersRead(false), Each(AnyOf(i, i + 1)));
     }
     ReportCount("rounds", rounds);
     ReportCount("productions", all);
@@ -245,7 +245,7 @@ TEST_F(ManyReadersTest, LateComersMayProduceAgainButNeverTwoAtATime)
 
 class CacheProcessTest : public ProcessTest {
   protected:
-    // An updater at work, which goes on when it is told to.
+    // A process that produces data and waits for Tell() before it finishes.
     ChildProcess StartUpdater()
     {
         return ChildProcess([this](ChildProcess::Link& link) {
@@ -257,18 +257,17 @@ class CacheProcessTest : public ProcessTest {
         });
     }
 
-    // A process that does something with a cache and tells when it has begun to wait for another
-    // updater.
+    // A process that uses a cache and tells when it starts to wait for another updater.
     ChildProcess StartWaiter(const std::function<void(const DocumentCache&)>& action)
     {
         return ChildProcess([this, action](ChildProcess::Link& link) {
-            const NotedPauses pauses([&link] { link.Tell(); });
+            const ObservedPauses pauses([&link] { link.Tell(); });
             action(MakeCache(Mode::Blocking, Gives(New)));
         });
     }
 };
 
-TEST_F(CacheProcessTest, ABackgroundReaderHasItsAnswerAtOnce)
+TEST_F(CacheProcessTest, ABackgroundReaderGetsItsDataAtOnce)
 {
     if (!HasLocks()) return;
     const std::vector<std::string> names{"a", "b", "c", "d", "e"};
@@ -291,14 +290,14 @@ TEST_F(CacheProcessTest, ABackgroundReaderHasItsAnswerAtOnce)
     for (const std::string& name : names) EXPECT_EQ(NumberInFile(name), New);
     EXPECT_EQ(Productions(), static_cast<int>(names.size()));
 
-    // A busy machine may hold up one or the other of them.
+    // On a busy machine some of the five may take longer.
     for (auto* took : {&firstTook, &secondTook}) {
         std::nth_element(took->begin(), took->begin() + 2, took->end());
         EXPECT_LT(took->at(2).count(), 100);
     }
 }
 
-TEST_F(CacheProcessTest, AWaitingReaderGetsWhatTheOtherUpdaterWrites)
+TEST_F(CacheProcessTest, AWaitingReaderGetsTheDocumentOfTheOtherUpdater)
 {
     if (!HasLocks()) return;
     WriteStale(Old);
@@ -308,7 +307,7 @@ TEST_F(CacheProcessTest, AWaitingReaderGetsWhatTheOtherUpdaterWrites)
     ChildProcess waiter =
         StartWaiter([&](const DocumentCache& cache) { *number = NumberOf(cache.Read()); });
     ASSERT_TRUE(waiter.Await());
-    ASSERT_TRUE(waiter.Await()) << "the wait ended although the updater has not written";
+    ASSERT_TRUE(waiter.Await()) << "the wait ended before the updater has written";
     EXPECT_EQ(NumberInFile(), Old);
 
     updater.Tell();
@@ -325,7 +324,7 @@ TEST_F(CacheProcessTest, AReaderWithoutADocumentWaitsForTheOtherUpdater)
     ASSERT_TRUE(updater.Await());
     const SharedMemory<std::atomic<int>> number;
     ChildProcess waiter([&](ChildProcess::Link& link) {
-        const NotedPauses pauses([&link] { link.Tell(); });
+        const ObservedPauses pauses([&link] { link.Tell(); });
         *number = NumberOf(MakeCache(Mode::Background, Gives(New)).Read());
     });
     ASSERT_TRUE(waiter.Await());
@@ -337,7 +336,7 @@ TEST_F(CacheProcessTest, AReaderWithoutADocumentWaitsForTheOtherUpdater)
     EXPECT_EQ(Productions(), 1);
 }
 
-TEST_F(CacheProcessTest, AWaitingReaderGetsWhatIsThereWhenTheUpdaterIsKilled)
+TEST_F(CacheProcessTest, AWaitingReaderGetsTheOldDocumentWhenTheUpdaterIsKilled)
 {
     if (!HasLocks()) return;
     WriteStale(Old);
@@ -356,11 +355,11 @@ TEST_F(CacheProcessTest, AWaitingReaderGetsWhatIsThereWhenTheUpdaterIsKilled)
     EXPECT_EQ(reader.Join(), 0);
     EXPECT_EQ(other.Join(), 0);
     EXPECT_EQ(*number, Old);
-    EXPECT_TRUE(*updated) << "on purpose, although nothing was written";
-    EXPECT_EQ(Productions(), 1) << "whoever has waited does not take over";
+    EXPECT_TRUE(*updated) << "the contract says true, although nothing was written";
+    EXPECT_EQ(Productions(), 1) << "a process that waited must not take over";
 }
 
-TEST_F(CacheProcessTest, ReadersNeverSeeAPartOfADocument)
+TEST_F(CacheProcessTest, ReadersNeverSeePartOfADocument)
 {
     constexpr int Readers = 4;
     if (!HasLocks()) return;
@@ -373,26 +372,26 @@ TEST_F(CacheProcessTest, ReadersNeverSeeAPartOfADocument)
     const SharedMemory<std::atomic<int>> partial;
     const Crowd crowd(Readers, [&](int) {
         while (!*done) {
-            // A new object reads the file whatever its time is.
+            // A new object reads the file whatever its modification time.
             const int number = NumberOf(MakeCache(Mode::Background, Gives(New)).Read());
             if (number == NoDocument) ++*partial;
             ++*reads;
         }
     });
     ASSERT_TRUE(crowd.Start());
-    // Long documents and short ones, in no order.
+    // Long and short documents, in no particular order.
     for (int i = 0; i < rewrites; ++i) EXPECT_TRUE(writer.UpdateWithData(DocumentOf(i * 337)));
     *done = true;
     EXPECT_TRUE(crowd.Join());
 
     EXPECT_GT(*reads, 0);
     EXPECT_EQ(*partial, 0);
-    EXPECT_EQ(Productions(), 0) << "a reader has found nothing valid";
+    EXPECT_EQ(Productions(), 0) << "a reader has found no valid document";
     ReportCount("rewrites", rewrites);
     ReportCount("reads", *reads);
 }
 
-TEST_F(CacheProcessTest, BackgroundRefreshesCostALongLivedProcessNothing)
+TEST_F(CacheProcessTest, BackgroundRefreshesLeakNothingInALongLivedProcess)
 {
     constexpr int WarmUp = 5;
     constexpr std::size_t SmallChange = 4096;
@@ -435,8 +434,8 @@ TEST_F(CacheProcessTest, BackgroundRefreshesCostALongLivedProcessNothing)
 
 class EditTest : public ProcessTest {};
 
-// Where the kernel does not allow to mount one, the times are finer and show the edits.
-TEST_F(EditTest, AnEditRightAfterAWriteIsSeenOnAFileSystemOfCoarseTimes)
+// If the kernel does not allow the mount, file times are finer and show the edit.
+TEST_F(EditTest, AnEditRightAfterAWriteIsSeenOnAFileSystemWithCoarseTimes)
 {
     const int rounds = Scaled(200, 5000);
     ChildProcess editor([&](ChildProcess::Link& /*link*/) {
@@ -454,7 +453,7 @@ TEST_F(EditTest, AnEditRightAfterAWriteIsSeenOnAFileSystemOfCoarseTimes)
             seen += MakeCache(Mode::Background, nullptr).GetMaxUpdateTime() == 9 ? 1 : 0;
             std::filesystem::remove(CacheFile());
         }
-        if (seen < rounds) throw std::runtime_error("an edit is lost");
+        if (seen < rounds) throw std::runtime_error("an edit was lost");
     });
     EXPECT_EQ(editor.Join(), 0);
     ReportCount("edits", rounds);
@@ -470,7 +469,7 @@ bool Limit(__rlimit_resource resource, rlim_t value)
 
 class FailingRefreshTest : public ProcessTest {
   protected:
-    // Makes the cache one that also a process without root's rights can use.
+    // Lets processes without root's rights use the cache.
     void SetUpForEveryone()
     {
         ASSERT_EQ(::chmod(dir.Path().c_str(), 0755), 0);
@@ -478,12 +477,12 @@ class FailingRefreshTest : public ProcessTest {
         ASSERT_EQ(::chmod(FileLock::getLockFilePath(LockName()).c_str(), 0644), 0);
     }
 
-    // Updates and reads the stale cache in a process that does `spoil` first. It must get the old
-    // document, and nothing must have changed after it. `updated` is what Update() has to say.
+    // Updates and reads the stale cache in a process that first calls `spoil`. It must get the old
+    // document, and the file must be unchanged afterwards. `updated`: what Update() must return.
     void ExpectTheOldDocument(Mode mode, bool updated, const std::function<bool()>& spoil,
                               const Producer& produce = Gives(New));
 
-    // Puts the stale cache on a disk that has no room for a large document, or for nothing at all.
+    // Puts the stale cache on a disk without room for a large document, or without any room.
     bool FillDisk(bool completely);
 };
 
@@ -534,7 +533,7 @@ bool FailingRefreshTest::FillDisk(bool completely)
     return true;
 }
 
-TEST_F(FailingRefreshTest, WithoutAForkTheReaderKeepsTheOldDocument)
+TEST_F(FailingRefreshTest, AReaderThatCannotForkGetsTheOldDocument)
 {
     if (!HasLocks()) return;
     SetUpForEveryone();
@@ -544,7 +543,7 @@ TEST_F(FailingRefreshTest, WithoutAForkTheReaderKeepsTheOldDocument)
     EXPECT_EQ(Productions(), 0);
 }
 
-TEST_F(FailingRefreshTest, AnUnwritableDirectoryKeepsTheOldDocument)
+TEST_F(FailingRefreshTest, AnUnwritableDirectoryLeavesTheOldDocument)
 {
     if (!HasLocks()) return;
     SetUpForEveryone();
@@ -555,7 +554,7 @@ TEST_F(FailingRefreshTest, AnUnwritableDirectoryKeepsTheOldDocument)
     EXPECT_EQ(Productions(), 0);
 }
 
-TEST_F(FailingRefreshTest, APidFileThatCannotBeWrittenKeepsTheOldDocument)
+TEST_F(FailingRefreshTest, AnUnwritablePidFileLeavesTheOldDocument)
 {
     if (!HasLocks()) return;
     WriteStale(Old);
@@ -566,7 +565,7 @@ TEST_F(FailingRefreshTest, APidFileThatCannotBeWrittenKeepsTheOldDocument)
     EXPECT_EQ(Productions(), 0);
 }
 
-TEST_F(FailingRefreshTest, ADocumentThatDoesNotFitOnTheDiskKeepsTheOldOne)
+TEST_F(FailingRefreshTest, ADocumentThatDoesNotFitOnTheDiskLeavesTheOldOne)
 {
     constexpr int Large = 999;
     if (!HasLocks()) return;
@@ -577,7 +576,7 @@ TEST_F(FailingRefreshTest, ADocumentThatDoesNotFitOnTheDiskKeepsTheOldOne)
     EXPECT_GT(Productions(), 2);
 }
 
-TEST_F(FailingRefreshTest, AFullDiskKeepsTheOldDocument)
+TEST_F(FailingRefreshTest, AFullDiskLeavesTheOldDocument)
 {
     if (!HasLocks()) return;
     const auto fill = [this] { return FillDisk(true); };
@@ -586,7 +585,7 @@ TEST_F(FailingRefreshTest, AFullDiskKeepsTheOldDocument)
     EXPECT_EQ(Productions(), 0);
 }
 
-TEST_F(FailingRefreshTest, AFileThatHoldsNoDocumentIsReplacedByTheReader)
+TEST_F(FailingRefreshTest, AReaderReplacesAFileThatHoldsNoDocument)
 {
     if (!HasLocks()) return;
     const std::vector<std::string> contents{"",
@@ -608,7 +607,7 @@ TEST_F(FailingRefreshTest, AFileThatHoldsNoDocumentIsReplacedByTheReader)
     }
 }
 
-TEST_F(FailingRefreshTest, ADirectoryInTheFilesPlaceGivesTheDefault)
+TEST_F(FailingRefreshTest, ADirectoryInPlaceOfTheFileGivesTheDefaultValue)
 {
     if (!HasLocks()) return;
     ASSERT_TRUE(std::filesystem::create_directories(CacheFile()));
@@ -619,12 +618,12 @@ TEST_F(FailingRefreshTest, ADirectoryInTheFilesPlaceGivesTheDefault)
     EXPECT_THAT(Files(), ElementsAre("x.cached"));
 }
 
-// A lock that others hold is tried six times, a second apart.
+// A lock that others hold is attempted six times, a second apart.
 class HeldLockTest : public ProcessTest {
   protected:
-    static constexpr std::chrono::seconds AllTries{5};
+    static constexpr std::chrono::seconds AllAttempts{5};
 
-    // A process that holds the cache's lock until it is told.
+    // A process that holds the cache's lock until Tell().
     ChildProcess StartHolder(int operation)
     {
         return ChildProcess([this, operation](ChildProcess::Link& link) {
@@ -636,7 +635,7 @@ class HeldLockTest : public ProcessTest {
     }
 };
 
-TEST_F(HeldLockTest, WhoCannotLookForAnUpdaterTakesItThatThereIsOne)
+TEST_F(HeldLockTest, AReaderThatCannotLookForAnUpdaterAssumesThereIsOne)
 {
     if (!HasLocks()) return;
     WriteStale(Old);
@@ -645,7 +644,7 @@ TEST_F(HeldLockTest, WhoCannotLookForAnUpdaterTakesItThatThereIsOne)
     const Reading reading = ReadElsewhere(Mode::Background, Gives(New));
     EXPECT_EQ(reading.number, Old);
     EXPECT_FALSE(reading.startedProcesses);
-    EXPECT_GE(reading.took, AllTries);
+    EXPECT_GE(reading.took, AllAttempts);
 
     holder.Tell();
     EXPECT_EQ(holder.Join(), 0);
@@ -653,7 +652,7 @@ TEST_F(HeldLockTest, WhoCannotLookForAnUpdaterTakesItThatThereIsOne)
     EXPECT_EQ(ReadElsewhere(Mode::Blocking, Gives(New)).number, New);
 }
 
-TEST_F(HeldLockTest, WhoCannotMarkItselfAsUpdaterDoesNotProduce)
+TEST_F(HeldLockTest, AReaderThatCannotMarkItselfAsUpdaterDoesNotProduce)
 {
     if (!HasLocks()) return;
     WriteStale(Old);
@@ -662,12 +661,12 @@ TEST_F(HeldLockTest, WhoCannotMarkItselfAsUpdaterDoesNotProduce)
     EXPECT_EQ(NumberOf(MakeCache(Mode::Background, Gives(New)).Read()), Old);
     const Reading reading = ReadElsewhere(Mode::Blocking, Gives(New));
     EXPECT_EQ(reading.number, Old);
-    EXPECT_GE(reading.took, AllTries);
+    EXPECT_GE(reading.took, AllAttempts);
     EXPECT_EQ(Productions(), 0);
     EXPECT_EQ(NumberInFile(), Old);
 }
 
-TEST_F(HeldLockTest, AnUpdaterThatCannotRemoveItsMarkCountsAsOneAsLongAsItLives)
+TEST_F(HeldLockTest, AnUpdaterThatCannotRemoveItsMarkCountsAsUpdaterUntilItEnds)
 {
     if (!HasLocks()) return;
     WriteStale(Old);

@@ -1,5 +1,5 @@
-// Processes that all write to one database at the same time. Each has records of its own, of which
-// it knows what it was answered, and all of them meet at the file's lock.
+// Many processes that write to one database at the same time. Each has its own records and remembers the
+// results of its operations.
 #include <gtest/gtest.h>
 #include <unistd.h>
 
@@ -40,23 +40,23 @@ using OrvaDRCore::UpdateCommand;
 using std::chrono::milliseconds;
 using Clock = std::chrono::steady_clock;
 
-// The longest that so many statements may wait for others. Each is tried once more often than the
-// limit says, with a pause between tries, and in each try SQLite waits up to its time-out. Where it
-// has to read the schema before that, at first or again, it may wait for that, too.
+// The longest that statements may wait for other processes. Each gets one attempt more than the retry
+// limit, with pauses between them, and in each attempt SQLite waits up to its time-out. It may wait just as
+// long when it reads the schema, at first or again.
 milliseconds LongestWait(int statements, int retryLimit)
 {
     constexpr milliseconds BusyTimeout(1000);
     constexpr milliseconds LongestPause(1000);
-    const milliseconds tries = (retryLimit + 1) * BusyTimeout + retryLimit * LongestPause;
-    return statements * tries + 2 * BusyTimeout;
+    const milliseconds attempts = (retryLimit + 1) * BusyTimeout + retryLimit * LongestPause;
+    return statements * attempts + 2 * BusyTimeout;
 }
 
-// An operation looks for its table, makes it where looking has failed, and runs its statement.
+// An operation looks up its table, creates it if the lookup failed, and runs its statement.
 constexpr int MostStatements = 3;
 
-// How long the file is locked at a time: longer than a single try waits, and longer than the tries of
-// all statements of an operation wait; and how long it is free then.
-constexpr std::chrono::seconds HeldForATry(2);
+// How long the file is locked at a time: longer than one attempt waits, and longer than all statements of
+// an operation wait without retries. And for how long it is free in between.
+constexpr std::chrono::seconds HeldForAnAttempt(2);
 constexpr std::chrono::seconds HeldForAnOperation(MostStatements + 1);
 constexpr std::chrono::seconds Free(3);
 
@@ -70,7 +70,7 @@ const SqliteTableHandler& Jobs()
     return table;
 }
 
-// What a record's writer was told: the state, or that it is not there.
+// A record's state as its writer was told; Absent when it is not there.
 constexpr int Absent = 0;
 constexpr int Made = 1;
 constexpr int Changed = 2;
@@ -86,14 +86,14 @@ bool Insert(SqliteDB& db, int id)
 
 struct Writer {
     std::array<std::atomic<unsigned char>, MaxRecords> states;
-    std::atomic<int> records;  // that it has tried to make
-    std::atomic<int> done;     // operations that were answered true
-    std::atomic<int> failed;   // operations that were answered false
-    std::atomic<int> wrong;    // selects that gave something else than what had been answered
-    std::atomic<int> pauses;   // tries that were repeated
+    std::atomic<int> records;  // inserts attempted
+    std::atomic<int> done;     // operations that returned true
+    std::atomic<int> failed;   // operations that returned false
+    std::atomic<int> wrong;    // selects that contradicted an earlier result
+    std::atomic<int> pauses;   // repeated attempts
 
-    // In milliseconds: the longest waits, of an operation and of one that is a statement alone, and
-    // the longest operation. What is not waiting in that is work.
+    // In milliseconds: the longest wait of an operation, of an operation that is a single statement, and
+    // the longest operation, work included.
     std::atomic<int> wait;
     std::atomic<int> statementWait;
     std::atomic<int> longest;
@@ -107,14 +107,14 @@ class Work {
     {
     }
 
-    // Makes a record, changes it, looks at it, and removes every other one.
+    // Inserts a record, changes it and reads it back. Removes every other one.
     void DoNext()
     {
         const int record = writer.records++;
         const int id = firstId + record;
         std::atomic<unsigned char>& state = writer.states.at(static_cast<std::size_t>(record));
         if (Take([&] { return Insert(db, id); })) state = Made;
-        // True also when there is nothing to change.
+        // Change() returns true even without such a record.
         if (Take([&] { return Change(id); }, &Writer::statementWait) && state == Made)
             state = Changed;
         Check(id, state);
@@ -122,7 +122,7 @@ class Work {
     }
 
   private:
-    // Measures an operation.
+    // Runs and measures an operation.
     template <class Operation>
     bool Take(Operation operation, std::atomic<int> Writer::*wait = &Writer::wait)
     {
@@ -144,7 +144,7 @@ class Work {
         longest = std::max<int>(longest, static_cast<int>(count));
     }
 
-    // Without a schema no table is looked for.
+    // Without a schema there is no table lookup.
     bool Change(int id)
     {
         UpdateCommand update;
@@ -165,7 +165,7 @@ class Work {
         std::vector<SqliteValueList> rows;
         if (!Take([&] { return db.SelectRecords(select, rows); })) return;
         int state = Absent;
-        // A try that failed in the middle leaves its rows, too.
+        // An attempt that failed halfway may have left its rows in front.
         if (!rows.empty() && !rows.back().GetValue("state", state)) state = -1;
         if (state != expected) ++writer.wrong;
     }
@@ -181,18 +181,17 @@ class ContentionTest : public ProcessTest {
 
     std::string Path() const { return disk.File("jobs.db"); }
 
-    // Lets processes work at once for a time, and checks that what they were answered is so.
+    // Lets many processes work for a time, and checks that the file holds what they were told.
     void Run(int retryLimit, std::chrono::seconds time, const std::function<void()>& onStart);
 
-    // The same while a process keeps all others out now and then.
+    // The same while another process locks the file now and then.
     void RunBesideHolder(int retryLimit, std::chrono::seconds time, std::chrono::seconds held);
 
-    // A process that tells when it has locked everybody out of the database. When it is told to, it
-    // lets them in after a while, and out again now and then for a time.
+    // A process that locks the database and tells so. After Tell() it unlocks and locks it by turns.
     ChildProcess StartHolder(std::chrono::seconds time, std::chrono::seconds held);
 
-    // What is in the file is what was answered, record by record.
-    void ExpectWhatWasAnswered() const;
+    // The file holds exactly the records that the writers were told it does.
+    void ExpectFileMatchesResults() const;
 
     int Sum(std::atomic<int> Writer::*number) const
     {
@@ -227,7 +226,7 @@ void ContentionTest::Run(int retryLimit, std::chrono::seconds time,
     onStart();
     EXPECT_TRUE(crowd.Join());
 
-    ExpectWhatWasAnswered();
+    ExpectFileMatchesResults();
     EXPECT_LE(Most(&Writer::statementWait), LongestWait(1, retryLimit).count());
     EXPECT_LE(Most(&Writer::wait), LongestWait(MostStatements, retryLimit).count());
     EXPECT_GT(Sum(&Writer::done), 0);
@@ -272,7 +271,7 @@ ChildProcess ContentionTest::StartHolder(std::chrono::seconds time, std::chrono:
     });
 }
 
-void ContentionTest::ExpectWhatWasAnswered() const
+void ContentionTest::ExpectFileMatchesResults() const
 {
     EXPECT_EQ(Sum(&Writer::wrong), 0);
     SqliteDB db(Path(), 0);
@@ -299,40 +298,39 @@ void ContentionTest::ExpectWhatWasAnswered() const
     }
 }
 
-TEST_F(ContentionTest, WhatIsAnsweredHappensAndNothingElse)
+TEST_F(ContentionTest, TheFileHoldsExactlyWhatSucceeded)
 {
     Run(UsualLimit, std::chrono::seconds(Scaled(3, 60)), [] {});
     EXPECT_EQ(Sum(&Writer::failed), 0);
 }
 
-TEST_F(ContentionTest, AProcessThatHoldsTheLockForLongIsWaitedFor)
+TEST_F(ContentionTest, WritersWaitForAProcessThatHoldsTheLockForLong)
 {
-    RunBesideHolder(UsualLimit, std::chrono::seconds(Scaled(4, 60)), HeldForATry);
+    RunBesideHolder(UsualLimit, std::chrono::seconds(Scaled(4, 60)), HeldForAnAttempt);
     EXPECT_EQ(Sum(&Writer::failed), 0);
     EXPECT_GT(Sum(&Writer::pauses), 0);
 }
 
-TEST_F(ContentionTest, WhatIsGivenUpDoesNotHappen)
+TEST_F(ContentionTest, FailedOperationsChangeNothing)
 {
     RunBesideHolder(0, std::chrono::seconds(Scaled(6, 60)), HeldForAnOperation);
     EXPECT_EQ(Sum(&Writer::pauses), 0);
     EXPECT_GT(Sum(&Writer::failed), 0);
 }
 
-// ----------------------------------------------------------------------------- everybody is served
+// ---------------------------------------------------------------------------------- no starvation
 
-// What a process of a queue has got.
 struct Participant {
     std::atomic<int> served;
     std::atomic<int> failed;
     std::atomic<int> wait;  // the longest, in milliseconds
 };
 
-// Writers that insert row by row into one file, as fast as they can, and readers between them.
+// Writers that insert row by row into one file as fast as they can, and readers among them.
 struct Queue {
     int writers;
     int readers;
-    int rowsPerWriter;  // so many that chance leaves nobody a twentieth of its share
+    int rowsPerWriter;  // enough that nobody gets less than a twentieth of its share by chance
     int longestWaitSeconds;
 };
 
@@ -349,7 +347,7 @@ class QueueTest : public ProcessTest,
 
     static int Goal(const Queue& queue) { return queue.writers * queue.rowsPerWriter; }
 
-    // What the processes share.
+    // Shared by the processes.
     struct Board {
         std::array<Participant, MaxParticipants> participants;
         std::atomic<int> ready;
@@ -397,7 +395,7 @@ void QueueTest::TakePart(const Queue& queue, int number) const
     }
 }
 
-TEST_P(QueueTest, EveryWriterIsServedAndNothingIsGivenUp)
+TEST_P(QueueTest, EveryWriterIsServedAndNoOperationFails)
 {
     const auto& [journal, queue] = GetParam();
     {

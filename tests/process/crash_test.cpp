@@ -1,6 +1,6 @@
-// Processes that are killed before each of their system calls in turn, at work on a database, a
-// file, a cache or a lock. What they have answered holds, what they have begun is done whole or not
-// at all, and whoever comes next finds nothing in the way.
+// A process works on a database, a file, a cache or a lock, and is killed before each of its system calls
+// in turn. What it reported as done is done, what it had begun is done completely or not at all, and the
+// next process is not held up.
 #include <gmock/gmock.h>
 #include <sys/file.h>
 
@@ -47,8 +47,8 @@ constexpr int Later = 3;
 
 class CrashTest : public ProcessTest {
   protected:
-    // What the process has done so far, as it said itself.
-    SharedMemory<std::atomic<int>> answered;
+    // What the process has reported as done.
+    SharedMemory<std::atomic<int>> done;
 };
 
 // ------------------------------------------------------------------------------------ databases
@@ -59,7 +59,7 @@ const SqliteTableHandler& Notes()
     return table;
 }
 
-// So long that some records fill a page of the file.
+// Long enough for a few records to fill a page of the file.
 std::string TextOf(int id)
 {
     return std::to_string(id) + std::string(200, static_cast<char>('a' + id % 26));
@@ -102,13 +102,13 @@ void ExpectIntact(SqliteDB& db)
     EXPECT_EQ(verdict.ToStr(), "integrity_check:'ok'");
 }
 
-// In both of SQLite's ways to keep what is not complete: the rollback journal, which the library
-// leaves as it is, and the write-ahead log, which a file may have been set to.
+// In both of SQLite's modes: the rollback journal, which is the default, and the write-ahead log, to which
+// a file may have been set.
 class DbCrashTest : public CrashTest, public ::testing::WithParamInterface<const char*> {
   protected:
     using Contents = std::map<int, std::string>;  // texts by id
 
-    // A single try waits a second at most, and for the dead nobody has to wait longer.
+    // One attempt waits at most a second. No longer wait may be needed because of a dead process.
     static constexpr unsigned int SingleTry = 0;
     static constexpr int NextId = 1000;
 
@@ -125,12 +125,12 @@ class DbCrashTest : public CrashTest, public ::testing::WithParamInterface<const
 
     void Restore()
     {
-        *answered = 0;
+        *done = 0;
         std::filesystem::copy_file(dir.File("before"), Path(),
                                    std::filesystem::copy_options::overwrite_existing);
     }
 
-    // What a new process finds. The file is whole.
+    // The content as a new process finds it. The file must be intact.
     Contents Find() const
     {
         SqliteDB db(Path(), SingleTry);
@@ -157,7 +157,7 @@ class DbCrashTest : public CrashTest, public ::testing::WithParamInterface<const
         return contents;
     }
 
-    // The next writer has its way at once, and no file of SQLite's outlasts it.
+    // The next writer succeeds at once and leaves none of SQLite's extra files behind.
     void ExpectNextWriter()
     {
         {
@@ -172,25 +172,25 @@ class DbCrashTest : public CrashTest, public ::testing::WithParamInterface<const
 INSTANTIATE_TEST_SUITE_P(Journals, DbCrashTest, ::testing::Values("DELETE", "WAL"),
                          [](const auto& parameter) { return std::string(parameter.param); });
 
-TEST_P(DbCrashTest, WhatWasInsertedIsThere)
+TEST_P(DbCrashTest, InsertedRecordsAreThere)
 {
     constexpr int Last = 6;
     const auto insertAll = [this] {
         SqliteDB db(Path(), SingleTry);
         for (int id = 4; id <= Last; ++id) {
-            if (Insert(db, id)) *answered = id;
+            if (Insert(db, id)) *done = id;
         }
     };
     KillEverywhere({[this] { Restore(); }, insertAll,
                     [this] {
-                        const int last = std::max<int>(*answered, 3);
+                        const int last = std::max<int>(*done, 3);
                         EXPECT_THAT(Find(), AnyOf(Records(1, last), Records(1, last + 1)));
                         ExpectNextWriter();
                     }});
-    EXPECT_EQ(*answered, Last);
+    EXPECT_EQ(*done, Last);
 }
 
-TEST_P(DbCrashTest, ManyInsertedAtOnceAreAllThereOrNone)
+TEST_P(DbCrashTest, InsertRecordsInsertsAllOrNone)
 {
     constexpr int Last = 200;
     const Contents all = Records(1, Last);
@@ -198,18 +198,18 @@ TEST_P(DbCrashTest, ManyInsertedAtOnceAreAllThereOrNone)
         std::vector<SqliteValueList> records;
         for (int id = 4; id <= Last; ++id) records.push_back(RecordOf(id));
         SqliteDB db(Path(), SingleTry);
-        if (db.InsertRecords(Notes(), records)) *answered = Last;
+        if (db.InsertRecords(Notes(), records)) *done = Last;
     };
     KillEverywhere({[this] { Restore(); }, insertAll,
                     [&] {
-                        const Contents before = *answered == Last ? all : Records(1, 3);
+                        const Contents before = *done == Last ? all : Records(1, 3);
                         EXPECT_THAT(Find(), AnyOf(before, all));
                         ExpectNextWriter();
                     }});
-    EXPECT_EQ(*answered, Last);
+    EXPECT_EQ(*done, Last);
 }
 
-TEST_P(DbCrashTest, ATransactionHappensWholeOrNotAtAll)
+TEST_P(DbCrashTest, ATransactionIsDoneCompletelyOrNotAtAll)
 {
     Contents after = Records(1, 4);
     after.erase(1);
@@ -217,20 +217,20 @@ TEST_P(DbCrashTest, ATransactionHappensWholeOrNotAtAll)
     const auto change = [this] {
         SqliteDB db(Path(), SingleTry);
         SqliteTransaction transaction(db);
-        const bool done = transaction.Begin() && Delete(db, 1) && Update(db, 2, "other") &&
-                          Insert(db, 4) && transaction.Commit();
-        if (done) *answered = 1;
+        const bool succeeded = transaction.Begin() && Delete(db, 1) && Update(db, 2, "other") &&
+                               Insert(db, 4) && transaction.Commit();
+        if (succeeded) *done = 1;
     };
     KillEverywhere({[this] { Restore(); }, change,
                     [&] {
-                        EXPECT_THAT(Find(), AnyOf(*answered == 1 ? after : Records(1, 3), after));
+                        EXPECT_THAT(Find(), AnyOf(*done == 1 ? after : Records(1, 3), after));
                         ExpectNextWriter();
                     }});
-    EXPECT_EQ(*answered, 1);
+    EXPECT_EQ(*done, 1);
 }
 
-// Here it is the file itself that is made, and then the table.
-TEST_F(CrashTest, ADatabaseThatWasBeingMadeIsMadeByTheNext)
+// The killed process creates the file, then the table.
+TEST_F(CrashTest, TheNextProcessFinishesTheCreationOfADatabase)
 {
     const std::string path = dir.File("new.db");
     const auto insert = [&](int id) {
@@ -238,7 +238,7 @@ TEST_F(CrashTest, ADatabaseThatWasBeingMadeIsMadeByTheNext)
         return Insert(db, id);
     };
     const auto removeAll = [&] {
-        *answered = 0;
+        *done = 0;
         for (const std::string& name : Files()) std::filesystem::remove(dir.File(name));
     };
     const auto inspect = [&] {
@@ -250,36 +250,36 @@ TEST_F(CrashTest, ADatabaseThatWasBeingMadeIsMadeByTheNext)
         EXPECT_TRUE(db.SelectByCommand("SELECT count(*) AS rows FROM notes", row));
         int rows = 0;
         EXPECT_TRUE(row.GetValue("rows", rows));
-        EXPECT_THAT(rows, AnyOf(*answered == 1 ? 2 : 1, 2));
+        EXPECT_THAT(rows, AnyOf(*done == 1 ? 2 : 1, 2));
         EXPECT_THAT(Files(), ElementsAre("new.db"));
     };
-    KillEverywhere({removeAll, [&] { *answered = insert(1) ? 1 : 0; }, inspect});
-    EXPECT_EQ(*answered, 1);
+    KillEverywhere({removeAll, [&] { *done = insert(1) ? 1 : 0; }, inspect});
+    EXPECT_EQ(*done, 1);
 }
 
 // ---------------------------------------------------------------------------------------- files
 
-// Somebody replaces an old document by a new one; the next makes it a later one and leaves nothing
-// else behind.
+// The killed process replaces an old document with a new one. The next process replaces it with a later
+// one and leaves no other file behind.
 class FileCrashTest : public CrashTest {
   protected:
     void KillWriters(const std::function<bool(int)>& write, const std::function<int()>& number)
     {
         const auto prepare = [&] {
-            *answered = Old;
+            *done = Old;
             EXPECT_TRUE(write(Old));
         };
         const auto replace = [&] {
-            if (write(New)) *answered = New;
+            if (write(New)) *done = New;
         };
         const auto inspect = [&] {
-            EXPECT_THAT(number(), AnyOf(answered->load(), New));
+            EXPECT_THAT(number(), AnyOf(done->load(), New));
             EXPECT_TRUE(write(Later));
             EXPECT_EQ(number(), Later);
             EXPECT_EQ(Files().size(), 1U);
         };
         KillEverywhere({prepare, replace, inspect});
-        EXPECT_EQ(*answered, New);
+        EXPECT_EQ(*done, New);
     }
 };
 
@@ -304,24 +304,24 @@ TEST_F(FileCrashTest, ACacheHoldsTheOldDocumentOrTheNewOne)
 
 // ---------------------------------------------------------------------------------------- locks
 
-// The lock's directory is made by a program, which is killed in its turn.
-TEST_F(CrashTest, ALockIsFreeWhereverItsHolderIsKilled)
+// A program creates the lock directory. It is killed, too.
+TEST_F(CrashTest, ALockIsFreeWhereverItsHolderWasKilled)
 {
     if (!HasLocks()) return;
     const auto lockTwice = [this] {
         FileLock lock(LockName());
         if (!lock.lock(LOCK_EX, 0)) return;
-        ++*answered;
+        ++*done;
         lock.unlock();
-        if (lock.lock(LOCK_SH, 0)) ++*answered;
+        if (lock.lock(LOCK_SH, 0)) ++*done;
     };
     KillEverywhere({[this] {
-                        *answered = 0;
+                        *done = 0;
                         RemoveLocks();
                     },
                     lockTwice,
                     [this] { EXPECT_TRUE(FileLock(LockName()).lock(LOCK_EX | LOCK_NB, 0)); }});
-    EXPECT_EQ(*answered, 2);
+    EXPECT_EQ(*done, 2);
 }
 
 }  // namespace

@@ -1,5 +1,5 @@
-// Readers of files that meet pipes, slow writers and contents that nobody meant to write. Each
-// reads in a process of its own, which has to end as it should.
+// Reading pipes, slow writers and unintended contents. All reading happens in a child process, which must
+// end normally.
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
@@ -26,26 +26,26 @@ using OrvaDRCore::File;
 constexpr std::size_t TenMegabytes = 10'000'000;
 constexpr std::size_t ManyBrackets = 100'000;
 
-// What the readers say of a content.
+// What the five ways to read return for a content.
 constexpr int Readers = 5;
-struct Answers {
+struct Results {
     bool document;        // File::Read of a path
     bool streamDocument;  // File::Read of a descriptor
-    int texts;            // of pairs
+    int texts;            // File::Read of key=value pairs, by type
     int integers;
     int numbers;
 };
 
-bool operator==(const Answers& a, const Answers& b)
+bool operator==(const Results& a, const Results& b)
 {
     return a.document == b.document && a.streamDocument == b.streamDocument && a.texts == b.texts &&
            a.integers == b.integers && a.numbers == b.numbers;
 }
 
-std::ostream& operator<<(std::ostream& out, const Answers& answers)
+std::ostream& operator<<(std::ostream& out, const Results& results)
 {
-    return out << answers.document << " " << answers.streamDocument << " " << answers.texts << " "
-               << answers.integers << " " << answers.numbers;
+    return out << results.document << " " << results.streamDocument << " " << results.texts << " "
+               << results.integers << " " << results.numbers;
 }
 
 template <class V>
@@ -57,27 +57,27 @@ int CountPairs(const std::string& path)
 
 class FileProcessTest : public ProcessTest {
   protected:
-    // Lets all readers read the same content. `path` says where the next one finds it.
-    void ExpectAnswers(const std::function<std::string()>& path, const Answers& expected)
+    // Reads the same content in all five ways. `path` returns where the next one finds it.
+    void ExpectResults(const std::function<std::string()>& path, const Results& expected)
     {
-        const SharedMemory<Answers> answers;
+        const SharedMemory<Results> results;
         ChildProcess reader([&](ChildProcess::Link& /*link*/) {
             Json::Value value;
-            answers->document = File::Read(path(), value);
-            answers->streamDocument = File::Read(::open(path().c_str(), O_RDONLY), value);
-            answers->texts = CountPairs<std::string>(path());
-            answers->integers = CountPairs<int>(path());
-            answers->numbers = CountPairs<double>(path());
+            results->document = File::Read(path(), value);
+            results->streamDocument = File::Read(::open(path().c_str(), O_RDONLY), value);
+            results->texts = CountPairs<std::string>(path());
+            results->integers = CountPairs<int>(path());
+            results->numbers = CountPairs<double>(path());
         });
         EXPECT_EQ(reader.Join(), 0);
-        EXPECT_EQ(*answers, expected);
+        EXPECT_EQ(*results, expected);
     }
 };
 
 struct Case {
     const char* name;
     std::string content;
-    Answers answers;
+    Results results;
 };
 
 std::vector<Case> Cases()
@@ -89,11 +89,11 @@ std::vector<Case> Cases()
     return {
         {"nothing", "", {false, false, 0, 0, 0}},
         {"a NUL byte", nul, {false, false, 0, 0, 0}},
-        {"a NUL byte behind a document", R"({"a":1})" + nul, {false, true, 0, 0, 0}},
+        {"a NUL byte after a document", R"({"a":1})" + nul, {false, true, 0, 0, 0}},
         {"a NUL byte in a string", "\"a" + nul + "b\"", {false, false, 0, 0, 0}},
         {"NUL bytes in a pair", "a" + nul + "=1" + nul + "\n", {false, false, 1, 1, 1}},
         {"CRLF", "{\r\n\"a\":\r\n1}\r\n", {true, true, 0, 0, 0}},
-        {"CRLF behind pairs", "a=1\r\nb=2\r\n\r\n", {false, false, 2, 2, 2}},
+        {"CRLF after pairs", "a=1\r\nb=2\r\n\r\n", {false, false, 2, 2, 2}},
         {"a long string", quoted, {true, true, 0, 0, 0}},
         {"a long value", "a=" + quoted, {false, false, 1, 1, 1}},
         {"a long key", quoted + "=1", {false, false, 1, 1, 1}},
@@ -104,19 +104,19 @@ std::vector<Case> Cases()
     };
 }
 
-TEST_F(FileProcessTest, ReadersAnswerWhateverAFileHolds)
+TEST_F(FileProcessTest, ReadersCopeWithAnyContentOfAFile)
 {
     const std::string path = dir.File("file");
     for (const Case& row : Cases()) {
         SCOPED_TRACE(row.name);
         std::ofstream(path, std::ios::trunc) << row.content;
-        ExpectAnswers([&]() -> const std::string& { return path; }, row.answers);
+        ExpectResults([&]() -> const std::string& { return path; }, row.results);
     }
 }
 
-TEST_F(FileProcessTest, ReadersAnswerWhateverComesThroughAPipe)
+TEST_F(FileProcessTest, ReadersCopeWithAnyContentOfAPipe)
 {
-    // One for each reader: who reads a pipe to its end must not meet the writer of the next.
+    // One pipe for each reader. In a single pipe a reader could meet the writer for the next one.
     std::vector<std::string> pipes;
     for (int i = 0; i < Readers; ++i) {
         pipes.push_back(dir.File("pipe" + std::to_string(i)));
@@ -128,7 +128,7 @@ TEST_F(FileProcessTest, ReadersAnswerWhateverComesThroughAPipe)
             for (const std::string& pipe : pipes) std::ofstream(pipe) << row.content;
         });
         auto next = pipes.begin();
-        ExpectAnswers([&] { return *next++; }, row.answers);
+        ExpectResults([&] { return *next++; }, row.results);
         EXPECT_EQ(writer.Join(), 0);
     }
 }

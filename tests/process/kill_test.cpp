@@ -1,4 +1,4 @@
-// An updater that is killed, wherever it stands, leaves a cache that the next reader can use.
+// An updater may be killed at any point: the next reader can use the cache.
 #include <gmock/gmock.h>
 #include <signal.h>
 #include <sys/file.h>
@@ -50,15 +50,15 @@ class KillTest : public ProcessTest {
   protected:
     using Action = std::function<void()>;
 
-    // Lets `inspect` see what is left of a refresh that was killed, for one refresh after the
-    // other, each killed at another of the beginnings and ends of its system calls.
+    // Kills one refresh after the other, each at another start or end of a system call, and calls
+    // `inspect` after each.
     void KillRefreshes(const Action& prepare, const Action& inspect);
 
-    // The cache file holds the old document (or none) or the new one, and the next reader makes it
-    // a later one, waits for nobody and leaves nothing else behind.
+    // The cache file holds the old document (or none) or the new one. The next reader replaces it with a
+    // later one without waiting, and leaves no other file behind.
     void ExpectRecovery(int old);
 
-    // A process that never ends to produce; it tells when it has begun to.
+    // A process that starts to produce data, tells so, and never finishes.
     ChildProcess StartEndlessUpdater()
     {
         return ChildProcess([this](ChildProcess::Link& link) {
@@ -98,7 +98,7 @@ void KillTest::KillRefreshes(const Action& prepare, const Action& inspect)
         TracedProcess updater([this] { Refresh(); });
         for (int stop = 0; stop < last; ++stop) updater.Step();
         updater.Kill();
-        ReapAll();  // a program that it had started
+        ReapAll();  // a program that the updater had started
         inspect();
     }
     ReportCount("kills", kills);
@@ -133,26 +133,26 @@ TEST_F(KillTest, AFirstRefreshKilledAnywhereLeavesNoDocumentOrTheNewOne)
     KillRefreshes(removeAll, [this] { ExpectRecovery(NoDocument); });
 }
 
-// The caller, the child that refreshes and the one between them, each in its turn.
-TEST_F(KillTest, ABackgroundRefreshOfWhichAnyProcessIsKilledIsFollowedByAnother)
+// Kills the caller, the intermediate process and the child that refreshes.
+TEST_F(KillTest, TheNextReaderRefreshesAfterAnyProcessOfABackgroundRefreshIsKilled)
 {
     if (!HasLocks()) return;
     const auto read = [this] {
-        // The old data, or the new where the child is quicker than its parent.
+        // The new data if the child is faster than its parent.
         const int number = NumberOf(MakeCache(Mode::Background, Gives(New)).Read());
         if (number != Old && number != New) throw std::runtime_error("no document");
     };
     KillEverywhere({[this] { WriteStale(Old); }, read, [this] { ExpectRecovery(Old); }});
 }
 
-TEST_F(KillTest, WhatKilledRefreshesLeaveBehindDoesNotPileUp)
+TEST_F(KillTest, LeftoversOfKilledRefreshesDoNotPileUp)
 {
     if (!HasLocks()) return;
     const auto makeStale = [this] {
         if (NumberInFile() == NoDocument) WriteStale(Old);
         MakeStale();
     };
-    // At most one temporary file of the cache file, and one of the pid file.
+    // At most one temporary file for the cache file and one for the pid file.
     const std::string temporary = R"(\.orvadr-tmp[0-9a-f]{8}\.[0-9]+\.[0-9]+\.0)";
     KillRefreshes(makeStale, [&] {
         EXPECT_THAT(Files(), IsSubsetOf<Matcher<std::string>>(
@@ -162,12 +162,12 @@ TEST_F(KillTest, WhatKilledRefreshesLeaveBehindDoesNotPileUp)
     ExpectRecovery(Old);
 }
 
-TEST_F(KillTest, WhatAKilledWriterLeftBesideAnotherIsRemovedByALaterOne)
+TEST_F(KillTest, ALaterWriterRemovesTheTemporaryFileOfAKilledOne)
 {
     const auto write = [this] {
         MakeCache(Mode::Background, nullptr).UpdateWithData(DocumentOf(New));
     };
-    // Temporary files that something is written to.
+    // Temporary files that are not empty.
     const auto countWritten = [this] {
         const std::set<std::string> files = Files();
         return std::count_if(files.begin(), files.end(), [this](const std::string& name) {
@@ -190,7 +190,7 @@ TEST_F(KillTest, WhatAKilledWriterLeftBesideAnotherIsRemovedByALaterOne)
     EXPECT_THAT(Files(), ElementsAre("x.cached"));
 }
 
-TEST_F(KillTest, WritersThatAreKilledAtAnyMomentPublishWholeDocumentsOnly)
+TEST_F(KillTest, WritersKilledAtAnyMomentLeaveOnlyWholeDocuments)
 {
     constexpr int Writers = 4;
     const int kills = Scaled(100, 2000);
@@ -219,7 +219,7 @@ TEST_F(KillTest, WritersThatAreKilledAtAnyMomentPublishWholeDocumentsOnly)
     ReportCount("kills", kills);
 }
 
-TEST_F(KillTest, AnUpdaterThatNobodyWaitedForCountsAsDead)
+TEST_F(KillTest, AnUpdaterThatIsAZombieCountsAsDead)
 {
     if (!HasLocks()) return;
     WriteStale(Old);
@@ -231,7 +231,7 @@ TEST_F(KillTest, AnUpdaterThatNobodyWaitedForCountsAsDead)
     ExpectRecovery(Old);
 }
 
-TEST_F(KillTest, AnUpdaterWhoseIdBelongsToALaterProcessCountsAsDead)
+TEST_F(KillTest, AnUpdaterWhoseProcessIdWasReusedCountsAsDead)
 {
     if (!HasLocks()) return;
     WriteStale(Old);
@@ -249,7 +249,7 @@ TEST_F(KillTest, AnUpdaterWhoseIdBelongsToALaterProcessCountsAsDead)
     ExpectRecovery(Old);
 }
 
-TEST_F(KillTest, AKilledBackgroundUpdaterIsFollowedByAnother)
+TEST_F(KillTest, TheNextReaderRefreshesAfterABackgroundUpdaterWasKilled)
 {
     if (!HasLocks()) return;
     WriteStale(Old);
@@ -265,7 +265,7 @@ TEST_F(KillTest, AKilledBackgroundUpdaterIsFollowedByAnother)
     ::kill(updater, SIGKILL);
     AwaitZombie(updater);
 
-    // The old data, or the new where the child is quicker than its parent.
+    // The new data if the child is faster than its parent.
     EXPECT_THAT(NumberOf(MakeCache(Mode::Background, Gives(New)).Read()), AnyOf(Old, New));
     ReapAll();
     EXPECT_EQ(NumberInFile(), New);

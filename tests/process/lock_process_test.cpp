@@ -1,4 +1,4 @@
-// Locks between processes.
+// FileLock between processes.
 #include <gtest/gtest.h>
 #include <signal.h>
 #include <sys/file.h>
@@ -43,7 +43,7 @@ class FileLockProcessTest : public ProcessTest {
         return FileLock(Name()).tryLock(operation | LOCK_NB);
     }
 
-    // A process that takes the lock and tells, and holds it until it is told or killed.
+    // A process that takes the lock and holds it until Tell() or until it is killed.
     ChildProcess StartHolder(
         int operation, const std::function<void()>& whileHolding = [] {})
     {
@@ -56,7 +56,7 @@ class FileLockProcessTest : public ProcessTest {
         });
     }
 
-    // All that starts a program in this library.
+    // All operations of the library that start a program.
     using Starter = std::pair<const char*, std::function<void()>>;
     std::vector<Starter> Starters() const
     {
@@ -66,7 +66,7 @@ class FileLockProcessTest : public ProcessTest {
     }
 };
 
-// Adds 1 to the number in a file, as nobody could who is not alone.
+// Adds 1 to the number in a file. Two processes at once would lose an increment.
 void Increment(const std::string& path)
 {
     int number = 0;
@@ -96,7 +96,7 @@ TEST_F(FileLockProcessTest, ProcessesThatIncrementUnderALockLoseNothing)
     ReportCount("increments", sum);
 }
 
-TEST_F(FileLockProcessTest, TheFlockProgramMeetsOurLock)
+TEST_F(FileLockProcessTest, TheFlockProgramRespectsOurLock)
 {
     if (!HasLocks()) return;
     const auto runFlock = [this] {
@@ -114,7 +114,7 @@ TEST_F(FileLockProcessTest, TheFlockProgramMeetsOurLock)
     EXPECT_EQ(runFlock(), 0);
 }
 
-TEST_F(FileLockProcessTest, WeMeetTheLockOfTheFlockProgram)
+TEST_F(FileLockProcessTest, OurLockRespectsTheFlockProgram)
 {
     if (!HasLocks()) return;
     ASSERT_TRUE(FileLock(Name()).openLockedFile());
@@ -134,7 +134,7 @@ TEST_F(FileLockProcessTest, WeMeetTheLockOfTheFlockProgram)
     EXPECT_TRUE(IsFree());
 }
 
-TEST_F(FileLockProcessTest, SharedLocksKeepOutAnExclusiveOneAlone)
+TEST_F(FileLockProcessTest, SharedLocksExcludeOnlyAnExclusiveOne)
 {
     if (!HasLocks()) return;
     ChildProcess one = StartHolder(LOCK_SH);
@@ -162,7 +162,7 @@ TEST_F(FileLockProcessTest, TheLockOfAKilledProcessIsFree)
     EXPECT_TRUE(IsFree());
 }
 
-TEST_F(FileLockProcessTest, WhoWaitsForALockGetsItWhenItsHolderIsKilled)
+TEST_F(FileLockProcessTest, AWaitingProcessGetsTheLockWhenItsHolderIsKilled)
 {
     if (!HasLocks()) return;
     ChildProcess holder = StartHolder(LOCK_EX);
@@ -180,7 +180,7 @@ TEST_F(FileLockProcessTest, WhoWaitsForALockGetsItWhenItsHolderIsKilled)
     EXPECT_EQ(waiter.Join(), 0);
 }
 
-TEST_F(FileLockProcessTest, AForkedChildHoldsTheLockOn)
+TEST_F(FileLockProcessTest, AForkedChildKeepsTheLock)
 {
     if (!HasLocks()) return;
     auto lock = std::make_unique<FileLock>(Name());
@@ -193,7 +193,7 @@ TEST_F(FileLockProcessTest, AForkedChildHoldsTheLockOn)
     EXPECT_TRUE(IsFree());
 }
 
-TEST_F(FileLockProcessTest, AStartedProgramDoesNotHoldTheLockOfAKilledProcess)
+TEST_F(FileLockProcessTest, AStartedProgramDoesNotKeepTheLockOfAKilledProcess)
 {
     if (!HasLocks()) return;
     ASSERT_TRUE(FileLock(Name()).openLockedFile());
@@ -208,17 +208,17 @@ TEST_F(FileLockProcessTest, AStartedProgramDoesNotHoldTheLockOfAKilledProcess)
         ASSERT_GT(program, 0);
         EXPECT_FALSE(IsFree());
         holder.Kill();
-        EXPECT_EQ(::kill(program, 0), 0) << "the program has ended too early";
+        EXPECT_EQ(::kill(program, 0), 0) << "the program ended too early";
         EXPECT_TRUE(IsFree());
         TracedProcess::Release(program);
         ReapAll();
     }
-    // The programs did what they were started for.
+    // The programs have done their work.
     EXPECT_TRUE(std::filesystem::is_directory(dir.File("made")));
     EXPECT_FALSE(std::filesystem::exists(dir.File("full")));
 }
 
-TEST_F(FileLockProcessTest, ALockHeldAcrossStartedProgramsIsFreeAfterItsHolder)
+TEST_F(FileLockProcessTest, ALockHeldWhileProgramsWereStartedIsFreeAfterItsHolder)
 {
     if (!HasLocks()) return;
     for (const auto& [name, start] : Starters()) {

@@ -34,7 +34,7 @@ constexpr int New = 2;
 
 class OldKernelTest : public ProcessTest {
   protected:
-    // Runs checks on each of the old kernels.
+    // Runs checks on each of the pretended kernels.
     static void OnEach(const std::function<void()>& checks)
     {
         for (const OldKernel& kernel : OldKernels) {
@@ -50,10 +50,10 @@ class OldKernelTest : public ProcessTest {
     }
 };
 
-TEST_F(OldKernelTest, ProgramsAreStarted)
+TEST_F(OldKernelTest, StartsPrograms)
 {
     OnEach([this] {
-        // As a child of the caller, and with a companion.
+        // As a child of the caller, and through a companion process.
         for (void (*handler)(int) : {SIG_DFL, SIG_IGN}) {
             ASSERT_NE(::signal(SIGCHLD, handler), SIG_ERR);
             EXPECT_EQ(GenerateUUID().size(), 36U);
@@ -65,12 +65,12 @@ TEST_F(OldKernelTest, ProgramsAreStarted)
     });
 }
 
-TEST_F(OldKernelTest, CachesAreRefreshed)
+TEST_F(OldKernelTest, RefreshesCaches)
 {
     if (!HasLocks()) return;
     OnEach([this] {
         WriteStale(Old);
-        // The child may be quicker than its caller.
+        // The new data if the child is faster than its parent.
         EXPECT_THAT(NumberOf(MakeCache(Mode::Background, Gives(New)).Read()), AnyOf(Old, New));
         EXPECT_TRUE(AwaitUntil([this] { return NumberInFile() == New; }));
         ReapAll();
@@ -79,7 +79,7 @@ TEST_F(OldKernelTest, CachesAreRefreshed)
     });
 }
 
-TEST_F(OldKernelTest, LocksAreTaken)
+TEST_F(OldKernelTest, TakesLocks)
 {
     if (!HasLocks()) return;
     OnEach([this] {
@@ -89,7 +89,7 @@ TEST_F(OldKernelTest, LocksAreTaken)
     });
 }
 
-TEST_F(OldKernelTest, RecordsAreInserted)
+TEST_F(OldKernelTest, InsertsRecords)
 {
     OnEach([this] {
         SqliteDB db(dir.File("nodes.db"), 0);

@@ -1,5 +1,5 @@
-// Files that are replaced while the power goes. The disk is rebuilt in each of the states in which
-// it can be found afterwards: support/processes/power_cut.h.
+// Power cuts while a file is replaced. The directory is rebuilt in each state that the disk can be in
+// afterwards: support/processes/power_cut.h.
 #include <gmock/gmock.h>
 #include <sys/stat.h>
 
@@ -26,14 +26,14 @@ using ::testing::ElementsAre;
 using ::testing::Key;
 using ::testing::Not;
 
-// Their documents take two blocks, three and one.
+// These documents take two blocks, three and one.
 constexpr int Old = 50;
 constexpr int New = 100;
 constexpr int Later = 3;
 
 void Require(bool succeeded)
 {
-    if (!succeeded) throw std::runtime_error("it has failed");
+    if (!succeeded) throw std::runtime_error("an operation failed");
 }
 
 bool IsSync(const Change& change)
@@ -55,15 +55,14 @@ class PowerCutTest : public ProcessTest {
         std::filesystem::permissions(Path(), static_cast<std::filesystem::perms>(OwnMode));
     }
 
-    // An old document is replaced by a new one.
+    // Records how an old document is replaced with a new one.
     Record RecordReplacement() const
     {
         WriteOld();
         return RecordChanges(dir.Path(), [this] { Write(New); });
     }
 
-    // Of the states after a cut those that hold neither the old document nor the new one, each with
-    // the permission bits.
+    // The states after a cut that hold neither the old nor the new document with its permission bits.
     static std::vector<Directory> Broken(const Record& record)
     {
         const Directory before{{"document", Stored(Old)}};
@@ -83,7 +82,7 @@ class PowerCutTest : public ProcessTest {
         return {OrvaDRCore::toString(DocumentOf(number)), OwnMode};
     }
 
-    // Rebuilds the directory in each state and lets `check` look at it.
+    // Rebuilds the directory in each state and calls `check`.
     void ForEachState(const Directory& before, const Record& record,
                       const std::function<void()>& check)
     {
@@ -117,7 +116,7 @@ TEST_F(PowerCutTest, AReplacedFileIsTheOldOrTheNewOne)
     });
 }
 
-TEST_F(PowerCutTest, ANewFileIsThereWholeOrNotAtAll)
+TEST_F(PowerCutTest, ANewFileIsCompleteOrMissing)
 {
     const Record record = RecordChanges(dir.Path(), [this] { Write(New); });
     const std::string text = OrvaDRCore::toString(DocumentOf(New));
@@ -136,7 +135,7 @@ TEST_F(PowerCutTest, ANewFileIsThereWholeOrNotAtAll)
     EXPECT_GT(with, 0);
 }
 
-TEST_F(PowerCutTest, ARefreshOfACacheIsFollowedByAnother)
+TEST_F(PowerCutTest, ACacheIsUsableAndCanBeRefreshed)
 {
     if (!HasLocks()) return;
     WriteStale(Old);
@@ -153,9 +152,9 @@ TEST_F(PowerCutTest, ARefreshOfACacheIsFollowedByAnother)
     });
 }
 
-// --------------------------------------------------------------- what would break would be found
+// ------------------------------------------------- the model finds what would break
 
-TEST_F(PowerCutTest, WithoutASyncAnythingIsFound)
+TEST_F(PowerCutTest, WithoutASyncTheFileCanBeDamaged)
 {
     Record record = RecordReplacement();
     ASSERT_EQ(std::count_if(record.begin(), record.end(), IsSync), 1);
@@ -173,7 +172,7 @@ TEST_F(PowerCutTest, WithoutASyncAnythingIsFound)
     EXPECT_THAT(found, Contains(StoredFile{text, 0600}));
 }
 
-TEST_F(PowerCutTest, ASyncBehindTheRenameIsTooLate)
+TEST_F(PowerCutTest, ASyncAfterTheRenameIsTooLate)
 {
     Record record = RecordReplacement();
     const auto sync = std::find_if(record.begin(), record.end(), IsSync);
@@ -183,14 +182,14 @@ TEST_F(PowerCutTest, ASyncBehindTheRenameIsTooLate)
     EXPECT_THAT(Broken(record), Not(ElementsAre()));
 }
 
-TEST_F(PowerCutTest, ARemovalBeforeTheRenameCanBeAllThatHappens)
+TEST_F(PowerCutTest, AfterARemovalBeforeTheRenameTheFileCanBeMissing)
 {
     Record record = RecordReplacement();
     record.insert(record.end() - 1, Change{Kind::Remove, 0, "document"});
     EXPECT_THAT(Broken(record), Contains(Not(Contains(Key("document")))));
 }
 
-TEST_F(PowerCutTest, AFileThatIsWrittenInPlaceBreaks)
+TEST_F(PowerCutTest, AFileWrittenInPlaceCanBeDamaged)
 {
     WriteOld();
     const Record record =
@@ -198,8 +197,7 @@ TEST_F(PowerCutTest, AFileThatIsWrittenInPlaceBreaks)
     EXPECT_THAT(Broken(record), Contains(Directory{{"document", {"", OwnMode}}}));
 }
 
-// The directory's own sync is what makes a rename certain.
-TEST_F(PowerCutTest, WhatIsSyncedIsThere)
+TEST_F(PowerCutTest, ARenameIsCertainAfterASyncOfTheDirectory)
 {
     Record record = RecordReplacement();
     EXPECT_GT(StatesAfterCut({{"document", Stored(Old)}}, record).size(), 1U);

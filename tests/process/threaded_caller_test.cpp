@@ -1,5 +1,5 @@
-// Caches in a program whose other threads go on meanwhile: they hold locks of the C and C++ libraries
-// at the moment of a fork, and they start programs, which inherit descriptors.
+// Caches in a program with other threads: these may hold locks of the C and C++ libraries at the moment of
+// a fork, and they start programs, which inherit descriptors.
 #include <gtest/gtest.h>
 #include <signal.h>
 #include <spawn.h>
@@ -40,7 +40,7 @@ using OrvaDRCore::FileLock;
 constexpr int Old = 1;
 constexpr int New = 2;
 
-// Threads that do something over and over again, each time many times and then a pause.
+// Threads that repeat some work all the time, with short pauses.
 class BusyThreads {
   public:
     BusyThreads(int count, const std::function<void()>& work)
@@ -114,7 +114,7 @@ void WriteToStdio()
 
 class ThreadedCallerTest : public ProcessTest {
   protected:
-    // Refreshes a cache in the background so many times, one after the other. Says what went wrong.
+    // Refreshes a cache in the background `times` times. Returns what went wrong; empty on success.
     std::string Refresh(int times)
     {
         const DocumentCache cache = MakeCache(Mode::Background, Gives(New));
@@ -133,7 +133,7 @@ class ThreadedCallerTest : public ProcessTest {
         return "";
     }
 
-    // The same in a process of its own with threads that do this.
+    // The same in a child with `count` threads that repeat `work`.
     void ExpectRefreshesBeside(int count, const std::function<void()>& work, int times)
     {
         ChildProcess process([&](ChildProcess::Link& /*link*/) {
@@ -155,7 +155,7 @@ class ThreadedCallerTest : public ProcessTest {
     }
 };
 
-TEST_F(ThreadedCallerTest, NoBackgroundRefreshHangsBesideThreadsThatDoOneThing)
+TEST_F(ThreadedCallerTest, BackgroundRefreshesDoNotHangBesideThreadsOfOneKind)
 {
     if (!HasLocks()) return;
     WriteStale(Old);
@@ -175,7 +175,7 @@ TEST_F(ThreadedCallerTest, NoBackgroundRefreshHangsBesideThreadsThatDoOneThing)
     }
 }
 
-TEST_F(ThreadedCallerTest, NoBackgroundRefreshHangsBesideThreadsThatDoEverything)
+TEST_F(ThreadedCallerTest, BackgroundRefreshesDoNotHangBesideThreadsThatDoEverything)
 {
     if (!HasLocks()) return;
     WriteStale(Old);
@@ -188,7 +188,7 @@ TEST_F(ThreadedCallerTest, NoBackgroundRefreshHangsBesideThreadsThatDoEverything
     ExpectRefreshesBeside(8, work, Scaled(50, 10'000));
 }
 
-// Programs that inherit whatever is open, and run until they are ended.
+// Programs that inherit all open descriptors, and run until End().
 class Sleepers {
   public:
     Sleepers() = default;
@@ -218,7 +218,7 @@ class Sleepers {
     std::vector<pid_t> pids;
 };
 
-TEST_F(ThreadedCallerTest, ProgramsThatAreStartedMeanwhileDoNotKeepTheCachesLock)
+TEST_F(ThreadedCallerTest, ProgramsStartedDuringAnUpdateDoNotKeepTheCachesLock)
 {
     constexpr int ProgramsAtOnce = 20;
     if (!HasLocks()) return;
