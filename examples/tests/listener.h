@@ -1,4 +1,4 @@
-// Ports on this machine's loopback for those who connect to them.
+// Listening ports on 127.0.0.1.
 #ifndef ORVADRCORE_TESTS_LISTENER_H
 #define ORVADRCORE_TESTS_LISTENER_H
 
@@ -11,7 +11,7 @@
 #include <cstdlib>
 #include <vector>
 
-// Takes connections on a free port.
+// Accepts connections on a free port.
 class Listener {
   public:
     explicit Listener(int backlog = SOMAXCONN)
@@ -52,7 +52,7 @@ class Listener {
     int count = 0;
 };
 
-// Has a port that neither takes nor refuses a connection: its queue is full.
+// A port that neither accepts nor refuses connections, because its queue is full.
 class SilentListener : public Listener {
   public:
     SilentListener() : Listener(0)

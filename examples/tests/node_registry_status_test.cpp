@@ -1,4 +1,4 @@
-// The example node_registry beyond single nodes: their status, and nodes in files.
+// The example node_registry: the status of all nodes, and nodes in files.
 #include <fcntl.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -69,7 +69,7 @@ class NodeFilesTest : public NodeRegistryTest {
   protected:
     NodeFilesTest() : file(dir.File("file")), fileParam(Text("file", file)) {}
 
-    // Whether lock files can be opened as root opens them. If not, asserts what others get.
+    // Whether this process may open lock files as root may. If not, checks what others get.
     bool HasLocks() const
     {
         if (::geteuid() == 0) return true;
@@ -97,7 +97,7 @@ class NodeStatusTest : public NodeFilesTest {
   protected:
     NodeStatusTest() : cacheFile(database + ".status.cached") {}
 
-    // The status that a reply holds.
+    // The status in a reply.
     static Json::Value StatusOf(const std::string& reply)
     {
         const Response response(reply);
@@ -107,14 +107,14 @@ class NodeStatusTest : public NodeFilesTest {
 
     Json::Value AskStatus() const { return StatusOf(Ask(Call("status"))); }
 
-    // The total of the status that a handler gives.
+    // The total in the status that a program returns.
     static int TotalBy(Program& handler)
     {
         handler.Send(Call("status") + "\n");
         return StatusOf(handler.ReadLine())["total"].asInt();
     }
 
-    // The total of the status in the cache; -1 when there is none.
+    // The total in the cached status; -1 without one.
     int TotalInCache() const
     {
         Json::Value document;
@@ -123,8 +123,8 @@ class NodeStatusTest : public NodeFilesTest {
                    : -1;
     }
 
-    // A handler to which each status is old.
-    std::vector<std::string> Impatient() const
+    // The command line of a program to which every status is old.
+    std::vector<std::string> WithoutTimeout() const
     {
         return {NODE_REGISTRY_PROGRAM, "--db", database, "--status-timeout", "0"};
     }
@@ -134,7 +134,7 @@ class NodeStatusTest : public NodeFilesTest {
 
 // --------------------------------------------------------------------------------------- status
 
-TEST_F(NodeStatusTest, AStatusTellsCountsVolumesAndProbes)
+TEST_F(NodeStatusTest, AStatusHasCountsVolumesAndProbes)
 {
     if (!HasLocks()) return;
     const Listener node;
@@ -189,7 +189,7 @@ TEST_F(NodeStatusTest, NodesThatListenOnIpv6AreReached)
     socklen_t size = sizeof address;
     auto* any = reinterpret_cast<sockaddr*>(&address);
     const int fd = ::socket(AF_INET6, SOCK_STREAM | SOCK_CLOEXEC, 0);
-    // Where the machine has no IPv6 nothing can be reached through it.
+    // Without IPv6 on this machine nothing is reachable through it.
     const bool isListening =
         ::bind(fd, any, size) == 0 && ::listen(fd, 1) == 0 && ::getsockname(fd, any, &size) == 0;
     const int port = isListening ? ntohs(address.sin6_port) : 1;
@@ -198,7 +198,7 @@ TEST_F(NodeStatusTest, NodesThatListenOnIpv6AreReached)
     ::close(fd);
 }
 
-TEST_F(NodeStatusTest, AStatusOfNoNodesIsAStatus)
+TEST_F(NodeStatusTest, WithoutNodesThereIsAStatus)
 {
     if (!HasLocks()) return;
     Json::Value status = AskStatus();
@@ -207,7 +207,7 @@ TEST_F(NodeStatusTest, AStatusOfNoNodesIsAStatus)
     EXPECT_TRUE(status["volumes"].isObject());
 }
 
-TEST_F(NodeStatusTest, AStatusIsKeptUntilItIsOld)
+TEST_F(NodeStatusTest, AStatusIsCachedUntilItIsOld)
 {
     if (!HasLocks()) return;
     EXPECT_EQ(AskStatus()["total"], 0);
@@ -218,7 +218,7 @@ TEST_F(NodeStatusTest, AStatusIsKeptUntilItIsOld)
     const std::time_t old = std::time(nullptr) - 60;
     const std::array<timespec, 2> times{{{old, 0}, {old, 0}}};
     ASSERT_EQ(::utimensat(AT_FDCWD, cacheFile.c_str(), times.data(), 0), 0);
-    // The old status, or the new one where the child is quicker than its parent.
+    // The new status if the child is faster than its parent.
     EXPECT_THAT(AskStatus()["total"].asInt(), AnyOf(0, 1));
     EXPECT_TRUE(AwaitUntil([&] { return TotalInCache() == 1; }));
     EXPECT_EQ(AskStatus()["total"], 1);
@@ -240,16 +240,16 @@ TEST_F(NodeStatusTest, TheAgeIsCountedFromTheTimeInTheStatus)
     }
 }
 
-// The one child of two handlers probes the first node at once, and is then kept by silent ones.
-TEST_F(NodeStatusTest, LaterRequestsGetTheLastStatusWhileOneChildTakesANewOne)
+// Two programs share one child. It probes the first node at once and then waits for silent ones.
+TEST_F(NodeStatusTest, RequestsGetTheLastStatusWhileOneChildRefreshesIt)
 {
     if (!HasLocks()) return;
     constexpr int SilentNodes = 100;  // half a minute
     Listener counter;
     const SilentListener silent;
     EXPECT_EQ(ImportLines(Colon("a = 127.0.0.1", counter.Port())), ImportText(1));
-    Program one(Impatient());
-    EXPECT_EQ(TotalBy(one), 1);  // the first one waits for it
+    Program one(WithoutTimeout());
+    EXPECT_EQ(TotalBy(one), 1);  // the first request waits for the status
     EXPECT_EQ(counter.Count(), 1);
     std::string lines;
     for (int node = 0; node < SilentNodes; ++node) {
@@ -257,7 +257,7 @@ TEST_F(NodeStatusTest, LaterRequestsGetTheLastStatusWhileOneChildTakesANewOne)
     }
     EXPECT_EQ(ImportLines(lines), ImportText(SilentNodes));
 
-    Program other(Impatient());
+    Program other(WithoutTimeout());
     EXPECT_EQ(TotalBy(one), 1);
     EXPECT_TRUE(AwaitUntil([&] { return counter.Count() == 2; }));
     for (int request = 0; request < 3; ++request) {
@@ -273,7 +273,7 @@ TEST_F(NodeStatusTest, LaterRequestsGetTheLastStatusWhileOneChildTakesANewOne)
     EXPECT_EQ(other.Finish().code, 0);
 }
 
-TEST_F(NodeStatusTest, TwoWhoNeedTheFirstStatusBothGetIt)
+TEST_F(NodeStatusTest, TwoProgramsThatNeedTheFirstStatusBothGetIt)
 {
     if (!HasLocks()) return;
     const SilentListener silent;
@@ -287,24 +287,24 @@ TEST_F(NodeStatusTest, TwoWhoNeedTheFirstStatusBothGetIt)
     }
 }
 
-// In a child of a process with threads SQLite cannot be used: see StatusCache::GetUpdatedData(). What
-// stands under the database's name while the child works is no database.
+// A child of a process with threads must not use SQLite: see StatusCache::GetUpdatedData(). While the child
+// works, the file with the database's name is not a database.
 TEST_F(NodeStatusTest, TheChildUsesNoDatabase)
 {
     if (!HasLocks()) return;
-    Program handler(Impatient());
+    Program handler(WithoutTimeout());
     EXPECT_EQ(TotalBy(handler), 0);
     handler.Send(CreateCall("a") + "\n");
     EXPECT_TRUE(Response(handler.ReadLine()).isSuccess());
     std::filesystem::rename(database, dir.File("moved.db"));
     WriteFile(database, "no database, but long enough to be taken for a damaged one");
 
-    EXPECT_THAT(TotalBy(handler), AnyOf(0, 1));  // the child may be quicker than its parent
+    EXPECT_THAT(TotalBy(handler), AnyOf(0, 1));  // 1 if the child is faster than its parent
     EXPECT_TRUE(AwaitUntil([&] { return TotalInCache() == 1; }));
     EXPECT_EQ(handler.Finish().code, 0);
 }
 
-TEST_F(NodeStatusTest, TheStatusIsKeptInTheDirectoryThatIsGiven)
+TEST_F(NodeStatusTest, TheStatusIsCachedInTheGivenDirectory)
 {
     if (!HasLocks()) return;
     const std::string place = dir.File("status");
@@ -317,7 +317,7 @@ TEST_F(NodeStatusTest, TheStatusIsKeptInTheDirectoryThatIsGiven)
     EXPECT_FALSE(std::filesystem::exists(dir.File("none")));
 }
 
-// The processes whose parent is `pid`, zombies included.
+// The children of a process, zombies included.
 std::vector<pid_t> ChildrenOf(pid_t pid)
 {
     std::vector<pid_t> children;
@@ -330,10 +330,10 @@ std::vector<pid_t> ChildrenOf(pid_t pid)
     return children;
 }
 
-TEST_F(NodeStatusTest, AHandlerKeepsNoZombies)
+TEST_F(NodeStatusTest, LeavesNoZombies)
 {
     if (!HasLocks()) return;
-    Program handler(Impatient());
+    Program handler(WithoutTimeout());
     const std::vector<pid_t> handlers = ChildrenOf(::getpid());
     ASSERT_EQ(handlers.size(), 1U);
     EXPECT_EQ(TotalBy(handler), 0);
@@ -346,7 +346,7 @@ TEST_F(NodeStatusTest, AHandlerKeepsNoZombies)
     EXPECT_EQ(handler.Finish().code, 0);
 }
 
-TEST_F(NodeStatusTest, ACacheThatHoldsNoStatusIsReplaced)
+TEST_F(NodeStatusTest, ACacheFileWithoutAStatusIsReplaced)
 {
     if (!HasLocks()) return;
     for (const std::string data :
@@ -361,7 +361,7 @@ TEST_F(NodeStatusTest, ACacheThatHoldsNoStatusIsReplaced)
     EXPECT_EQ(AskStatus()["total"], 0);
 }
 
-TEST_F(NodeStatusTest, AStatusThatCannotBeTakenIsAnswered)
+TEST_F(NodeStatusTest, AStatusThatCannotBeTakenIsReported)
 {
     if (!HasLocks()) return;
     Create("a");
@@ -375,13 +375,13 @@ TEST_F(NodeStatusTest, AStatusThatCannotBeTakenIsAnswered)
     EXPECT_FALSE(std::filesystem::exists(dir.File("none")));
 }
 
-// Who cannot open a lock file a second time, not even his own, would wait for a status without end.
-TEST_F(NodeStatusTest, WhoMayNotOpenLocksIsToldSo)
+// A user who cannot open a lock file twice would wait for a status forever.
+TEST_F(NodeStatusTest, AUserWhoMayNotOpenLocksGetsAnError)
 {
     WriteFile(file, DocumentText(""));
     const std::string lines = Call("status") + "\n" + Call("export", fileParam) + "\n" +
                               Call("export", fileParam) + "\n" + Call("restore", fileParam) + "\n";
-    // Root without its rights can make lock files, and no more.
+    // Root without capabilities can create lock files, but not open them again.
     const std::string become =
         ::geteuid() == 0 ? "setpriv --inh-caps=-all --bounding-set=-all " : "";
     const ProgramResult result = RunInShell("exec " + become + R"("$0" --db "$1")", lines);
@@ -425,7 +425,7 @@ TEST_F(NodeFilesTest, BadParametersAreNamed)
 }
 
 // Reading a device might never end.
-TEST_F(NodeFilesTest, OnlyRegularFilesAreRead)
+TEST_F(NodeFilesTest, ReadsOnlyRegularFiles)
 {
     for (const std::string method : {"import", "restore"}) {
         for (const std::string& path : {dir.File("none"), dir.Path(), std::string("/dev/zero")}) {
@@ -456,7 +456,7 @@ TEST_F(NodeFilesTest, AnImportCreatesTheNodesOfAFile)
     }
 }
 
-TEST_F(NodeFilesTest, AnImportGivesAllNodesTheVolume)
+TEST_F(NodeFilesTest, AnImportGivesAllNodesTheGivenVolume)
 {
     EXPECT_EQ(ImportLines("a = a:1\nb = b:1", R"(,"volume":"/volume2/it's")"), ImportText(2));
     for (const Json::Value& node : Response(Ask(Call("list"))).getDataField("nodes")) {
@@ -465,7 +465,7 @@ TEST_F(NodeFilesTest, AnImportGivesAllNodesTheVolume)
     EXPECT_EQ(ImportLines(""), ImportText(0));
 }
 
-TEST_F(NodeFilesTest, AnImportSaysWhichNodesItRefusesAndWhy)
+TEST_F(NodeFilesTest, AnImportReportsWhichNodesItRefusesAndWhy)
 {
     const std::string port = "port must be an integer from 1 to 65535";
     const std::string address =
@@ -500,7 +500,7 @@ TEST_F(NodeFilesTest, AnImportSaysWhichNodesItRefusesAndWhy)
         EXPECT_EQ(ImportLines(row.line + "\n"), ImportText(0, Text(row.name, row.reason)))
             << row.line;
     }
-    EXPECT_EQ(ImportLines("a =\n"), ImportText(0));  // no pair
+    EXPECT_EQ(ImportLines("a =\n"), ImportText(0));  // not a pair
     EXPECT_THAT(List(), ElementsAre("taken"));
     EXPECT_EQ(ImportLines("a = a:0\nb = b:1\nc = c"),
               ImportText(1, Text("a", port) + "," + Text("c", "port is missing")));
@@ -513,7 +513,7 @@ TEST_F(NodeFilesTest, AnImportStopsWhenTheDatabaseFails)
     EXPECT_EQ(ImportLines("a = a:1\n"), R"({"error":{"code":404,"errors":null},"success":false})");
 }
 
-TEST_F(NodeFilesTest, ImportedTextsThatLookLikeSqlAreTexts)
+TEST_F(NodeFilesTest, ImportedTextsThatLookLikeSqlAreStoredUnchanged)
 {
     Create("a");
     const std::string text = Injection;
@@ -526,7 +526,7 @@ TEST_F(NodeFilesTest, ImportedTextsThatLookLikeSqlAreTexts)
 
 // ---------------------------------------------------------------------------- export and restore
 
-TEST_F(NodeFilesTest, AnExportIsOneDocumentOfAllNodes)
+TEST_F(NodeFilesTest, AnExportIsOneDocumentWithAllNodes)
 {
     if (!HasLocks()) return;
     EXPECT_EQ(Ask(Call("export", fileParam)), CountText(0));
@@ -541,7 +541,7 @@ TEST_F(NodeFilesTest, AnExportIsOneDocumentOfAllNodes)
                   "\n");
 }
 
-TEST_F(NodeFilesTest, ARestoreBringsBackWhatWasExported)
+TEST_F(NodeFilesTest, ARestoreBringsBackTheExportedNodes)
 {
     if (!HasLocks()) return;
     const std::string text = "x'; DROP TABLE nodes; --";
@@ -619,8 +619,8 @@ TEST_F(NodeFilesTest, ARestoreOfABadDocumentChangesNothing)
     }
 }
 
-// The index refuses the second node when the first is in already: some seconds of tries.
-TEST_F(NodeFilesTest, ARestoreThatFailsHalfWayIsRolledBack)
+// The index refuses the second node after the first one is inserted. The attempts take some seconds.
+TEST_F(NodeFilesTest, ARestoreThatFailsHalfwayIsRolledBack)
 {
     if (!HasLocks()) return;
     Create("a");
@@ -636,7 +636,7 @@ TEST_F(NodeFilesTest, ARestoreThatFailsHalfWayIsRolledBack)
     EXPECT_THAT(List(), ElementsAre("a", "c"));
 }
 
-TEST_F(NodeFilesTest, AFailingDatabaseIsReported)
+TEST_F(NodeFilesTest, ADatabaseFailureIsReported)
 {
     if (!HasLocks()) return;
     WriteFile(file, DocumentText(""));
@@ -666,8 +666,8 @@ TEST_F(NodeFilesTest, AnExportOverwritesFilesButNotTheDatabase)
     EXPECT_LT(ReadFile(file).size(), 1000U);
 }
 
-// The same database by another name has the same lock.
-TEST_F(NodeFilesTest, OfExportsAndRestoresOneWorksAtATime)
+// The same database under another name has the same lock.
+TEST_F(NodeFilesTest, OneExportOrRestoreWorksAtATime)
 {
     if (!HasLocks()) return;
     WriteFile(file, DocumentText(""));
@@ -692,8 +692,8 @@ TEST_F(NodeFilesTest, OfExportsAndRestoresOneWorksAtATime)
     EXPECT_EQ(restorer.Finish().code, 0);
 }
 
-// Each restore reads what an export wrote, whole, however many are at it.
-TEST_F(NodeFilesTest, ExportsAndRestoresSideBySideLeaveAllNodesThere)
+// Each restore must read a complete export, however many programs are at work.
+TEST_F(NodeFilesTest, ExportsAndRestoresAtTheSameTimeLoseNoNodes)
 {
     if (!HasLocks()) return;
     std::string lines;

@@ -1,5 +1,4 @@
-// The example node_registry from end to end: request lines in, replies out, several of them on one
-// file.
+// The example node_registry as a program: request lines in, replies out, several programs on one file.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
@@ -51,7 +50,7 @@ std::string NameTaken()
 
 // ------------------------------------------------------------------------------------- the demo
 
-// The text with another port in every request or node that has the first one.
+// The text with the port `from` replaced in all requests and nodes.
 std::string WithPort(std::string text, int from, int to)
 {
     const auto member = [](int port) { return "\"port\":" + std::to_string(port); };
@@ -62,9 +61,9 @@ std::string WithPort(std::string text, int from, int to)
     return text;
 }
 
-// The paths in the requests are relative to the top of the sources, and one port is that of a node
-// that can be reached. An ordinary user gets all but what comes with the first status.
-TEST_F(NodeRegistryTest, ADayOfAnApplianceReadsAsWrittenDown)
+// The demo. Its paths are relative to the top of the sources, and one port is that of a reachable node. For
+// an ordinary user only the output before the first status is compared.
+TEST_F(NodeRegistryTest, ADaysRequestsPrintTheExpectedOutput)
 {
     constexpr int DemoPort = 15001;
     const std::string folder = NODE_REGISTRY_DIR;
@@ -90,7 +89,7 @@ TEST_F(NodeRegistryTest, ADayOfAnApplianceReadsAsWrittenDown)
 
 // -------------------------------------------------------------------------------------- methods
 
-TEST_F(NodeRegistryTest, CreateAnswersANewUuid)
+TEST_F(NodeRegistryTest, CreateReturnsANewUuid)
 {
     const std::string uuid = "[0-9a-f]{8}-[0-9a-f]{4}-[0-9a-f]{4}-[0-9a-f]{4}-[0-9a-f]{12}";
     const std::string first = Create("a");
@@ -100,14 +99,14 @@ TEST_F(NodeRegistryTest, CreateAnswersANewUuid)
     EXPECT_NE(first, second);
 }
 
-TEST_F(NodeRegistryTest, GetAnswersTheNodeByIdAndByName)
+TEST_F(NodeRegistryTest, GetFindsTheNodeByIdAndByName)
 {
     const std::string id = Create("a");
     EXPECT_EQ(Ask(Call("get", Text("id", id))), SuccessText(NodeText(id, "a")));
     EXPECT_EQ(Ask(Call("get", R"("name":"a")")), SuccessText(NodeText(id, "a")));
 }
 
-TEST_F(NodeRegistryTest, CreateTakesWhatLiesAtTheLimits)
+TEST_F(NodeRegistryTest, CreateAcceptsValuesAtTheLimits)
 {
     const std::string name(64, 'n');
     const std::string address(253, 'a');
@@ -121,7 +120,7 @@ TEST_F(NodeRegistryTest, CreateTakesWhatLiesAtTheLimits)
     EXPECT_EQ(Ask(Call("set", R"("id":")" + id + R"(","name":"n","port":1)")), IdText(id));
 }
 
-TEST_F(NodeRegistryTest, SetChangesWhatIsGivenAndNothingElse)
+TEST_F(NodeRegistryTest, SetChangesOnlyTheGivenFields)
 {
     const std::string id = Create("a");
     const std::string byId = R"("id":")" + id + R"(",)";
@@ -154,20 +153,20 @@ TEST_F(NodeRegistryTest, DeleteRemovesTheNodeByIdAndByName)
     EXPECT_THAT(List(), ElementsAre("c"));
 }
 
-TEST_F(NodeRegistryTest, ListSortsByTheBytesOfTheNames)
+TEST_F(NodeRegistryTest, ListSortsNamesByTheirBytes)
 {
     for (const char* name : {"b", "Zürich", "a", "B", "\u00e4"}) Create(name);
     EXPECT_THAT(List(), ElementsAre("B", "Zürich", "a", "b", "\u00e4"));
 }
 
-TEST_F(NodeRegistryTest, ListAnswersWholeNodes)
+TEST_F(NodeRegistryTest, ListReturnsWholeNodes)
 {
     EXPECT_EQ(Ask(Call("list")), SuccessText(R"({"nodes":[]})"));
     const std::string id = Create("a");
     EXPECT_EQ(Ask(Call("list")), SuccessText(R"({"nodes":[)" + NodeText(id, "a") + "]}"));
 }
 
-TEST_F(NodeRegistryTest, FiltersChooseWhatIsListed)
+TEST_F(NodeRegistryTest, FiltersSelectTheListedNodes)
 {
     const std::string a = '"' + Create("a") + '"';
     const std::string b = '"' + Create("b") + '"';
@@ -200,8 +199,8 @@ TEST_F(NodeRegistryTest, FiltersChooseWhatIsListed)
     }
 }
 
-// The deepest condition that SQLite meets. One more filter is refused before it meets it.
-TEST_F(NodeRegistryTest, AFilterMayHoldThirtyTwo)
+// This is the deepest condition that reaches SQLite. One more filter is refused before.
+TEST_F(NodeRegistryTest, AFilterMayHaveThirtyTwoParts)
 {
     Create("a");
     const auto nested = [](int joins, std::string filter) {
@@ -222,7 +221,7 @@ TEST_F(NodeRegistryTest, AFilterMayHoldThirtyTwo)
     EXPECT_EQ(Response(Ask(Call("list", R"("filter":{"or":[)" + leaves + "]}"))).getErrCode(), 401);
 }
 
-TEST_F(NodeRegistryTest, ParametersMayStandInAnyOrderAndBlanksBetweenThem)
+TEST_F(NodeRegistryTest, ParametersMayComeInAnyOrderAndWithBlanks)
 {
     const std::string id = Create("a");
     EXPECT_EQ(
@@ -232,7 +231,7 @@ TEST_F(NodeRegistryTest, ParametersMayStandInAnyOrderAndBlanksBetweenThem)
 
 // ------------------------------------------------------------------------------------- refusals
 
-// Each value is refused when a node is created with it and when one is changed to it.
+// Each value is refused by create and by set.
 TEST_F(NodeRegistryTest, BadFieldsAreNamed)
 {
     const std::string nameRule = "must be a text of 1 to 64 bytes without control characters";
@@ -367,7 +366,7 @@ TEST_F(NodeRegistryTest, BadFiltersAreRefused)
     }
 }
 
-TEST_F(NodeRegistryTest, BadLinesAreAnsweredAndTheNextOneServed)
+TEST_F(NodeRegistryTest, BadLinesGetAReplyAndTheNextLineIsServed)
 {
     const std::string good = Call("list");
     const struct {
@@ -420,7 +419,7 @@ TEST_F(NodeRegistryTest, BadLinesAreAnsweredAndTheNextOneServed)
     EXPECT_EQ(handler.Finish().code, 0);
 }
 
-TEST_F(NodeRegistryTest, TheLastLineNeedsNoEnd)
+TEST_F(NodeRegistryTest, TheLastLineNeedsNoNewline)
 {
     EXPECT_EQ(Run({}, Call("list")).out, SuccessText(R"({"nodes":[]})") + "\n");
     EXPECT_EQ(Run({}, "\n\n").out, NoJson() + "\n" + NoJson() + "\n");
@@ -459,14 +458,14 @@ TEST_F(NodeRegistryTest, UnknownNodesAreRefused)
     EXPECT_THAT(List(), ElementsAre("a"));
 }
 
-TEST_F(NodeRegistryTest, ANameThatIsTakenIsRefused)
+TEST_F(NodeRegistryTest, ATakenNameIsRefused)
 {
     const std::string a = Create("a");
     const std::string b = Create("b");
     EXPECT_EQ(Ask(CreateCall("a")), NameTaken());
     EXPECT_EQ(Ask(Call("set", R"("id":")" + b + R"(","name":"a","port":1)")), NameTaken());
     EXPECT_EQ(Ask(Call("get", R"("name":"b")")), SuccessText(NodeText(b, "b")));
-    // Asked beforehand: no statement has failed.
+    // The program looked for the name first: no statement failed.
     EXPECT_EQ(Run({"--verbose"}, CreateCall("a")).err, "");
     EXPECT_EQ(Ask(Call("set", R"("id":")" + a + R"(","name":"a")")), IdText(a));
     EXPECT_NE(Create("A"), "");
@@ -475,7 +474,7 @@ TEST_F(NodeRegistryTest, ANameThatIsTakenIsRefused)
 
 // ------------------------------------------------------------------------------------ injection
 
-TEST_F(NodeRegistryTest, TextsThatLookLikeSqlAreStoredAndComeBack)
+TEST_F(NodeRegistryTest, TextsThatLookLikeSqlAreStoredUnchanged)
 {
     const std::string volume = "/volume1/" + std::string(Injection);
     const std::string address = "x';DROP/**/TABLE/**/nodes;--";  // blanks are not allowed there
@@ -526,14 +525,14 @@ TEST_F(NodeRegistryTest, KeysAndListsNeverChangeTheMeaningOfAStatement)
 
 // ----------------------------------------------------------------------------- database failures
 
-TEST_F(NodeRegistryTest, ADatabaseThatCannotBeOpenedIsAnsweredAtOnce)
+TEST_F(NodeRegistryTest, ADatabaseThatCannotBeOpenedIsReportedAtOnce)
 {
     database = dir.Path();
     EXPECT_EQ(Ask(Call("list")), R"({"error":{"code":404,"errors":null},"success":false})");
 }
 
-// The one case that waits for the pauses between the tries.
-TEST_F(NodeRegistryTest, AFileThatIsNoDatabaseIsAnsweredWithEveryTry)
+// This test waits for the pauses between the attempts.
+TEST_F(NodeRegistryTest, AFileThatIsNoDatabaseIsReportedWithEveryAttempt)
 {
     WriteFile(database, std::string(1000, 'x'));
     const ProgramResult result = Run({}, Call("get", R"("name":"a")"));
@@ -566,7 +565,7 @@ TEST_F(NodeRegistryTest, ADamagedRowIsReported)
     EXPECT_THAT(List(R"("filter":{"enabled":true})"), ElementsAre("b"));
 }
 
-// The program that makes ids cannot start: its library is an empty file.
+// The program that generates ids cannot start, because its library is an empty file.
 TEST_F(NodeRegistryTest, ANodeWithoutAnIdIsNotCreated)
 {
     WriteFile(dir.File("libuuid.so.1"), "");
@@ -579,7 +578,7 @@ TEST_F(NodeRegistryTest, ANodeWithoutAnIdIsNotCreated)
 
 // ---------------------------------------------------------------------- options, input and output
 
-TEST_F(NodeRegistryTest, WrongOptionsGetTheUsage)
+TEST_F(NodeRegistryTest, WrongOptionsPrintTheUsage)
 {
     const std::vector<std::string> rows[] = {
         {"--nothing"},
@@ -605,7 +604,7 @@ TEST_F(NodeRegistryTest, WrongOptionsGetTheUsage)
     }
 }
 
-TEST_F(NodeRegistryTest, HelpNamesEverything)
+TEST_F(NodeRegistryTest, HelpListsOptionsMethodsAndCodes)
 {
     const ProgramResult result = Run({"--help"}, Call("list"));
     EXPECT_EQ(result.code, 0);
@@ -646,7 +645,7 @@ TEST_F(NodeRegistryTest, HelpNamesEverything)
     }
 }
 
-TEST_F(NodeRegistryTest, RequestsComeFromAFileOrFromStandardInput)
+TEST_F(NodeRegistryTest, ReadsRequestsFromAFileOrFromStandardInput)
 {
     const std::string input = dir.File("input");
     WriteFile(input, Call("list") + "\n");
@@ -656,7 +655,7 @@ TEST_F(NodeRegistryTest, RequestsComeFromAFileOrFromStandardInput)
     EXPECT_EQ(Run({}, Call("list")).out, reply);
 }
 
-TEST_F(NodeRegistryTest, TheDatabaseIsInTheWorkingDirectoryUnlessSaidOtherwise)
+TEST_F(NodeRegistryTest, TheDatabaseIsInTheWorkingDirectoryByDefault)
 {
     const ProgramResult result = RunInShell(R"(cd "${1%/*}" && exec "$0")", CreateCall("a"));
     EXPECT_EQ(result.code, 0);
@@ -664,7 +663,7 @@ TEST_F(NodeRegistryTest, TheDatabaseIsInTheWorkingDirectoryUnlessSaidOtherwise)
     EXPECT_THAT(List(), ElementsAre("a"));
 }
 
-TEST_F(NodeRegistryTest, AnInputThatCannotBeReadIsAFailure)
+TEST_F(NodeRegistryTest, UnreadableInputIsAFailure)
 {
     const ProgramResult missing = Run({dir.File("none")});
     EXPECT_EQ(missing.code, 1);
@@ -677,8 +676,8 @@ TEST_F(NodeRegistryTest, AnInputThatCannotBeReadIsAFailure)
     EXPECT_EQ(redirected.err, "node_registry: -: Is a directory\n");
 }
 
-// The peer of a socket that goes without reading what was sent to it resets the connection.
-TEST_F(NodeRegistryTest, ALineThatAFailedReadCutsOffIsNotAnswered)
+// When a socket is closed with unread data, its peer gets a reset.
+TEST_F(NodeRegistryTest, ALineCutOffByAFailedReadGetsNoReply)
 {
     std::array<int, 2> sockets{};  // inherited by the program
     ASSERT_EQ(::socketpair(AF_UNIX, SOCK_STREAM, 0, sockets.data()), 0);
@@ -694,7 +693,7 @@ TEST_F(NodeRegistryTest, ALineThatAFailedReadCutsOffIsNotAnswered)
     EXPECT_THAT(List(), ElementsAre("a"));
 }
 
-TEST_F(NodeRegistryTest, OutputThatCannotBeWrittenIsAFailure)
+TEST_F(NodeRegistryTest, UnwritableOutputIsAFailure)
 {
     const std::string message = "node_registry: standard output: No space left on device\n";
     for (const std::string option : {"", " --pretty", " --help"}) {
@@ -705,7 +704,7 @@ TEST_F(NodeRegistryTest, OutputThatCannotBeWrittenIsAFailure)
     }
 }
 
-TEST_F(NodeRegistryTest, AReaderWhoHasGoneIsAFailure)
+TEST_F(NodeRegistryTest, AReaderThatClosesThePipeIsAFailure)
 {
     Program handler({ProgramFile, "--db", database});
     handler.Send(Call("list") + "\n");
@@ -717,7 +716,7 @@ TEST_F(NodeRegistryTest, AReaderWhoHasGoneIsAFailure)
     EXPECT_EQ(result.err, "node_registry: standard output: Broken pipe\n");
 }
 
-TEST_F(NodeRegistryTest, EachReplyIsSentBeforeTheNextRequestIsRead)
+TEST_F(NodeRegistryTest, SendsEachReplyBeforeItReadsTheNextRequest)
 {
     Program handler({ProgramFile, "--db", database});
     for (const char* name : {"a", "b", "c"}) {
@@ -727,7 +726,7 @@ TEST_F(NodeRegistryTest, EachReplyIsSentBeforeTheNextRequestIsRead)
     EXPECT_EQ(handler.Finish().code, 0);
 }
 
-TEST_F(NodeRegistryTest, VerboseShowsTheLogOnStandardError)
+TEST_F(NodeRegistryTest, VerbosePrintsTheLogToStandardError)
 {
     database = dir.Path();
     const ProgramResult result = Run({"--verbose"}, Call("list"));
@@ -742,7 +741,7 @@ TEST_F(NodeRegistryTest, VerboseShowsTheLogOnStandardError)
                              R"(\[)" + database + R"(\])"));
 }
 
-TEST_F(NodeRegistryTest, PrettyShowsRequestsAndNamesErrors)
+TEST_F(NodeRegistryTest, PrettyPrintsRequestsAndTheNamesOfErrors)
 {
     const struct {
         std::string line;
@@ -767,7 +766,7 @@ TEST_F(NodeRegistryTest, PrettyShowsRequestsAndNamesErrors)
     }
 }
 
-// ------------------------------------------------------------------- several handlers on one file
+// ------------------------------------------------------------------- several programs on one file
 
 class NodeRegistriesTest : public NodeRegistryTest {
   protected:
@@ -782,7 +781,7 @@ class NodeRegistriesTest : public NodeRegistryTest {
     std::vector<std::unique_ptr<Program>> handlers;
 };
 
-TEST_F(NodeRegistriesTest, EightCreateSideBySide)
+TEST_F(NodeRegistriesTest, EightProgramsCreateNodesAtTheSameTime)
 {
     constexpr int Nodes = 200;
     Start(8);
@@ -803,9 +802,9 @@ TEST_F(NodeRegistriesTest, EightCreateSideBySide)
     EXPECT_EQ(List().size(), 1600U);
 }
 
-// One who has asked for the name in time but comes second learns from the schema that it is taken,
-// after all tries: some seconds a round.
-TEST_F(NodeRegistriesTest, OfEightOneGetsTheName)
+// A program that finds the name free but inserts second is refused by the schema, after all attempts: that
+// takes some seconds a round.
+TEST_F(NodeRegistriesTest, OneOfEightProgramsGetsTheName)
 {
     Start(8);
     for (const std::string name : {"a", "b", "c"}) {
@@ -825,9 +824,8 @@ TEST_F(NodeRegistriesTest, OfEightOneGetsTheName)
     EXPECT_THAT(List(), ElementsAre("a", "b", "c"));
 }
 
-// An index that takes upper and lower case for the same refuses a name that is free when it is
-// asked for: the same as a name that another handler has taken since.
-TEST_F(NodeRegistriesTest, TheSchemaHasTheLastWord)
+// An index that ignores case refuses a name that looked free, as if another program had just taken it.
+TEST_F(NodeRegistriesTest, TheSchemaDecidesWhetherANameIsTaken)
 {
     Create("a");
     const std::string b = Create("b");

@@ -1,5 +1,5 @@
-// The example node_service from outside: HTTP in, replies out, and how it begins and ends. What the
-// replies say is tested with node_registry, whose handler it shares.
+// The example node_service as a program: HTTP in, replies out, start and end. The content of the replies is
+// tested with node_registry, which shares the handler.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <signal.h>
@@ -65,7 +65,7 @@ std::set<std::string> NamesOf(const std::string& reply)
     return names;
 }
 
-// Runs `body` in so many threads, each with a number of its own, and waits for them.
+// Runs `body` in `count` threads, each with its number, and waits for them.
 void InThreads(int count, const std::function<void(int)>& body)
 {
     std::vector<std::thread> threads;
@@ -74,7 +74,7 @@ void InThreads(int count, const std::function<void(int)>& body)
     for (std::thread& thread : threads) thread.join();
 }
 
-// A service that runs until the end of the object, at the latest.
+// A running service. It ends with End() or with the object.
 class Service {
   public:
     explicit Service(const std::vector<std::string>& options, const std::string& address)
@@ -92,7 +92,7 @@ class Service {
 
     HttpReply Ask(const std::string& request) const { return Post(port, "/webapi", request); }
 
-    // Ends the service; what it printed meanwhile.
+    // Ends the service. Returns what it has printed.
     ProgramResult End(int signal = SIGTERM)
     {
         program.Kill(signal);
@@ -123,7 +123,7 @@ class NodeServiceTest : public NodeRegistryTest {
         return std::make_unique<Service>(options, address);
     }
 
-    // Ends a service, which must have had nothing to say.
+    // Ends a service, which must have printed nothing.
     static void ExpectCleanEnd(Service& service, int signal = SIGTERM)
     {
         const ProgramResult result = service.End(signal);
@@ -152,7 +152,7 @@ TEST_F(NodeServiceTest, CreatesGetsAndListsNodes)
     ExpectCleanEnd(*service);
 }
 
-TEST_F(NodeServiceTest, ConnectionsCarryOneRequest)
+TEST_F(NodeServiceTest, AConnectionCarriesOneRequest)
 {
     const auto service = Start();
     const HttpConnection connection(service->Port());
@@ -163,7 +163,7 @@ TEST_F(NodeServiceTest, ConnectionsCarryOneRequest)
     EXPECT_EQ(reply.body, SuccessText(R"({"nodes":[]})") + "\n");
 }
 
-TEST_F(NodeServiceTest, FailuresOfTheRegistryAreRepliesLikeOthers)
+TEST_F(NodeServiceTest, FailuresOfTheRegistryAreRepliesWithStatus200)
 {
     const auto service = Start();
     const HttpReply missing = service->Ask(Call("get", R"("name":"a")"));
@@ -174,7 +174,7 @@ TEST_F(NodeServiceTest, FailuresOfTheRegistryAreRepliesLikeOthers)
     EXPECT_EQ(unknown.body, FailureText(526, "method", "is unknown") + "\n");
 }
 
-TEST_F(NodeServiceTest, BrokenBodiesGetTheReplyOfABrokenLine)
+TEST_F(NodeServiceTest, MalformedBodiesGetTheReplyOfAMalformedLine)
 {
     const auto service = Start();
     for (const std::string& body :
@@ -188,8 +188,7 @@ TEST_F(NodeServiceTest, BrokenBodiesGetTheReplyOfABrokenLine)
     ExpectCleanEnd(*service);
 }
 
-// Up to 8 MiB are read and thrown away, so that a client that sends first and reads then gets to the
-// reply.
+// The service reads and discards up to 8 MiB, so that a client that reads only after sending gets the reply.
 TEST_F(NodeServiceTest, OversizedBodiesAreRefused)
 {
     const auto service = Start();
@@ -202,7 +201,7 @@ TEST_F(NodeServiceTest, OversizedBodiesAreRefused)
     ExpectCleanEnd(*service);
 }
 
-TEST_F(NodeServiceTest, BodiesThatTurnOutOversizedAreRefused)
+TEST_F(NodeServiceTest, ChunkedBodiesThatGrowTooLargeAreRefused)
 {
     const auto service = Start();
     const HttpConnection connection(service->Port());
@@ -216,7 +215,7 @@ TEST_F(NodeServiceTest, BodiesThatTurnOutOversizedAreRefused)
     EXPECT_THAT(Files(), IsEmpty());
 }
 
-TEST_F(NodeServiceTest, ClientsThatAskBeforeTheySendAreRefusedAtOnce)
+TEST_F(NodeServiceTest, ClientsThatExpectAContinueAreRefusedAtOnce)
 {
     const auto service = Start();
     const HttpConnection connection(service->Port());
@@ -256,7 +255,7 @@ TEST_F(NodeServiceTest, OtherPathsAndMethodsAreUnknown)
     ExpectCleanEnd(*service);
 }
 
-TEST_F(NodeServiceTest, WhatIsNoHttpIsAnswered)
+TEST_F(NodeServiceTest, MalformedHttpGetsAReply)
 {
     const auto service = Start();
     for (const std::string text :
@@ -274,7 +273,7 @@ TEST_F(NodeServiceTest, WhatIsNoHttpIsAnswered)
     EXPECT_THAT(Files(), IsEmpty());
 }
 
-TEST_F(NodeServiceTest, FormsWithFilesAreRefused)
+TEST_F(NodeServiceTest, MultipartFormsAreRefused)
 {
     const auto service = Start();
     const HttpConnection connection(service->Port());
@@ -289,7 +288,7 @@ TEST_F(NodeServiceTest, FormsWithFilesAreRefused)
 
 // ------------------------------------------------------------------------------------- many clients
 
-TEST_F(NodeServiceTest, ManyClientsCreateSideBySide)
+TEST_F(NodeServiceTest, ManyClientsCreateNodesAtTheSameTime)
 {
     constexpr int Clients = 32;
     constexpr int Nodes = 5;
@@ -305,7 +304,7 @@ TEST_F(NodeServiceTest, ManyClientsCreateSideBySide)
     ExpectCleanEnd(*service);
 }
 
-TEST_F(NodeServiceTest, ClientsThatSayNothingAreGivenUp)
+TEST_F(NodeServiceTest, SilentClientsAreDropped)
 {
     const auto service = Start({"--threads", "1"});
     const HttpConnection silent(service->Port());
@@ -314,7 +313,7 @@ TEST_F(NodeServiceTest, ClientsThatSayNothingAreGivenUp)
     ExpectCleanEnd(*service);
 }
 
-TEST_F(NodeServiceTest, ClientsThatGoBeforeTheReplyHarmNobody)
+TEST_F(NodeServiceTest, ClientsThatLeaveBeforeTheReplyDoNoHarm)
 {
     const auto service = Start();
     for (int client = 0; client < 20; ++client) {
@@ -346,7 +345,7 @@ TEST_F(NodeServiceTest, TwoServicesShareADatabase)
     ExpectCleanEnd(*other);
 }
 
-TEST_F(NodeServiceTest, EachRequestIsLoggedInOneLine)
+TEST_F(NodeServiceTest, LogsEachRequestInOneLine)
 {
     const auto service = Start({"--verbose"});
     service->Ask(Call("list"));
@@ -361,9 +360,9 @@ TEST_F(NodeServiceTest, EachRequestIsLoggedInOneLine)
 
 class NodeServiceStatusTest : public NodeServiceTest {
   protected:
-    static constexpr int SilentNodes = 50;  // fifteen seconds
+    static constexpr int SilentNodes = 50;  // their probes take fifteen seconds
 
-    // Whether the status can be used, as by root. If not, asserts what others get.
+    // Whether this user may use the status, as root may. If not, checks what others get.
     bool HasStatus() const
     {
         if (::geteuid() == 0) return true;
@@ -371,8 +370,7 @@ class NodeServiceStatusTest : public NodeServiceTest {
         return false;
     }
 
-    // Gets a refresh going that lasts as long as the test wants: its nodes do not answer. Its
-    // process.
+    // Starts a refresh that outlasts the test, because its nodes do not answer. Returns its process.
     pid_t StartRefresh(const Service& service, const SilentListener& silent) const
     {
         service.Ask(Call("status"));
@@ -409,8 +407,8 @@ TEST_F(NodeServiceStatusTest, ThreadsShareOneStatus)
     EXPECT_THAT(Files(), ElementsAre("nodes.db", "nodes.db.status.cached"));
 }
 
-// The refresh has none of the service's sockets: the next service gets the port.
-TEST_F(NodeServiceStatusTest, AKilledServiceLeavesItsPortWhileARefreshRuns)
+// The refresh must not inherit the service's sockets.
+TEST_F(NodeServiceStatusTest, ThePortOfAKilledServiceIsFreeWhileARefreshRuns)
 {
     if (!HasStatus()) return;
     const SilentListener silent;
@@ -418,15 +416,15 @@ TEST_F(NodeServiceStatusTest, AKilledServiceLeavesItsPortWhileARefreshRuns)
     const pid_t updater = StartRefresh(*service, silent);
     service->End(SIGKILL);
     EXPECT_TRUE(AwaitUntil([&] { return !service->IsListening(); }));
-    EXPECT_EQ(::waitpid(updater, nullptr, WNOHANG), 0) << "the refresh has ended before";
+    EXPECT_EQ(::waitpid(updater, nullptr, WNOHANG), 0) << "the refresh has ended already";
     const auto next = Start({}, service->Address());
     EXPECT_EQ(next->Ask(Call("get", R"("name":"n0")")).status, 200);
     ::kill(updater, SIGKILL);
     ExpectCleanEnd(*next);
 }
 
-// The service waits for the signal that it blocks; its child ends by it.
-TEST_F(NodeServiceStatusTest, ARefreshEndsBySigterm)
+// The service blocks SIGTERM and waits for it. Its child must unblock it.
+TEST_F(NodeServiceStatusTest, SigtermEndsARefresh)
 {
     if (!HasStatus()) return;
     const SilentListener silent;
@@ -439,7 +437,7 @@ TEST_F(NodeServiceStatusTest, ARefreshEndsBySigterm)
     ExpectCleanEnd(*service);
 }
 
-// --------------------------------------------------------------------------------- beginning and end
+// ------------------------------------------------------------------------------------ start and end
 
 TEST_F(NodeServiceTest, SigtermAndSigintEndTheService)
 {
@@ -457,8 +455,8 @@ TEST_F(NodeServiceTest, SigtermRightAfterTheStartIsNotLost)
     for (int round = 0; round < 20; ++round) ExpectCleanEnd(*Start());
 }
 
-// The reply "100 Continue" tells that the request has been begun.
-TEST_F(NodeServiceTest, RequestsUnderWayAreAnsweredAfterSigterm)
+// "100 Continue" shows that the service has begun the request.
+TEST_F(NodeServiceTest, RequestsInProgressAreAnsweredAfterSigterm)
 {
     const auto service = Start({"--threads", "8"});
     const std::string body = CreateCall("a");
@@ -493,11 +491,11 @@ TEST_F(NodeServiceTest, SigtermUnderLoadLosesNoAnsweredCreate)
     ExpectCleanEnd(*service);
     clients.join();
     const std::vector<std::string> names = List();
-    for (const auto& those : created) EXPECT_THAT(names, IsSupersetOf(those));
+    for (const auto& ofClient : created) EXPECT_THAT(names, IsSupersetOf(ofClient));
     EXPECT_THAT(Files(), ElementsAre("nodes.db"));
 }
 
-TEST_F(NodeServiceTest, AnAddressThatIsTakenIsAFailure)
+TEST_F(NodeServiceTest, ATakenAddressIsAFailure)
 {
     const auto service = Start();
     const ProgramResult taken = RunProgram(
@@ -514,7 +512,7 @@ TEST_F(NodeServiceTest, AnAddressThatIsTakenIsAFailure)
     EXPECT_THAT(Files(), IsEmpty());
 }
 
-TEST_F(NodeServiceTest, OutputThatCannotBeWrittenIsAFailure)
+TEST_F(NodeServiceTest, UnwritableOutputIsAFailure)
 {
     for (const std::string option : {"--listen 127.0.0.1:0", "--help"}) {
         const ProgramResult result = RunProgram(
@@ -524,7 +522,7 @@ TEST_F(NodeServiceTest, OutputThatCannotBeWrittenIsAFailure)
     }
 }
 
-TEST_F(NodeServiceTest, WrongOptionsGetTheUsage)
+TEST_F(NodeServiceTest, WrongOptionsPrintTheUsage)
 {
     const std::vector<std::string> rows[] = {
         {"--nothing"},
@@ -559,7 +557,7 @@ TEST_F(NodeServiceTest, WrongOptionsGetTheUsage)
     }
 }
 
-TEST_F(NodeServiceTest, HelpNamesEverything)
+TEST_F(NodeServiceTest, HelpListsOptionsMethodsAndCodes)
 {
     const ProgramResult result = RunProgram({NODE_SERVICE_PROGRAM, "--help"});
     EXPECT_EQ(result.code, 0);
