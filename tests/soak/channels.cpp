@@ -4,27 +4,28 @@
 #include <unistd.h>
 
 #include <array>
-#include <cerrno>
 #include <utility>
 
 #include <orvadrcore/response.h>
 
+#include "base/errno.h"
 #include "examples/node_registry/json_line.h"
 #include "support/processes/http_client.h"
 
 namespace Soak {
 
 using OrvaDRCore::Response;
+using OrvaDRCore::RetryOnEintr;
 
 namespace {
 
-// No answer comes so late: who has none by then never gets one.
+// Far longer than any answer takes: after it none is coming.
 constexpr seconds Patience{60};
 
 constexpr milliseconds AwaitFresh{100};
 constexpr int BadParameter = 401;
 
-Answer Told(const std::string& text)
+Answer ToldBy(const std::string& text)
 {
     Answer answer;
     answer.outcome = Answer::Outcome::Told;
@@ -43,13 +44,13 @@ void ReportNoAnswer(Findings& findings, const std::string& who)
                  who + ": no answer within " + std::to_string(Patience.count()) + " s");
 }
 
-// What is no request to the registry, and the HTTP status that it has to get.
-struct Oddity {
+// An invalid request and the HTTP status that it must get.
+struct Invalid {
     std::string bytes;
     int status;
 };
 
-Oddity OddityOf(int which)
+Invalid InvalidOf(int which)
 {
     constexpr std::size_t TooLarge = 1'100'000;
     switch (which % 4) {
@@ -71,7 +72,7 @@ Answer HttpChannel::Ask(const std::string& request)
     if (!connection.IsOpen()) return {};
     connection.Send(HttpRequest("POST", "/webapi", request));
     const HttpReply reply = connection.Receive();
-    if (reply.status == 200) return Told(reply.body);
+    if (reply.status == 200) return ToldBy(reply.body);
     if (Clock::now() - begin >= Patience) ReportNoAnswer(findings, request);
     if (reply.status != 0) {
         findings.Add(Promise::Answers, request + " got HTTP " + std::to_string(reply.status));
@@ -83,11 +84,11 @@ std::optional<bool> HttpChannel::AskNonsense(int which)
 {
     const HttpConnection connection(port, Patience);
     if (!connection.IsOpen()) return std::nullopt;
-    const Oddity oddity = OddityOf(which);
-    connection.Send(oddity.bytes);
+    const Invalid invalid = InvalidOf(which);
+    connection.Send(invalid.bytes);
     const HttpReply reply = connection.Receive();
     if (reply.status == 0) return std::nullopt;
-    return reply.status == oddity.status && !Response(reply.body).isSuccess();
+    return reply.status == invalid.status && !Response(reply.body).isSuccess();
 }
 
 LineChannel::LineChannel(std::string who, Findings& where) : name(std::move(who)), findings(where)
@@ -121,7 +122,7 @@ Answer LineChannel::Ask(const std::string& request)
         return Lost();
     }
     const std::optional<std::string> line = ReadLine();
-    return line ? Told(*line) : Lost();
+    return line ? ToldBy(*line) : Lost();
 }
 
 std::optional<bool> LineChannel::AskNonsense(int /*which*/)
@@ -155,7 +156,7 @@ std::optional<std::string> LineChannel::ReadLine()
     return line;
 }
 
-// Takes over the pipes of the next process, if there is one soon.
+// Takes the pipes of the next process, if one starts soon.
 bool LineChannel::TakeFresh()
 {
     std::unique_lock<std::mutex> lock(mutex);
@@ -169,8 +170,8 @@ bool LineChannel::Write(const std::string& text) const
 {
     std::size_t written = 0;
     while (written < text.size()) {
-        const ssize_t count = ::write(current.in, text.data() + written, text.size() - written);
-        if (count < 0 && errno == EINTR) continue;
+        const ssize_t count = RetryOnEintr(
+            [&] { return ::write(current.in, text.data() + written, text.size() - written); });
         if (count <= 0) return false;
         written += static_cast<std::size_t>(count);
     }

@@ -1,4 +1,4 @@
-// The two ways to the registry: HTTP, and the lines of a program that may be killed and replaced.
+// The two ways to the registry: HTTP, and the pipes of a program that may be killed and restarted.
 #ifndef ORVADRCORE_TESTS_SOAK_CHANNELS_H
 #define ORVADRCORE_TESTS_SOAK_CHANNELS_H
 
@@ -13,7 +13,7 @@
 
 namespace Soak {
 
-// A connection to 127.0.0.1 for each request.
+// Makes a connection to 127.0.0.1 for each request.
 class HttpChannel {
   public:
     HttpChannel(int servicePort, Findings& findings);
@@ -26,7 +26,7 @@ class HttpChannel {
     Findings& findings;
 };
 
-// One thread reads and writes the lines, another one hands over the pipes of each new process.
+// One thread writes and reads lines, another passes in the pipes of each new process.
 class LineChannel {
   public:
     LineChannel(std::string name, Findings& findings);
@@ -34,16 +34,16 @@ class LineChannel {
     LineChannel& operator=(const LineChannel&) = delete;
     ~LineChannel();
 
-    // The pipes of a process that has just been started; from now on they are the channel's.
+    // Passes in the pipes of a process that has just started. The channel closes them.
     void Give(Pipes fresh);
 
-    // Closes the process's input, which ends it.
+    // Ends the process by closing its input.
     void Close();
 
     Answer Ask(const std::string& request);
     std::optional<bool> AskNonsense(int which);
 
-    // The next line of a process, or none when it has gone.
+    // The next line from the process; none if it has ended.
     std::optional<std::string> ReadLine();
 
   private:

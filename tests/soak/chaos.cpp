@@ -2,11 +2,12 @@
 
 #include <fcntl.h>
 #include <signal.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <array>
 #include <fstream>
+
+#include "support/processes/reap.h"
 
 namespace Soak {
 
@@ -22,7 +23,7 @@ enum class Event {
     HoldLock
 };
 
-// Every event meets every other one sooner or later: the disk stays full beyond the next event.
+// Every event coincides with every other one sooner or later: a full disk outlasts the next event.
 constexpr std::array<Event, 12> Order = {
     Event::HoldLock,    Event::KillService,       Event::FillDisk,      Event::KillRegistry,
     Event::KillRefresh, Event::HoldLock,          Event::KillNeighbour, Event::FillDisk,
@@ -69,8 +70,8 @@ void Chaos::KillSome(Member& member)
     member.Kill();
 }
 
-// Whoever is marked as refreshing, unless that is a member, which refreshes in itself when there is no
-// status yet.
+// Kills the process that is marked as refreshing, unless it is a member: those refresh themselves if there
+// is no status yet.
 void Chaos::KillRefresh()
 {
     pid_t updater = 0;
@@ -78,7 +79,7 @@ void Chaos::KillRefresh()
     while (updater == 0 && Clock::now() < deadline) {
         std::ifstream(plan.StatusFile() + ".pid") >> updater;
     }
-    // Whatever stands in that file, nobody but our own processes is killed.
+    // Kills only our own processes, whatever the file contains.
     if (updater <= 0 || CommandOf(updater).find(plan.directory) == std::string::npos) return;
     for (const auto& member : company.Members()) {
         if (member->Pid() == updater) return;
@@ -108,8 +109,8 @@ void Chaos::HoldLock()
 {
     if (holder) {
         const auto end = reaper.EndOf(*holder);
-        if (!end) return;  // still waiting for the last one
-        if (!WIFEXITED(*end) || WEXITSTATUS(*end) != 0) ++events.locksMissed;
+        if (!end) return;  // it is still waiting for the lock
+        if (ExitCodeOf(*end) != 0) ++events.locksMissed;
     }
     Pipes pipes;
     holder =

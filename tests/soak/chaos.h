@@ -1,4 +1,4 @@
-// What goes wrong during a soak, one thing every few seconds.
+// Makes things go wrong during a soak, one every few seconds.
 #ifndef ORVADRCORE_TESTS_SOAK_CHAOS_H
 #define ORVADRCORE_TESTS_SOAK_CHAOS_H
 
@@ -12,22 +12,22 @@
 
 namespace Soak {
 
-// How often what happened.
+// How often each event happened.
 struct Events {
     int refreshesKilled = 0;
     int disksFilled = 0;
     int locksHeld = 0;
-    int locksMissed = 0;  // the lock was not to be had
+    int locksMissed = 0;  // the lock could not be taken
 };
 
 class Chaos {
   public:
     Chaos(const Plan& plan, Company& company, Reaper& reaper);
 
-    // Does what is due. From the survivors' time on the service and the first registry are spared.
+    // Does what is due. Does not kill the service and the first registry if survivors are spared.
     void Step(bool areSurvivorsSpared);
 
-    // Ends what still goes on.
+    // Ends what is still going on.
     void Calm();
 
     bool IsDiskFull() const { return isDiskFull; }

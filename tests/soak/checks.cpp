@@ -35,7 +35,7 @@ std::string ColumnText(sqlite3_stmt* statement, int column)
     return text == nullptr ? "" : reinterpret_cast<const char*>(text);
 }
 
-// Calls `take` for each row. False when the statement fails.
+// Calls `take` for each row. False if the statement fails.
 bool ForEachRow(sqlite3* database, const char* text, const std::function<void(sqlite3_stmt*)>& take)
 {
     sqlite3_stmt* statement = nullptr;
@@ -56,7 +56,7 @@ std::set<std::string> NamesIn(const std::string& directory)
     return names;
 }
 
-// The processes that have a file open.
+// Describes the processes that have a file open.
 std::string HoldersOf(const std::string& path)
 {
     std::string holders;
@@ -74,7 +74,7 @@ std::string HoldersOf(const std::string& path)
     return holders;
 }
 
-// Our children that have no business to be there any more. The neighbour's programs end by themselves.
+// Our children that should have ended. The neighbour's programs end by themselves.
 std::vector<pid_t> UnexpectedChildren()
 {
     std::vector<pid_t> children = ChildrenOf(::getpid());

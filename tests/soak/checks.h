@@ -1,4 +1,4 @@
-// What is looked at when all processes of a soak have ended.
+// Checks after all processes of a soak have ended.
 #ifndef ORVADRCORE_TESTS_SOAK_CHECKS_H
 #define ORVADRCORE_TESTS_SOAK_CHECKS_H
 
@@ -12,24 +12,24 @@
 
 namespace Soak {
 
-// The database is sound, and holds what the clients were told.
+// The database is intact and holds what the clients were told.
 Comparison CheckDatabase(const std::string& database, const std::vector<const Ledger*>& ledgers,
                          Findings& findings);
 
-// Nobody holds a lock on that file any more.
+// Nobody holds a lock on this file any more.
 void CheckLock(const std::string& lockFile, Findings& findings);
 
-// Beside the database and the status nothing is left.
+// No files are left except the database and the status.
 void CheckFiles(const Plan& plan, Findings& findings);
 
-// No child of ours is left, but for the neighbour's programs.
+// No child is left, except the neighbour's programs.
 void CheckProcesses(const Plan& plan, Findings& findings);
 
-// Somebody got an answer in every window of time.
+// A client was never without an answer for too long.
 void CheckGap(const Plan& plan, const std::string& name, milliseconds longestGap,
               Findings& findings);
 
-// Clients of a kind got about the same number of answers.
+// These clients got about the same number of answers.
 void CheckShares(const Plan& plan, const std::vector<const Client*>& clients, Findings& findings);
 
 }  // namespace Soak

@@ -16,7 +16,7 @@ using OrvaDRCore::Response;
 
 namespace {
 
-// How often a client asks for what, of a hundred requests.
+// The share of each kind among a client's requests.
 struct Share {
     Kind kind;
     int percent;
@@ -26,7 +26,7 @@ constexpr Share Shares[] = {{Kind::Create, 30}, {Kind::Get, 35}, {Kind::Set, 10}
                             {Kind::Nonsense, 2}};
 
 constexpr int MaxPort = 65535;
-constexpr milliseconds TryAgain{5};  // where nobody listens
+constexpr milliseconds TryAgain{5};  // when nobody listens
 
 Kind KindAt(int percent)
 {
@@ -44,8 +44,7 @@ Json::Value Named(const std::string& name)
     return parameters;
 }
 
-// Of the nodes of which it is not known whether they are there, every other one stays as it is until the
-// end; the rest are asked for again.
+// Half of the nodes with an unknown state are created again, the other half is left alone until the end.
 bool IsToBeRetried(const Ledger::value_type& node)
 {
     const auto& [name, account] = node;
@@ -103,7 +102,7 @@ void Client::AskOne()
     }
 }
 
-// A new node, or one that is asked for again.
+// Creates a new node, or one again whose state is unknown.
 void Client::Create()
 {
     const auto unknown = std::find_if(ledger.begin(), ledger.end(), IsToBeRetried);
@@ -135,7 +134,7 @@ void Client::CreateAs(Node& node)
     if (reply.isSuccess()) {
         account = {State::Stored, reply.getDataFieldtoStr("id"), {parameters["port"].asInt()}};
     } else if (reply.getErrCode() == ERR::ERR_NODE_EXIST && wasUnknown) {
-        account.state = State::Stored;  // made by the request whose answer was lost
+        account.state = State::Stored;  // created by the request whose answer was lost
     } else {
         ReportWrong("create " + nodeName, answer);
     }
@@ -178,7 +177,7 @@ void Client::Delete(Node& node)
     account.state = State::Absent;
 }
 
-// The nodes of this client by their ids: all that are stored, and no others.
+// Lists the stored nodes of this client by id. The reply must have them all and no others.
 void Client::ListSome()
 {
     Json::Value ids(Json::arrayValue);
@@ -255,7 +254,7 @@ Answer Client::Measure(Kind kind, Operation operation)
     return answer;
 }
 
-// The registry has said that it could not do it; nothing has changed then.
+// The registry reported that it failed. Then nothing has changed.
 bool Client::IsGivenUp(const Answer& answer)
 {
     const int code = Response(answer.reply).getErrCode();
@@ -270,7 +269,7 @@ bool Client::IsGivenUp(const Answer& answer)
 void Client::ReportWrong(const std::string& what, const Answer& answer)
 {
     findings.Add(Promise::Answers,
-                 name + ": " + what + " was answered " + NodeRegistry::ToLine(answer.reply));
+                 name + ": " + what + " got the reply " + NodeRegistry::ToLine(answer.reply));
 }
 
 int Client::Random(int most)

@@ -1,5 +1,5 @@
-// A client of the registry. It asks one request after the other, notes what it is told about its
-// nodes, and compares every answer with its notes.
+// A client of the registry. It makes one request after the other, keeps a ledger of what it is told about its
+// nodes, and compares every answer with the ledger.
 #ifndef ORVADRCORE_TESTS_SOAK_CLIENT_H
 #define ORVADRCORE_TESTS_SOAK_CLIENT_H
 
@@ -20,9 +20,9 @@
 
 namespace Soak {
 
-// What came of a request.
+// The result of a request.
 struct Answer {
-    // NotSent: the request has reached nobody. Lost: nobody knows whether it was done.
+    // NotSent: the request reached nobody. Lost: nobody knows whether it was done. Told: there is a reply.
     enum class Outcome { NotSent, Lost, Told } outcome = Outcome::NotSent;
     Json::Value reply;
 };
@@ -30,17 +30,16 @@ struct Answer {
 // Sends a request and waits for the answer.
 using Ask = std::function<Answer(const std::string& request)>;
 
-// Sends something that is no request, and tells whether the answer was what it should be; none when
-// there was no answer.
+// Sends something that is not a request. Returns whether the answer was right; nothing without an answer.
 using AskNonsense = std::function<std::optional<bool>(int which)>;
 
 enum class Kind { Create, Get, Set, Delete, List, Status, Nonsense };
 constexpr std::size_t Kinds = 7;
 const char* NameOf(Kind kind);
 
-// What a client has met.
+// A client's statistics.
 struct Notes {
-    std::array<std::vector<std::uint32_t>, Kinds> microseconds;  // of each answer
+    std::array<std::vector<std::uint32_t>, Kinds> microseconds;  // until each answer
     std::map<int, int> givenUp;                                  // by error code
     int lost = 0;
     milliseconds longestGap{0};  // between two answers
@@ -51,10 +50,10 @@ class Client {
     Client(const std::string& clientName, Ask ask, AskNonsense nonsense, const Bounds& bounds,
            Findings& findings);
 
-    // Asks one request, and waits for its answer.
+    // Makes one request and waits for the answer.
     void AskOne();
 
-    // Says that the client has not been waiting until now.
+    // From now on counts the time without an answer anew: the client was paused.
     void ForgetGap();
 
     const std::string& Name() const { return name; }

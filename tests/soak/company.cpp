@@ -4,7 +4,6 @@
 #include <poll.h>
 #include <signal.h>
 #include <sys/socket.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -12,13 +11,15 @@
 #include <thread>
 #include <utility>
 
+#include "support/processes/reap.h"
+
 namespace Soak {
 
 namespace {
 
 constexpr milliseconds StartAgain{50};
 
-// A port that nobody uses, for all services of the run: each must get it from the one before.
+// A free port for all services of the run. Each must be able to reuse it after the one before.
 int FreePort()
 {
     sockaddr_in address{};
@@ -94,7 +95,7 @@ void Member::End() const
     if (!end) {
         findings.Add(Promise::Ends, name + " does not end: " + Describe(pid));
         ::kill(pid, SIGKILL);
-    } else if (!WIFEXITED(*end) || WEXITSTATUS(*end) != 0) {
+    } else if (ExitCodeOf(*end) != 0) {
         findings.Add(Promise::Ends, name + " ended with " + DescribeEnd(*end));
     }
 }
@@ -124,7 +125,7 @@ Company::Company(const Plan& plan, Reaper& reaping, Findings& where)
                    {"/proc/self/exe", "--neighbour", plan.Database(), plan.StatusDirectory()});
 }
 
-// A program that ends with its input.
+// Adds a program that ends with its input.
 void Company::AddLineProgram(const Plan& plan, const std::string& name,
                              std::vector<std::string> words)
 {

@@ -1,5 +1,5 @@
-// Who takes part in a soak: the service, two command-line registries and a neighbour. Whoever is
-// killed is started again.
+// The processes of a soak: the service, two command-line registries and a neighbour. A killed one is started
+// again.
 #ifndef ORVADRCORE_TESTS_SOAK_COMPANY_H
 #define ORVADRCORE_TESTS_SOAK_COMPANY_H
 
@@ -15,28 +15,29 @@
 
 namespace Soak {
 
-// A program that runs all the time.
+// A program that is kept running.
 class Member {
   public:
     struct Program {
         std::vector<std::string> words;
         std::string logFile;
-        std::function<bool(Pipes)> welcome;  // takes the pipes; false when the program is of no use
+        std::function<bool(Pipes)>
+            welcome;  // takes the pipes; false if the program did not come up
         std::function<void(pid_t)> tellToEnd;
     };
 
     Member(std::string name, Program program, const Bounds& bounds, Reaper& reaper,
            Findings& findings);
 
-    // Starts it, again and again as long as the bounds allow.
+    // Starts it, and repeats that for as long as the bounds allow.
     void Start();
 
     void Kill();
 
-    // Starts it again when it has ended, which it may only do when it was killed.
+    // Starts it again after it was killed. It must not end in another way.
     void Tend();
 
-    // Ends it, which must come about in time and with code 0.
+    // Ends it. It must do so in time and with exit code 0.
     void End() const;
 
     const std::string& Name() const { return name; }
@@ -56,7 +57,7 @@ class Member {
     milliseconds longestStart{0};
 };
 
-// All members, and the ways to them. Used by one thread, but for the channels: each has a client.
+// All members and the channels to them. For one thread, except that each channel has a client of its own.
 class Company {
   public:
     Company(const Plan& plan, Reaper& reaper, Findings& findings);

@@ -4,7 +4,7 @@ namespace Soak {
 
 namespace {
 
-constexpr std::size_t MostShown = 8;
+constexpr std::size_t MaxShown = 8;
 
 }  // namespace
 
@@ -12,12 +12,12 @@ const char* WordsOf(Promise promise)
 {
     switch (promise) {
         case Promise::Answers: return "every answer is right";
-        case Promise::Stored: return "what was answered is stored, once, and nothing else is";
-        case Promise::Integrity: return "the database is sound";
+        case Promise::Stored: return "confirmed changes are stored, once, and nothing else";
+        case Promise::Integrity: return "the database is intact";
         case Promise::Refreshes: return "the status is refreshed, and no refresh hangs";
         case Promise::Waits: return "no request waits too long";
         case Promise::Starvation: return "no client starves";
-        case Promise::Ends: return "processes end when told to, and only then";
+        case Promise::Ends: return "processes end when told to, and not before";
         case Promise::Growth: return "processes do not grow";
         case Promise::LeftOvers: return "no lock, pid file or temporary file is left";
     }
@@ -36,9 +36,9 @@ std::vector<std::string> Findings::Of(Promise promise) const
     const auto found = texts.find(promise);
     if (found == texts.end()) return {};
     std::vector<std::string> shown = found->second;
-    if (shown.size() > MostShown) {
-        const std::size_t more = shown.size() - MostShown;
-        shown.resize(MostShown);
+    if (shown.size() > MaxShown) {
+        const std::size_t more = shown.size() - MaxShown;
+        shown.resize(MaxShown);
         shown.push_back("... and " + std::to_string(more) + " more");
     }
     return shown;

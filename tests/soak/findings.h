@@ -1,4 +1,4 @@
-// What a soak has found to be broken.
+// The broken promises that a soak has found.
 #ifndef ORVADRCORE_TESTS_SOAK_FINDINGS_H
 #define ORVADRCORE_TESTS_SOAK_FINDINGS_H
 
@@ -27,12 +27,12 @@ constexpr Promise AllPromises[] = {Promise::Answers,   Promise::Stored, Promise:
 
 const char* WordsOf(Promise promise);
 
-// Findings may be added by any thread.
+// Any thread may add findings.
 class Findings {
   public:
     void Add(Promise promise, const std::string& text);
 
-    // Those of one promise; the first ones, and a line that says how many more there were.
+    // The first findings about a promise, and a line with the number of the others.
     std::vector<std::string> Of(Promise promise) const;
     bool IsEmpty() const;
 

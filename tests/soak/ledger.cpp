@@ -6,13 +6,15 @@ namespace {
 
 using Rows = std::multimap<std::string, const Row*>;  // by name
 
-// What is wrong with a node that is there, to be read after its name; empty when nothing is.
+// What is wrong with a node in the database, as words that follow its name; empty if nothing is.
 std::string ProblemOf(const Account& account, const Row& row)
 {
-    if (account.state == State::Absent) return " is there, although it was never made or removed";
-    if (!account.id.empty() && account.id != row.id) return " has another id than was answered";
+    if (account.state == State::Absent)
+        return " is there, although it was never created or was deleted";
+    if (!account.id.empty() && account.id != row.id) return " has another id than the reply said";
     if (account.ports.count(row.port) == 0) {
-        return " has port " + std::to_string(row.port) + ", which was not asked for or replaced";
+        return " has port " + std::to_string(row.port) +
+               ", which was never requested or has been replaced";
     }
     return {};
 }
@@ -26,7 +28,7 @@ void CompareOne(const std::string& name, const Account& account, const Rows& byN
         comparison.problems.push_back(name + " is there " + std::to_string(count) + " times");
     }
     if (count == 0 && account.state == State::Stored) {
-        comparison.problems.push_back(name + " is missing, although it was answered");
+        comparison.problems.push_back(name + " is missing, although its creation was confirmed");
     }
     for (auto row = begin; row != end; ++row) {
         const std::string problem = ProblemOf(account, *row->second);
@@ -56,7 +58,7 @@ Comparison Compare(const std::vector<const Ledger*>& ledgers, const std::vector<
     }
     for (const Row& row : rows) {
         if (known.count(row.name) == 0) {
-            comparison.problems.push_back(row.name + " is there, although nobody asked for it");
+            comparison.problems.push_back(row.name + " is there, although nobody created it");
         }
     }
     return comparison;

@@ -59,7 +59,7 @@ void Load::Stop()
 
 void Load::Pause(const std::function<void()>& look)
 {
-    if (!gate.Close(plan.bounds.wait * 2)) findings.Add(Promise::Waits, "requests do not end");
+    if (!gate.Close(plan.bounds.wait * 2)) findings.Add(Promise::Waits, "requests do not finish");
     look();
     gate.Open();
 }
@@ -73,9 +73,9 @@ std::vector<const Client*> Load::Clients() const
 
 std::vector<const Client*> Load::HttpClients() const
 {
-    std::vector<const Client*> those = Clients();
-    those.resize(Connections);
-    return those;
+    std::vector<const Client*> first = Clients();
+    first.resize(Connections);
+    return first;
 }
 
 template <class Channel>

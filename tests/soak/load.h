@@ -1,4 +1,4 @@
-// All clients of a soak, with a thread each.
+// All clients of a soak, each with its own thread.
 #ifndef ORVADRCORE_TESTS_SOAK_LOAD_H
 #define ORVADRCORE_TESTS_SOAK_LOAD_H
 
@@ -19,14 +19,14 @@
 
 namespace Soak {
 
-// Keeps clients from beginning a request.
+// Stops clients from starting requests.
 class Gate {
   public:
-    // Around a request. Entering waits while the gate is closed; whether it did.
+    // Call these around a request. Enter() waits while the gate is closed, and returns whether it did.
     bool Enter();
     void Leave();
 
-    // Returns when no request is under way, or false when that takes too long.
+    // Returns when no request is in progress; false if that takes too long.
     bool Close(milliseconds patience);
     void Open();
 
@@ -46,13 +46,13 @@ class Load {
 
     void Start();
 
-    // Returns when all clients have their last answer.
+    // Returns when all clients have got their last answer.
     void Stop();
 
-    // Calls `look` while no request is under way.
+    // Calls `look` while no request is in progress.
     void Pause(const std::function<void()>& look);
 
-    // To be looked at when they have stopped. Those who ask over HTTP come first.
+    // For use after Stop(). The HTTP clients come first.
     std::vector<const Client*> Clients() const;
     std::vector<const Client*> HttpClients() const;
 

@@ -1,9 +1,8 @@
-// A daemon under load, for minutes: see --help.
+// Puts a daemon under load for minutes: see --help.
 //
-// The files, in the order in which they are best read: plan (what happens, and the bounds), soak (one
-// run), company (the processes), channels, client and load (who asks), ledger (what they were told),
-// chaos (what goes wrong), neighbour (a process of our own beside them), watch (looks on), checks (at
-// the end), findings and report.
+// Read the files in this order: plan (what happens, and the bounds), soak (one run), company (the
+// processes), channels, client and load (the requests), ledger (what clients were told), chaos (what goes
+// wrong), neighbour (another daemon), watch (checks during the run), checks (after it), findings, report.
 #include <unistd.h>
 
 #include <charconv>
@@ -22,20 +21,20 @@
 namespace {
 
 constexpr int ExitUsage = 2;
-constexpr int ExitNoRights = 77;                 // as tests say that they were skipped
-constexpr unsigned int LastResortSeconds = 300;  // beyond the length: then something in here hangs
+constexpr int ExitNoRights = 77;                 // CTest counts the test as skipped
+constexpr unsigned int LastResortSeconds = 300;  // longer than the run: then the soak itself hangs
 
 constexpr const char* Usage =
     "usage: soak [--seconds COUNT] [--dir DIRECTORY]\n"
     "\n"
-    "Runs the node registry as a service, two more on the command line and a neighbour\n"
-    "on one database, with 64 clients on 127.0.0.1, for so many seconds (default 120, at\n"
-    "least 10). Meanwhile processes are killed, the disk of the status is full, and the\n"
-    "database is locked. Prints what was measured, and each promise that was broken; then\n"
-    "DIRECTORY (default: a new one in /tmp), which holds the database and the log, is\n"
-    "kept. Needs root, or user namespaces.\n"
+    "Runs the node registry as a service, twice on the command line, and a neighbour, all\n"
+    "on one database, with 64 clients on 127.0.0.1, for COUNT seconds (default 120, at\n"
+    "least 10). Meanwhile it kills processes, fills the disk of the status and locks the\n"
+    "database. Prints measurements and each broken promise. If a promise was broken, keeps\n"
+    "DIRECTORY (default: a new one in /tmp) with the database and the log. Needs root or\n"
+    "user namespaces.\n"
     "\n"
-    "Exit codes: 0 all promises were kept, 1 one was broken, 2 wrong options, 77 no rights.\n";
+    "Exit codes: 0 all promises kept, 1 a promise broken, 2 wrong options, 77 no rights.\n";
 
 bool ReadSeconds(const char* text, std::chrono::seconds& ret_length)
 {
@@ -61,7 +60,7 @@ bool ReadOptions(int argc, char** argv, Soak::Plan& plan)
     return true;
 }
 
-// An empty directory in full. Empty when there is none.
+// Makes an empty directory. Returns its full path, or an empty text on failure.
 std::string MakeDirectory(const std::string& wanted)
 {
     std::error_code error;
@@ -90,7 +89,7 @@ int main(int argc, char** argv)
     }
     plan.directory = MakeDirectory(plan.directory);
     if (plan.directory.empty() || !Soak::Prepare(plan)) {
-        std::fputs("soak: no directory, or no right to mount in it\n", stderr);
+        std::fputs("soak: cannot make the directory or mount in it\n", stderr);
         return ExitNoRights;
     }
     static_cast<void>(std::signal(SIGPIPE, SIG_IGN));

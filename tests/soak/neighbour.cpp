@@ -28,14 +28,14 @@ namespace {
 
 constexpr milliseconds ReadEvery{20};
 constexpr milliseconds StartEvery{50};
-constexpr std::size_t MostStarted = 40;  // alive at a time
+constexpr std::size_t MaxStarted = 40;  // alive at a time
 constexpr const char* SleepSeconds = "2";
 constexpr int BusyThreads = 2;
 constexpr std::chrono::microseconds BusyEvery{200};
 
 constexpr int LockPatienceMSec = 10'000;
 
-// Programs that inherit whatever is open and not close-on-exec, and live for a while.
+// Starts programs that live for a while and inherit every descriptor that is not close-on-exec.
 void StartPrograms(const std::atomic<bool>& isEnding)
 {
     std::string program = "/bin/sleep";
@@ -44,7 +44,7 @@ void StartPrograms(const std::atomic<bool>& isEnding)
     std::deque<pid_t> started;
     while (!isEnding) {
         pid_t pid = -1;
-        if (started.size() < MostStarted &&
+        if (started.size() < MaxStarted &&
             ::posix_spawn(&pid, words[0], nullptr, nullptr, words.data(), environ) == 0) {
             started.push_back(pid);
         }
@@ -55,8 +55,7 @@ void StartPrograms(const std::atomic<bool>& isEnding)
     }
 }
 
-// Takes locks of the C and C++ libraries all the time: those of the log, of time zones, of locales,
-// of memory and of a stream.
+// Takes locks of the C and C++ libraries all the time: for syslog, time zones, locales, memory and a stream.
 void KeepBusy(const std::atomic<bool>& isEnding)
 {
     std::ofstream nowhere("/dev/null");
@@ -97,7 +96,7 @@ bool Run(sqlite3* database, const char* statement)
 
 int RunNeighbour(const std::string& database, const std::string& statusDirectory)
 {
-    // A locale of a daemon's own: not the one that streams copy without a lock.
+    // A locale of our own, because streams copy the classic one without a lock.
     std::locale::global(std::locale(std::locale(), new std::numpunct<char>));
     static_cast<void>(std::signal(SIGPIPE, SIG_IGN));
     std::atomic<bool> isEnding{false};

@@ -1,4 +1,4 @@
-// The other processes of a soak that are this program itself.
+// Processes of a soak that run this program in another role.
 #ifndef ORVADRCORE_TESTS_SOAK_NEIGHBOUR_H
 #define ORVADRCORE_TESTS_SOAK_NEIGHBOUR_H
 
@@ -6,12 +6,12 @@
 
 namespace Soak {
 
-// A daemon that does what daemons do beside the library. One thread reads the status as a handler does,
-// and prints a line each time; another one starts programs; others log, format times and copy
-// locales. Ends with its standard input. The exit code.
+// A daemon with other work than the library's. One thread reads the status and prints a line each time,
+// another starts programs, others log, format times and copy locales. It ends with its standard input.
+// Returns the exit code.
 int RunNeighbour(const std::string& database, const std::string& statusDirectory);
 
-// Holds an exclusive lock on a database for LockIsHeld. The exit code.
+// Holds an exclusive lock on a database for LockIsHeld. Returns the exit code.
 int HoldLock(const std::string& database);
 
 }  // namespace Soak

@@ -20,8 +20,8 @@ namespace {
 
 constexpr milliseconds ReapEvery{5};
 constexpr mode_t LogMode = 0644;
-constexpr int Looks = 10;
-constexpr milliseconds LookEvery{20};
+constexpr int Samples = 10;
+constexpr milliseconds SampleEvery{20};
 
 std::string ReadAll(const std::string& path)
 {
@@ -35,7 +35,7 @@ std::string OfProcess(pid_t pid, const std::string& file)
     return ReadAll("/proc/" + std::to_string(pid) + "/" + file);
 }
 
-// What stands after a name in /proc/PID/status, up to the end of the line.
+// The value of a field in /proc/PID/status.
 std::string StatusField(pid_t pid, const std::string& name)
 {
     const std::string status = OfProcess(pid, "status");
@@ -52,7 +52,7 @@ int CountOpen(pid_t pid)
     return static_cast<int>(std::distance(begin(open), end(open)));
 }
 
-// In the new process, which makes system calls only.
+// Runs in the new process, which may only make system calls.
 [[noreturn]] void BecomeProgram(char* const* words, int in, int out, int log)
 {
     ::prctl(PR_SET_PDEATHSIG, SIGKILL);
@@ -174,8 +174,8 @@ std::vector<pid_t> ChildrenOf(pid_t pid)
 Usage UsageOf(const std::string& name, pid_t pid)
 {
     Usage usage{name, pid, std::atol(StatusField(pid, "RssAnon").c_str()), CountOpen(pid)};
-    for (int look = 1; look < Looks; ++look) {
-        std::this_thread::sleep_for(LookEvery);
+    for (int sample = 1; sample < Samples; ++sample) {
+        std::this_thread::sleep_for(SampleEvery);
         usage.descriptors = std::min(usage.descriptors, CountOpen(pid));
     }
     return usage;

@@ -20,7 +20,7 @@ double ToMSec(std::uint32_t microseconds)
     return microseconds / 1000.0;
 }
 
-// The value that so many percent do not exceed. `sorted` must not be empty.
+// A percentile of values, which must be sorted and not empty.
 std::uint32_t PercentileOf(const std::vector<std::uint32_t>& sorted, double percent)
 {
     const double rank = percent / 100 * static_cast<double>(sorted.size() - 1);
@@ -38,7 +38,7 @@ void PrintLatencies(const char* name, std::vector<std::uint32_t> microseconds)
     std::printf(" %9.1f\n", ToMSec(microseconds.back()));
 }
 
-// How the answers are shared out among clients of a kind.
+// How evenly the answers are distributed among these clients.
 void PrintShares(const char* kind, std::vector<const Client*> clients)
 {
     const auto fewer = [](const Client* left, const Client* right) {
@@ -86,7 +86,8 @@ void PrintFailures(const std::vector<const Client*>& clients)
         for (const auto& [code, times] : client->GetNotes().givenUp) givenUp[code] += times;
         lost += client->GetNotes().lost;
     }
-    std::printf("lost         %d answers, of requests under way when a process was killed\n", lost);
+    std::printf("lost         %d answers to requests in progress when a process was killed\n",
+                lost);
     std::printf("given up    ");
     if (givenUp.empty()) std::printf(" 0");
     for (const auto& [code, times] : givenUp) {
@@ -143,7 +144,7 @@ void PrintUsages(const std::vector<Usage>& before, const std::vector<Usage>& aft
 
 void PrintComparison(const Comparison& comparison)
 {
-    std::printf("stored       %d nodes as answered; of %d whose answer was lost %d\n",
+    std::printf("stored       %d nodes as confirmed; of %d whose answer was lost, %d\n",
                 comparison.stored, comparison.unknown, comparison.unknownFound);
 }
 

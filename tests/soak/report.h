@@ -1,4 +1,4 @@
-// What a soak prints at its end.
+// Prints the report of a soak.
 #ifndef ORVADRCORE_TESTS_SOAK_REPORT_H
 #define ORVADRCORE_TESTS_SOAK_REPORT_H
 
@@ -22,7 +22,7 @@ void PrintStatus(const RefreshWatch& refreshes, const NeighbourWatch& neighbour)
 void PrintUsages(const std::vector<Usage>& before, const std::vector<Usage>& after);
 void PrintComparison(const Comparison& comparison);
 
-// One line for each promise, and what was found against it.
+// One line for each promise, followed by the findings.
 void PrintFindings(const Findings& findings);
 
 }  // namespace Soak

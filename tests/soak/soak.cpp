@@ -32,15 +32,15 @@ using OrvaDRCore::FileLock;
 namespace {
 
 constexpr milliseconds StepEvery{10};
-constexpr milliseconds Calmness{2000};  // at the end, so that refreshes follow the last kill
+constexpr milliseconds Calmness{2000};  // at the end, so that refreshes happen after the last kill
 
-// When the service and a registry are killed for the last time, and when they are looked at for the
-// first time: by then each thread of theirs has worked.
+// Parts of the run: when the service and a registry are killed for the last time, and when their resources
+// are measured first. By then all their threads have worked.
 constexpr double SpareFrom = 0.4;
-constexpr double LookFrom = 0.5;
+constexpr double MeasureAt = 0.5;
 
-// Lets things go wrong until a moment.
-void Trouble(Chaos& chaos, Company& company, Clock::time_point until, bool areSurvivorsSpared)
+// Makes things go wrong until a point in time.
+void MakeTrouble(Chaos& chaos, Company& company, Clock::time_point until, bool areSurvivorsSpared)
 {
     while (Clock::now() < until) {
         chaos.Step(areSurvivorsSpared);
@@ -56,8 +56,8 @@ std::vector<const Ledger*> LedgersOf(const Load& load)
     return ledgers;
 }
 
-// For the programs that are started: what threads free goes back to the system, so that the heap of a
-// process with threads says after a minute whether it grows, and not after hours.
+// Makes started programs return freed memory to the system, so that a growing heap shows after a minute
+// instead of hours.
 void SteadyTheHeap()
 {
     for (const char* setting : {"MALLOC_MMAP_THRESHOLD_", "MALLOC_TRIM_THRESHOLD_"}) {
@@ -109,11 +109,11 @@ bool Run(const Plan& plan)
     RefreshWatch refreshes(
         plan, [&] { return chaos.IsDiskFull(); }, findings);
 
-    Trouble(chaos, company, at(SpareFrom), false);
-    Trouble(chaos, company, at(LookFrom), true);
+    MakeTrouble(chaos, company, at(SpareFrom), false);
+    MakeTrouble(chaos, company, at(MeasureAt), true);
     std::vector<Usage> before;
     load.Pause([&] { before = UsagesOf(company); });
-    Trouble(chaos, company, at(1) - Calmness, true);
+    MakeTrouble(chaos, company, at(1) - Calmness, true);
     chaos.Calm();
     company.Tend();
     std::this_thread::sleep_for(Calmness);

@@ -1,4 +1,4 @@
-// What a soak looks with is able to see: each promise is broken here by hand.
+// The soak's checks notice broken promises: each one is broken here by hand.
 #include <fcntl.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -52,7 +52,7 @@ class SoakTest : public ::testing::Test {
 
     static void Touch(const std::string& path) { std::ofstream(path) << "x"; }
 
-    // What was found against one promise, and that nothing was against any other.
+    // The findings about a promise. There must be none about any other.
     std::vector<std::string> OnlyFindings(Promise promise) const
     {
         for (const Promise other : AllPromises) {
@@ -80,7 +80,7 @@ std::vector<std::string> ProblemsOf(const Ledger& ledger, const std::vector<Row>
     return Compare({&ledger}, rows).problems;
 }
 
-TEST(SoakLedgerTest, NodesThatAreAsToldAreRight)
+TEST(SoakLedgerTest, NodesAsToldAreNoProblem)
 {
     EXPECT_THAT(ProblemsOf(Told(State::Stored), {{"id", "a", 1}}), IsEmpty());
     EXPECT_THAT(ProblemsOf(Told(State::Absent), {}), IsEmpty());
@@ -102,22 +102,22 @@ TEST(SoakLedgerTest, NodesWhoseAnswerWasLostMayBeThereOrNot)
     EXPECT_EQ(missing.unknownFound, 0);
 }
 
-TEST(SoakLedgerTest, WhatIsNotAsToldIsFound)
+TEST(SoakLedgerTest, FindsNodesThatAreNotAsTold)
 {
     EXPECT_THAT(ProblemsOf(Told(State::Stored), {}),
-                ElementsAre("a is missing, although it was answered"));
+                ElementsAre("a is missing, although its creation was confirmed"));
     EXPECT_THAT(ProblemsOf(Told(State::Stored), {{"id", "a", 1}, {"id", "a", 2}}),
                 ElementsAre("a is there 2 times"));
     EXPECT_THAT(ProblemsOf(Told(State::Unknown), {{"id", "a", 1}, {"id", "a", 1}}),
                 ElementsAre("a is there 2 times"));
     EXPECT_THAT(ProblemsOf(Told(State::Stored), {{"id", "a", 3}}),
-                ElementsAre("a has port 3, which was not asked for or replaced"));
+                ElementsAre("a has port 3, which was never requested or has been replaced"));
     EXPECT_THAT(ProblemsOf(Told(State::Stored), {{"other", "a", 1}}),
-                ElementsAre("a has another id than was answered"));
+                ElementsAre("a has another id than the reply said"));
     EXPECT_THAT(ProblemsOf(Told(State::Absent), {{"id", "a", 1}}),
-                ElementsAre("a is there, although it was never made or removed"));
+                ElementsAre("a is there, although it was never created or was deleted"));
     EXPECT_THAT(ProblemsOf({}, {{"id", "b", 1}}),
-                ElementsAre("b is there, although nobody asked for it"));
+                ElementsAre("b is there, although nobody created it"));
 }
 
 class SoakDatabaseTest : public SoakTest {
@@ -137,16 +137,16 @@ class SoakDatabaseTest : public SoakTest {
     }
 };
 
-TEST_F(SoakDatabaseTest, RowsAreComparedWithWhatWasTold)
+TEST_F(SoakDatabaseTest, ComparesRowsWithTheLedgers)
 {
     Run("INSERT INTO nodes VALUES ('id','a',1),('id2','b',2)");
     const Ledger ledger = Told(State::Stored);
     EXPECT_EQ(CheckDatabase(plan.Database(), {&ledger}, findings).stored, 1);
     EXPECT_THAT(OnlyFindings(Promise::Stored),
-                ElementsAre("b is there, although nobody asked for it"));
+                ElementsAre("b is there, although nobody created it"));
 }
 
-TEST_F(SoakDatabaseTest, DamageIsFound)
+TEST_F(SoakDatabaseTest, FindsDamage)
 {
     Run("WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i+1 FROM n WHERE i<2000) "
         "INSERT INTO nodes SELECT i, 'name' || i, i FROM n");
@@ -158,15 +158,15 @@ TEST_F(SoakDatabaseTest, DamageIsFound)
     EXPECT_THAT(findings.Of(Promise::Integrity), Not(IsEmpty()));
 }
 
-TEST_F(SoakDatabaseTest, ADatabaseThatIsNotThereIsFound)
+TEST_F(SoakDatabaseTest, FindsThatTheDatabaseIsMissing)
 {
     CheckDatabase(dir.File("none"), {}, findings);
     EXPECT_THAT(OnlyFindings(Promise::Integrity), ElementsAre("unable to open database file"));
 }
 
-// -------------------------------------------------------------------------------------- left-overs
+// --------------------------------------------------------------------------------------- leftovers
 
-TEST_F(SoakTest, FilesThatAreLeftAreFound)
+TEST_F(SoakTest, FindsLeftoverFiles)
 {
     Touch(plan.Database());
     Touch(plan.StatusFile());
@@ -181,14 +181,14 @@ TEST_F(SoakTest, FilesThatAreLeftAreFound)
                 ElementsAre(left[0] + " is left", left[1] + " is left", left[2] + " is left"));
 }
 
-TEST_F(SoakTest, AStatusThatIsMissingIsFound)
+TEST_F(SoakTest, FindsThatTheStatusIsMissing)
 {
     Touch(plan.Database());
     CheckFiles(plan, findings);
     EXPECT_THAT(OnlyFindings(Promise::LeftOvers), ElementsAre(plan.StatusFile() + " is missing"));
 }
 
-TEST_F(SoakTest, ALockThatIsHeldIsFound)
+TEST_F(SoakTest, FindsAHeldLock)
 {
     const std::string path = dir.File("lock");
     Touch(path);
@@ -213,7 +213,7 @@ TEST_F(SoakTest, ALockThatIsHeldIsFound)
 
 // ---------------------------------------------------------------------------------------- processes
 
-TEST_F(SoakTest, AProcessThatIsLeftIsFoundAndKilled)
+TEST_F(SoakTest, FindsAndKillsALeftoverProcess)
 {
     ChildProcess left([](ChildProcess::Link& link) { link.Await(); });
     plan.bounds.end = milliseconds(1);
@@ -243,7 +243,7 @@ class SoakMemberTest : public SoakTest {
     Reaper reaper;
 };
 
-TEST_F(SoakMemberTest, AProgramThatEndsByItselfIsFound)
+TEST_F(SoakMemberTest, FindsAProgramThatEndsByItself)
 {
     Member member = Make({"/bin/false"});
     member.Start();
@@ -254,7 +254,7 @@ TEST_F(SoakMemberTest, AProgramThatEndsByItselfIsFound)
     EXPECT_NE(member.Pid(), first);
 }
 
-TEST_F(SoakMemberTest, AProgramThatWasKilledIsStartedAgain)
+TEST_F(SoakMemberTest, RestartsAKilledProgram)
 {
     Member member = Make({"/bin/sleep", "60"});
     member.Start();
@@ -268,7 +268,7 @@ TEST_F(SoakMemberTest, AProgramThatWasKilledIsStartedAgain)
     member.Kill();
 }
 
-TEST_F(SoakMemberTest, AProgramThatDoesNotEndIsFoundAndKilled)
+TEST_F(SoakMemberTest, FindsAndKillsAProgramThatDoesNotEnd)
 {
     plan.bounds.end = milliseconds(1);
     Member member = Make({"/bin/sleep", "60"});
@@ -280,7 +280,7 @@ TEST_F(SoakMemberTest, AProgramThatDoesNotEndIsFoundAndKilled)
     EXPECT_TRUE(reaper.AwaitEnd(member.Pid(), seconds(60)));
 }
 
-TEST_F(SoakMemberTest, AWrongExitCodeIsFound)
+TEST_F(SoakMemberTest, FindsAWrongExitCode)
 {
     Member member = Make({"/bin/false"});
     member.Start();
@@ -288,7 +288,7 @@ TEST_F(SoakMemberTest, AWrongExitCodeIsFound)
     EXPECT_THAT(OnlyFindings(Promise::Ends), ElementsAre("it ended with exit code 1"));
 }
 
-TEST_F(SoakMemberTest, AProgramThatCannotBeStartedIsFound)
+TEST_F(SoakMemberTest, FindsAProgramThatCannotBeStarted)
 {
     plan.bounds.start = milliseconds(1);
     Member member = Make({"/bin/true"}, false);
@@ -296,7 +296,7 @@ TEST_F(SoakMemberTest, AProgramThatCannotBeStartedIsFound)
     EXPECT_THAT(OnlyFindings(Promise::Ends), ElementsAre("it cannot be started again"));
 }
 
-TEST_F(SoakTest, GrowthIsFoundInThoseThatSurvive)
+TEST_F(SoakTest, FindsGrowthOfSurvivors)
 {
     plan.length = LongEnoughForMemory;
     const std::vector<Usage> before = {{"one", 1, 1000, 10}, {"two", 2, 1000, 10}};
@@ -309,7 +309,7 @@ TEST_F(SoakTest, GrowthIsFoundInThoseThatSurvive)
                             "two had 1000 KiB of memory, and has 5097"));
 }
 
-TEST_F(SoakTest, AProcessIsMeasured)
+TEST_F(SoakTest, MeasuresAProcess)
 {
     const Usage usage = UsageOf("this", ::getpid());
     const int more = ::open("/dev/null", O_RDONLY | O_CLOEXEC);
@@ -320,7 +320,7 @@ TEST_F(SoakTest, AProcessIsMeasured)
 
 // ------------------------------------------------------------------------------------------ the status
 
-TEST_F(SoakTest, RefreshesAreCounted)
+TEST_F(SoakTest, CountsRefreshes)
 {
     const RefreshWatch watch(
         plan, [] { return false; }, findings);
@@ -332,7 +332,7 @@ TEST_F(SoakTest, RefreshesAreCounted)
     EXPECT_TRUE(findings.IsEmpty());
 }
 
-TEST_F(SoakTest, ARefreshThatHangsIsFoundByName)
+TEST_F(SoakTest, FindsARefreshThatHangs)
 {
     plan.bounds.stale = milliseconds(20);
     std::ofstream(plan.StatusFile() + ".pid") << ::getpid() << "\n";
@@ -344,7 +344,7 @@ TEST_F(SoakTest, ARefreshThatHangsIsFoundByName)
         HasSubstr("for 20 ms; marked as refreshing: process " + std::to_string(::getpid())));
 }
 
-TEST_F(SoakTest, AFullDiskExcusesAStatusThatStays)
+TEST_F(SoakTest, AcceptsAnUnchangedStatusWhileTheDiskIsFull)
 {
     plan.bounds.stale = milliseconds(20);
     std::atomic<bool> isFull{true};
@@ -359,13 +359,13 @@ TEST_F(SoakTest, AFullDiskExcusesAStatusThatStays)
 
 // ------------------------------------------------------------------------------------------ clients
 
-// A registry that does what it is told, and may lie about it or say nothing.
+// A registry that does what it is asked, and may give wrong answers or none.
 class FakeRegistry {
   public:
-    using Lie = std::function<void(const std::string& method, Answer& answer)>;
+    using Falsify = std::function<void(const std::string& method, Answer& answer)>;
 
-    explicit FakeRegistry(Lie how = [](const std::string& /*method*/, Answer& /*answer*/) {})
-        : lie(std::move(how))
+    explicit FakeRegistry(Falsify how = [](const std::string& /*method*/, Answer& /*answer*/) {})
+        : falsify(std::move(how))
     {
     }
 
@@ -375,7 +375,7 @@ class FakeRegistry {
         EXPECT_TRUE(NodeRegistry::ParseLine(text, request));
         const std::string method = request["method"].asString();
         Answer answer{Answer::Outcome::Told, Do(method, request)};
-        lie(method, answer);
+        falsify(method, answer);
         return answer;
     }
 
@@ -421,14 +421,14 @@ class FakeRegistry {
         return Success(data);
     }
 
-    Lie lie;
+    Falsify falsify;
     std::map<std::string, Json::Value> nodes;
     int made = 0;
 };
 
 class SoakClientTest : public SoakTest {
   protected:
-    // Has a client ask the registry often, and compares at the end.
+    // A client makes many requests. Its ledger is compared with the registry at the end.
     void AskOften(FakeRegistry& registry, const std::optional<bool>& nonsense = true)
     {
         constexpr int Requests = 2000;
@@ -441,7 +441,7 @@ class SoakClientTest : public SoakTest {
         problems = ProblemsOf(client.Accounts(), registry.Rows());
     }
 
-    // What a client finds wrong with a registry that lies in its answers to a method.
+    // What a client reports about a registry that falsifies its answers to a method.
     std::string FindingOf(const std::string& method,
                           const std::function<void(Json::Value&)>& change)
     {
@@ -462,7 +462,7 @@ class SoakClientTest : public SoakTest {
     std::vector<std::string> problems;
 };
 
-TEST_F(SoakClientTest, RightAnswersAreNoFinding)
+TEST_F(SoakClientTest, AcceptsRightAnswers)
 {
     FakeRegistry registry;
     AskOften(registry);
@@ -473,7 +473,7 @@ TEST_F(SoakClientTest, RightAnswersAreNoFinding)
     EXPECT_LE(registry.Rows().size(), static_cast<std::size_t>(LiveNodes));
 }
 
-TEST_F(SoakClientTest, LostAnswersAreNoFinding)
+TEST_F(SoakClientTest, AcceptsLostAnswers)
 {
     int count = 0;
     FakeRegistry registry([&](const std::string& /*method*/, Answer& answer) {
@@ -485,7 +485,7 @@ TEST_F(SoakClientTest, LostAnswersAreNoFinding)
     EXPECT_LT(answers, 2000U);
 }
 
-TEST_F(SoakClientTest, WhatIsGivenUpIsCounted)
+TEST_F(SoakClientTest, CountsFailuresOfTheRegistry)
 {
     FakeRegistry registry([](const std::string& method, Answer& answer) {
         if (method == "get") answer.reply = Failure(404, {});
@@ -495,11 +495,11 @@ TEST_F(SoakClientTest, WhatIsGivenUpIsCounted)
     EXPECT_GT(givenUp, 100);
 }
 
-TEST_F(SoakClientTest, WrongAnswersAreFound)
+TEST_F(SoakClientTest, FindsWrongAnswers)
 {
     const auto fails = [](Json::Value& reply) { reply = Failure(507, {}); };
     EXPECT_THAT(FindingOf("create", [](Json::Value& reply) { reply = Failure(508, {}); }),
-                HasSubstr("c: create c-1 was answered"));
+                HasSubstr("c: create c-1 got the reply"));
     EXPECT_THAT(FindingOf("create", [](Json::Value& reply) { reply["data"]["id"] = "other"; }),
                 HasSubstr("c: get c-"));
     EXPECT_THAT(FindingOf("get", fails), HasSubstr("c: get c-"));
@@ -511,17 +511,17 @@ TEST_F(SoakClientTest, WrongAnswersAreFound)
     EXPECT_THAT(FindingOf("delete", fails), HasSubstr("c: delete c-"));
     EXPECT_THAT(FindingOf("list", [](Json::Value& reply) { reply["data"]["nodes"].append(1); }),
                 HasSubstr("c: list of "));
-    EXPECT_THAT(FindingOf("status", fails), HasSubstr("c: status was answered"));
+    EXPECT_THAT(FindingOf("status", fails), HasSubstr("c: status got the reply"));
 }
 
-TEST_F(SoakClientTest, WrongAnswersToNonsenseAreFound)
+TEST_F(SoakClientTest, FindsWrongAnswersToNonsense)
 {
     FakeRegistry registry;
     AskOften(registry, false);
     EXPECT_THAT(OnlyFindings(Promise::Answers)[0], "c: nonsense got a wrong answer");
 }
 
-TEST_F(SoakClientTest, CreatesThatAreDroppedAreFoundAtTheEnd)
+TEST_F(SoakClientTest, FindsLostCreatesAtTheEnd)
 {
     FakeRegistry registry;
     AskOften(registry);
@@ -532,7 +532,7 @@ TEST_F(SoakClientTest, CreatesThatAreDroppedAreFoundAtTheEnd)
     EXPECT_THAT(ProblemsOf(client.Accounts(), {}), Not(IsEmpty()));
 }
 
-TEST_F(SoakClientTest, SlowAnswersAreFound)
+TEST_F(SoakClientTest, FindsSlowAnswers)
 {
     plan.bounds.wait = milliseconds(-1);
     FakeRegistry registry;
@@ -543,7 +543,7 @@ TEST_F(SoakClientTest, SlowAnswersAreFound)
     EXPECT_EQ(found[8], "... and 1992 more");
 }
 
-TEST_F(SoakTest, ClientsThatGoHungryAreFound)
+TEST_F(SoakTest, FindsStarvingClients)
 {
     CheckGap(plan, "c", plan.bounds.gap, findings);
     EXPECT_TRUE(findings.IsEmpty());
@@ -551,7 +551,7 @@ TEST_F(SoakTest, ClientsThatGoHungryAreFound)
     EXPECT_THAT(OnlyFindings(Promise::Starvation), ElementsAre("c got no answer for 15001 ms"));
 }
 
-TEST_F(SoakTest, UnequalSharesAreFound)
+TEST_F(SoakTest, FindsUnequalShares)
 {
     FakeRegistry registry;
     const auto ask = [&](const std::string& request) { return registry.Ask(request); };

@@ -19,7 +19,7 @@ Edition EditionOf(const std::string& path)
     return {status.st_ino, status.st_mtim.tv_sec, status.st_mtim.tv_nsec};
 }
 
-// The process that a pid file names; 0 without one.
+// The process in a pid file; 0 without one.
 pid_t MarkedIn(const std::string& pidFile)
 {
     pid_t pid = 0;
@@ -32,7 +32,7 @@ pid_t MarkedIn(const std::string& pidFile)
 RefreshWatch::RefreshWatch(const Plan& thePlan, std::function<bool()> isFull, Findings& where)
     : plan(thePlan), isDiskFull(std::move(isFull)), findings(where)
 {
-    // Taken here: what comes from now on counts.
+    // Taken before the thread starts: every later refresh counts.
     thread = std::thread([this, first = EditionOf(plan.StatusFile())] { Watch(first); });
 }
 
@@ -46,7 +46,7 @@ void RefreshWatch::Watch(Edition last)
 {
     auto lastChange = Clock::now();
     auto lastReport = lastChange;
-    pid_t reported = -1;  // each process once
+    pid_t reported = -1;  // report each process once
     while (!isStopping) {
         std::this_thread::sleep_for(LookEvery);
         const auto now = Clock::now();
@@ -70,7 +70,7 @@ void RefreshWatch::Report(pid_t updater)
     findings.Add(Promise::Refreshes,
                  "the status has not been refreshed for " +
                      std::to_string(plan.bounds.stale.count()) + " ms; " +
-                     (updater == 0 ? std::string("nobody is marked as refreshing")
+                     (updater == 0 ? std::string("no process is marked as refreshing")
                                    : "marked as refreshing: " + Describe(updater)));
 }
 

@@ -1,4 +1,4 @@
-// Looks on during a soak: is the status refreshed, do clients get answers, do processes grow.
+// Watches during a soak: whether the status is refreshed, clients get answers and processes grow.
 #ifndef ORVADRCORE_TESTS_SOAK_WATCH_H
 #define ORVADRCORE_TESTS_SOAK_WATCH_H
 
@@ -17,7 +17,7 @@
 
 namespace Soak {
 
-// What tells one file of that name from the next.
+// Tells a file from the one that replaced it.
 struct Edition {
     ino_t inode = 0;
     long seconds = 0;
@@ -29,8 +29,8 @@ struct Edition {
     }
 };
 
-// Counts refreshes: each one replaces the file of the status. Reports one that does not come while it
-// could, and what the process looks like that has marked itself as refreshing.
+// Counts refreshes: each one replaces the status file. Reports when none happens although it could, and
+// describes the process that is marked as refreshing.
 class RefreshWatch {
   public:
     RefreshWatch(const Plan& plan, std::function<bool()> isDiskFull, Findings& findings);
@@ -56,7 +56,7 @@ class RefreshWatch {
     std::thread thread;
 };
 
-// Reads what the neighbour prints: a line each time that it has read the status.
+// Reads the neighbour's output: a line for each time it has read the status.
 class NeighbourWatch {
   public:
     explicit NeighbourWatch(LineChannel& channel);
@@ -66,7 +66,7 @@ class NeighbourWatch {
 
     void Stop();
 
-    // After Stop().
+    // For use after Stop().
     int Reads() const { return reads; }
     int Failures() const { return failures; }
     milliseconds LongestGap() const { return longestGap; }
@@ -81,10 +81,10 @@ class NeighbourWatch {
     std::thread thread;
 };
 
-// What the service and the registries use. The neighbour is never at rest.
+// Measures the service and the registries. The neighbour is never idle.
 std::vector<Usage> UsagesOf(const Company& company);
 
-// Reports processes that have been alive all the time between two looks and have grown.
+// Reports processes that lived through both measurements and have grown.
 void CompareUsages(const Plan& plan, const std::vector<Usage>& before,
                    const std::vector<Usage>& after, Findings& findings);
 
