@@ -1,5 +1,5 @@
-// A cache whose file holds any bytes. The first line says how it is read: "stale", "required";
-// behind it comes the file.
+// A cache whose file holds any bytes. The first input line says how it is read: "stale", "required". The rest is
+// the file.
 #include <fcntl.h>
 #include <orvadrcore/cache.h>
 #include <sys/stat.h>
@@ -34,7 +34,7 @@ class AnyCache : public Cache {
     bool IsValidData(const Json::Value& data) const override { return !data.isNull(); }
 };
 
-// A directory with the cache and its lock. Nothing waits for a disk, and no child can be forked.
+// A directory with the cache and its lock. Syncing does nothing, and forking fails.
 struct Surroundings {
     Surroundings()
     {
@@ -71,7 +71,7 @@ struct Surroundings {
     ProcessFaults processes;
 };
 
-// What a file says, by its own words alone.
+// What the cache must read from a file.
 struct Model {
     explicit Model(const std::string& content)
     {
@@ -112,8 +112,8 @@ void Fuzz(const std::string& input)
     const AnyCache cache(surroundings.dir.Path(), "any", Timeout, isRequired, 0);
     CheckUntouched(cache, model, isStale);
 
-    // What is not valid, or stale and required, is refreshed at once; what is only stale stays,
-    // since there is no child to refresh it.
+    // Invalid data is refreshed at once, and so is stale data if fresh data is required. Other stale data
+    // stays, since there is no child to refresh it.
     const bool isRefreshed = model.data.isNull() || (isStale && isRequired);
     const Json::Value expected = isRefreshed ? Json::Value("new") : model.data;
     Expect(cache.Read() == expected, "fresh data is read");

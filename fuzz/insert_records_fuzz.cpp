@@ -1,5 +1,5 @@
-// Records into a table with a key and out again, beside a model of the table. The first line says
-// how: "replace", "nested", "rollback"; an empty line ends a record.
+// Inserts records into a table with a key and reads them back, compared with a model of the table. The
+// first input line says how: "replace", "nested", "rollback". An empty line ends a record.
 #include <orvadrcore/sqlite_transaction.h>
 
 #include <map>
@@ -13,14 +13,14 @@ namespace {
 
 constexpr std::size_t MaxRecords = 16;
 
-// Columns without a type keep each value as it is.
+// Columns without a type store each value unchanged.
 const SqliteTableHandler& Table()
 {
     static const SqliteTableHandler table("t", "a PRIMARY KEY,b,c,d,e,f,g,h");
     return table;
 }
 
-// A record beside what SQLite holds of it.
+// A record, and what SQLite must store for it.
 struct Record {
     SqliteValueList list;
     std::map<std::string, Stored> stored;
@@ -34,7 +34,7 @@ std::vector<Record> TakeRecords(Pieces& pieces)
         while (!pieces.AtEnd()) {
             const Field field = TakeField(pieces);
             if (field.name.empty()) break;
-            // One of the columns, whatever the name is.
+            // Maps any name to one of the columns.
             const std::string column(1, static_cast<char>('a' + ((field.name[0] - 'a') & 7)));
             record.list.AddValue(column, ValueOf(field));
             record.stored[column] = StoredOf(field);
@@ -44,7 +44,7 @@ std::vector<Record> TakeRecords(Pieces& pieces)
     return records;
 }
 
-// The table after the inserts; `succeeded` is what InsertRecords has to answer.
+// The table after the inserts, and what InsertRecords() must return.
 struct Model {
     std::vector<std::map<std::string, Stored>> rows;
     bool succeeded = true;
@@ -68,7 +68,7 @@ Model Insert(const std::vector<Record>& records, bool replacable)
     return model;
 }
 
-// Integers are read as 32 bits, texts up to their first zero byte.
+// Integers are read back as 32 bits, texts up to their first zero byte.
 void CheckRow(const SqliteValueList& row, const std::map<std::string, Stored>& expected)
 {
     Expect(row.GetValues().size() == expected.size(), "a row has the record's fields");

@@ -1,5 +1,4 @@
-// A document that is accepted is printed and read back as it was; one that is not leaves the value
-// alone.
+// An accepted document is printed and read back unchanged. A refused one leaves the value unchanged.
 #include <algorithm>
 #include <cmath>
 
@@ -8,7 +7,7 @@
 
 namespace {
 
-// The same kinds, names and bits. Walks both itself, so that the fuzzer sees what is in a document.
+// Compares kinds, names and bits. Recurses itself, so that the fuzzer sees the structure of a document.
 bool IsSame(const Json::Value& one, const Json::Value& other)
 {
     if (one.type() != other.type() || one.size() != other.size()) return false;

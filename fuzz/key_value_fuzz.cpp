@@ -1,4 +1,4 @@
-// A file of any bytes as "key=value" lines, beside a model of the rules.
+// Reads a file of any bytes as "key=value" lines, compared with a model of the rules.
 #include <orvadrcore/file.h>
 
 #include <charconv>
@@ -16,7 +16,7 @@ bool IsBlank(char character)
     return character != '\0' && std::strchr(" \t\n\v\f\r", character) != nullptr;
 }
 
-// The text without the blanks before it.
+// The text without leading blanks.
 std::string Trimmed(const std::string& text)
 {
     std::size_t at = 0;
@@ -44,7 +44,7 @@ void ReadAs(const std::string& text, std::string& value)
     value = trimmed.substr(0, end);
 }
 
-// The digits, and the largest or smallest number where they are too many.
+// The leading integer; out of range the largest or smallest one.
 void ReadAs(const std::string& text, int& value)
 {
     const std::string trimmed = Trimmed(text);
@@ -61,7 +61,7 @@ void ReadAs(const std::string& text, int& value)
     }
 }
 
-// What looks like a real number; nothing where it breaks off behind its "e" or has no digits.
+// The leading real number; empty without digits, or if it ends after its "e".
 void ReadAs(const std::string& text, double& value)
 {
     const std::string trimmed = Trimmed(text);

@@ -1,5 +1,5 @@
-// A pid file of any bytes. In the input "@" stands for this process's id and "#" for its start
-// time, which no file in a corpus can name.
+// A pid file of any bytes. In the input "@" stands for this process's id and "#" for its start time, which a
+// file in the corpus cannot know.
 #include <orvacore/orvacore.h>
 
 #include <charconv>
@@ -11,7 +11,7 @@
 
 namespace {
 
-constexpr std::size_t ReadSize = 64;  // of a file, what is behind does not count
+constexpr std::size_t ReadSize = 64;  // the rest of the file is ignored
 
 struct Lines {
     std::string first;
@@ -25,7 +25,7 @@ Lines SplitLines(const std::string& text)
     return {text.substr(0, end), rest.substr(0, rest.find('\n'))};
 }
 
-// What the library writes of this process.
+// What the library writes about this process.
 Lines OwnLines()
 {
     const TempDir dir;
@@ -37,7 +37,7 @@ Lines OwnLines()
     return SplitLines(text);
 }
 
-// The number that a line is, 0 where it is none.
+// The number on a line, or 0.
 template <class Number>
 Number Parse(const std::string& line)
 {

@@ -1,4 +1,4 @@
-// A request from any JSON, and parameters added from any other: the first and the second line.
+// A request from any JSON, the first input line, with parameters added from the second.
 #include <orvadrcore/request.h>
 
 #include "base/json_helpers.h"
@@ -8,7 +8,7 @@ using OrvaDRCore::Request;
 
 namespace {
 
-// The document, or the text itself where it is none.
+// The document, or the text itself if it is not JSON.
 Json::Value Parse(const std::string& text)
 {
     Json::Value value(text);
@@ -16,7 +16,7 @@ Json::Value Parse(const std::string& text)
     return value;
 }
 
-// Takes a member out that is of the right kind; null when there is none such.
+// Removes and returns a member of the given kind; null without one.
 Json::Value Take(Json::Value& object, const char* key, bool (Json::Value::*isRight)() const)
 {
     Json::Value member;

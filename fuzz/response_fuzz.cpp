@@ -1,4 +1,4 @@
-// A reply from any text: all questions get an answer, and the one that its JSON says.
+// A reply from any text: every getter returns what the JSON says.
 #include <orvadrcore/response.h>
 
 #include "base/json_helpers.h"
@@ -8,7 +8,7 @@ using OrvaDRCore::Response;
 
 namespace {
 
-// The member of an object; null where there is none.
+// A member of an object; null without one.
 const Json::Value* Member(const Json::Value* object, const std::string& key)
 {
     const bool isThere = object != nullptr && object->isObject() && object->isMember(key);

@@ -1,6 +1,6 @@
-// Statements from any names and values, names as quoted identifiers and texts through EscapeText:
-// taken apart by a tokenizer of SQL, and run. The first line is the table's name, the others are
-// fields. A second time they are built from names and texts as they stand, and only looked at.
+// Builds statements from any names and values, with quoted names and escaped texts, tokenizes them and runs
+// them. Then builds them again from the raw names and texts, and only inspects them. The first input line is
+// the table's name, the others are fields.
 #include <orvadrcore/sqlite_command.h>
 #include <sqlite3.h>
 
@@ -19,7 +19,7 @@ namespace {
 
 constexpr std::size_t MaxFields = 12;
 
-// Quoted names and their values, in the order in which statements have them.
+// Quoted names and their values, in the order of the statements.
 using Fields = std::map<std::string, Field>;
 
 // SQLite ends a statement at a zero byte.
@@ -29,7 +29,7 @@ std::string WithoutZeros(std::string text)
     return text;
 }
 
-// To SQLite, two columns whose names differ in case alone are the same.
+// SQLite takes column names that differ only in case for the same.
 std::string Folded(std::string name)
 {
     for (char& character : name) {
@@ -77,7 +77,7 @@ void Append(Tokens& tokens, const Tokens& more)
     tokens.insert(tokens.end(), more.begin(), more.end());
 }
 
-// The tokens that `make` gives for each field, with commas between.
+// The tokens that `make` returns for each field, separated by commas.
 template <class Make>
 Tokens Listed(const Fields& fields, Make make)
 {
@@ -282,7 +282,7 @@ void CheckRuns(const Statements& statements)
            "what was updated is selected");
 }
 
-// Names and texts as they stand: nothing is promised of the text but that it is there.
+// Raw names and texts: there must be a statement, whatever it says.
 void CheckRaw(const std::string& table, const std::vector<Field>& fields)
 {
     InsertCommand insert;
@@ -333,7 +333,7 @@ void Fuzz(const std::string& input)
     CheckRaw(table, fields);
     if (fields.empty()) return;
 
-    // The letter keeps off the names that SQLite reserves.
+    // The letter avoids the names that SQLite reserves.
     Statements statements{SqliteTableHandler(Quoted("t" + table), ""), {}};
     for (const Field& field : fields) statements.fields.emplace(Quoted(field.name), field);
     CheckTexts(statements);

@@ -1,4 +1,4 @@
-// Fields of records as inputs write them, one a line: kind, name, value.
+// Fields of records in an input, one per line: kind, name, value.
 //
 //     text name=O'Brien
 //     int port=-5001
@@ -15,7 +15,7 @@
 
 #include "support/fuzz.h"
 
-// What SQLite holds for a value.
+// What SQLite stores for a value.
 using Stored = std::variant<long long, std::string>;
 
 struct Field {
@@ -31,7 +31,7 @@ Number ParseNumber(const std::string& text)
     return number;
 }
 
-// The field of the next line. The first letter tells the kind; any other is that of a text.
+// The field on the next line. Its first letter tells the kind; unknown letters mean text.
 inline Field TakeField(Pieces& pieces)
 {
     const std::string kind = pieces.Until(' ');

@@ -1,6 +1,6 @@
-// What the fuzz targets share. NAME_fuzz.cpp defines Fuzz, which is called with one input after the
-// other: any bytes. It must come back; what the sanitizers find, an exception, and an Expect that
-// does not hold end the program, and libFuzzer keeps the input.
+// Shared by the fuzz targets. NAME_fuzz.cpp defines Fuzz(), which is called with one input after the other:
+// any bytes. It must return. A sanitizer's finding, an exception and a failed Expect() end the program, and
+// libFuzzer keeps the input.
 #ifndef ORVADRCORE_FUZZ_H
 #define ORVADRCORE_FUZZ_H
 
@@ -17,15 +17,15 @@ inline void Expect(bool holds, const char* what)
     std::abort();
 }
 
-// Takes an input apart. A backslash gives the character behind it another meaning: "\n" is a
-// newline, "\0" a zero byte, and any other is itself and ends nothing.
+// Splits an input. A backslash escapes the next character: "\n" is a newline, "\0" a zero byte, any other
+// stands for itself and ends nothing.
 class Pieces {
   public:
     explicit Pieces(const std::string& input) : text(input) {}
 
     bool AtEnd() const { return at >= text.size(); }
 
-    // The text up to `end`, which is passed over, or to the end of the line.
+    // The text up to `end`, which is skipped, or to the end of the line.
     std::string Until(char end)
     {
         std::string piece;
@@ -37,7 +37,7 @@ class Pieces {
         return piece;
     }
 
-    // All that is left, as it stands.
+    // The rest, unchanged.
     std::string Rest() const { return AtEnd() ? std::string() : text.substr(at); }
 
   private:

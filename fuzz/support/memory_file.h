@@ -1,4 +1,4 @@
-// A file that takes no disk. Its path opens it anew each time, from the beginning.
+// A file in memory. Each open of its path starts at the beginning.
 #ifndef ORVADRCORE_FUZZ_MEMORY_FILE_H
 #define ORVADRCORE_FUZZ_MEMORY_FILE_H
 

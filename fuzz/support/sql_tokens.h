@@ -1,4 +1,4 @@
-// SQL as a reader of its own takes it apart.
+// A tokenizer for SQL that shares no code with the library or SQLite.
 #ifndef ORVADRCORE_FUZZ_SQL_TOKENS_H
 #define ORVADRCORE_FUZZ_SQL_TOKENS_H
 
@@ -17,7 +17,7 @@ inline std::string Quoted(const std::string& name, char quote = '"')
     return quoted + quote;
 }
 
-// Texts and names with their quotes, numbers and words whole, all else character by character.
+// Tokens are texts and names with their quotes, numbers, words, and single other characters.
 inline Tokens Tokenize(const std::string& text)
 {
     const auto isWord = [](char character) {

@@ -1,6 +1,6 @@
 #!/usr/bin/env bash
-# Installs the packages in a new minimal Debian 12 and builds and runs callers there, with CMake and with
-# pkg-config. Needs root and debootstrap; takes some minutes.
+# Installs the packages in a new minimal Debian 12, and builds and runs callers there with CMake and
+# pkg-config. Needs root and debootstrap. Takes some minutes.
 #
 #   bare_debian_test.sh SOURCE-DIRECTORY PACKAGE-DIRECTORY
 set -euo pipefail
@@ -29,11 +29,11 @@ quietly within sh -c 'DEBIAN_FRONTEND=noninteractive apt-get install -y --no-ins
     /packages/*.deb g++ make cmake pkg-config'
 within dpkg-query -W 'liborvadrcore*' | sed 's/^/    /'
 if within test -e /usr/include/sqlite3.h; then
-    echo "SQLite's header came along, which no caller needs" >&2
+    echo "the packages depend on SQLite's header, which no caller needs" >&2
     exit 1
 fi
 
-# The installation went well without systemd-tmpfiles; with it the lock directory is made at once.
+# So far there is no systemd-tmpfiles. With it, installing the package makes the lock directory at once.
 step "the lock directory"
 within test ! -e /tmp/.orvadr_lock
 quietly within sh -c 'DEBIAN_FRONTEND=noninteractive apt-get install -y --no-install-recommends \

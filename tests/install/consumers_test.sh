@@ -18,7 +18,7 @@ step() { printf '    %s\n' "$*"; }
 # quietly COMMAND...: shows the command's output when it fails.
 quietly() { "$@" >"$work/log" 2>&1 || { cat "$work/log" >&2; return 1; }; }
 
-# run PROGRAM: the program prints what is expected, with the installed library.
+# run PROGRAM: checks what the program prints, with the installed library.
 run() {
     mkdir "$work/data"
     diff -u consumer.out <("$1" "$work/data")

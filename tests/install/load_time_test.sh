@@ -1,11 +1,10 @@
 #!/bin/sh
-# Nothing of the library runs when a program loads it: no object may bring a global constructor
-# along, and none may include <iostream>, whose streams are set up by one.
+# No code of the library may run when a program loads it: no object may have a global constructor or
+# include <iostream>, which has one.
 #
 #     load_time_test.sh OBJECT_OR_ARCHIVE...
 #
-# Names every object that does, and fails. Meant for objects without instrumentation: sanitizers
-# and coverage add constructors of their own.
+# Fails and names every object that does. Not for sanitizer and coverage builds, which add constructors.
 set -eu
 
 fail() {

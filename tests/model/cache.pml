@@ -1,48 +1,47 @@
 /*
- * The update protocol of src/cache/cache.cpp, one step for each system call that others can notice.
- * run.sh says which properties are checked of which variants, docs/cache.md what follows from it.
+ * The update protocol of src/cache/cache.cpp, with one step for each system call that other processes can
+ * notice. run.sh lists which properties are checked in which variants, docs/cache.md the consequences.
  *
- * There are three places in the process table. A process is born into a free one, by the world or by
- * a fork, with a new id or with that of the place's last process, and reads the cache as often as
- * the world likes; whether it must have fresh data is open each time. It may be killed between any
- * two steps. One that the world leaves alone is also a process that has nothing to do with the cache
- * and merely got an updater's id.
+ * The process table has three places. A new process takes a free one, started by the world or by a fork,
+ * with a new id or the id of the place's last process. It reads the cache as often as the world wants, and
+ * may or may not require fresh data each time. It may be killed between any two steps. A process that the
+ * world leaves alone also stands for one that has nothing to do with the cache but got an updater's id.
  *
- * A pause is no step: the others may always be faster. The tries for a lock are one step: it
- * succeeds when the lock is free, and may give up when it is not. Taking a lock is one step with the
- * first look under it, freeing it one with the last: nobody can tell the difference.
+ * A pause is not a step, because the others may always be faster. All attempts to take a lock are one step:
+ * it succeeds if the lock is free, and may give up if it is not. Taking a lock and the first read under it
+ * are one step, and so are the last access and the release: nobody can tell the difference.
  *
- * Variants, each a -D: conditions of the world,
+ * Variants, each a -D. Conditions of the world:
  *   ID_ONLY            pid files hold no start time
- *   NO_KILLS           nobody is killed; processes end all the same when they have nothing to do
+ *   NO_KILLS           nobody is killed; idle processes may still end
  *   CERTAIN_LOCKS      nobody gives up on a lock
- *   LOCK_FAULTS        the lock file cannot be opened, now and then
- *   READ_FAULTS        the pid file cannot be opened for reading, now and then
+ *   LOCK_FAULTS        sometimes the lock file cannot be opened
+ *   READ_FAULTS        sometimes the pid file cannot be opened for reading
  *   OUTSIDER           somebody removes the pid file by hand
- *   ONLY_OLD           data is refreshed because it is old, and for no other reason
- *   ONLY_MARKED        nobody writes the cache file without having marked itself
- *   ALL_BLOCK          all readers must have fresh data
- *   UNNOTICED_BIRTHS   a birth does not count as a disturbance of a lone reader
- * and changes of the protocol, which show that the checks can fail:
+ *   ONLY_OLD           data is refreshed only because it is old
+ *   ONLY_MARKED        only a marked process writes the cache file
+ *   ALL_BLOCK          all readers require fresh data
+ *   UNNOTICED_BIRTHS   a new process does not count as a disturbance of a lone reader
+ * Changes of the protocol, which show that the checks can fail:
  *   NO_LOCK  SHARED_MARKING  NO_SECOND_LOOK  BLIND_REMOVAL  UNLOCKED_REMOVAL  NO_LIFE_CHECK
  *   WAIT_FOR_FRESH  WAIT_FOR_UPDATER
- * CHECK_... compiles a property in.
+ * CHECK_... selects a property.
  */
 
 #define Places 3 /* numbered from 1 */
 
-/* Where a process stands, in the order of the code. */
-#define None 0         /* there is none */
+/* The state of a process, in the order of the code. */
+#define None 0         /* no process */
 #define Rest 1         /* between two reads */
 #define Update 2       /* found its data stale */
-#define UpdateSeen 3   /*     has read the pid file, shared lock held, as in all named Seen */
+#define UpdateSeen 3   /*     has read the pid file under a shared lock, as in all states named ...Seen */
 #define Wait 4         /* WaitForUpdater */
 #define WaitSeen 5
-#define Refresh 6      /* also where a child begins */
+#define Refresh 6      /* a child starts here */
 #define RefreshSeen 7
 #define Set 8          /* SetUpdating */
 #define SetSeen 9      /*     exclusive lock held */
-#define SetFree 10     /*     so, and nobody else is at it */
+#define SetFree 10     /*     exclusive lock held, and nobody else refreshes */
 #define Produce 11     /* marked; DoUpdate */
 #define Unset 12       /* UnsetUpdating */
 #define UnsetSeen 13
@@ -52,18 +51,17 @@
 byte at[Places + 1];
 
 /*
- * Whose id stands in the pid file: 0 for none; p for the process in place p, which may have ended
- * since; Places + p for an earlier one that had the id of the one in place p; Gone for one whose id
- * nobody has.
+ * The id in the pid file: 0 for none; p for the process in place p, which may have ended; Places + p for an
+ * earlier process with the same id as the one in place p; Gone for an id that no process has.
  */
 #define Gone (2 * Places + 1)
 byte mark;
-byte seen[Places + 1]; /* what each has read of it */
+byte seen[Places + 1]; /* what each process has read from it */
 
 bit fresh;   /* the cache file is not older than the time-out */
-bit retired; /* nobody is born, killed or asked to read any more */
+bit retired; /* no process is started, killed or made to read any more */
 
-#define Place(id) ((id) - Places * ((id) > Places)) /* no condition: claims know none */
+#define Place(id) ((id) - Places * ((id) > Places)) /* without ?: because claims have none */
 #define HasProcess(id) ((id) != 0 && (id) != Gone && at[Place(id)] != None)
 #define IsOwners(id) ((id) != 0 && (id) <= Places && at[id] != None)
 #define IsUpdater(p) (at[p] >= Produce)
@@ -73,7 +71,7 @@ bit retired; /* nobody is born, killed or asked to read any more */
 #define Counts(id) IsOwners(id)
 #endif
 
-/* The lock. Who holds it follows from where all stand. */
+/* The lock. Who holds it follows from the states. */
 #define Marks(p) (at[p] == SetSeen || at[p] == SetFree)
 #define Probes(p) (at[p] == UpdateSeen || at[p] == WaitSeen || at[p] == RefreshSeen)
 #ifdef UNLOCKED_REMOVAL
@@ -117,13 +115,13 @@ bit retired; /* nobody is born, killed or asked to read any more */
 #else
 #define AssertOwnRemoval skip
 #endif
-/* A refresh begins only while data is old. */
+/* A refresh starts only while data is old. */
 #ifdef CHECK_NO_LATE_REFRESH
 #define AssertNoLateRefresh assert(!fresh)
 #else
 #define AssertNoLateRefresh skip
 #endif
-/* A process that has nothing to do has left no mark. */
+/* An idle process has left no mark. */
 #ifdef CHECK_NO_MARK_STAYS
 #define AssertNoMarkStays assert(mark != me)
 #else
@@ -135,20 +133,20 @@ bit retired; /* nobody is born, killed or asked to read any more */
 #else
 #define AssertNoSelfWait skip
 #endif
-/* Who has waited has fresh data. */
+/* A process that waited has fresh data. */
 #ifdef CHECK_WAIT_BRINGS_FRESH
 #define AssertWaitBroughtFresh assert(fresh)
 #else
 #define AssertWaitBroughtFresh skip
 #endif
-/* Who does not become the updater because another one is does not come back with old data. */
+/* A process that does not refresh because another one does never returns with old data. */
 #ifdef CHECK_LOSER_WAITS
 #define AssertLoserWaits assert(fresh || !IsOwners(mark))
 #else
 #define AssertLoserWaits skip
 #endif
 
-/* The one in place 1 waits for an updater at work until something is written or an updater ends. */
+/* Process 1 waits for a working updater until something is written or an updater ends. */
 #ifdef CHECK_WAIT_BRINGS_NEWS
 bit news;
 #define News news = true
@@ -162,8 +160,8 @@ bit news;
 #endif
 
 /*
- * A reader in place 1 whom nobody disturbs meets no updater: all others have had nothing to do since
- * it began, and the mark, if there was one, was not that of a living process.
+ * An undisturbed reader in place 1 finds no updater: all others have been idle since it started, and the
+ * mark, if there was one, was not that of a living process.
  */
 #ifdef CHECK_LONE_READER
 bit lone;
@@ -180,7 +178,7 @@ bit lone;
 #define IsBorn(p) skip
 #endif
 
-/* A new process in place p: whoever has read the id of the last one there holds a stale one. */
+/* A new process in place p: everybody who has read the last one's id there has a stale id. */
 #define WithSameId(id, p) (id == p -> Places + p : id)
 #define WithNewId(id, p) (Place(id) == p -> Gone : id)
 inline Bear(p, where) {
@@ -198,14 +196,14 @@ inline Bear(p, where) {
     at[p] = where
 }
 
-/* The lock goes with the process, its mark stays. */
+/* The lock ends with the process, its mark stays. */
 inline Kill(p) {
     News;
     seen[p] = 0;
     at[p] = None
 }
 
-/* RefreshInChild, where there is a place for it. */
+/* RefreshInChild, if there is a free place. */
 inline Fork() {
     if
     :: at[1] == None -> Bear(1, Refresh)
@@ -215,7 +213,7 @@ inline Fork() {
     fi
 }
 
-/* CoreLibReadPidFile: the file, which is replaced whole, and whether its process is a later one. */
+/* CoreLibReadPidFile: reads the file, which is replaced as a whole, and ignores a reused id. */
 inline ReadMark() {
     if
     :: seen[me] = mark
@@ -228,7 +226,7 @@ inline ReadMark() {
 #endif
 }
 
-/* CoreLibProcAlive, a step later: in between the process may end, and another one get its id. */
+/* CoreLibProcAlive, a step later: in between the process may end and its id be reused. */
 #ifdef NO_LIFE_CHECK
 #define SeenLives (seen[me] != 0)
 #else
@@ -240,7 +238,7 @@ inline GoTo(where) {
     at[me] = where
 }
 
-/* The caller has its data. A child ends here, and others may. */
+/* The caller has its data. A child ends here, and other processes may. */
 inline Finish() {
     seen[me] = 0;
     if
@@ -249,7 +247,7 @@ inline Finish() {
     fi
 }
 
-/* Update, when somebody is at it: wait, or be content with old data. */
+/* Update, when another process refreshes: wait, or accept old data. */
 inline MeetUpdater() {
     AssertNotLone;
     if
@@ -260,7 +258,7 @@ inline MeetUpdater() {
     fi
 }
 
-/* Update, when nobody is: refresh, or have a child do that. */
+/* Update, when nobody refreshes: refresh, or let a child do it. */
 inline MeetNobody() {
     if
     :: GoTo(Refresh)
@@ -330,7 +328,7 @@ endRest:
     :: atomic { at[me] == SetFree -> Finish() } /* the pid file cannot be written */
 
     :: atomic { at[me] == Produce -> fresh = true; News; at[me] = Unset }
-    :: atomic { at[me] == Produce -> at[me] = Unset } /* no data, or none that could be written */
+    :: atomic { at[me] == Produce -> at[me] = Unset } /* no data, or it could not be written */
 
 #ifdef BLIND_REMOVAL
     :: atomic { at[me] == Unset -> RemoveMark() }
@@ -361,7 +359,7 @@ endRest:
 #ifdef ONLY_OLD
 #define MayRead !fresh
 #else
-#define MayRead true /* or what is there is refused by its looks, or Update() is called by itself */
+#define MayRead true /* or the data is not valid, or Update() is called directly */
 #endif
 #ifdef NO_KILLS
 #define MayEnd(p) (at[p] == Rest)
@@ -378,7 +376,7 @@ inline Disturb(p) {
     fi
 }
 
-/* It may retire at any time, or never: nothing has to happen. */
+/* The world may retire at any time or never: nothing has to happen. */
 active proctype World() {
     do
     :: atomic { true -> Disturb(1) }
@@ -386,7 +384,7 @@ active proctype World() {
     :: atomic { true -> Disturb(3) }
     :: atomic { fresh -> fresh = false }
 #ifndef ONLY_MARKED
-    :: atomic { !fresh -> fresh = true; News } /* UpdateWithData(), called by itself */
+    :: atomic { !fresh -> fresh = true; News } /* UpdateWithData(), called directly */
 #endif
 #ifdef OUTSIDER
     :: atomic { mark != 0 -> mark = 0 }
@@ -395,21 +393,21 @@ active proctype World() {
     od
 }
 
-#define Ends [](at[1] > Rest -> <>(at[1] <= Rest)) /* every read of the one in place 1 */
+#define Ends [](at[1] > Rest -> <>(at[1] <= Rest)) /* every read of process 1 */
 
-/* Once the world is quiet, and the data fresh or no updater marked. */
+/* When the world has retired, and data is fresh or no updater is marked. */
 #ifdef CHECK_READ_ENDS
 ltl { (<>retired && <>[](fresh || !Counts(mark))) -> Ends }
 #endif
-/* However many are born, killed and asked, once the lock is free and the marked id nobody's. */
+/* However many processes start, are killed and read, when the lock is free and the marked id unused. */
 #ifdef CHECK_READ_ENDS_IN_A_CROWD
 ltl { <>[]((fresh || !HasProcess(mark)) && !Exclusive) -> Ends }
 #endif
-/* Once the world is quiet and nobody refreshes. */
+/* When the world has retired and nobody refreshes. */
 #ifdef CHECK_READ_ENDS_WITH_REFRESHES
 ltl { (<>retired && <>[](!IsUpdater(1) && !IsUpdater(2) && !IsUpdater(3))) -> Ends }
 #endif
-/* When the data is fresh again and again, and it looks again and again. */
+/* When data is fresh again and again, and the process checks again and again. */
 #ifdef CHECK_READ_ENDS_BY_FRESH_MOMENTS
 ltl { ([]<>fresh && []<>(at[1] == WaitSeen)) -> Ends }
 #endif

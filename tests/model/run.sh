@@ -1,19 +1,19 @@
 #!/usr/bin/env bash
-# Checks every property of the cache's update protocol, in every state that its model cache.pml can
-# reach: those that hold must hold, and those that the protocol does not promise, or that a change of
-# the protocol breaks, must be broken.
+# Checks all properties of the cache's update protocol in every state that the model cache.pml can reach.
+# Promised properties must hold. Those that the protocol does not promise, or that a change of the protocol
+# breaks, must be broken.
 #
-#   run.sh FOLDER                       all of them; FOLDER takes what is built
-#   run.sh FOLDER CHECK_... [VARIANT]   one of them, and how it breaks: where each place stands, whose
-#                                       id is in the pid file, what has been read of it
+#   run.sh FOLDER                         checks all properties, building in FOLDER
+#   run.sh FOLDER CHECK_... [VARIANT...]  checks one property, and prints how it breaks: the state of each
+#                                         process, the id in the pid file, and what each has read from it
 set -euo pipefail
 model=$(dirname "$(readlink -f "$0")")/cache.pml
 folder=$1
 max_depth=200000
 max_memory_mb=8000
-wrong=() # what came out otherwise than it should
+wrong=() # properties with an unexpected result
 
-# What the library promises, and what that rests on.
+# What the library promises, and under which conditions.
 holds='
 CHECK_ONE_UPDATER
 CHECK_ONE_UPDATER ID_ONLY
@@ -30,7 +30,7 @@ CHECK_LONE_READER
 CHECK_NO_SELF_WAIT CERTAIN_LOCKS
 CHECK_NO_MARK_STAYS CERTAIN_LOCKS
 '
-# What it does not promise: docs/cache.md tells each of these stories.
+# What it does not promise: docs/cache.md explains each case.
 surprises='
 CHECK_NO_LATE_REFRESH ONLY_OLD ONLY_MARKED NO_KILLS CERTAIN_LOCKS
 CHECK_LOSER_WAITS ALL_BLOCK ONLY_OLD ONLY_MARKED NO_KILLS CERTAIN_LOCKS
@@ -51,7 +51,7 @@ CHECK_ONE_UPDATER OUTSIDER
 CHECK_ONE_UPDATER READ_FAULTS
 CHECK_OWN_REMOVAL READ_FAULTS
 '
-# What breaks when the protocol is changed: each of its precautions is needed, and the checks see it.
+# What breaks when the protocol is changed: each of its precautions is needed, and the checks notice.
 mutants='
 CHECK_ONE_UPDATER NO_LOCK
 CHECK_ONE_UPDATER SHARED_MARKING
@@ -69,11 +69,11 @@ fail() {
     exit 1
 }
 
-# explore CHECK VARIANT...: leaves in FOLDER/pan.log what the search has found.
+# explore CHECK VARIANT...: writes the result of the search to FOLDER/pan.log.
 explore() {
     local options=(-DSAFETY) search=() word
     case $1 in
-        CHECK_READ_ENDS*) # in every run in which no process is passed over for ever
+        CHECK_READ_ENDS*) # only fair runs: every process that can go on does
             options=()
             search=(-a -f)
             ;;
@@ -90,11 +90,11 @@ explore() {
     ) || fail "$* cannot be explored: see $folder"
     if grep -qE 'max search depth too small|out of memory|Search not completed' "$folder/pan.log" &&
         ! grep -q 'errors: 1' "$folder/pan.log"; then
-        fail "$* is not explored to the end: see $folder/pan.log"
+        fail "$* is not explored completely: see $folder/pan.log"
     fi
 }
 
-# figure SCRIPT: a number of FOLDER/pan.log
+# figure PATTERN: prints a number from FOLDER/pan.log
 figure() { sed -nE "s/$1/\1/p" "$folder/pan.log" | head -n 1; }
 
 # judge EXPECTED CHECK VARIANT...
@@ -117,9 +117,9 @@ judge_all() {
     done <<<"$2"
 }
 
-# Prints what changes in each step of the last search's trail.
+# tell CHECK VARIANT...: prints what changes in each step of the last search's trail.
 tell() {
-    cd "$folder" # where spin leaves a file of its own
+    cd "$folder" # spin leaves a file there
     spin "${@/#/-D}" -k ./*.trail -t -p -g "$model" 2>/dev/null | awk '
         NR == FNR {
             if ($0 ~ /^#define [A-Z][A-Za-z]* [0-9]+( |$)/) name[$3] = $2

@@ -1,7 +1,7 @@
-"""Finds the places in a C++ source where a small fault can be put, and the fault for each.
+"""Finds the small faults that can be put into a C++ source.
 
-The sources are laid out by clang-format, on which this relies: a binary operator stands between
-blanks, the brackets of a template do not.
+Relies on the layout of clang-format: there are blanks around a binary operator, but not around the
+brackets of a template.
 """
 
 import random
@@ -11,7 +11,7 @@ from dataclasses import dataclass
 LITERAL_OR_COMMENT = re.compile(
     r"""//[^\n]*|/\*.*?\*/|R"\(.*?\)"|"(?:\\.|[^"\\\n])*"|'(?:\\.|[^'\\\n])'""", re.S)
 NOT_CODE = re.compile(r"^#(?!define \w+\().*$", re.M)
-# In a text these stay whole: escapes and conversions.
+# Escapes and conversions in a text are changed as a whole.
 UNIT = re.compile(r"\\[0-7]{1,3}|\\.|%[-+ #0-9.*hlz]*[a-zA-Z%]|.", re.S)
 SHORT_LINE = 30
 BEFORE_CONDITION = re.compile(r"[,;?]|(?<![=!<>])= ")
@@ -49,9 +49,9 @@ class Fault:
         return text.count("\n", 0, self.begin) + 1
 
     def change(self, text):
-        """The lines that it changes, before and after, with single blanks.
+        """The changed lines before and after, with single blanks.
 
-        A short line, of which there may be several, comes with the line in front of it.
+        A short line, which may occur several times, comes with the line before it.
         """
         begin = text.rfind("\n", 0, self.begin) + 1
         end = text.find("\n", self.end)
@@ -62,7 +62,7 @@ class Fault:
 
 
 def blanked(text):
-    """The text with blanks in place of comments, contents of literals and directives."""
+    """The text with comments, contents of literals and directives blanked out."""
     def blank(match):
         found = match.group()
         kept = re.sub(r"[^\n]", " ", found)
@@ -72,7 +72,7 @@ def blanked(text):
 
 
 def closing(code, at, stops):
-    """The first place behind `at` with one of `stops` outside brackets opened since; -1 if none."""
+    """The first place after `at` with one of `stops` outside of later brackets; -1 without one."""
     depth = 0
     for place in range(at, len(code)):
         if depth == 0 and code[place] in stops:
@@ -87,7 +87,7 @@ def closing(code, at, stops):
 
 
 def opening(code, at):
-    """Where the condition before the "?" at `at` begins."""
+    """The start of the condition before the "?" at `at`."""
     depth = 0
     for place in range(at - 1, 0, -1):
         if code[place] in ")]}":
@@ -161,7 +161,7 @@ def negated(text, begin, end):
 
 
 def find(text, seed):
-    """All faults of a source, in an order that the seed decides."""
+    """All faults of a source, in an order that depends on the seed."""
     rng = random.Random(f"{seed}")
     code = blanked(text)
     found = [*numbers(code, rng), *literals(text, code, rng)]

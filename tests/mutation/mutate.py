@@ -44,12 +44,12 @@ Result = collections.namedtuple("Result", "source line before after caught_by")
 
 
 def become_subreaper():
-    """Processes that lose their parents become this one's children."""
+    """Orphaned descendants become children of this process."""
     ctypes.CDLL(None).prctl(PR_SET_CHILD_SUBREAPER, 1, 0, 0, 0)
 
 
 def descendants():
-    """This process's children and theirs, those that lost their parents included."""
+    """All descendants of this process, orphans included."""
     parents = {}
     for stat in Path("/proc").glob("[0-9]*/stat"):
         try:
@@ -64,7 +64,7 @@ def descendants():
 
 
 def end_descendants():
-    """A faulty child may have left its process group; it comes back to the subreaper."""
+    """A faulty child may have left its process group, but it remains our descendant."""
     while pids := descendants():
         for pid in pids:
             try:
@@ -78,7 +78,7 @@ def end_descendants():
 
 
 def set_limits():
-    """A faulty program may neither fill the machine nor run on."""
+    """A faulty program must not use up the machine or run forever."""
     resource.setrlimit(resource.RLIMIT_CPU, (300, 300))
     resource.setrlimit(resource.RLIMIT_AS, (4096 * MIB, 4096 * MIB))
     resource.setrlimit(resource.RLIMIT_FSIZE, (1024 * MIB, 1024 * MIB))
@@ -96,8 +96,8 @@ class Tests:
         self.limit = 5 * seconds + 20
 
     def fail_in(self, build):
-        """What shows that they fail: their name or "time-out"; an empty text when they pass."""
-        # In a directory of their own and not as root: a faulty path may be removed.
+        """Their name or "time-out" if they fail; an empty text if they pass."""
+        # Not as root and in a directory of their own: a fault may remove the wrong path.
         scratch = tempfile.mkdtemp(prefix="orvadr-mutation-")
         os.chmod(scratch, 0o777)
         try:
@@ -129,7 +129,7 @@ class Tests:
 
 
 class Copy:
-    """A copy of the tree, in which faults are put, and its build."""
+    """A copy of the tree, into which faults are put, and its build."""
 
     def __init__(self, number):
         self.tree = WORK / str(number) / "tree"
@@ -166,7 +166,7 @@ class Copy:
                                   check=False).returncode == 0
 
     def meet(self, source, text, fault, stages):
-        """What catches the fault: "" when nothing does, None when it does not compile."""
+        """What catches the fault: "" if nothing does, None if it does not compile."""
         (self.tree / source).write_text(fault.apply(text))
         for tests in stages:
             if not self.make(tests.program):
@@ -177,7 +177,7 @@ class Copy:
 
 
 def durations(build, program):
-    """The seconds that each test takes; all must pass as long as there is no fault."""
+    """The seconds that each test takes. All must pass without a fault."""
     if Tests(program, program, "*", 120).fail_in(build):
         sys.exit(f"error: {program} fail without a fault; see {build.parent}/tests-*.log")
     output = "".join(log.read_text(errors="replace") for log in build.parent.glob("tests-*.log"))
@@ -206,13 +206,13 @@ def stages_of(source, seconds):
 
 
 def shares(count, sizes):
-    """Divides `count` by the sizes; each gets one at least."""
+    """Divides `count` in proportion to the sizes. Each gets at least one."""
     whole = sum(sizes.values())
     return {name: max(1, round(count * size / whole)) for name, size in sizes.items()}
 
 
 def plan(arguments):
-    """What the workers do: sources with some of their faults and how many of these to try."""
+    """The jobs of the workers: a source, some of its faults, and how many of these to try."""
     chosen = arguments.sources or sorted(
         str(path.relative_to(ROOT)) for path in (ROOT / "src").rglob("*.[ch]*"))
     found = {source: faults.find((ROOT / source).read_text(), f"{arguments.seed} {source}")
@@ -229,7 +229,7 @@ def plan(arguments):
 
 
 def known(path):
-    """The faults that an earlier run of the same sources caught."""
+    """The faults that an earlier run caught."""
     if not path.exists():
         return {}
     results = [Result(*json.loads(line)) for line in path.read_text().splitlines()]
@@ -259,7 +259,7 @@ def work(number, jobs, results, seconds, caught_before):
 
 
 def run(arguments, seconds):
-    """Gives the faults that compile, each with what caught it."""
+    """Tries the faults. Returns those that compile, each with what caught it."""
     record = WORK / "results.jsonl"
     caught_before = known(record) if arguments.resume else {}
     jobs, results = multiprocessing.Queue(), multiprocessing.Queue()
@@ -292,18 +292,18 @@ def run(arguments, seconds):
 
 
 def accepted_faults():
-    """From blocks of lines: "src/NAME", "- BEFORE", "+ AFTER", then the reason, indented."""
+    """Reads blocks of lines: "src/NAME", "- BEFORE", "+ AFTER", then the indented reason."""
     block = re.compile(r"^(src/\S+)\n- (.*)\n\+ (.*)\n((?:  .*\n)+)", re.M)
     found = {match.group(1, 2, 3): " ".join(match.group(4).split())
              for match in block.finditer(ACCEPTED.read_text())}
     for source, before, _ in found:
         if before not in " ".join((ROOT / source).read_text().split()):
-            sys.exit(f"error: what {ACCEPTED} says of {source} is not there any more: {before}")
+            sys.exit(f"error: {ACCEPTED}: {source} no longer has this line: {before}")
     return found
 
 
 def report(found, accepted):
-    """Prints the table and the survivors; gives the percentage that was caught."""
+    """Prints the table and the survivors. Returns the percentage that was caught."""
     rows = collections.defaultdict(collections.Counter)
     survivors = []
     for result in found:
@@ -335,8 +335,8 @@ def main():
     parser.add_argument("--jobs", type=int, default=os.cpu_count(), help="how many workers")
     parser.add_argument("--minimum", type=float, default=95, help="percent to be caught (95)")
     parser.add_argument("--resume", action="store_true",
-                        help="go on where a run stopped; try survivors again")
-    parser.add_argument("sources", nargs="*", help="such as src/common/utils.cpp; without: all")
+                        help="continue a run that was stopped; try survivors again")
+    parser.add_argument("sources", nargs="*", help="such as src/common/utils.cpp; all without")
     arguments = parser.parse_args()
 
     begin = time.monotonic()
