@@ -1,5 +1,5 @@
-// A cache whose file holds any bytes. The first input line says how it is read: "stale", "required". The rest is
-// the file.
+// A cache whose file holds any bytes. The first input line says how it is read: "stale",
+// "required". The rest is the file.
 #include <fcntl.h>
 #include <orvadrcore/cache.h>
 #include <sys/stat.h>
@@ -112,8 +112,8 @@ void Fuzz(const std::string& input)
     const AnyCache cache(surroundings.dir.Path(), "any", Timeout, isRequired, 0);
     CheckUntouched(cache, model, isStale);
 
-    // Invalid data is refreshed at once, and so is stale data if fresh data is required. Other stale data
-    // stays, since there is no child to refresh it.
+    // Invalid data is refreshed at once, and so is stale data if fresh data is required. Other
+    // stale data stays, since there is no child to refresh it.
     const bool isRefreshed = model.data.isNull() || (isStale && isRequired);
     const Json::Value expected = isRefreshed ? Json::Value("new") : model.data;
     Expect(cache.Read() == expected, "fresh data is read");

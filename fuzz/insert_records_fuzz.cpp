@@ -1,5 +1,5 @@
-// Inserts records into a table with a key and reads them back, compared with a model of the table. The
-// first input line says how: "replace", "nested", "rollback". An empty line ends a record.
+// Inserts records into a table with a key and reads them back, compared with a model of the table.
+// The first input line says how: "replace", "nested", "rollback". An empty line ends a record.
 #include <orvadrcore/sqlite_transaction.h>
 
 #include <map>

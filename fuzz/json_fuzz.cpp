@@ -1,4 +1,5 @@
-// An accepted document is printed and read back unchanged. A refused one leaves the value unchanged.
+// An accepted document is printed and read back unchanged. A refused one leaves the value
+// unchanged.
 #include <algorithm>
 #include <cmath>
 
@@ -7,7 +8,8 @@
 
 namespace {
 
-// Compares kinds, names and bits. Recurses itself, so that the fuzzer sees the structure of a document.
+// Compares kinds, names and bits. Recurses itself, so that the fuzzer sees the structure of a
+// document.
 bool IsSame(const Json::Value& one, const Json::Value& other)
 {
     if (one.type() != other.type() || one.size() != other.size()) return false;

@@ -1,5 +1,5 @@
-// A pid file of any bytes. In the input "@" stands for this process's id and "#" for its start time, which a
-// file in the corpus cannot know.
+// A pid file of any bytes. In the input "@" stands for this process's id and "#" for its start
+// time, which a file in the corpus cannot know.
 #include <orvacore/orvacore.h>
 
 #include <charconv>

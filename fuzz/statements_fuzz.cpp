@@ -1,6 +1,6 @@
-// Builds statements from any names and values, with quoted names and escaped texts, tokenizes them and runs
-// them. Then builds them again from the raw names and texts, and only inspects them. The first input line is
-// the table's name, the others are fields.
+// Builds statements from any names and values, with quoted names and escaped texts, tokenizes them
+// and runs them. Then builds them again from the raw names and texts, and only inspects them. The
+// first input line is the table's name, the others are fields.
 #include <orvadrcore/sqlite_command.h>
 #include <sqlite3.h>
 

@@ -287,8 +287,8 @@ TEST_F(NodeStatusTest, TwoProgramsThatNeedTheFirstStatusBothGetIt)
     }
 }
 
-// A child of a process with threads must not use SQLite: see StatusCache::GetUpdatedData(). While the child
-// works, the file with the database's name is not a database.
+// A child of a process with threads must not use SQLite: see StatusCache::GetUpdatedData(). While
+// the child works, the file with the database's name is not a database.
 TEST_F(NodeStatusTest, TheChildUsesNoDatabase)
 {
     if (!HasLocks()) return;
@@ -619,7 +619,8 @@ TEST_F(NodeFilesTest, ARestoreOfABadDocumentChangesNothing)
     }
 }
 
-// The index refuses the second node after the first one is inserted. The attempts take some seconds.
+// The index refuses the second node after the first one is inserted. The attempts take some
+// seconds.
 TEST_F(NodeFilesTest, ARestoreThatFailsHalfwayIsRolledBack)
 {
     if (!HasLocks()) return;

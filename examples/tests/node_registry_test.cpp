@@ -1,4 +1,5 @@
-// The example node_registry as a program: request lines in, replies out, several programs on one file.
+// The example node_registry as a program: request lines in, replies out, several programs on one
+// file.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
@@ -61,8 +62,8 @@ std::string WithPort(std::string text, int from, int to)
     return text;
 }
 
-// The demo. Its paths are relative to the top of the sources, and one port is that of a reachable node. For
-// an ordinary user only the output before the first status is compared.
+// The demo. Its paths are relative to the top of the sources, and one port is that of a reachable
+// node. For an ordinary user only the output before the first status is compared.
 TEST_F(NodeRegistryTest, ADaysRequestsPrintTheExpectedOutput)
 {
     constexpr int DemoPort = 15001;
@@ -802,8 +803,8 @@ TEST_F(NodeRegistriesTest, EightProgramsCreateNodesAtTheSameTime)
     EXPECT_EQ(List().size(), 1600U);
 }
 
-// A program that finds the name free but inserts second is refused by the schema, after all attempts: that
-// takes some seconds a round.
+// A program that finds the name free but inserts second is refused by the schema, after all
+// attempts: that takes some seconds a round.
 TEST_F(NodeRegistriesTest, OneOfEightProgramsGetsTheName)
 {
     Start(8);
@@ -824,7 +825,8 @@ TEST_F(NodeRegistriesTest, OneOfEightProgramsGetsTheName)
     EXPECT_THAT(List(), ElementsAre("a", "b", "c"));
 }
 
-// An index that ignores case refuses a name that looked free, as if another program had just taken it.
+// An index that ignores case refuses a name that looked free, as if another program had just taken
+// it.
 TEST_F(NodeRegistriesTest, TheSchemaDecidesWhetherANameIsTaken)
 {
     Create("a");

@@ -1,5 +1,5 @@
-// The example node_service as a program: HTTP in, replies out, start and end. The content of the replies is
-// tested with node_registry, which shares the handler.
+// The example node_service as a program: HTTP in, replies out, start and end. The content of the
+// replies is tested with node_registry, which shares the handler.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <signal.h>
@@ -188,7 +188,8 @@ TEST_F(NodeServiceTest, MalformedBodiesGetTheReplyOfAMalformedLine)
     ExpectCleanEnd(*service);
 }
 
-// The service reads and discards up to 8 MiB, so that a client that reads only after sending gets the reply.
+// The service reads and discards up to 8 MiB, so that a client that reads only after sending gets
+// the reply.
 TEST_F(NodeServiceTest, OversizedBodiesAreRefused)
 {
     const auto service = Start();
@@ -370,7 +371,8 @@ class NodeServiceStatusTest : public NodeServiceTest {
         return false;
     }
 
-    // Starts a refresh that outlasts the test, because its nodes do not answer. Returns its process.
+    // Starts a refresh that outlasts the test, because its nodes do not answer. Returns its
+    // process.
     pid_t StartRefresh(const Service& service, const SilentListener& silent) const
     {
         service.Ask(Call("status"));

@@ -1,6 +1,6 @@
-// Shared by the fuzz targets. NAME_fuzz.cpp defines Fuzz(), which is called with one input after the other:
-// any bytes. It must return. A sanitizer's finding, an exception and a failed Expect() end the program, and
-// libFuzzer keeps the input.
+// Shared by the fuzz targets. NAME_fuzz.cpp defines Fuzz(), which is called with one input after
+// the other: any bytes. It must return. A sanitizer's finding, an exception and a failed Expect()
+// end the program, and libFuzzer keeps the input.
 #ifndef ORVADRCORE_FUZZ_H
 #define ORVADRCORE_FUZZ_H
 
@@ -17,8 +17,8 @@ inline void Expect(bool holds, const char* what)
     std::abort();
 }
 
-// Splits an input. A backslash escapes the next character: "\n" is a newline, "\0" a zero byte, any other
-// stands for itself and ends nothing.
+// Splits an input. A backslash escapes the next character: "\n" is a newline, "\0" a zero byte, any
+// other stands for itself and ends nothing.
 class Pieces {
   public:
     explicit Pieces(const std::string& input) : text(input) {}

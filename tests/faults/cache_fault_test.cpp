@@ -58,8 +58,8 @@ struct Place {
         return document["cached_data"].asString();
     }
 
-    // Removes the mark of the updater. It stays when a system call failed that was needed to remove it,
-    // but never because an allocation failed.
+    // Removes the mark of the updater. It stays when a system call failed that was needed to remove
+    // it, but never because an allocation failed.
     void RemoveMark() const
     {
         const std::string mark = path + ".pid";

@@ -1,4 +1,5 @@
-// Values, statements, requests and replies, with every allocation failing once. They make no system calls.
+// Values, statements, requests and replies, with every allocation failing once. They make no system
+// calls.
 #include <orvadrcore/request.h>
 #include <orvadrcore/response.h>
 #include <orvadrcore/sqlite_command.h>

@@ -99,8 +99,8 @@ struct Sums : ::testing::Environment {
 };
 Sums& sums = static_cast<Sums&>(*::testing::AddGlobalTestEnvironment(new Sums));
 
-// Shared by the trials and all processes that they fork: of the calls `call` number `at`, counted from 1,
-// fails with `error`.
+// Shared by the trials and all processes that they fork: of the calls `call` number `at`, counted
+// from 1, fails with `error`.
 struct Plan {
     Call call;
     int at;
@@ -301,8 +301,8 @@ void RunTrial(const std::function<void()>& trial)
     plan.isRunning = false;
 }
 
-// The number of the next call to fail. There are many allocations: after the first 30 only some fail,
-// unless the test is a long one.
+// The number of the next call to fail. There are many allocations: after the first 30 only some
+// fail, unless the test is a long one.
 int Next(Call call, int at)
 {
     constexpr int Always = 30;

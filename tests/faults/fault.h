@@ -1,6 +1,7 @@
-// Makes every call of an operation fail once. A trial prepares what the operation needs, runs it with a
-// fault, checks what the fault has left behind, and runs it again without. It is repeated for each system
-// call and each allocation of the operation, in this process and in those that it forks:
+// Makes every call of an operation fail once. A trial prepares what the operation needs, runs it
+// with a fault, checks what the fault has left behind, and runs it again without. It is repeated
+// for each system call and each allocation of the operation, in this process and in those that it
+// forks:
 //
 //     EveryCallFails("toFile", [] {
 //         const TempDir dir;
@@ -9,9 +10,9 @@
 //         EXPECT_TRUE(toFile(Json::Value(1), path));
 //     });
 //
-// For all operations it checks: no crash, no hang, no exception except when memory runs out, no child that
-// goes on with its parent's work, no leaked descriptor, memory or process. Pauses and sleeps take no time,
-// and a directory of the test stands in for /tmp/.orvadr_lock.
+// For all operations it checks: no crash, no hang, no exception except when memory runs out, no
+// child that goes on with its parent's work, no leaked descriptor, memory or process. Pauses and
+// sleeps take no time, and a directory of the test stands in for /tmp/.orvadr_lock.
 #ifndef ORVADRCORE_TESTS_FAULT_H
 #define ORVADRCORE_TESTS_FAULT_H
 

@@ -1,5 +1,5 @@
-// An SQLite file system (VFS) with faults: it passes everything on to SQLite's own, unless Strike() has a
-// fault for it. It is SQLite's default while the object lives.
+// An SQLite file system (VFS) with faults: it passes everything on to SQLite's own, unless Strike()
+// has a fault for it. It is SQLite's default while the object lives.
 #ifndef ORVADRCORE_TESTS_FAULTY_VFS_H
 #define ORVADRCORE_TESTS_FAULTY_VFS_H
 

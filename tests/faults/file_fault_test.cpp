@@ -39,8 +39,8 @@ struct Place {
     std::string path = dir.File("document.json");
 };
 
-// Replaces the file with a fault and again without. Afterwards the directory holds the old or the new
-// file and nothing else.
+// Replaces the file with a fault and again without. Afterwards the directory holds the old or the
+// new file and nothing else.
 void ExpectReplacement(const Place& place)
 {
     const Json::Value value = Document(New);

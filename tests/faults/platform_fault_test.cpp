@@ -1,4 +1,5 @@
-// The platform layer as the library uses it, and what needs nothing else, with every call failing once.
+// The platform layer as the library uses it, and what needs nothing else, with every call failing
+// once.
 #include <orvacore/orvacore.h>
 #include <orvadrcore/utils.h>
 #include <orvarandom/orvarandom.h>

@@ -1,5 +1,5 @@
-// Every operation of SqliteDB, with every call failing once: system calls, allocations, and SQLite's file
-// accesses in both journal modes.
+// Every operation of SqliteDB, with every call failing once: system calls, allocations, and
+// SQLite's file accesses in both journal modes.
 #include <json/writer.h>  // for the messages of failed checks
 #include <orvadrcore/sqlite_condition.h>
 #include <orvadrcore/sqlite_db.h>
@@ -174,7 +174,8 @@ std::string Content(const std::string& path)
     return rows == "NULL" ? "" : rows;
 }
 
-// Afterwards the file holds the old content or the whole change. After a success it holds the change.
+// Afterwards the file holds the old content or the whole change. After a success it holds the
+// change.
 void TryOnce(const Operation& operation, const std::string& original, unsigned int retries)
 {
     const TempDir dir;

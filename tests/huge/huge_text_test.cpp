@@ -1,5 +1,5 @@
-// Texts of 2 GiB and more, which no JSON value can hold: they are refused as a whole, never cut, and
-// nothing throws. Each test makes its text once, shortens it, and frees it at its end.
+// Texts of 2 GiB and more, which no JSON value can hold: they are refused as a whole, never cut,
+// and nothing throws. Each test makes its text once, shortens it, and frees it at its end.
 #include <json/value.h>
 #include <orvadrcore/request.h>
 #include <orvadrcore/response.h>

@@ -70,8 +70,8 @@ class ObservedPauses {
 
 // ------------------------------------------------------------------------------ many at once
 
-// A barrier for all processes that are forked while this object lives, and for their children. A process
-// arrives with Arrive() or when it ends.
+// A barrier for all processes that are forked while this object lives, and for their children. A
+// process arrives with Arrive() or when it ends.
 class Barrier {
   public:
     Barrier()
@@ -117,7 +117,8 @@ class ManyReadersTest : public ProcessTest {
     void ReadAtOnce(int number, const std::function<Mode(int)>& modeOf,
                     const Action& whileProducing);
 
-    // The productions of the last round, and the documents that readers got which waited or did not.
+    // The productions of the last round, and the documents that readers got which waited or did
+    // not.
     int RoundProductions() const { return Productions() - productionsBefore; }
     std::vector<int> NumbersRead(bool waited) const;
 

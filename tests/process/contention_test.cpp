@@ -1,5 +1,5 @@
-// Many processes that write to one database at the same time. Each has its own records and remembers the
-// results of its operations.
+// Many processes that write to one database at the same time. Each has its own records and
+// remembers the results of its operations.
 #include <gtest/gtest.h>
 #include <unistd.h>
 
@@ -40,9 +40,9 @@ using OrvaDRCore::UpdateCommand;
 using std::chrono::milliseconds;
 using Clock = std::chrono::steady_clock;
 
-// The longest that statements may wait for other processes. Each gets one attempt more than the retry
-// limit, with pauses between them, and in each attempt SQLite waits up to its time-out. It may wait just as
-// long when it reads the schema, at first or again.
+// The longest that statements may wait for other processes. Each gets one attempt more than the
+// retry limit, with pauses between them, and in each attempt SQLite waits up to its time-out. It
+// may wait just as long when it reads the schema, at first or again.
 milliseconds LongestWait(int statements, int retryLimit)
 {
     constexpr milliseconds BusyTimeout(1000);
@@ -54,8 +54,8 @@ milliseconds LongestWait(int statements, int retryLimit)
 // An operation looks up its table, creates it if the lookup failed, and runs its statement.
 constexpr int MostStatements = 3;
 
-// How long the file is locked at a time: longer than one attempt waits, and longer than all statements of
-// an operation wait without retries. And for how long it is free in between.
+// How long the file is locked at a time: longer than one attempt waits, and longer than all
+// statements of an operation wait without retries. And for how long it is free in between.
 constexpr std::chrono::seconds HeldForAnAttempt(2);
 constexpr std::chrono::seconds HeldForAnOperation(MostStatements + 1);
 constexpr std::chrono::seconds Free(3);
@@ -92,8 +92,8 @@ struct Writer {
     std::atomic<int> wrong;    // selects that contradicted an earlier result
     std::atomic<int> pauses;   // repeated attempts
 
-    // In milliseconds: the longest wait of an operation, of an operation that is a single statement, and
-    // the longest operation, work included.
+    // In milliseconds: the longest wait of an operation, of an operation that is a single
+    // statement, and the longest operation, work included.
     std::atomic<int> wait;
     std::atomic<int> statementWait;
     std::atomic<int> longest;
@@ -187,7 +187,8 @@ class ContentionTest : public ProcessTest {
     // The same while another process locks the file now and then.
     void RunBesideHolder(int retryLimit, std::chrono::seconds time, std::chrono::seconds held);
 
-    // A process that locks the database and tells so. After Tell() it unlocks and locks it by turns.
+    // A process that locks the database and tells so. After Tell() it unlocks and locks it by
+    // turns.
     ChildProcess StartHolder(std::chrono::seconds time, std::chrono::seconds held);
 
     // The file holds exactly the records that the writers were told it does.

@@ -1,6 +1,6 @@
-// A process works on a database, a file, a cache or a lock, and is killed before each of its system calls
-// in turn. What it reported as done is done, what it had begun is done completely or not at all, and the
-// next process is not held up.
+// A process works on a database, a file, a cache or a lock, and is killed before each of its system
+// calls in turn. What it reported as done is done, what it had begun is done completely or not at
+// all, and the next process is not held up.
 #include <gmock/gmock.h>
 #include <sys/file.h>
 
@@ -102,8 +102,8 @@ void ExpectIntact(SqliteDB& db)
     EXPECT_EQ(verdict.ToStr(), "integrity_check:'ok'");
 }
 
-// In both of SQLite's modes: the rollback journal, which is the default, and the write-ahead log, to which
-// a file may have been set.
+// In both of SQLite's modes: the rollback journal, which is the default, and the write-ahead log,
+// to which a file may have been set.
 class DbCrashTest : public CrashTest, public ::testing::WithParamInterface<const char*> {
   protected:
     using Contents = std::map<int, std::string>;  // texts by id
@@ -259,8 +259,8 @@ TEST_F(CrashTest, TheNextProcessFinishesTheCreationOfADatabase)
 
 // ---------------------------------------------------------------------------------------- files
 
-// The killed process replaces an old document with a new one. The next process replaces it with a later
-// one and leaves no other file behind.
+// The killed process replaces an old document with a new one. The next process replaces it with a
+// later one and leaves no other file behind.
 class FileCrashTest : public CrashTest {
   protected:
     void KillWriters(const std::function<bool(int)>& write, const std::function<int()>& number)

@@ -1,5 +1,5 @@
-// Reading pipes, slow writers and unintended contents. All reading happens in a child process, which must
-// end normally.
+// Reading pipes, slow writers and unintended contents. All reading happens in a child process,
+// which must end normally.
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>

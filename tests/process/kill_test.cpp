@@ -54,8 +54,8 @@ class KillTest : public ProcessTest {
     // `inspect` after each.
     void KillRefreshes(const Action& prepare, const Action& inspect);
 
-    // The cache file holds the old document (or none) or the new one. The next reader replaces it with a
-    // later one without waiting, and leaves no other file behind.
+    // The cache file holds the old document (or none) or the new one. The next reader replaces it
+    // with a later one without waiting, and leaves no other file behind.
     void ExpectRecovery(int old);
 
     // A process that starts to produce data, tells so, and never finishes.

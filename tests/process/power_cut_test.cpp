@@ -1,5 +1,5 @@
-// Power cuts while a file is replaced. The directory is rebuilt in each state that the disk can be in
-// afterwards: support/processes/power_cut.h.
+// Power cuts while a file is replaced. The directory is rebuilt in each state that the disk can be
+// in afterwards: support/processes/power_cut.h.
 #include <gmock/gmock.h>
 #include <sys/stat.h>
 
@@ -62,7 +62,8 @@ class PowerCutTest : public ProcessTest {
         return RecordChanges(dir.Path(), [this] { Write(New); });
     }
 
-    // The states after a cut that hold neither the old nor the new document with its permission bits.
+    // The states after a cut that hold neither the old nor the new document with its permission
+    // bits.
     static std::vector<Directory> Broken(const Record& record)
     {
         const Directory before{{"document", Stored(Old)}};

@@ -1,5 +1,5 @@
-// Caches in a program with other threads: these may hold locks of the C and C++ libraries at the moment of
-// a fork, and they start programs, which inherit descriptors.
+// Caches in a program with other threads: these may hold locks of the C and C++ libraries at the
+// moment of a fork, and they start programs, which inherit descriptors.
 #include <gtest/gtest.h>
 #include <signal.h>
 #include <spawn.h>

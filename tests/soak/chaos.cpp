@@ -70,8 +70,8 @@ void Chaos::KillSome(Member& member)
     member.Kill();
 }
 
-// Kills the process that is marked as refreshing, unless it is a member: those refresh themselves if there
-// is no status yet.
+// Kills the process that is marked as refreshing, unless it is a member: those refresh themselves
+// if there is no status yet.
 void Chaos::KillRefresh()
 {
     pid_t updater = 0;

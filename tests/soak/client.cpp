@@ -44,7 +44,8 @@ Json::Value Named(const std::string& name)
     return parameters;
 }
 
-// Half of the nodes with an unknown state are created again, the other half is left alone until the end.
+// Half of the nodes with an unknown state are created again, the other half is left alone until the
+// end.
 bool IsToBeRetried(const Ledger::value_type& node)
 {
     const auto& [name, account] = node;

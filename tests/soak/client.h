@@ -1,5 +1,5 @@
-// A client of the registry. It makes one request after the other, keeps a ledger of what it is told about its
-// nodes, and compares every answer with the ledger.
+// A client of the registry. It makes one request after the other, keeps a ledger of what it is told
+// about its nodes, and compares every answer with the ledger.
 #ifndef ORVADRCORE_TESTS_SOAK_CLIENT_H
 #define ORVADRCORE_TESTS_SOAK_CLIENT_H
 
@@ -22,7 +22,8 @@ namespace Soak {
 
 // The result of a request.
 struct Answer {
-    // NotSent: the request reached nobody. Lost: nobody knows whether it was done. Told: there is a reply.
+    // NotSent: the request reached nobody. Lost: nobody knows whether it was done. Told: there is a
+    // reply.
     enum class Outcome { NotSent, Lost, Told } outcome = Outcome::NotSent;
     Json::Value reply;
 };
@@ -30,7 +31,8 @@ struct Answer {
 // Sends a request and waits for the answer.
 using Ask = std::function<Answer(const std::string& request)>;
 
-// Sends something that is not a request. Returns whether the answer was right; nothing without an answer.
+// Sends something that is not a request. Returns whether the answer was right; nothing without an
+// answer.
 using AskNonsense = std::function<std::optional<bool>(int which)>;
 
 enum class Kind { Create, Get, Set, Delete, List, Status, Nonsense };

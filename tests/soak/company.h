@@ -1,5 +1,5 @@
-// The processes of a soak: the service, two command-line registries and a neighbour. A killed one is started
-// again.
+// The processes of a soak: the service, two command-line registries and a neighbour. A killed one
+// is started again.
 #ifndef ORVADRCORE_TESTS_SOAK_COMPANY_H
 #define ORVADRCORE_TESTS_SOAK_COMPANY_H
 
@@ -57,7 +57,8 @@ class Member {
     milliseconds longestStart{0};
 };
 
-// All members and the channels to them. For one thread, except that each channel has a client of its own.
+// All members and the channels to them. For one thread, except that each channel has a client of
+// its own.
 class Company {
   public:
     Company(const Plan& plan, Reaper& reaper, Findings& findings);

@@ -22,7 +22,8 @@ namespace Soak {
 // Stops clients from starting requests.
 class Gate {
   public:
-    // Call these around a request. Enter() waits while the gate is closed, and returns whether it did.
+    // Call these around a request. Enter() waits while the gate is closed, and returns whether it
+    // did.
     bool Enter();
     void Leave();
 

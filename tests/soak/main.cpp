@@ -1,8 +1,9 @@
 // Puts a daemon under load for minutes: see --help.
 //
 // Read the files in this order: plan (what happens, and the bounds), soak (one run), company (the
-// processes), channels, client and load (the requests), ledger (what clients were told), chaos (what goes
-// wrong), neighbour (another daemon), watch (checks during the run), checks (after it), findings, report.
+// processes), channels, client and load (the requests), ledger (what clients were told), chaos
+// (what goes wrong), neighbour (another daemon), watch (checks during the run), checks (after it),
+// findings, report.
 #include <unistd.h>
 
 #include <charconv>

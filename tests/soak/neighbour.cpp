@@ -55,7 +55,8 @@ void StartPrograms(const std::atomic<bool>& isEnding)
     }
 }
 
-// Takes locks of the C and C++ libraries all the time: for syslog, time zones, locales, memory and a stream.
+// Takes locks of the C and C++ libraries all the time: for syslog, time zones, locales, memory and
+// a stream.
 void KeepBusy(const std::atomic<bool>& isEnding)
 {
     std::ofstream nowhere("/dev/null");

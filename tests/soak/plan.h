@@ -26,9 +26,9 @@ constexpr int SmallDiskBytes = 256 * 1024;  // the disk of the status
 // ------------------------------------------------------------------------------------ what must hold
 
 struct Bounds {
-    // The longest that a request may take, from connecting to the complete reply. A create waits for a
-    // thread of the service, then up to three times for the database: name check, table lookup, insert.
-    // Each may meet the lock that is held for a second.
+    // The longest that a request may take, from connecting to the complete reply. A create waits
+    // for a thread of the service, then up to three times for the database: name check, table
+    // lookup, insert. Each may meet the lock that is held for a second.
     milliseconds wait{10'000};
 
     // The longest that a client may be without an answer: one request, and the time until a killed
@@ -40,20 +40,22 @@ struct Bounds {
     double share = 0.5;
     double smallAverage = 100;
 
-    // The longest that the status may stay unchanged while clients ask for it and its disk has room.
+    // The longest that the status may stay unchanged while clients ask for it and its disk has
+    // room.
     milliseconds stale{10'000};
 
     // How long a killed process may take to restart, and a process to end when it is told to.
     milliseconds start{15'000};
     milliseconds end{15'000};
 
-    // How much more a process may have at the end than in the middle, both times without a request in
-    // progress. Descriptors do not vary then. Memory does a little, because the database grows.
+    // How much more a process may have at the end than in the middle, both times without a request
+    // in progress. Descriptors do not vary then. Memory does a little, because the database grows.
     int descriptors = 0;
     long kiBytes = 4096;
 };
 
-// Memory is not checked in shorter runs: the clients have not created all their nodes by the middle.
+// Memory is not checked in shorter runs: the clients have not created all their nodes by the
+// middle.
 constexpr seconds LongEnoughForMemory{60};
 
 // ------------------------------------------------------------------------------------------ one run

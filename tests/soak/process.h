@@ -15,8 +15,8 @@
 
 namespace Soak {
 
-// Reaps all children, and all processes that became children because their parent was killed: a zombie could
-// be taken for a living process.
+// Reaps all children, and all processes that became children because their parent was killed: a
+// zombie could be taken for a living process.
 class Reaper {
   public:
     Reaper();
@@ -48,8 +48,8 @@ struct Pipes {
     int out = -1;
 };
 
-// Starts the program whose path is the first word. Its standard error is appended to `logFile`. It is killed
-// when the calling thread ends.
+// Starts the program whose path is the first word. Its standard error is appended to `logFile`. It
+// is killed when the calling thread ends.
 pid_t StartProgram(const std::vector<std::string>& words, const std::string& logFile,
                    Pipes& ret_pipes);
 
@@ -66,8 +66,8 @@ struct Usage {
     long kiBytes = 0;  // of private memory
     int descriptors = 0;
 };
-// Takes several samples and keeps the lowest number of descriptors, because the service closes a connection
-// a moment after the client has its reply.
+// Takes several samples and keeps the lowest number of descriptors, because the service closes a
+// connection a moment after the client has its reply.
 Usage UsageOf(const std::string& name, pid_t pid);
 
 }  // namespace Soak

@@ -34,8 +34,8 @@ namespace {
 constexpr milliseconds StepEvery{10};
 constexpr milliseconds Calmness{2000};  // at the end, so that refreshes happen after the last kill
 
-// Parts of the run: when the service and a registry are killed for the last time, and when their resources
-// are measured first. By then all their threads have worked.
+// Parts of the run: when the service and a registry are killed for the last time, and when their
+// resources are measured first. By then all their threads have worked.
 constexpr double SpareFrom = 0.4;
 constexpr double MeasureAt = 0.5;
 
@@ -56,8 +56,8 @@ std::vector<const Ledger*> LedgersOf(const Load& load)
     return ledgers;
 }
 
-// Makes started programs return freed memory to the system, so that a growing heap shows after a minute
-// instead of hours.
+// Makes started programs return freed memory to the system, so that a growing heap shows after a
+// minute instead of hours.
 void SteadyTheHeap()
 {
     for (const char* setting : {"MALLOC_MMAP_THRESHOLD_", "MALLOC_TRIM_THRESHOLD_"}) {

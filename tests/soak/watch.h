@@ -29,8 +29,8 @@ struct Edition {
     }
 };
 
-// Counts refreshes: each one replaces the status file. Reports when none happens although it could, and
-// describes the process that is marked as refreshing.
+// Counts refreshes: each one replaces the status file. Reports when none happens although it could,
+// and describes the process that is marked as refreshing.
 class RefreshWatch {
   public:
     RefreshWatch(const Plan& plan, std::function<bool()> isDiskFull, Findings& findings);

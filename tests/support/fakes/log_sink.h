@@ -1,5 +1,5 @@
-// Takes the place of syslog. Each line goes to a function that a test sets; without one it is formatted,
-// so that the sanitizers check its arguments, and dropped.
+// Takes the place of syslog. Each line goes to a function that a test sets; without one it is
+// formatted, so that the sanitizers check its arguments, and dropped.
 #ifndef ORVADRCORE_TESTS_LOG_SINK_H
 #define ORVADRCORE_TESTS_LOG_SINK_H
 

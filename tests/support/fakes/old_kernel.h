@@ -1,5 +1,5 @@
-// Pretends to run on an older kernel, by a filter that refuses system calls. The filter cannot be removed
-// again: use it in child processes.
+// Pretends to run on an older kernel, by a filter that refuses system calls. The filter cannot be
+// removed again: use it in child processes.
 #ifndef ORVADRCORE_TESTS_OLD_KERNEL_H
 #define ORVADRCORE_TESTS_OLD_KERNEL_H
 
@@ -12,8 +12,8 @@
 #include <cerrno>
 #include <cstddef>
 
-// From now on the calls with the numbers `first` to `last` fail with `error`, in this process and its
-// children. False where the system does not allow filters.
+// From now on the calls with the numbers `first` to `last` fail with `error`, in this process and
+// its children. False where the system does not allow filters.
 inline bool RefuseCalls(unsigned int first, unsigned int last, unsigned int error)
 {
     std::array<sock_filter, 5> filter{{

@@ -1,7 +1,7 @@
-// Counts the pauses of the tested code instead of sleeping. While a Pauses object lives, usleep returns
-// at once, in the library and in SQLite; otherwise it sleeps. Pauses of more than 100 milliseconds are
-// those between the library's attempts. Shorter ones are those of an attempt that waits for a lock, in the
-// library's busy handler or in SQLite's.
+// Counts the pauses of the tested code instead of sleeping. While a Pauses object lives, usleep
+// returns at once, in the library and in SQLite; otherwise it sleeps. Pauses of more than 100
+// milliseconds are those between the library's attempts. Shorter ones are those of an attempt that
+// waits for a lock, in the library's busy handler or in SQLite's.
 #ifndef ORVADRCORE_TESTS_PAUSES_H
 #define ORVADRCORE_TESTS_PAUSES_H
 
@@ -21,7 +21,8 @@ class Pauses {
     // At each pause between attempts calls `action` with its number, from 1, instead of sleeping.
     void OnPause(std::function<void(std::size_t)> action) { onPause = std::move(action); }
 
-    // The same for the pauses within an attempt. They are recorded after the first call of OnWait().
+    // The same for the pauses within an attempt. They are recorded after the first call of
+    // OnWait().
     const std::vector<unsigned int>& Waits() const { return waits; }
     void OnWait(std::function<void(std::size_t)> action);
     void ForgetWaits() { waits.clear(); }
@@ -35,8 +36,8 @@ class Pauses {
     std::function<void(std::size_t)> onWait;
 };
 
-// What this process has really slept in usleep, while no Pauses object lived. Includes what its parent
-// had slept before the fork.
+// What this process has really slept in usleep, while no Pauses object lived. Includes what its
+// parent had slept before the fork.
 struct Slept {
     int pauses;              // between attempts
     long long microseconds;  // as requested; pauses within attempts included

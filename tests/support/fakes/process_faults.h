@@ -1,6 +1,6 @@
-// Replaces fork and time, as syscall_faults.h replaces the calls for files. While a ProcessFaults object
-// lives, the functions that are set here are called instead of the system's, in this process and its
-// children.
+// Replaces fork and time, as syscall_faults.h replaces the calls for files. While a ProcessFaults
+// object lives, the functions that are set here are called instead of the system's, in this process
+// and its children.
 //
 //     ProcessFaults faults;
 //     faults.time = [] { return 1'700'000'000; };

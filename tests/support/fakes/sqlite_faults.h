@@ -1,5 +1,5 @@
-// Results of SQLite that no real database can provoke. While a SqliteFaults object lives, the functions
-// that are set here are called instead of SQLite's. All others are the real ones.
+// Results of SQLite that no real database can provoke. While a SqliteFaults object lives, the
+// functions that are set here are called instead of SQLite's. All others are the real ones.
 #ifndef ORVADRCORE_TESTS_SQLITE_FAULTS_H
 #define ORVADRCORE_TESTS_SQLITE_FAULTS_H
 

@@ -1,6 +1,6 @@
-// Results of system calls that a test cannot provoke. While a SyscallFaults object lives, the functions
-// that are set here are called instead of the system's, in this process and its children. All others are
-// the real ones.
+// Results of system calls that a test cannot provoke. While a SyscallFaults object lives, the
+// functions that are set here are called instead of the system's, in this process and its children.
+// All others are the real ones.
 //
 //     SyscallFaults faults;
 //     faults.fsync = Failing(EIO);

@@ -1,5 +1,5 @@
-// Checks that need a process of their own. When an EXPECT, ASSERT or ExpectLines fails in it, the test
-// fails.
+// Checks that need a process of their own. When an EXPECT, ASSERT or ExpectLines fails in it, the
+// test fails.
 #ifndef ORVADRCORE_TESTS_CHILD_CHECKS_H
 #define ORVADRCORE_TESTS_CHILD_CHECKS_H
 
@@ -7,7 +7,8 @@
 
 #include "support/fixtures/temp_dir.h"
 
-// Runs checks in a child process, which may close, limit or ignore anything. SIGPIPE is ignored already.
+// Runs checks in a child process, which may close, limit or ignore anything. SIGPIPE is ignored
+// already.
 void CheckInChild(const std::function<void()>& checks);
 
 // The same in a process without root's rights, which owns `dir`, even if root runs the tests.

@@ -1,5 +1,5 @@
-// A child process that runs a function. Its exit code says whether all went well. Test and child tell
-// each other through pipes how far they are; neither sleeps.
+// A child process that runs a function. Its exit code says whether all went well. Test and child
+// tell each other through pipes how far they are; neither sleeps.
 //
 //     ChildProcess holder([&](ChildProcess::Link& link) {
 //         TakeTheLock();
@@ -39,8 +39,8 @@ class ChildProcess {
         int out;
     };
 
-    // Forks a process that runs `body` and exits with code 0, or 1 when `body` throws. It runs no exit
-    // handlers and no destructors of the test.
+    // Forks a process that runs `body` and exits with code 0, or 1 when `body` throws. It runs no
+    // exit handlers and no destructors of the test.
     explicit ChildProcess(const std::function<void(Link&)>& body);
     ChildProcess(const ChildProcess&) = delete;
     ChildProcess& operator=(const ChildProcess&) = delete;
@@ -52,7 +52,8 @@ class ChildProcess {
 
     void Kill(int signal) const;
 
-    // Waits until it ends. Returns its exit code, or 128 plus the number of the signal that ended it.
+    // Waits until it ends. Returns its exit code, or 128 plus the number of the signal that ended
+    // it.
     int Join();
 
   private:

@@ -1,6 +1,6 @@
-// For coverage builds: replaces _exit, so that processes which end with it write their figures, too.
-// Traced processes do not: a test counts their system calls, and one that is killed while writing spoils
-// the figures. No allocation fails while they are written.
+// For coverage builds: replaces _exit, so that processes which end with it write their figures,
+// too. Traced processes do not: a test counts their system calls, and one that is killed while
+// writing spoils the figures. No allocation fails while they are written.
 #include <sys/syscall.h>
 #include <unistd.h>
 

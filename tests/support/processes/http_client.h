@@ -1,5 +1,5 @@
-// A small HTTP client for services on 127.0.0.1. A connection carries one request, which may be sent in
-// parts and may be malformed.
+// A small HTTP client for services on 127.0.0.1. A connection carries one request, which may be
+// sent in parts and may be malformed.
 //
 //     EXPECT_EQ(Post(port, "/webapi", "{}").status, 200);
 //

@@ -1,12 +1,12 @@
-// What a power cut can do to a directory. The system calls of a process are recorded, and from the record
-// follows what the disk can hold when the power fails after any of them:
+// What a power cut can do to a directory. The system calls of a process are recorded, and from the
+// record follows what the disk can hold when the power fails after any of them:
 //
-// - Until a file is synced, its content, its size and its permission bits may reach the disk in any order,
-//   or not at all: the file can be short, cut between two blocks or within one, or have zeros instead of a
-//   block or of everything from a block on.
-// - Until the directory is synced, names that were made, replaced or removed may reach the disk in any
-//   order, or not at all. A renamed file can be there under both names or under neither, but a replaced
-//   name always leads to one of the two files.
+// - Until a file is synced, its content, its size and its permission bits may reach the disk in any
+//   order, or not at all: the file can be short, cut between two blocks or within one, or have zeros
+//   instead of a block or of everything from a block on.
+// - Until the directory is synced, names that were made, replaced or removed may reach the disk in
+//   any order, or not at all. A renamed file can be there under both names or under neither, but a
+//   replaced name always leads to one of the two files.
 //
 //     const Record record = RecordChanges(dir, [&] { toFile(value, path); });
 //     for (const Directory& state : StatesAfterCut(before, record)) ...
@@ -49,8 +49,9 @@ struct Change {
 };
 using Record = std::vector<Change>;
 
-// Runs `body` in a child and records its changes to the directory and its files. It must use full paths.
-// Throws when the child fails, or makes a system call that changes files in a way not modelled here.
+// Runs `body` in a child and records its changes to the directory and its files. It must use full
+// paths. Throws when the child fails, or makes a system call that changes files in a way not
+// modelled here.
 Record RecordChanges(const std::string& path, const std::function<void()>& body);
 
 // All that the disk can hold after a power cut: after the last change, or after any of them.

@@ -4,15 +4,15 @@
 
 #include <string>
 
-// Lets this process open any lock file, as root can. An ordinary user becomes root in a user namespace
-// with its own lock directory. False when the kernel does not allow that.
+// Lets this process open any lock file, as root can. An ordinary user becomes root in a user
+// namespace with its own lock directory. False when the kernel does not allow that.
 bool BecomeRoot();
 
 // Makes this process an ordinary user, without a way back. False when that fails.
 bool LoseRights();
 
-// Mounts a file system of `bytes` bytes on a directory, visible to this process and its children only.
-// False when that fails.
+// Mounts a file system of `bytes` bytes on a directory, visible to this process and its children
+// only. False when that fails.
 bool MountSmallDisk(const std::string& directory, int bytes);
 
 // The same with a file system in memory whose times advance in the kernel's clock ticks.

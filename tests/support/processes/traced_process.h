@@ -1,5 +1,5 @@
-// A child process under ptrace. It runs to its next system call, or until it starts another program, and
-// it or a process that it forks can be killed at exactly that point.
+// A child process under ptrace. It runs to its next system call, or until it starts another
+// program, and it or a process that it forks can be killed at exactly that point.
 //
 //     TracedProcess updater([&] { cache.Read(); });
 //     while (updater.Step()) ...
@@ -39,9 +39,9 @@ class TracedProcess {
     std::string Memory(std::uint64_t address, std::size_t size) const;
     std::string Text(std::uint64_t address) const;
 
-    // Lets the child and all processes forked from it run to their ends, but kills one of them before
-    // its `call`-th system call, counted from 1. The child is `member` 0, the others follow in the order
-    // of the forks. False when that process does not exist or ended before that call.
+    // Lets the child and all processes forked from it run to their ends, but kills one of them
+    // before its `call`-th system call, counted from 1. The child is `member` 0, the others follow
+    // in the order of the forks. False when that process does not exist or ended before that call.
     bool KillBefore(int member, int call);
 
     // Lets the child run until a program that it starts has just been loaded. Returns the id of the
