@@ -54,14 +54,20 @@ void Write(const Level& level, const Site& site, const char* format, Args... arg
 
 }  // namespace OrvaDRCore::Log
 
+// The file that lines name. A source with a part of another one's operations defines it before it
+// includes this header, because the lines of one public header all name the same file.
+#ifndef DR_LOG_FILE
+#define DR_LOG_FILE __FILE__
+#endif
+
 #define DR_LOG(level, ...) DR_LOG_AS(__func__, level, __VA_ARGS__)
 
 // Writes the line under the name of another function. (__extension__ allows "%m", which is not ISO.)
-#define DR_LOG_AS(function, level, ...)                                                    \
-    __extension__(false ? ::OrvaDRCore::Log::CheckFormat(__VA_ARGS__)                      \
-                        : ::OrvaDRCore::Log::Write(                                        \
-                              ::OrvaDRCore::Log::level,                                    \
-                              {::OrvaDRCore::Log::BaseName(__FILE__), __LINE__, function}, \
+#define DR_LOG_AS(function, level, ...)                                                       \
+    __extension__(false ? ::OrvaDRCore::Log::CheckFormat(__VA_ARGS__)                         \
+                        : ::OrvaDRCore::Log::Write(                                           \
+                              ::OrvaDRCore::Log::level,                                       \
+                              {::OrvaDRCore::Log::BaseName(DR_LOG_FILE), __LINE__, function}, \
                               "%s:%d(%s)[%s][%d]: " __VA_ARGS__))
 
 #endif
