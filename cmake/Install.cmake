@@ -48,7 +48,7 @@ install(FILES README.md CHANGELOG.md
 install(DIRECTORY docs
     DESTINATION ${CMAKE_INSTALL_DATADIR}/doc/liborvadrcore-dev
     COMPONENT Development
-    FILES_MATCHING PATTERN *.md PATTERN *.svg)
+    FILES_MATCHING PATTERN *.md PATTERN *.svg PATTERN *.json)
 install(DIRECTORY examples
     DESTINATION ${CMAKE_INSTALL_DATADIR}/doc/liborvadrcore-examples
     COMPONENT Examples

@@ -1,0 +1,17 @@
+// The commands of orvadr. Each looks at what it is given and reports; docs/orvadr.md says what.
+#ifndef ORVADR_COMMANDS_H
+#define ORVADR_COMMANDS_H
+
+#include <string>
+#include <vector>
+
+#include "report.h"
+
+namespace Orvadr {
+
+// Error codes by number or name; all of them without any.
+Report ReportErrors(const std::vector<std::string>& codesOrNames);
+
+}  // namespace Orvadr
+
+#endif
