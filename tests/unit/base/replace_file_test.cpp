@@ -1,117 +1,28 @@
-// ReplaceFile. json_file_test.cpp tests toFile, which uses it.
+// What ReplaceFile writes, and what a failure leaves. json_file_test.cpp tests toFile, which uses it.
 #include "base/replace_file.h"
 
 #include <fcntl.h>
 #include <gmock/gmock.h>
-#include <signal.h>
 #include <sys/stat.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
-#include <algorithm>
-#include <array>
-#include <climits>
-#include <cstdio>
-#include <ctime>
+#include <cerrno>
 #include <filesystem>
 #include <functional>
 #include <set>
-#include <stdexcept>
 #include <string>
-#include <thread>
 #include <utility>
 #include <vector>
 
-#include "base/process_status.h"
-#include "support/fakes/process_faults.h"
-#include "support/fakes/syscall_faults.h"
-#include "support/fixtures/log_capture.h"
+#include "support/fixtures/replace_file_fixture.h"
 #include "support/fixtures/special_file.h"
-#include "support/fixtures/temp_dir.h"
 #include "support/fixtures/test_files.h"
 #include "support/processes/child_checks.h"
-#include "support/processes/child_process.h"
 
 namespace {
 
-using OrvaDRCore::ReadProcessStatus;
 using OrvaDRCore::ReplaceFile;
 using ::testing::ElementsAre;
-using ::testing::MatchesRegex;
-
-constexpr const char* Name = "doc";
-
-// Any temporary file of it.
-constexpr const char* TemporaryName = "doc\\.orvadr-tmp[0-9a-f]{8}\\.[0-9]+\\.[0-9]+\\.[0-9]+";
-
-constexpr pid_t Nobodys = INT_MAX;  // no process has this id
-constexpr std::time_t Hour = 3600;
-
-// The writer of a temporary file, according to its name.
-struct Writer {
-    unsigned int domain;
-    pid_t pid;
-    unsigned long long start;
-};
-
-std::string TextOf(const Writer& writer, unsigned int number = 0)
-{
-    std::array<char, 100> text{};
-    (void)std::snprintf(text.data(), text.size(), "%08x.%d.%llu.%u", writer.domain, writer.pid,
-                        writer.start, number);
-    return text.data();
-}
-
-unsigned long long StartOf(pid_t pid)
-{
-    const auto status = ReadProcessStatus(pid);
-    return status ? status->start : 0;
-}
-
-// Nothing here logs: the fixture fails on any line.
-class ReplaceFileTest : public LoggedTest {
-  protected:
-    ReplaceFileTest() : LoggedTest("replace_file.cpp") {}
-
-    // Replaces the file and returns the path of the temporary file.
-    std::string ReplaceAndTell()
-    {
-        std::string used;
-        faults.rename = [&](const char* from, const char* to) {
-            used = from;
-            return RealRename(from, to);
-        };
-        EXPECT_TRUE(ReplaceFile(path, "new"));
-        faults.rename = nullptr;
-        EXPECT_EQ(ReadFile(path), "new");
-        return used;
-    }
-
-    // This process as a writer.
-    Writer Self()
-    {
-        const std::string used = ReplaceAndTell();
-        std::filesystem::remove(path);
-        const auto domain = std::stoul(used.substr(path.size() + 11, 8), nullptr, 16);
-        return {static_cast<unsigned int>(domain), ::getpid(), StartOf(::getpid())};
-    }
-
-    std::string Temporary(const Writer& writer, unsigned int number = 0) const
-    {
-        return path + ".orvadr-tmp" + TextOf(writer, number);
-    }
-
-    TempDir dir;
-    SyscallFaults faults;
-    ProcessFaults processes;
-    std::string path = dir.File(Name);
-};
-
-// Writes three bytes at a time.
-ssize_t WriteThreeBytes(int fd, const void* buffer, std::size_t size)
-{
-    return RealWrite(fd, buffer, std::min<std::size_t>(size, 3));
-}
 
 // The first call fails with an error, the others are left to `rest`.
 template <class Function>
@@ -123,6 +34,10 @@ auto FailingOnce(int error, Function rest)
         return decltype(rest(arguments...)){-1};
     };
 }
+
+class ReplaceFileTest : public ReplaceFileFixture {};
+
+// ---------------------------------------------------------------------------------------- the text
 
 TEST_F(ReplaceFileTest, WritesTheTextByteForByte)
 {
@@ -183,6 +98,45 @@ TEST_F(ReplaceFileTest, ContinuesAfterShortWritesAndInterruptions)
     EXPECT_TRUE(ReplaceFile(path, "0123456789"));
     EXPECT_EQ(ReadFile(path), "0123456789");
 }
+
+TEST_F(ReplaceFileTest, ReturnsTheStatusOfItsOwnFileEvenIfThatWasReplaced)
+{
+    struct stat made {};
+    ino_t inode = 0;
+    faults.rename = [&](const char* from, const char* to) {
+        inode = InodeOf(from);
+        const int result = RealRename(from, to);
+        WriteFile(dir.File("another"), "another's");
+        EXPECT_EQ(RealRename(dir.File("another").c_str(), to), 0);
+        return result;
+    };
+    EXPECT_TRUE(ReplaceFile(path, "new", 0640, &made));
+    EXPECT_EQ(made.st_ino, inode);
+    EXPECT_EQ(made.st_size, 3);
+    EXPECT_EQ(made.st_mode & 07777, 0640U);
+    EXPECT_NE(InodeOf(path), inode);
+}
+
+TEST_F(ReplaceFileTest, ReplacesASymbolicLinkWithoutFollowingIt)
+{
+    const std::string target = dir.File("target");
+    const auto check = [&] {
+        EXPECT_TRUE(ReplaceFile(path, "new"));
+        EXPECT_FALSE(std::filesystem::is_symlink(path));
+        EXPECT_EQ(ReadFile(path), "new");
+    };
+    std::filesystem::create_symlink(target, path);
+    check();
+    EXPECT_FALSE(std::filesystem::exists(target));
+
+    WriteFile(target, "the target's");
+    std::filesystem::remove(path);
+    std::filesystem::create_symlink(target, path);
+    check();
+    EXPECT_EQ(ReadFile(target), "the target's");
+}
+
+// --------------------------------------------------------------------------------- permission bits
 
 TEST_F(ReplaceFileTest, ANewFileGetsMode0666LessTheUmask)
 {
@@ -276,425 +230,7 @@ TEST_F(ReplaceFileTest, ReplacesAFileWithoutWritePermission)
     });
 }
 
-TEST_F(ReplaceFileTest, ReplacesASymbolicLinkWithoutFollowingIt)
-{
-    const std::string target = dir.File("target");
-    const auto check = [&] {
-        EXPECT_TRUE(ReplaceFile(path, "new"));
-        EXPECT_FALSE(std::filesystem::is_symlink(path));
-        EXPECT_EQ(ReadFile(path), "new");
-    };
-    std::filesystem::create_symlink(target, path);
-    check();
-    EXPECT_FALSE(std::filesystem::exists(target));
-
-    WriteFile(target, "the target's");
-    std::filesystem::remove(path);
-    std::filesystem::create_symlink(target, path);
-    check();
-    EXPECT_EQ(ReadFile(target), "the target's");
-}
-
-// -------------------------------------------------------------------- ReplaceFile: temporary files
-
-TEST_F(ReplaceFileTest, ATemporaryFileIsNamedAfterItsWriter)
-{
-    const Writer self = Self();
-    EXPECT_NE(self.domain, 0U);
-    EXPECT_EQ(ReplaceAndTell(), Temporary(self));
-    CheckInChild([&] {
-        const pid_t pid = ::getpid();
-        EXPECT_EQ(ReplaceAndTell(), Temporary({self.domain, pid, StartOf(pid)}));
-    });
-}
-
-struct Planted {
-    const char* what;
-    std::function<void(const std::string& name)> plant;
-};
-
-TEST_F(ReplaceFileTest, NeverWritesThroughWhatHasTheTemporaryName)
-{
-    const std::string target = dir.File("target");
-    const std::vector<Planted> table = {
-        {"a file", [](auto& name) { WriteFile(name, "planted"); }},
-        {"a link to a file", [&](auto& name) { std::filesystem::create_symlink(target, name); }},
-        {"a link to the file itself",
-         [&](auto& name) { std::filesystem::create_symlink(path, name); }},
-        {"a link to nothing",
-         [&](auto& name) { std::filesystem::create_symlink(dir.File("nothing"), name); }},
-        {"a link to a directory",
-         [&](auto& name) { std::filesystem::create_symlink(dir.Path(), name); }},
-        {"a directory", [&](auto& name) { std::filesystem::create_directory(name); }},
-        {"a pipe", [](auto& name) { EXPECT_EQ(::mkfifo(name.c_str(), 0600), 0); }},
-    };
-    const Writer self = Self();
-    WriteFile(target, "the target's");
-    for (const Planted& row : table) {
-        SCOPED_TRACE(row.what);
-        WriteFile(path, "old");
-        row.plant(Temporary(self));
-        EXPECT_EQ(ReplaceAndTell(), Temporary(self, 1));
-        EXPECT_FALSE(std::filesystem::is_symlink(path));
-        EXPECT_EQ(ReadFile(target), "the target's");
-        EXPECT_EQ(NamesIn(dir.Path()).size(), 3U);
-        std::filesystem::remove(Temporary(self));
-    }
-}
-
-TEST_F(ReplaceFileTest, FailsWhenEveryTemporaryNameIsTaken)
-{
-    WriteFile(path, "old");
-    std::size_t attempts = 0;
-    faults.open = [&](const char* name, int flags, mode_t mode) {
-        if ((flags & O_CREAT) == 0) return RealOpen(name, flags, mode);
-        ++attempts;
-        return Failing(EEXIST)();
-    };
-    errno = 0;
-    EXPECT_FALSE(ReplaceFile(path, "new"));
-    EXPECT_EQ(errno, EEXIST);
-    EXPECT_EQ(attempts, 10'000U);
-    EXPECT_EQ(ReadFile(path), "old");
-}
-
-TEST_F(ReplaceFileTest, ManyThreadsMayReplaceOneFile)
-{
-    constexpr int Rounds = 50;
-    const std::array<std::string, 8> texts = {"a", "bb", "ccc", "d", "ee", "fff", "g", "hh"};
-    std::vector<std::thread> threads;
-    threads.reserve(texts.size());
-    for (const std::string& text : texts) {
-        threads.emplace_back([&, text] {
-            for (int round = 0; round < Rounds; ++round) EXPECT_TRUE(ReplaceFile(path, text));
-        });
-    }
-    for (std::thread& thread : threads) thread.join();
-    EXPECT_THAT(texts, ::testing::Contains(ReadFile(path)));
-    EXPECT_THAT(NamesIn(dir.Path()), ElementsAre(Name));
-}
-
-// Locks fail on some file systems, and on others each machine has locks of its own.
-TEST_F(ReplaceFileTest, TakesNoLock)
-{
-    faults.flock = [](int /*fd*/, int /*operation*/) {
-        ADD_FAILURE();
-        return Failing(ENOLCK)();
-    };
-    faults.fcntl = [](int /*fd*/, int /*command*/, void* /*argument*/) {
-        ADD_FAILURE();
-        return Failing(ENOLCK)();
-    };
-    EXPECT_TRUE(ReplaceFile(path, "text"));
-    EXPECT_EQ(ReadFile(path), "text");
-}
-
-// ------------------------------------------------------------------------- ReplaceFile: left-overs
-
-TEST_F(ReplaceFileTest, TheNextWriterRemovesTheFileOfOneKilledAtAnyStep)
-{
-    struct Step {
-        const char* name;
-        std::function<void(const std::function<void()>& halt)> haltAt;
-    };
-    const std::vector<Step> table = {
-        {"write",
-         [&](auto& halt) {
-             faults.write = [&](int fd, const void* buffer, std::size_t size) {
-                 if (size == 8) halt();  // after three of eleven bytes
-                 return WriteThreeBytes(fd, buffer, size);
-             };
-         }},
-        {"fchmod",
-         [&](auto& halt) {
-             faults.fchmod = [&](int fd, mode_t mode) {
-                 halt();
-                 return RealFchmod(fd, mode);
-             };
-         }},
-        {"fsync",
-         [&](auto& halt) {
-             faults.fsync = [&](int fd) {
-                 halt();
-                 return RealFsync(fd);
-             };
-         }},
-        {"rename",
-         [&](auto& halt) {
-             faults.rename = [&](const char* from, const char* to) {
-                 halt();
-                 return RealRename(from, to);
-             };
-         }},
-    };
-    for (const Step& step : table) {
-        SCOPED_TRACE(step.name);
-        WriteFile(path, "old");
-        ChildProcess writer([&](ChildProcess::Link& link) {
-            const std::function<void()> halt = [&] {
-                link.Tell();
-                link.Await();
-            };
-            step.haltAt(halt);
-            ReplaceFile(path, "of the dead");
-        });
-        ASSERT_TRUE(writer.Await());
-        writer.Kill(SIGKILL);
-        EXPECT_EQ(writer.Join(), 128 + SIGKILL);
-        EXPECT_EQ(ReadFile(path), "old");
-        EXPECT_THAT(NamesIn(dir.Path()), ElementsAre(Name, MatchesRegex(TemporaryName)));
-
-        EXPECT_TRUE(ReplaceFile(path, "of the living"));
-        EXPECT_EQ(ReadFile(path), "of the living");
-        EXPECT_THAT(NamesIn(dir.Path()), ElementsAre(Name));
-    }
-}
-
-TEST_F(ReplaceFileTest, AStoppedWriterKeepsItsFileAndCompletesLater)
-{
-    ChildProcess first([&](ChildProcess::Link& link) {
-        faults.fsync = [&](int fd) {
-            link.Tell();
-            (void)::raise(SIGSTOP);
-            return RealFsync(fd);
-        };
-        if (!ReplaceFile(path, "first")) throw std::runtime_error("not replaced");
-    });
-    const std::string temporary = Temporary({Self().domain, first.Pid(), StartOf(first.Pid())});
-    ASSERT_TRUE(first.Await());
-    int status = 0;
-    ASSERT_EQ(::waitpid(first.Pid(), &status, WUNTRACED), first.Pid());
-    ASSERT_TRUE(WIFSTOPPED(status));
-
-    EXPECT_TRUE(ReplaceFile(path, "second"));
-    EXPECT_EQ(ReadFile(path), "second");
-    EXPECT_EQ(ReadFile(temporary), "first");
-
-    first.Kill(SIGCONT);
-    EXPECT_EQ(first.Join(), 0);
-    EXPECT_EQ(ReadFile(path), "first");
-    EXPECT_THAT(NamesIn(dir.Path()), ElementsAre(Name));
-}
-
-class LeftOverTest : public ReplaceFileTest {
-  protected:
-    // Whether replacing the path removes a file of that name.
-    bool Goes(const std::string& name, std::time_t age = 0)
-    {
-        WriteFile(name, "left over");
-        SetModifyTime(name, std::time(nullptr) - age);
-        EXPECT_TRUE(ReplaceFile(path, "new"));
-        EXPECT_EQ(ReadFile(path), "new");
-        const bool isThere = std::filesystem::remove(name);
-        EXPECT_THAT(NamesIn(dir.Path()), ElementsAre(Name));
-        return !isThere;
-    }
-    bool GoesOf(const Writer& writer, std::time_t age = 0) { return Goes(Temporary(writer), age); }
-
-    const unsigned int domain = Self().domain;
-    const unsigned int otherDomain = domain ^ 1;
-};
-
-TEST_F(LeftOverTest, AFileOfADeadProcessIsRemovedAndOfALivingOneKept)
-{
-    const ChildProcess living([](ChildProcess::Link& link) { link.Await(); });
-    ChildProcess zombie([](ChildProcess::Link& /*link*/) {});
-    siginfo_t ended{};
-    ASSERT_EQ(::waitid(P_PID, static_cast<id_t>(zombie.Pid()), &ended, WEXITED | WNOWAIT), 0);
-    const unsigned long long start = StartOf(living.Pid());
-
-    EXPECT_TRUE(GoesOf({domain, Nobodys, 1}));
-    EXPECT_TRUE(GoesOf({domain, Nobodys, 0}));
-    EXPECT_TRUE(GoesOf({domain, zombie.Pid(), StartOf(zombie.Pid())}));
-    EXPECT_TRUE(GoesOf({domain, living.Pid(), start + 1}));  // an earlier process had the id
-    for (const std::time_t age : {0L, 100 * Hour}) {
-        EXPECT_FALSE(GoesOf({domain, living.Pid(), start}, age));
-        EXPECT_FALSE(GoesOf({domain, living.Pid(), 0}, age));
-        EXPECT_FALSE(GoesOf({domain, ::getpid(), StartOf(::getpid())}, age));
-    }
-}
-
-// On a network file system, or a volume that containers share, process ids are not unique.
-TEST_F(LeftOverTest, AFileOfAnotherMachineOrContainerIsRemovedAfterAnHour)
-{
-    for (const pid_t pid : {Nobodys, ::getpid()}) {
-        for (const unsigned int other : {otherDomain, 0U}) {
-            const Writer writer{other, pid, StartOf(::getpid())};
-            EXPECT_FALSE(GoesOf(writer));
-            EXPECT_FALSE(GoesOf(writer, Hour - 10));
-            EXPECT_TRUE(GoesOf(writer, Hour + 10));
-            EXPECT_FALSE(GoesOf(writer, -Hour - 10));  // in the future
-        }
-    }
-}
-
-TEST_F(LeftOverTest, WithoutProcAnIdInUseIsAlive)
-{
-    faults.open = [](const char* name, int flags, mode_t mode) {
-        const bool isHidden = std::string(name).rfind("/proc/", 0) == 0;
-        return isHidden ? Failing(ENOENT)() : RealOpen(name, flags, mode);
-    };
-    EXPECT_EQ(ReplaceAndTell(), Temporary({domain, ::getpid(), 0}));
-    EXPECT_TRUE(GoesOf({domain, Nobodys, 1}));
-    EXPECT_FALSE(GoesOf({domain, ::getppid(), 1}));
-}
-
-TEST_F(LeftOverTest, WithAnUnknownDomainOnlyTheHourCounts)
-{
-    faults.readlink = Failing(ENOENT);
-    const Writer self{0, ::getpid(), StartOf(::getpid())};
-    EXPECT_EQ(ReplaceAndTell(), Temporary(self));
-    for (const unsigned int each : {0U, domain}) {
-        EXPECT_FALSE(GoesOf({each, Nobodys, 1}));
-        EXPECT_TRUE(GoesOf({each, Nobodys, 1}, Hour + 10));
-    }
-}
-
-TEST_F(LeftOverTest, AFileWithAnotherKindOfNameStays)
-{
-    const std::string dead = TextOf({domain, Nobodys, 1});
-    const std::string hex = dead.substr(0, 9);
-    const std::vector<std::string> table = {
-        "orvadr-tmp" + dead,
-        ".orvadr-tmp",
-        ".orvadr-tmp0",
-        ".orvadr-tmp" + hex,
-        ".orvadr-tmp" + hex + "2147483647",
-        ".orvadr-tmp" + hex + "2147483647.1",
-        ".orvadr-tmp" + hex + "2147483647.1.",
-        ".orvadr-tmp" + dead + ".",
-        ".orvadr-tmp" + dead + ".0",
-        ".orvadr-tmp" + dead + "x",
-        ".orvadr-tmp." + dead,
-        ".orvadr-tmp0" + dead,
-        ".orvadr-tmpABCDEF01.2147483647.1.0",
-        ".orvadr-tmp1234567.2147483647.1.0",
-        ".orvadr-tmp" + hex + "0.1.0",
-        ".orvadr-tmp" + hex + "-1.1.0",
-        ".orvadr-tmp" + hex + "+2147483647.1.0",
-        ".orvadr-tmp" + hex + "02147483647.1.0",
-        ".orvadr-tmp" + hex + "2147483648.1.0",
-        ".orvadr-tmp" + hex + "2147483647.18446744073709551616.0",
-        ".orvadr-tmp" + hex + "2147483647.1.4294967296",
-        ".orvadr-tmp" + hex + "2147483647..0",
-        ".orvadr-tmp" + hex + " 2147483647.1.0",
-    };
-    for (const std::string& ending : table) {
-        EXPECT_FALSE(Goes(path + ending, 100 * Hour)) << ending;
-    }
-    EXPECT_TRUE(Goes(path + ".orvadr-tmp" + hex + "2147483647.18446744073709551615.4294967295"));
-}
-
-TEST_F(LeftOverTest, AFileBesideAnotherPathStays)
-{
-    const std::string ending = ".orvadr-tmp" + TextOf({domain, Nobodys, 1});
-    for (const char* other : {"do", "docs", "doc.pid", "a doc", ""}) {
-        EXPECT_FALSE(Goes(dir.File(other + ending))) << other;
-    }
-    EXPECT_TRUE(Goes(dir.File(Name + ending)));
-}
-
-TEST_F(LeftOverTest, AnythingButARegularFileStays)
-{
-    const std::string target = dir.File("target");
-    const std::string name = Temporary({domain, Nobodys, 1});
-    const std::vector<Planted> table = {
-        {"a link", [&](auto& place) { std::filesystem::create_symlink(target, place); }},
-        {"a directory", [](auto& place) { std::filesystem::create_directory(place); }},
-        {"a pipe", [](auto& place) { EXPECT_EQ(::mkfifo(place.c_str(), 0600), 0); }},
-    };
-    for (const Planted& row : table) {
-        SCOPED_TRACE(row.what);
-        WriteFile(target, "the target's");
-        row.plant(name);
-        EXPECT_TRUE(ReplaceFile(path, "new"));
-        EXPECT_EQ(ReadFile(path), "new");
-        EXPECT_EQ(ReadFile(target), "the target's");
-        EXPECT_TRUE(std::filesystem::remove(name));
-    }
-}
-
-TEST_F(LeftOverTest, IsRemovedInTheWorkingDirectoryToo)
-{
-    CheckInChild([&] {
-        ASSERT_EQ(::chdir(dir.Path().c_str()), 0);
-        WriteFile(Temporary({domain, Nobodys, 1}), "left over");
-        EXPECT_TRUE(ReplaceFile(Name, "new"));
-        EXPECT_THAT(NamesIn("."), ElementsAre(Name));
-    });
-}
-
-TEST_F(LeftOverTest, StaysInADirectoryThatCannotBeListed)
-{
-    const std::string name = Temporary({domain, Nobodys, 1});
-    WriteFile(name, "left over");
-    CheckAsOrdinaryUser(dir, [&] {
-        ASSERT_EQ(::chmod(dir.Path().c_str(), 0300), 0);
-        EXPECT_TRUE(ReplaceFile(path, "new"));
-        ASSERT_EQ(::chmod(dir.Path().c_str(), 0700), 0);
-        EXPECT_EQ(ReadFile(path), "new");
-        EXPECT_EQ(ReadFile(name), "left over");
-    });
-}
-
-TEST_F(LeftOverTest, ALargeDirectoryIsListedCompletelyOnceASecond)
-{
-    constexpr unsigned int Looked = 4000;
-    constexpr unsigned int More = 100;
-    EXPECT_TRUE(ReplaceFile(path, "old"));
-    for (unsigned int number = 0; number < Looked + More; ++number) {
-        WriteFile(Temporary({domain, Nobodys, 1}, number), "");
-    }
-    // Among the first names may be those of the directory, its parent and the file.
-    const auto left = [this] { return NamesIn(dir.Path()).size() - 1; };
-    SetModifyTime(path, std::time(nullptr));
-    processes.time = [now = std::time(nullptr)] { return now; };
-    EXPECT_TRUE(ReplaceFile(path, "new"));
-    EXPECT_GE(left(), More);
-    EXPECT_LE(left(), More + 3);
-    processes.time = [later = std::time(nullptr) + 10] { return later; };
-    EXPECT_TRUE(ReplaceFile(path, "newer"));
-    EXPECT_EQ(left(), 0U);
-}
-
-// Another machine may take it for a left-over after it has written for more than an hour.
-TEST_F(LeftOverTest, AWriterWhoseFileWasRemovedFails)
-{
-    WriteFile(path, "old");
-    faults.fsync = [&](int fd) {
-        for (const std::string& name : NamesIn(dir.Path())) {
-            if (name != Name) std::filesystem::remove(dir.File(name));
-        }
-        return RealFsync(fd);
-    };
-    errno = 0;
-    EXPECT_FALSE(ReplaceFile(path, "new"));
-    EXPECT_EQ(errno, ENOENT);
-    EXPECT_EQ(ReadFile(path), "old");
-    EXPECT_THAT(NamesIn(dir.Path()), ElementsAre(Name));
-}
-
-// ----------------------------------------------------------------------- ReplaceFile: the new file
-
-TEST_F(ReplaceFileTest, ReturnsTheStatusOfItsOwnFileEvenIfThatWasReplaced)
-{
-    struct stat made {};
-    ino_t inode = 0;
-    faults.rename = [&](const char* from, const char* to) {
-        inode = InodeOf(from);
-        const int result = RealRename(from, to);
-        WriteFile(dir.File("another"), "another's");
-        EXPECT_EQ(RealRename(dir.File("another").c_str(), to), 0);
-        return result;
-    };
-    EXPECT_TRUE(ReplaceFile(path, "new", 0640, &made));
-    EXPECT_EQ(made.st_ino, inode);
-    EXPECT_EQ(made.st_size, 3);
-    EXPECT_EQ(made.st_mode & 07777, 0640U);
-    EXPECT_NE(InodeOf(path), inode);
-}
-
-// --------------------------------------------------------------------------- ReplaceFile: failures
+// ---------------------------------------------------------------------------------------- failures
 
 struct Fault {
     const char* what;
@@ -743,44 +279,6 @@ TEST_F(ReplaceFileTest, AFailureLeavesTheOldFileAndNoTemporaryOne)
     }
     EXPECT_TRUE(ReplaceFile(path, "the new text"));
     EXPECT_EQ(ReadFile(path), "the new text");
-}
-
-TEST_F(LeftOverTest, AFileWithTheLongestNameIsReplacedAndItsLeftOversRemoved)
-{
-    path = dir.File(std::string(NAME_MAX, 'n'));
-    const std::string beginning = dir.File(std::string(NAME_MAX - 56, 'n'));
-    EXPECT_EQ(ReplaceAndTell(),
-              beginning + ".orvadr-tmp" + TextOf({domain, ::getpid(), StartOf(::getpid())}));
-    const std::string longest = "ffffffff.2147483647.18446744073709551615.9999";
-    WriteFile(beginning + ".orvadr-tmp" + longest, "left over");
-    WriteFile(beginning + ".orvadr-tmp" + TextOf({domain, Nobodys, 1}), "left over");
-    SetModifyTime(beginning + ".orvadr-tmp" + longest, 1);
-    EXPECT_TRUE(ReplaceFile(path, "new"));
-    EXPECT_EQ(NamesIn(dir.Path()).size(), 1U);
-}
-
-// Each writer begins while the one before it writes.
-TEST_F(ReplaceFileTest, ManyThreadsMayReplaceAFileWithTheLongestName)
-{
-    constexpr std::size_t Writers = 100;
-    const std::string longest = dir.File(std::string(NAME_MAX, 'n'));
-    std::size_t writers = 0;
-    faults.write = [&](int fd, const void* buffer, std::size_t size) {
-        if (++writers < Writers) {
-            EXPECT_TRUE(ReplaceFile(longest, "text"));
-        }
-        return RealWrite(fd, buffer, size);
-    };
-    EXPECT_TRUE(ReplaceFile(longest, "text"));
-    EXPECT_EQ(writers, Writers);
-    EXPECT_EQ(ReadFile(longest), "text");
-    EXPECT_EQ(NamesIn(dir.Path()).size(), 1U);
-}
-
-TEST_F(ReplaceFileTest, ANameWithRoomForTheLongestEndingIsNotShortened)
-{
-    path = dir.File(std::string(199, 'n'));
-    EXPECT_EQ(ReplaceAndTell().substr(0, path.size() + 11), path + ".orvadr-tmp");
 }
 
 TEST_F(ReplaceFileTest, AFailureMakesNoFileWhereNoneWas)
