@@ -1,5 +1,5 @@
-// For the tests of the platform stand-ins: callers in processes of their own, whose signals,
-// descriptors and user can be changed freely, and the state of a process.
+// For the tests of the platform stand-ins: what a caller can set up before it forks or starts a
+// program, and what it can see afterwards.
 #ifndef ORVADRCORE_TESTS_PLATFORM_CALLER_H
 #define ORVADRCORE_TESTS_PLATFORM_CALLER_H
 
@@ -8,7 +8,6 @@
 #include <poll.h>
 #include <signal.h>
 #include <sys/resource.h>
-#include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -16,26 +15,12 @@
 #include <cerrno>
 #include <cstdlib>
 #include <filesystem>
-#include <fstream>
-#include <functional>
 #include <set>
 #include <sstream>
-#include <stdexcept>
 #include <string>
 #include <vector>
 
 #include "support/processes/child_process.h"
-
-// Runs `body` in a process of its own, for a minute at most. Expectations that fail there fail the
-// test.
-inline void InProcess(const std::function<void()>& body)
-{
-    ChildProcess process([&](ChildProcess::Link&) {
-        body();
-        if (::testing::Test::HasFailure()) throw std::runtime_error("an expectation failed");
-    });
-    EXPECT_EQ(process.Join(), 0);
-}
 
 // A pipe that programs inherit only if the caller passes it on.
 class Pipe {
@@ -106,18 +91,6 @@ class Pipe {
 
     std::array<int, 2> ends{-1, -1};
 };
-
-inline std::string Content(const std::string& path)
-{
-    std::ostringstream text;
-    text << std::ifstream(path, std::ios::binary).rdbuf();
-    return text.str();
-}
-
-inline void SetContent(const std::string& path, const std::string& text)
-{
-    std::ofstream(path, std::ios::binary) << text;
-}
 
 // The number that a text begins with, or 0.
 inline long Number(const std::string& text)
@@ -209,7 +182,7 @@ inline void BlockSignal(int signal)
 }
 
 // A handler that waits for all children, as in event loops.
-inline void ReapAll(int)
+inline void ReapChildren(int)
 {
     const int error = errno;
     while (::waitpid(-1, nullptr, WNOHANG) > 0) {
@@ -227,17 +200,8 @@ const std::array<ChildSignal, 5> ChildSignals{{
     {"default", SIG_DFL, 0},
     {"ignored", SIG_IGN, 0},
     {"no zombies", SIG_DFL, SA_NOCLDWAIT},
-    {"reaping handler", ReapAll, SA_RESTART},
-    {"reaping handler, no zombies", ReapAll, SA_NOCLDWAIT},
+    {"reaping handler", ReapChildren, SA_RESTART},
+    {"reaping handler, no zombies", ReapChildren, SA_NOCLDWAIT},
 }};
-
-// Gives up root's rights for good, if there are any.
-inline void BecomeOrdinary()
-{
-    constexpr uid_t Nobody = 65534;
-    if (::geteuid() != 0) return;
-    EXPECT_EQ(::setgid(Nobody), 0);
-    EXPECT_EQ(::setuid(Nobody), 0);
-}
 
 #endif

@@ -9,6 +9,9 @@
 
 #include "caller.h"
 #include "support/fixtures/temp_dir.h"
+#include "support/fixtures/test_files.h"
+#include "support/processes/child_checks.h"
+#include "support/processes/rights.h"
 
 namespace {
 
@@ -27,9 +30,9 @@ class FilesTest : public ::testing::Test {
 
 TEST_F(FilesTest, EverythingWithANameExists)
 {
-    SetContent(dir.File("file"), "text");
-    SetContent(dir.File("secret"), "");
-    SetContent(dir.File("two\nlines \xff"), "");
+    WriteFile(dir.File("file"), "text");
+    WriteFile(dir.File("secret"), "");
+    WriteFile(dir.File("two\nlines \xff"), "");
     EXPECT_EQ(::chmod(dir.File("secret").c_str(), 0000), 0);
     EXPECT_EQ(::mkfifo(dir.File("fifo").c_str(), 0600), 0);
     for (const char* name : {"file", "secret", "two\nlines \xff", "fifo"}) {
@@ -51,7 +54,7 @@ TEST_F(FilesTest, RecognizesDirectories)
 
 TEST_F(FilesTest, WhatHasNoNameDoesNotExist)
 {
-    SetContent(dir.File("file"), "");
+    WriteFile(dir.File("file"), "");
     for (const char* name : {"missing", "missing/", "missing/file", "file/", "file/name"}) {
         Expect(dir.File(name), false, 0);
     }
@@ -61,7 +64,7 @@ TEST_F(FilesTest, WhatHasNoNameDoesNotExist)
 
 TEST_F(FilesTest, FollowsSymbolicLinks)
 {
-    SetContent(dir.File("file"), "");
+    WriteFile(dir.File("file"), "");
     fs::create_symlink("file", dir.File("to file"));
     fs::create_directory_symlink(dir.Path(), dir.File("to directory"));
     fs::create_symlink("to file", dir.File("to link"));
@@ -80,8 +83,8 @@ TEST_F(FilesTest, NothingExistsInADirectoryThatMayNotBeSearched)
     fs::create_directories(dir.File("closed/directory"));
     EXPECT_EQ(::chmod(dir.Path().c_str(), 0711), 0);
     EXPECT_EQ(::chmod(dir.File("closed").c_str(), 0000), 0);
-    InProcess([this] {
-        BecomeOrdinary();
+    CheckInChild([this] {
+        EXPECT_TRUE(LoseRights());
         Expect(dir.File("closed"), true, 1);
         Expect(dir.File("closed/directory"), false, 0);
     });

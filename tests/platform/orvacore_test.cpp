@@ -4,20 +4,18 @@
 #include <gtest/gtest.h>
 #include <signal.h>
 #include <sys/resource.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <array>
 #include <cerrno>
 #include <cstdlib>
-#include <filesystem>
-#include <fstream>
-#include <iterator>
 #include <stdexcept>
 #include <string>
 #include <vector>
 
+#include "caller.h"
 #include "support/fixtures/temp_dir.h"
+#include "support/fixtures/test_files.h"
 #include "support/processes/child_process.h"
 
 namespace {
@@ -59,17 +57,6 @@ Outcome RunToEnd(const char* path, Arguments... arguments)
     return {output, CoreLibPclose(stream)};
 }
 
-std::ptrdiff_t OpenDescriptors()
-{
-    const std::filesystem::directory_iterator entries("/proc/self/fd");
-    return std::distance(begin(entries), end(entries));
-}
-
-bool HasChild()
-{
-    return ::waitpid(-1, nullptr, WNOHANG) >= 0 || errno != ECHILD;
-}
-
 // For the body of a ChildProcess, which reports by its exit code.
 void Require(bool fact)
 {
@@ -81,12 +68,12 @@ class OrvaCoreTest : public ::testing::Test {
   protected:
     void TearDown() override
     {
-        EXPECT_EQ(OpenDescriptors(), descriptors);
-        EXPECT_FALSE(HasChild());
+        EXPECT_EQ(CountDescriptors(), descriptors);
+        EXPECT_FALSE(HasChildren());
     }
 
   private:
-    std::ptrdiff_t descriptors = OpenDescriptors();
+    std::size_t descriptors = CountDescriptors();
 };
 
 TEST_F(OrvaCoreTest, TheOutputIsReadToItsEnd)
@@ -136,7 +123,7 @@ TEST_F(OrvaCoreTest, AProgramThatCannotBeStartedHasNoStream)
 {
     const TempDir directory;
     const std::string notExecutable = directory.File("plain");
-    std::ofstream(notExecutable) << "#!/bin/sh\n";
+    WriteFile(notExecutable, "#!/bin/sh\n");
 
     struct Row {
         const char* path;
@@ -170,7 +157,7 @@ TEST_F(OrvaCoreTest, WithoutFreeDescriptorsThereIsNoStream)
             Require(::setrlimit(RLIMIT_NOFILE, &limit) == 0);
             Require(CoreLibPopen("/bin/true", "r", nullptr) == nullptr);
             Require(errno == EMFILE);
-            Require(!HasChild());
+            Require(!HasChildren());
         });
         EXPECT_EQ(child.Join(), 0) << spare;
     }
@@ -210,16 +197,14 @@ TEST_F(OrvaCoreTest, StandardInputAndErrorAreTheCallers)
     const TempDir directory;
     const std::string inputFile = directory.File("input");
     const std::string errorFile = directory.File("error");
-    std::ofstream(inputFile) << "input";
+    WriteFile(inputFile, "input");
     ChildProcess child([&](ChildProcess::Link&) {
         Require(::dup2(::open(inputFile.c_str(), O_RDONLY), STDIN_FILENO) == STDIN_FILENO);
         Require(::dup2(::creat(errorFile.c_str(), 0600), STDERR_FILENO) == STDERR_FILENO);
         Require(RunToEnd("/bin/sh", "-c", "cat; echo error >&2") == Outcome{"input", 0});
     });
     EXPECT_EQ(child.Join(), 0);
-    std::string error;
-    std::getline(std::ifstream(errorFile), error);
-    EXPECT_EQ(error, "error");
+    EXPECT_EQ(ReadFile(errorFile), "error\n");
 }
 
 TEST_F(OrvaCoreTest, ACallerMayHaveClosedItsStandardDescriptors)
@@ -229,10 +214,10 @@ TEST_F(OrvaCoreTest, ACallerMayHaveClosedItsStandardDescriptors)
             for (const int descriptor : {0, 1, 2}) {
                 if ((closed >> descriptor & 1U) != 0) ::close(descriptor);
             }
-            const std::ptrdiff_t before = OpenDescriptors();
+            const std::size_t before = CountDescriptors();
             Require(RunToEnd("/bin/echo", "hello") == Outcome{"hello\n", 0});
-            Require(OpenDescriptors() == before);
-            Require(!HasChild());
+            Require(CountDescriptors() == before);
+            Require(!HasChildren());
         });
         EXPECT_EQ(child.Join(), 0) << closed;
     }
@@ -276,7 +261,7 @@ TEST_F(OrvaCoreTest, ACallerMayIgnoreItsChildren)
         Require(::signal(SIGCHLD, SIG_IGN) != SIG_ERR);
         Require(RunToEnd("/bin/echo", "hello") == Outcome{"hello\n", 0});
         Require(RunToEnd("/bin/false") == Outcome{"", -1});
-        Require(!HasChild());
+        Require(!HasChildren());
     });
     EXPECT_EQ(child.Join(), 0);
 }

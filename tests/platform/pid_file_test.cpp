@@ -9,20 +9,18 @@
 
 #include "caller.h"
 #include "support/fixtures/temp_dir.h"
+#include "support/fixtures/test_files.h"
+#include "support/processes/child_checks.h"
+#include "support/processes/reap.h"
+#include "support/processes/rights.h"
+#include "support/processes/stat_field.h"
 
 namespace {
 
-// The start time of this process in clock ticks since boot: field 22 of /proc/self/stat. The name,
-// before the third field, may hold anything.
+// In clock ticks since boot.
 unsigned long long OwnStart()
 {
-    const std::string status = Content("/proc/self/stat");
-    std::istringstream fields(status.substr(status.rfind(')') + 1));
-    std::string field;
-    for (int number = 3; number < 22; ++number) fields >> field;
-    unsigned long long start = 0;
-    fields >> start;
-    return start;
+    return std::stoull(StatField(::getpid(), 22));
 }
 
 std::string OwnText()
@@ -50,15 +48,6 @@ class PidFileTest : public ::testing::Test {
         return status;
     }
 
-    std::set<std::string> Names() const
-    {
-        std::set<std::string> names;
-        for (const auto& entry : std::filesystem::directory_iterator(dir.Path())) {
-            names.insert(entry.path().filename().string());
-        }
-        return names;
-    }
-
     TempDir dir;
     std::string path = dir.File("x.pid");
 };
@@ -66,9 +55,9 @@ class PidFileTest : public ::testing::Test {
 TEST_F(PidFileTest, HoldsIdAndStart)
 {
     EXPECT_EQ(Create(), 0);
-    EXPECT_EQ(Content(path), OwnText());
+    EXPECT_EQ(ReadFile(path), OwnText());
     EXPECT_EQ(Read(), ::getpid());
-    EXPECT_EQ(Names(), std::set<std::string>{"x.pid"});
+    EXPECT_EQ(NamesIn(dir.Path()), std::set<std::string>{"x.pid"});
 }
 
 TEST_F(PidFileTest, NamesTheCallingProcessWhateverItsName)
@@ -77,7 +66,7 @@ TEST_F(PidFileTest, NamesTheCallingProcessWhateverItsName)
         SCOPED_TRACE(name);
         ChildProcess process([&](ChildProcess::Link& link) {
             ::prctl(PR_SET_NAME, name);
-            if (Create() != 0 || Content(path) != OwnText()) return;
+            if (Create() != 0 || ReadFile(path) != OwnText()) return;
             link.Tell();
             link.Await();
         });
@@ -91,23 +80,23 @@ TEST_F(PidFileTest, NamesTheCallingProcessWhateverItsName)
 
 TEST_F(PidFileTest, NamesADetachedChildThatCalls)
 {
-    InProcess([this] {
+    CheckInChild([this] {
         Pipe done;
         const pid_t child = CoreLibProcForkEx(CORELIB_FORK_DETACHED);
         if (child == 0) {
             Create();
-            done.Write(Content(path) == OwnText() ? "right" : "wrong");
+            done.Write(ReadFile(path) == OwnText() ? "right" : "wrong");
             ::_exit(0);
         }
         EXPECT_EQ(done.ReadToEnd(), "right");
-        EXPECT_EQ(Content(path).find(std::to_string(child) + "\n"), 0U);
+        EXPECT_EQ(ReadFile(path).find(std::to_string(child) + "\n"), 0U);
     });
 }
 
 TEST_F(PidFileTest, IsReadableByAllWhateverTheUmask)
 {
     for (const mode_t mask : {0000U, 0022U, 0077U, 0777U}) {
-        InProcess([&] {
+        CheckInChild([&] {
             ::umask(mask);
             EXPECT_EQ(Create(), 0);
         });
@@ -120,8 +109,8 @@ TEST_F(PidFileTest, IsReadByAnotherUser)
     EXPECT_EQ(Create(), 0);
     EXPECT_EQ(::chmod(dir.Path().c_str(), 0711), 0);
     const pid_t writer = ::getpid();
-    InProcess([&] {
-        BecomeOrdinary();
+    CheckInChild([&] {
+        EXPECT_TRUE(LoseRights());
         EXPECT_EQ(Read(), writer);
         EXPECT_EQ(CoreLibProcAlive(writer), 1);
     });
@@ -129,20 +118,20 @@ TEST_F(PidFileTest, IsReadByAnotherUser)
 
 TEST_F(PidFileTest, IsReplacedAsAWhole)
 {
-    SetContent(path, "1\n2\n");
+    WriteFile(path, "1\n2\n");
     const std::string other = dir.File("other name");
     EXPECT_EQ(::link(path.c_str(), other.c_str()), 0);
     EXPECT_EQ(::chmod(path.c_str(), 0400), 0);
     EXPECT_EQ(Create(), 0);
-    EXPECT_EQ(Content(path), OwnText());
+    EXPECT_EQ(ReadFile(path), OwnText());
     EXPECT_EQ(Status().st_mode, S_IFREG | 0644U);
-    EXPECT_EQ(Content(other), "1\n2\n");  // the old file is not written to
-    EXPECT_EQ(Names(), (std::set<std::string>{"other name", "x.pid"}));
+    EXPECT_EQ(ReadFile(other), "1\n2\n");  // the old file is not written to
+    EXPECT_EQ(NamesIn(dir.Path()), (std::set<std::string>{"other name", "x.pid"}));
 }
 
 TEST_F(PidFileTest, ReplacesWhatADeadProcessLeft)
 {
-    InProcess([&] { EXPECT_EQ(Create(), 0); });
+    CheckInChild([&] { EXPECT_EQ(Create(), 0); });
     EXPECT_EQ(CoreLibProcAlive(Read()), 0);
     EXPECT_EQ(Create(), 0);
     EXPECT_EQ(Read(), ::getpid());
@@ -151,25 +140,25 @@ TEST_F(PidFileTest, ReplacesWhatADeadProcessLeft)
 TEST_F(PidFileTest, IsNotWrittenThroughASymbolicLink)
 {
     const std::string precious = dir.File("precious");
-    SetContent(precious, "precious");
+    WriteFile(precious, "precious");
     std::filesystem::create_symlink(precious, path);
     EXPECT_EQ(Create(), 0);
     EXPECT_TRUE(S_ISREG(Status().st_mode));
-    EXPECT_EQ(Content(path), OwnText());
-    EXPECT_EQ(Content(precious), "precious");
+    EXPECT_EQ(ReadFile(path), OwnText());
+    EXPECT_EQ(ReadFile(precious), "precious");
 }
 
 TEST_F(PidFileTest, IsNotMadeThroughADanglingLink)
 {
     std::filesystem::create_symlink(dir.File("target"), path);
     EXPECT_EQ(Create(), 0);
-    EXPECT_EQ(Content(path), OwnText());
-    EXPECT_EQ(Names(), std::set<std::string>{"x.pid"});
+    EXPECT_EQ(ReadFile(path), OwnText());
+    EXPECT_EQ(NamesIn(dir.Path()), std::set<std::string>{"x.pid"});
 }
 
 TEST_F(PidFileTest, IsNotMadeWhereNoFileCanBe)
 {
-    SetContent(dir.File("file"), "");
+    WriteFile(dir.File("file"), "");
     path = dir.File("missing/x.pid");
     ExpectNotCreated(ENOENT);
     path = dir.File("file/x.pid");
@@ -179,33 +168,33 @@ TEST_F(PidFileTest, IsNotMadeWhereNoFileCanBe)
     path = dir.File("dir");
     std::filesystem::create_directory(path);
     ExpectNotCreated(EISDIR);
-    EXPECT_EQ(Names(), (std::set<std::string>{"dir", "file"}));
+    EXPECT_EQ(NamesIn(dir.Path()), (std::set<std::string>{"dir", "file"}));
 }
 
 TEST_F(PidFileTest, AnUnwritableDirectoryIsAnErrorAndTheOldFileStays)
 {
-    SetContent(path, "1\n");
+    WriteFile(path, "1\n");
     EXPECT_EQ(::chmod(dir.Path().c_str(), 0555), 0);
-    InProcess([&] {
-        BecomeOrdinary();
+    CheckInChild([&] {
+        EXPECT_TRUE(LoseRights());
         ExpectNotCreated(EACCES);
     });
     EXPECT_EQ(::chmod(dir.Path().c_str(), 0700), 0);
-    EXPECT_EQ(Content(path), "1\n");
-    EXPECT_EQ(Names(), std::set<std::string>{"x.pid"});
+    EXPECT_EQ(ReadFile(path), "1\n");
+    EXPECT_EQ(NamesIn(dir.Path()), std::set<std::string>{"x.pid"});
 }
 
 TEST_F(PidFileTest, AFailureToWriteIsAnErrorAndTheOldFileStays)
 {
-    SetContent(path, "1\n");
-    InProcess([&] {
+    WriteFile(path, "1\n");
+    CheckInChild([&] {
         SetSignal(SIGXFSZ, SIG_IGN);
         const rlimit none{0, RLIM_INFINITY};
         EXPECT_EQ(::setrlimit(RLIMIT_FSIZE, &none), 0);
         ExpectNotCreated(EFBIG);
     });
-    EXPECT_EQ(Content(path), "1\n");
-    EXPECT_EQ(Names(), std::set<std::string>{"x.pid"});
+    EXPECT_EQ(ReadFile(path), "1\n");
+    EXPECT_EQ(NamesIn(dir.Path()), std::set<std::string>{"x.pid"});
 }
 
 TEST_F(PidFileTest, OneOfManyWritersWins)
@@ -220,8 +209,8 @@ TEST_F(PidFileTest, OneOfManyWritersWins)
         });
     }
     for (std::thread& thread : threads) thread.join();
-    EXPECT_EQ(Content(path), OwnText());
-    EXPECT_EQ(Names(), std::set<std::string>{"x.pid"});
+    EXPECT_EQ(ReadFile(path), OwnText());
+    EXPECT_EQ(NamesIn(dir.Path()), std::set<std::string>{"x.pid"});
 }
 
 TEST_F(PidFileTest, AMissingFileHoldsNoId)
@@ -236,7 +225,7 @@ TEST_F(PidFileTest, AMissingFileHoldsNoId)
 TEST_F(PidFileTest, ReadsOnlyALineThatIsAnId)
 {
     const std::string own = std::to_string(::getpid());
-    const std::string start = std::to_string(OwnStart());
+    const std::string start = StatField(::getpid(), 22);
     struct Row {
         std::string text;
         pid_t pid;
@@ -281,7 +270,7 @@ TEST_F(PidFileTest, ReadsOnlyALineThatIsAnId)
         {"2147483647\n1\n", INT_MAX},
     };
     for (const Row& row : rows) {
-        SetContent(path, row.text);
+        WriteFile(path, row.text);
         EXPECT_EQ(Read(), row.pid) << row.text.substr(0, 100);
     }
 }
@@ -290,8 +279,7 @@ TEST_F(PidFileTest, ReadsTheIdOfAZombieUntilItIsUsedAgain)
 {
     ChildProcess process([this](ChildProcess::Link&) { Create(); });
     const pid_t pid = process.Pid();
-    siginfo_t info{};
-    EXPECT_EQ(::waitid(P_PID, static_cast<id_t>(pid), &info, WEXITED | WNOWAIT), 0);
+    AwaitZombie(pid);
     EXPECT_EQ(Read(), pid);
     EXPECT_EQ(CoreLibProcAlive(pid), 0);
     EXPECT_EQ(process.Join(), 0);
@@ -301,11 +289,11 @@ TEST_F(PidFileTest, ReadsTheIdOfAZombieUntilItIsUsedAgain)
 
 TEST_F(PidFileTest, AFileThatCannotBeReadHoldsNoId)
 {
-    SetContent(path, std::to_string(::getpid()));
+    WriteFile(path, std::to_string(::getpid()));
     EXPECT_EQ(::chmod(dir.Path().c_str(), 0711), 0);
     EXPECT_EQ(::chmod(path.c_str(), 0000), 0);
-    InProcess([this] {
-        BecomeOrdinary();
+    CheckInChild([this] {
+        EXPECT_TRUE(LoseRights());
         EXPECT_EQ(Read(), 0);
         path = dir.Path();
         EXPECT_EQ(Read(), 0);
@@ -315,20 +303,20 @@ TEST_F(PidFileTest, AFileThatCannotBeReadHoldsNoId)
 TEST_F(PidFileTest, APipeHoldsNoIdWithoutWaiting)
 {
     EXPECT_EQ(::mkfifo(path.c_str(), 0600), 0);
-    InProcess([this] { EXPECT_EQ(Read(), 0); });
+    CheckInChild([this] { EXPECT_EQ(Read(), 0); });
     const int writer = ::open(path.c_str(), O_RDWR | O_CLOEXEC);
     const std::string text = std::to_string(::getpid()) + "\n";
     EXPECT_EQ(::write(writer, text.data(), text.size()), static_cast<ssize_t>(text.size()));
-    InProcess([this] { EXPECT_EQ(Read(), 0); });
+    CheckInChild([this] { EXPECT_EQ(Read(), 0); });
     ::close(writer);
 }
 
 TEST_F(PidFileTest, ReadsNoMoreThanAPidFileHolds)
 {
     constexpr long SizeKiB = 512L * 1024;
-    SetContent(path, std::to_string(::getpid()) + "\n");
+    WriteFile(path, std::to_string(::getpid()) + "\n");
     EXPECT_EQ(::truncate(path.c_str(), SizeKiB * 1024), 0);
-    InProcess([this] {
+    CheckInChild([this] {
         const auto peakKiB = [] {
             rusage usage{};
             ::getrusage(RUSAGE_SELF, &usage);

@@ -1,7 +1,6 @@
 // CoreLibProcForkEx() and CoreLibProcAlive().
 #include <orvacore/orvacore.h>
 
-#include <dlfcn.h>
 #include <sched.h>
 #include <stdio.h>
 #include <sys/prctl.h>
@@ -17,8 +16,14 @@
 #include <thread>
 
 #include "caller.h"
+#include "support/fakes/real_function.h"
 #include "support/fixtures/temp_dir.h"
+#include "support/fixtures/test_files.h"
+#include "support/processes/child_checks.h"
+#include "support/processes/reap.h"
+#include "support/processes/rights.h"
 #include "support/processes/shared_memory.h"
+#include "support/processes/stat_field.h"
 
 namespace {
 
@@ -47,7 +52,7 @@ extern "C" pid_t fork() noexcept
         forkFault.action();
         return -1;
     }
-    static const auto real = reinterpret_cast<pid_t (*)()>(::dlsym(RTLD_NEXT, "fork"));
+    static const auto real = RealFunction<pid_t()>("fork");
     return real();
 }
 
@@ -58,7 +63,7 @@ extern "C" int setlogmask(int mask) noexcept
         --libraryLock->waits;
         libraryLock->wait();
     }
-    static const auto real = reinterpret_cast<int (*)(int)>(::dlsym(RTLD_NEXT, "setlogmask"));
+    static const auto real = RealFunction<int(int)>("setlogmask");
     return real(mask);
 }
 
@@ -97,19 +102,17 @@ TEST(ForkTest, TheFlagsValueIsFixed)
 
 TEST(ForkTest, WithoutFlagsTheCallerMustWaitForTheChild)
 {
-    InProcess([] {
+    CheckInChild([] {
         const pid_t caller = ::getpid();
         const pid_t child = CoreLibProcForkEx(0);
         if (child == 0) ::_exit(::getppid() == caller ? 5 : 6);
-        int status = 0;
-        EXPECT_EQ(::waitpid(child, &status, 0), child);
-        EXPECT_EQ(WEXITSTATUS(status), 5);
+        EXPECT_EQ(Reap(child), 5);
     });
 }
 
 TEST(ForkTest, WithoutFlagsAFailureIsReturned)
 {
-    InProcess([] {
+    CheckInChild([] {
         forkFault = {1, [] { errno = ENOMEM; }};
         EXPECT_EQ(CoreLibProcForkEx(0), -1);
         EXPECT_EQ(errno, ENOMEM);
@@ -118,7 +121,7 @@ TEST(ForkTest, WithoutFlagsAFailureIsReturned)
 
 TEST(DetachedForkTest, ReturnsTheIdOfTheProcessThatRunsTheChildsCode)
 {
-    InProcess([] {
+    CheckInChild([] {
         Pipe report;
         const pid_t child = Detach([&] { report.Write(std::to_string(::getpid())); });
         EXPECT_EQ(report.ReadToEnd(), std::to_string(child));
@@ -128,7 +131,7 @@ TEST(DetachedForkTest, ReturnsTheIdOfTheProcessThatRunsTheChildsCode)
 
 TEST(DetachedForkTest, TheCallerHasNoChildToWaitFor)
 {
-    InProcess([] {
+    CheckInChild([] {
         Pipe forked;
         Pipe report;
         const pid_t child = Detach([&] {
@@ -145,11 +148,10 @@ TEST(DetachedForkTest, TheCallerHasNoChildToWaitFor)
 
 TEST(DetachedForkTest, DoesNotReapOtherChildrenOfTheCaller)
 {
-    InProcess([] {
+    CheckInChild([] {
         const pid_t other = ::fork();
         if (other == 0) ::_exit(5);
-        siginfo_t info{};
-        EXPECT_EQ(::waitid(P_PID, static_cast<id_t>(other), &info, WEXITED | WNOWAIT), 0);
+        AwaitZombie(other);
         Detach([] {});
         int status = 0;
         EXPECT_EQ(::waitpid(other, &status, 0), other);
@@ -162,7 +164,7 @@ TEST(DetachedForkTest, WorksWhateverTheCallerDoesWithSigchld)
 {
     for (const ChildSignal& row : ChildSignals) {
         SCOPED_TRACE(row.name);
-        InProcess([&] {
+        CheckInChild([&] {
             SetSignal(SIGCHLD, row.handler, row.flags);
             for (int i = 0; i < 20; ++i) {
                 Pipe report;
@@ -186,13 +188,13 @@ std::string Settings()
 TEST(DetachedForkTest, KeepsDirectoryUmaskAndSignals)
 {
     const TempDir dir;
-    InProcess([&] {
+    CheckInChild([&] {
         EXPECT_EQ(::chdir(dir.Path().c_str()), 0);
         ::umask(0137);
-        SetSignal(SIGUSR1, ReapAll, SA_RESTART | SA_NODEFER);
+        SetSignal(SIGUSR1, ReapChildren, SA_RESTART | SA_NODEFER);
         SetSignal(SIGCHLD, SIG_IGN);
         BlockSignal(SIGUSR2);
-        SetSignal(SIGALRM, ReapAll, SA_RESTART);
+        SetSignal(SIGALRM, ReapChildren, SA_RESTART);
         BlockSignal(SIGALRM);
         Pipe report;
         Detach([&] { report.Write(Settings()); });
@@ -246,11 +248,6 @@ int OpenFifo(const std::string& path)
     return ::open(path.c_str(), O_RDWR);
 }
 
-int OpenFile(const std::string& path)
-{
-    return ::open(path.c_str(), O_RDWR | O_CREAT, 0600);
-}
-
 TEST(DetachedForkTest, StandardPipesAndSocketsBecomeTheNullDevice)
 {
     struct Row {
@@ -264,7 +261,7 @@ TEST(DetachedForkTest, StandardPipesAndSocketsBecomeTheNullDevice)
         {"named pipe", OpenFifo, false},
         {"local socket", OpenSocket<AF_UNIX, SOCK_DGRAM>, false},
         {"network socket", OpenSocket<AF_INET, SOCK_STREAM>, false},
-        {"file", OpenFile, true},
+        {"file", [](const std::string& path) { return OpenFile(path, O_RDWR | O_CREAT); }, true},
         {"directory", [](const std::string&) { return ::open("/", O_RDONLY); }, true},
         {"device", OpenDevice, true},
     }};
@@ -272,7 +269,7 @@ TEST(DetachedForkTest, StandardPipesAndSocketsBecomeTheNullDevice)
         for (const int fd : {STDIN_FILENO, STDOUT_FILENO, STDERR_FILENO}) {
             SCOPED_TRACE(std::string(row.name) + " on " + std::to_string(fd));
             const TempDir dir;
-            InProcess([&] {
+            CheckInChild([&] {
                 const int stream = row.open(dir.File("stream"));
                 const std::string before = Target(stream);
                 EXPECT_EQ(::dup2(stream, fd), fd);
@@ -287,7 +284,7 @@ TEST(DetachedForkTest, StandardPipesAndSocketsBecomeTheNullDevice)
 
 TEST(DetachedForkTest, TheNullDeviceCanBeReadWrittenAndInherited)
 {
-    InProcess([] {
+    CheckInChild([] {
         const Pipe streams;
         for (const int fd : {0, 1, 2}) EXPECT_EQ(::dup2(streams.Writing(), fd), fd);
         Pipe report;
@@ -307,7 +304,7 @@ TEST(DetachedForkTest, ClosedStandardStreamsStayClosed)
 {
     for (const std::string open : {"", "0", "1", "2", "01", "02", "12"}) {
         SCOPED_TRACE("open: " + open);
-        InProcess([&] {
+        CheckInChild([&] {
             Pipe report;
             const Pipe stream;
             for (const int fd : {0, 1, 2}) {
@@ -329,7 +326,7 @@ TEST(DetachedForkTest, ClosedStandardStreamsStayClosed)
 
 TEST(DetachedForkTest, KeepsOtherDescriptorsAndAddsNone)
 {
-    InProcess([] {
+    CheckInChild([] {
         Pipe report;
         const Pipe other;
         const std::set<int> before = Descriptors();
@@ -343,7 +340,7 @@ TEST(DetachedForkTest, TheCallersOutputEndsWithTheCaller)
 {
     Pipe output;
     Pipe never;
-    InProcess([&] {
+    CheckInChild([&] {
         ::dup2(output.Writing(), STDOUT_FILENO);
         output.CloseWriting();
         output.CloseReading();
@@ -356,7 +353,7 @@ TEST(DetachedForkTest, TheCallersOutputEndsWithTheCaller)
 
 TEST(DetachedForkTest, AFailureOfTheFirstForkIsReturned)
 {
-    InProcess([] {
+    CheckInChild([] {
         forkFault = {1, [] { errno = EAGAIN; }};
         ExpectNotForked(EAGAIN);
     });
@@ -364,7 +361,7 @@ TEST(DetachedForkTest, AFailureOfTheFirstForkIsReturned)
 
 TEST(DetachedForkTest, AFailureOfTheSecondForkIsReturned)
 {
-    InProcess([] {
+    CheckInChild([] {
         forkFault = {2, [] { errno = ENOMEM; }};
         ExpectNotForked(ENOMEM);
     });
@@ -372,7 +369,7 @@ TEST(DetachedForkTest, AFailureOfTheSecondForkIsReturned)
 
 TEST(DetachedForkTest, FailsWhenTheIntermediateProcessIsKilled)
 {
-    InProcess([] {
+    CheckInChild([] {
         forkFault = {2, [] { ::kill(::getpid(), SIGKILL); }};
         ExpectNotForked(ECHILD);
     });
@@ -383,7 +380,7 @@ TEST(DetachedForkTest, FailsWhenTheIntermediateProcessIsKilled)
 TEST(DetachedForkTest, NoticesAKilledIntermediateProcessWhosePipeIsStillOpen)
 {
     for (auto* const disposition : {SIG_DFL, SIG_IGN}) {
-        InProcess([disposition] {
+        CheckInChild([disposition] {
             static Pipe life;  // closed at the end of the caller
             EXPECT_NE(std::signal(SIGCHLD, disposition), SIG_ERR);
             forkFault = {2, [] {
@@ -448,7 +445,7 @@ class LockedLibraryTest : public ::testing::Test {
 TEST_F(LockedLibraryTest, TheCallerForksAgainUntilTheLockIsFree)
 {
     for (void (*wait)() : {&WaitForEver, &SpinForEver}) {
-        InProcess([&] {
+        CheckInChild([&] {
             Lock(3, wait);
             ExpectForked();
             EXPECT_EQ(lock->waits, 0);
@@ -458,7 +455,7 @@ TEST_F(LockedLibraryTest, TheCallerForksAgainUntilTheLockIsFree)
 
 TEST_F(LockedLibraryTest, ASlowProcessIsNotTakenForOneThatWaits)
 {
-    InProcess([this] {
+    CheckInChild([this] {
         Lock(INT_MAX, WorkForAWhile);
         ExpectForked();
     });
@@ -466,7 +463,7 @@ TEST_F(LockedLibraryTest, ASlowProcessIsNotTakenForOneThatWaits)
 
 TEST_F(LockedLibraryTest, WithoutOtherThreadsNoLockIsTested)
 {
-    InProcess([this] {
+    CheckInChild([this] {
         __libc_single_threaded = 1;  // other tests of this program had threads
         LockForOneThread(INT_MAX, WaitForEver);
         ExpectForked();
@@ -476,7 +473,7 @@ TEST_F(LockedLibraryTest, WithoutOtherThreadsNoLockIsTested)
 
 TEST_F(LockedLibraryTest, ALockThatIsNeverFreeIsAFailure)
 {
-    InProcess([this] {
+    CheckInChild([this] {
         Lock(INT_MAX, WaitForEver);
         ExpectNotForked(EDEADLK);
         EXPECT_LT(lock->waits, INT_MAX - 10);
@@ -486,7 +483,7 @@ TEST_F(LockedLibraryTest, ALockThatIsNeverFreeIsAFailure)
 TEST(DetachedForkTest, WithoutDescriptorsNothingIsForked)
 {
     for (int spare = 0; spare < 2; ++spare) {
-        InProcess([spare] {
+        CheckInChild([spare] {
             const std::set<int> before = Descriptors();
             rlimit limits{};
             ::getrlimit(RLIMIT_NOFILE, &limits);
@@ -503,7 +500,7 @@ TEST(DetachedForkTest, WithoutDescriptorsNothingIsForked)
 
 TEST(DetachedForkTest, ManyForksLeaveNothingBehind)
 {
-    InProcess([] {
+    CheckInChild([] {
         const std::set<int> before = Descriptors();
         for (int i = 0; i < 300; ++i) Detach([] {});
         EXPECT_EQ(Descriptors(), before);
@@ -515,7 +512,7 @@ TEST(DetachedForkTest, ThreadsForkAtOnce)
 {
     constexpr int Threads = 4;
     constexpr int Forks = 10;
-    InProcess([] {
+    CheckInChild([] {
         Pipe report;
         std::array<std::set<pid_t>, Threads> returned;
         std::vector<std::thread> threads;
@@ -553,8 +550,8 @@ TEST(AliveTest, NumbersOfNoProcessAreNotAlive)
 
 TEST(AliveTest, AProcessOfAnotherUserIsAlive)
 {
-    InProcess([] {
-        BecomeOrdinary();
+    CheckInChild([] {
+        EXPECT_TRUE(LoseRights());
         EXPECT_EQ(CoreLibProcAlive(1), 1);
     });
 }
@@ -586,8 +583,7 @@ TEST(AliveTest, ZombiesAndEndedProcessesAreNotAliveWhateverTheirName)
         EXPECT_EQ(CoreLibProcAlive(pid), 1);
 
         process.Tell();
-        siginfo_t info{};
-        EXPECT_EQ(::waitid(P_PID, static_cast<id_t>(pid), &info, WEXITED | WNOWAIT), 0);
+        AwaitZombie(pid);
         EXPECT_EQ(::kill(pid, 0), 0);
         EXPECT_EQ(CoreLibProcAlive(pid), 0);
 
@@ -608,18 +604,11 @@ TEST(AliveTest, TheIdOfAThreadIsNotAlive)
     EXPECT_EQ(alive, 0);
 }
 
-// The state of the first thread: a letter in /proc/PID/stat.
-char State(pid_t pid)
-{
-    const std::string status = Content("/proc/" + std::to_string(pid) + "/stat");
-    return status[status.rfind(')') + 2];
-}
-
 TEST(AliveTest, AProcessIsAliveAsLongAsOneOfItsThreads)
 {
     ChildProcess process([](ChildProcess::Link& link) {
         std::thread([&link] {
-            while (State(::getpid()) != 'Z') ::sched_yield();
+            while (StatField(::getpid(), 3) != "Z") ::sched_yield();
             link.Tell();
             link.Await();
             ::_exit(0);

@@ -1,7 +1,6 @@
 // CoreLibExec().
 #include <orvacore/orvacore.h>
 
-#include <dlfcn.h>
 #include <malloc.h>
 #include <pthread.h>
 #include <spawn.h>
@@ -13,7 +12,12 @@
 
 #include "caller.h"
 #include "support/fakes/old_kernel.h"
+#include "support/fakes/real_function.h"
 #include "support/fixtures/temp_dir.h"
+#include "support/fixtures/test_files.h"
+#include "support/processes/child_checks.h"
+#include "support/processes/reap.h"
+#include "support/processes/rights.h"
 
 namespace {
 
@@ -28,8 +32,7 @@ extern "C" int posix_spawn(pid_t* pid, const char* path, const posix_spawn_file_
                            char* const* environment)
 {
     if (insteadOfStarting != nullptr) insteadOfStarting();
-    static const auto real =
-        reinterpret_cast<decltype(::posix_spawn)*>(::dlsym(RTLD_NEXT, "posix_spawn"));
+    static const auto real = RealFunction<decltype(::posix_spawn)>("posix_spawn");
     return real(pid, path, files, attributes, arguments, environment);
 }
 
@@ -41,7 +44,7 @@ void InBothKinds(const std::function<void()>& body)
 {
     for (void (*handler)(int) : {SIG_DFL, SIG_IGN}) {
         SCOPED_TRACE(handler == SIG_DFL ? "children" : "companions");
-        InProcess([&] {
+        CheckInChild([&] {
             SetSignal(SIGCHLD, handler);
             body();
         });
@@ -75,14 +78,6 @@ void ExpectTrueResults()
     ExpectNotStarted("/no/such/program", ENOENT);
 }
 
-bool CanLock(const std::string& path)
-{
-    const int fd = ::open(path.c_str(), O_RDWR | O_CLOEXEC);
-    const bool locked = ::flock(fd, LOCK_EX | LOCK_NB) == 0;
-    ::close(fd);
-    return locked;
-}
-
 // A lock whose descriptor is not closed when programs are started.
 void HoldLock(const std::string& path)
 {
@@ -95,7 +90,7 @@ class ProgramTest : public ::testing::Test {
     std::string Script(const std::string& name, const std::string& text, mode_t mode) const
     {
         std::string path = dir.File(name);
-        SetContent(path, text);
+        WriteFile(path, text);
         EXPECT_EQ(::chmod(path.c_str(), mode), 0);
         return path;
     }
@@ -167,7 +162,7 @@ TEST_F(ProgramTest, PassesArgumentsUnchanged)
     }};
     for (const Row& row : rows) {
         EXPECT_EQ(Exec(path, row.given[0], row.given[1], row.given[2], row.given[3]), 0);
-        EXPECT_EQ(Content(path + ".out"), row.arrived);
+        EXPECT_EQ(ReadFile(path + ".out"), row.arrived);
     }
 }
 
@@ -189,7 +184,7 @@ std::string InheritedDescriptors(const TempDir& dir)
     const int file = ::open(dir.File("out").c_str(), O_RDWR | O_CREAT | O_TRUNC, 0600);
     for (const int fd : {0, 1, 2, 3, 4, 5, 63, 64, 200}) ::dup2(file, fd);
     EXPECT_EQ(Exec("/bin/ls", "/proc/self/fd"), 0);
-    return Content(dir.File("out"));
+    return ReadFile(dir.File("out"));
 }
 
 constexpr const char* StandardDescriptors = "0\n1\n2\n3\n";  // 3 is the directory that ls reads
@@ -236,11 +231,11 @@ TEST_F(ProgramTest, ALockEndsWithItsHolderAlthoughAProgramItStartedLivesOn)
     InBothKinds([&] {
         HoldLock(lock);
         EXPECT_EQ(Shell("sleep 60 >/dev/null 2>&1 & echo $! >\"$0\"", background), 0);
-        EXPECT_FALSE(CanLock(lock));
+        EXPECT_TRUE(IsLocked(lock));
     });
-    const Bystander sleeper(Content(background));
+    const Bystander sleeper(ReadFile(background));
     EXPECT_EQ(CoreLibProcAlive(sleeper.pid), 1);
-    EXPECT_TRUE(CanLock(lock));
+    EXPECT_FALSE(IsLocked(lock));
 }
 
 TEST_F(ProgramTest, AKilledCallerFreesItsLockWhileTheProgramRuns)
@@ -253,18 +248,18 @@ TEST_F(ProgramTest, AKilledCallerFreesItsLockWhileTheProgramRuns)
         Shell("echo $$; exec sleep 60");
     });
     const Bystander program(output.ReadLine());
-    EXPECT_FALSE(CanLock(lock));
+    EXPECT_TRUE(IsLocked(lock));
     caller.Kill(SIGTERM);
     EXPECT_EQ(caller.Join(), 128 + SIGTERM);
     EXPECT_EQ(CoreLibProcAlive(program.pid), 1);
-    EXPECT_TRUE(CanLock(lock));
+    EXPECT_FALSE(IsLocked(lock));
 }
 
 TEST_F(ProgramTest, ReturnsTheResultWhateverTheCallerDoesWithSigchld)
 {
     for (const ChildSignal& row : ChildSignals) {
         SCOPED_TRACE(row.name);
-        InProcess([&] {
+        CheckInChild([&] {
             SetSignal(SIGCHLD, row.handler, row.flags);
             for (int i = 0; i < 10; ++i) ExpectTrueResults();
             EXPECT_FALSE(HasChildren());
@@ -278,7 +273,7 @@ class Reaper {
     Reaper()
         : thread([this] {
               while (!done) {
-                  ReapAll(0);
+                  ReapChildren(0);
                   ::sched_yield();
               }
           })
@@ -299,8 +294,8 @@ class Reaper {
 
 TEST_F(ProgramTest, ACompanionHidesTheResultFromAThreadThatReapsAllChildren)
 {
-    InProcess([] {
-        SetSignal(SIGCHLD, ReapAll, SA_RESTART);
+    CheckInChild([] {
+        SetSignal(SIGCHLD, ReapChildren, SA_RESTART);
         const Reaper reaper;
         for (int i = 0; i < 10; ++i) ExpectTrueResults();
     });
@@ -308,7 +303,7 @@ TEST_F(ProgramTest, ACompanionHidesTheResultFromAThreadThatReapsAllChildren)
 
 TEST_F(ProgramTest, AResultThatAnotherThreadGotIsNotKnown)
 {
-    InProcess([] {
+    CheckInChild([] {
         SetSignal(SIGCHLD, SIG_DFL);
         const Reaper reaper;
         for (int i = 0; i < 10; ++i) {
@@ -321,8 +316,8 @@ TEST_F(ProgramTest, AResultThatAnotherThreadGotIsNotKnown)
 
 TEST_F(ProgramTest, ACompanionSendsNoSignalToTheCaller)
 {
-    InProcess([] {
-        SetSignal(SIGCHLD, ReapAll);
+    CheckInChild([] {
+        SetSignal(SIGCHLD, ReapChildren);
         BlockSignal(SIGCHLD);
         ExpectTrueResults();
         sigset_t pending;
@@ -334,7 +329,7 @@ TEST_F(ProgramTest, ACompanionSendsNoSignalToTheCaller)
 // The end of the pipe does not show that the companion has ended: somebody else holds it open.
 TEST_F(ProgramTest, FailsWhenTheCompanionIsKilled)
 {
-    InProcess([] {
+    CheckInChild([] {
         SetSignal(SIGCHLD, SIG_IGN);
         static Pipe life;  // closed at the end of the caller
         insteadOfStarting = [] {
@@ -351,24 +346,21 @@ TEST_F(ProgramTest, FailsWhenTheCompanionIsKilled)
 
 TEST_F(ProgramTest, DoesNotReapOtherChildrenOfTheCaller)
 {
-    InProcess([] {
+    CheckInChild([] {
         const pid_t child = ::fork();
         if (child == 0) ::_exit(5);
-        siginfo_t info{};
-        EXPECT_EQ(::waitid(P_PID, static_cast<id_t>(child), &info, WEXITED | WNOWAIT), 0);
+        AwaitZombie(child);
         ExpectTrueResults();
-        int status = 0;
-        EXPECT_EQ(::waitpid(child, &status, 0), child);
-        EXPECT_EQ(WEXITSTATUS(status), 5);
+        EXPECT_EQ(Reap(child), 5);
     });
 }
 
 TEST_F(ProgramTest, KeepsTheCallersSignalSettings)
 {
-    InProcess([] {
-        SetSignal(SIGUSR1, ReapAll, SA_RESTART | SA_NODEFER);
+    CheckInChild([] {
+        SetSignal(SIGUSR1, ReapChildren, SA_RESTART | SA_NODEFER);
         SetSignal(SIGUSR2, SIG_IGN);
-        SetSignal(SIGCHLD, ReapAll, SA_NOCLDWAIT);
+        SetSignal(SIGCHLD, ReapChildren, SA_NOCLDWAIT);
         BlockSignal(SIGTERM);
         const std::string before = SignalSettings();
         ExpectTrueResults();
@@ -386,10 +378,10 @@ unsigned long long SignalsIn(const std::string& status, const std::string& line)
 TEST_F(ProgramTest, TheProgramHasTheCallersMaskAndIgnoredSignalsButNoHandlers)
 {
     const auto bit = [](int signal) { return 1ULL << (signal - 1); };
-    for (void (*handler)(int) : {SIG_DFL, SIG_IGN, ReapAll}) {
-        InProcess([&] {
-            SetSignal(SIGUSR1, ReapAll);
-            SetSignal(SIGTERM, ReapAll);
+    for (void (*handler)(int) : {SIG_DFL, SIG_IGN, ReapChildren}) {
+        CheckInChild([&] {
+            SetSignal(SIGUSR1, ReapChildren);
+            SetSignal(SIGTERM, ReapChildren);
             SetSignal(SIGUSR2, SIG_IGN);
             SetSignal(SIGCHLD, handler);
             BlockSignal(SIGUSR1);
@@ -398,7 +390,7 @@ TEST_F(ProgramTest, TheProgramHasTheCallersMaskAndIgnoredSignalsButNoHandlers)
             ::dup2(file, STDOUT_FILENO);
             EXPECT_EQ(Exec("/bin/cat", "/proc/self/status"), 0);
         });
-        const std::string status = Content(dir.File("status"));
+        const std::string status = ReadFile(dir.File("status"));
         EXPECT_EQ(SignalsIn(status, "SigBlk"), bit(SIGUSR1) | bit(SIGINT));
         EXPECT_EQ(SignalsIn(status, "SigCgt"), 0U);
         const unsigned long long ignored = SignalsIn(status, "SigIgn");
@@ -490,7 +482,7 @@ TEST_F(ProgramTest, AThreadWithASmallStackRunsPrograms)
 
 TEST_F(ProgramTest, AChildNeedsNoFreeDescriptors)
 {
-    InProcess([] {
+    CheckInChild([] {
         SetSignal(SIGCHLD, SIG_DFL);
         LeaveDescriptors(0);
         EXPECT_EQ(Exec("/bin/true"), 0);
@@ -500,7 +492,7 @@ TEST_F(ProgramTest, AChildNeedsNoFreeDescriptors)
 TEST_F(ProgramTest, WithoutDescriptorsForACompanionNoProgramIsStarted)
 {
     for (int spare = 0; spare < 2; ++spare) {
-        InProcess([spare] {
+        CheckInChild([spare] {
             SetSignal(SIGCHLD, SIG_IGN);
             LeaveDescriptors(spare);
             ExpectNotStarted("/bin/true", EMFILE);
@@ -512,7 +504,7 @@ TEST_F(ProgramTest, WithoutDescriptorsForACompanionNoProgramIsStarted)
 TEST_F(ProgramTest, WhenNoProcessCanBeMadeNoProgramIsStarted)
 {
     InBothKinds([] {
-        BecomeOrdinary();
+        EXPECT_TRUE(LoseRights());
         const std::set<int> before = Descriptors();
         const rlimit none{0, 0};
         EXPECT_EQ(::setrlimit(RLIMIT_NPROC, &none), 0);
@@ -524,7 +516,7 @@ TEST_F(ProgramTest, WhenNoProcessCanBeMadeNoProgramIsStarted)
 TEST_F(ProgramTest, RunsLeaveNothingBehind)
 {
     InBothKinds([] {
-        const auto pages = [] { return Number(Content("/proc/self/statm")); };
+        const auto pages = [] { return Number(ReadFile("/proc/self/statm")); };
         const auto run = [](int times) {
             for (int i = 0; i < times; i += 2) {
                 EXPECT_EQ(Exec("/bin/true"), 0);

@@ -2,7 +2,6 @@
 #include <gmock/gmock.h>
 #include <signal.h>
 #include <sys/file.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -38,13 +37,6 @@ using ::testing::MatchesRegex;
 constexpr int Old = 1;
 constexpr int New = 2;
 constexpr int Later = 3;
-
-// Waits for the end of a child, which stays a zombie.
-void AwaitZombie(pid_t pid)
-{
-    siginfo_t info{};
-    ASSERT_EQ(::waitid(P_PID, static_cast<id_t>(pid), &info, WEXITED | WNOWAIT), 0);
-}
 
 class KillTest : public ProcessTest {
   protected:

@@ -1,6 +1,5 @@
 #include "support/processes/child_checks.h"
 
-#include <grp.h>
 #include <gtest/gtest.h>
 #include <signal.h>
 #include <sys/resource.h>
@@ -10,22 +9,7 @@
 #include <stdexcept>
 
 #include "support/processes/child_process.h"
-
-namespace {
-
-constexpr uid_t OrdinaryUser = 65534;
-constexpr gid_t OrdinaryGroup = 65534;
-
-void DropRights()
-{
-    if (::setgroups(0, nullptr) < 0 ||
-        ::setresgid(OrdinaryGroup, OrdinaryGroup, OrdinaryGroup) < 0 ||
-        ::setresuid(OrdinaryUser, OrdinaryUser, OrdinaryUser) < 0) {
-        throw std::runtime_error("root's rights cannot be dropped");
-    }
-}
-
-}  // namespace
+#include "support/processes/rights.h"
 
 void CheckInChild(const std::function<void()>& checks)
 {
@@ -42,10 +26,10 @@ void CheckAsOrdinaryUser(const TempDir& dir, const std::function<void()>& checks
 {
     const bool isRoot = ::geteuid() == 0;
     if (isRoot) {
-        ASSERT_EQ(::chown(dir.Path().c_str(), OrdinaryUser, OrdinaryGroup), 0);
+        ASSERT_EQ(::chown(dir.Path().c_str(), Nobody, Nobody), 0);
     }
     CheckInChild([&] {
-        if (isRoot) DropRights();
+        if (isRoot && !LoseRights()) throw std::runtime_error("root's rights cannot be dropped");
         checks();
     });
 }

@@ -1,6 +1,7 @@
 #include "support/processes/reap.h"
 
 #include <gtest/gtest.h>
+#include <signal.h>
 #include <sys/wait.h>
 
 #include <cerrno>
@@ -20,6 +21,12 @@ int Reap(pid_t pid)
     int status = 0;
     const pid_t ended = RetryOnEintr([&] { return ::waitpid(pid, &status, 0); });
     return ended < 0 ? -1 : ExitCodeOf(status);
+}
+
+void AwaitZombie(pid_t pid)
+{
+    siginfo_t ended{};
+    EXPECT_EQ(::waitid(P_PID, static_cast<id_t>(pid), &ended, WEXITED | WNOWAIT), 0);
 }
 
 void ReapAll()

@@ -15,7 +15,6 @@ namespace {
 
 constexpr const char* LockDir = "/tmp/.orvadr_lock";
 constexpr mode_t LockDirMode = 0755;
-constexpr unsigned int Nobody = 65534;
 
 bool Put(const std::string& path, const std::string& text)
 {

@@ -2,13 +2,18 @@
 #ifndef ORVADRCORE_TESTS_RIGHTS_H
 #define ORVADRCORE_TESTS_RIGHTS_H
 
+#include <sys/types.h>
+
 #include <string>
+
+// The ordinary user, and its group.
+constexpr uid_t Nobody = 65534;
 
 // Lets this process open any lock file, as root can. An ordinary user becomes root in a user
 // namespace with its own lock directory. False when the kernel does not allow that.
 bool BecomeRoot();
 
-// Makes this process an ordinary user, without a way back. False when that fails.
+// Makes this process the ordinary user, without a way back. False when that fails.
 bool LoseRights();
 
 // Mounts a file system of `bytes` bytes on a directory, visible to this process and its children

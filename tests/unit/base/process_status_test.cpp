@@ -2,8 +2,6 @@
 #include "base/process_status.h"
 
 #include <gtest/gtest.h>
-#include <signal.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <climits>
@@ -11,6 +9,7 @@
 
 #include "support/fakes/syscall_faults.h"
 #include "support/processes/child_process.h"
+#include "support/processes/reap.h"
 
 namespace {
 
@@ -71,8 +70,7 @@ TEST_F(ProcessStatusTest, TheStartTimeTellsAProcessFromALaterOne)
 TEST_F(ProcessStatusTest, AZombieIsNotAlive)
 {
     ChildProcess child([](ChildProcess::Link& /*link*/) {});
-    siginfo_t ended{};
-    ASSERT_EQ(::waitid(P_PID, static_cast<id_t>(child.Pid()), &ended, WEXITED | WNOWAIT), 0);
+    AwaitZombie(child.Pid());
     const auto status = ReadProcessStatus(child.Pid());
     ASSERT_TRUE(status);
     EXPECT_EQ(status->state, 'Z');

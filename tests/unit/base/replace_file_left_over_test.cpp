@@ -20,6 +20,7 @@
 #include "support/fixtures/test_files.h"
 #include "support/processes/child_checks.h"
 #include "support/processes/child_process.h"
+#include "support/processes/reap.h"
 
 namespace {
 
@@ -138,8 +139,7 @@ TEST_F(LeftOverTest, AFileOfADeadProcessIsRemovedAndOfALivingOneKept)
 {
     const ChildProcess living([](ChildProcess::Link& link) { link.Await(); });
     ChildProcess zombie([](ChildProcess::Link& /*link*/) {});
-    siginfo_t ended{};
-    ASSERT_EQ(::waitid(P_PID, static_cast<id_t>(zombie.Pid()), &ended, WEXITED | WNOWAIT), 0);
+    AwaitZombie(zombie.Pid());
     const unsigned long long start = StartOf(living.Pid());
 
     EXPECT_TRUE(GoesOf({domain, Nobodys, 1}));

@@ -18,6 +18,7 @@
 #include "support/fixtures/cache_update_fixture.h"
 #include "support/fixtures/json_kinds.h"
 #include "support/fixtures/test_files.h"
+#include "support/processes/stat_field.h"
 
 namespace {
 
@@ -138,12 +139,7 @@ TEST_F(CachePageTest, ThePageShowsTheFormOfThePidFile)
         std::smatch numbers;
         EXPECT_TRUE(std::regex_match(written, numbers, form)) << written;
         EXPECT_EQ(numbers[1], std::to_string(::getpid()));
-        // The third field follows the name in brackets; the start time is field 22.
-        const std::string status = ReadFile("/proc/self/stat");
-        std::istringstream fields(status.substr(status.rfind(')') + 1));
-        std::string start;
-        for (int field = 3; field <= 22; ++field) fields >> start;
-        EXPECT_EQ(numbers[2], start);
+        EXPECT_EQ(numbers[2], StatField(::getpid(), 22));
         data = "new";
         return true;
     };

@@ -5,7 +5,6 @@
 #include <orvacore/orvacore.h>
 #include <signal.h>
 #include <sys/file.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -20,6 +19,7 @@
 #include "support/fixtures/special_file.h"
 #include "support/fixtures/test_files.h"
 #include "support/processes/child_checks.h"
+#include "support/processes/reap.h"
 
 namespace {
 
@@ -107,8 +107,7 @@ TEST_F(CacheUpdaterTest, AZombieIsNoUpdater)
     ChildProcess updater = Updater();
     ASSERT_TRUE(updater.Await());
     updater.Kill(SIGKILL);
-    siginfo_t ended{};
-    ASSERT_EQ(::waitid(P_PID, static_cast<id_t>(updater.Pid()), &ended, WEXITED | WNOWAIT), 0);
+    AwaitZombie(updater.Pid());
     EXPECT_EQ(waiting.Read(), "new");
     ExpectLines({Start(), Finish()});
 }
