@@ -6,16 +6,16 @@
 ///     InsertCommand insert;
 ///     insert.SetTable(nodes);
 ///     insert.AddFieldValue("id", 1);
-///     insert.AddFieldValue("name", "backup");
-///     insert.GetCommand();   // "INSERT INTO nodes (id,name) VALUES (1,'backup');"
+///     insert.AddFieldValue("name", SqliteValue::Text("O'Brien"));
+///     insert.GetCommand();   // "INSERT INTO nodes (id,name) VALUES (1,'O''Brien');"
 /// \endcode
 ///
 /// Builders copy what they are given; each is used by one thread at a time. They throw only when
 /// memory runs out. What they refuse changes nothing and gives false or an empty text, mostly with
 /// a line at ERR as `sqlite_command.cpp`; docs/records.md lists the lines.
 ///
-/// \warning Names, schemas and conditions are written as they are, and text values are quoted but
-///          not escaped: see SqliteValue::ToFormatedValue().
+/// \warning Names, schemas and conditions are written as they are, and texts are quoted but not
+///          escaped, except those of SqliteValue::Text().
 #ifndef ORVADRCORE_SQLITE_COMMAND_H
 #define ORVADRCORE_SQLITE_COMMAND_H
 
@@ -89,10 +89,10 @@ class ORVADRCORE_API InsertCommand : public SqliteCommand {
     void SetFieldValues(const SqliteValueList& values);  ///< Replaces all columns.
     void SetReplacable(bool replacable);                 ///< True for INSERT OR REPLACE.
 
-    /// Adds a column or replaces its value.
-    /// \return false when the name is empty or the text is too long for a SqliteValue
+    /// Adds a column or replaces its value. Use SqliteValue::Text() for a text from outside.
+    /// \return false when the name is empty, the value not valid, or the text too long for a value
     template <class T>
-    bool AddFieldValue(  // T: std::string, bool, int or unsigned int
+    bool AddFieldValue(  // T: SqliteValue, std::string, bool, int or unsigned int
         const std::string& field, const T& value) = delete;
 
     bool AddFieldValue(const std::string& field, const char* text);  ///< Refuses null, too.
@@ -125,7 +125,7 @@ class ORVADRCORE_API UpdateCommand : public SqliteCommand {
 
     /// As InsertCommand::AddFieldValue().
     template <class T>
-    bool AddFieldValue(  // T: std::string, bool, int or unsigned int
+    bool AddFieldValue(  // T: SqliteValue, std::string, bool, int or unsigned int
         const std::string& field, const T& value) = delete;
 
     bool AddFieldValue(const std::string& field, const char* text);  ///< Refuses null, too.
@@ -181,6 +181,9 @@ template <>
 ORVADRCORE_API bool InsertCommand::AddFieldValue<std::string>(const std::string& field,
                                                               const std::string& value);
 template <>
+ORVADRCORE_API bool InsertCommand::AddFieldValue<SqliteValue>(const std::string& field,
+                                                              const SqliteValue& value);
+template <>
 ORVADRCORE_API bool InsertCommand::AddFieldValue<bool>(const std::string& field, const bool& value);
 template <>
 ORVADRCORE_API bool InsertCommand::AddFieldValue<int>(const std::string& field, const int& value);
@@ -190,6 +193,9 @@ ORVADRCORE_API bool InsertCommand::AddFieldValue<unsigned int>(const std::string
 template <>
 ORVADRCORE_API bool UpdateCommand::AddFieldValue<std::string>(const std::string& field,
                                                               const std::string& value);
+template <>
+ORVADRCORE_API bool UpdateCommand::AddFieldValue<SqliteValue>(const std::string& field,
+                                                              const SqliteValue& value);
 template <>
 ORVADRCORE_API bool UpdateCommand::AddFieldValue<bool>(const std::string& field, const bool& value);
 template <>

@@ -12,8 +12,8 @@
 /// returns false for operands that it refuses, and logs them at ERR as `sqlite_condition.cpp`; a
 /// constructor only logs, so look at IsValid() or the text. Nothing throws unless memory runs out.
 ///
-/// \warning Column names and operand texts are written as they are, and text values are quoted but
-///          not escaped: see SqliteValue::ToFormatedValue().
+/// \warning Column names and operand texts are written as they are, and texts are quoted but not
+///          escaped, except those of SqliteValue::Text().
 #ifndef ORVADRCORE_SQLITE_CONDITION_H
 #define ORVADRCORE_SQLITE_CONDITION_H
 
@@ -46,7 +46,7 @@ class ORVADRCORE_API SqliteCondition {
     std::string condition;  ///< What GetCondition() returns.
 };
 
-/// A column that equals a value: `id=3`.
+/// A column that equals a value: `id=3`, or `note IS NULL` for SqliteValue::Null().
 class ORVADRCORE_API SqliteEqual : public SqliteCondition {
   public:
     SqliteEqual() = default;
@@ -57,7 +57,8 @@ class ORVADRCORE_API SqliteEqual : public SqliteCondition {
     bool SetValue(const std::string& lvalue, const SqliteValue& value);
 };
 
-/// A column that differs from a value: `id!=3`. Otherwise as SqliteEqual.
+/// A column that differs from a value: `id!=3`, or `note IS NOT NULL`. Otherwise as SqliteEqual.
+/// \note A column that is NULL differs from nothing.
 class ORVADRCORE_API SqliteNotEqual : public SqliteCondition {
   public:
     SqliteNotEqual() = default;
@@ -123,6 +124,7 @@ class ORVADRCORE_API SqliteIn : public SqliteInFamily {
 };
 
 /// A column whose value is not in a list.
+/// \warning With SqliteValue::Null() in the list it matches no row: that is SQL's rule.
 class ORVADRCORE_API SqliteNotIn : public SqliteInFamily {
   public:
     SqliteNotIn();  ///< Has no text but is valid: see SqliteInFamily::IsValid().

@@ -4,8 +4,9 @@
 /// \code
 ///     SqliteValueList node;
 ///     node.AddValue("id", 3);
-///     node.AddValue("name", SqliteValue::EscapeText("O'Brien's NAS"));
-///     node.ToStr();                                   // "id:3, name:'O''Brien''s NAS'"
+///     node.AddValue("name", SqliteValue::Text("O'Brien's NAS"));
+///     node.AddValue("bytes", SqliteValue::Integer(5'000'000'000));
+///     node.ToStr();                  // "bytes:5000000000, id:3, name:'O''Brien''s NAS'"
 ///     std::string name;
 ///     if (node.GetValue("name", name)) { ... }
 /// \endcode
@@ -16,6 +17,7 @@
 #define ORVADRCORE_SQLITE_VALUE_H
 
 #include <cstddef>
+#include <cstdint>
 #include <map>
 #include <string>
 #include <type_traits>
@@ -27,7 +29,7 @@
 
 namespace OrvaDRCore {
 
-/// The value of one column: an `int`, an `unsigned int`, a `bool`, a text, or nothing.
+/// The value of one column: a number, a `bool`, a text, a blob, NULL, or nothing.
 class ORVADRCORE_API SqliteValue {
   public:
     SqliteValue() = default;  ///< No value. It is not valid.
@@ -35,8 +37,8 @@ class ORVADRCORE_API SqliteValue {
     SqliteValue(unsigned int number);  ///< SqliteDB reads it back as a signed integer.
     SqliteValue(bool truth);           ///< Written as 1 or 0.
 
-    /// A text. It is quoted in statements but not escaped: see ToFormatedValue(). One of 2 GiB or
-    /// more makes no value and is logged.
+    /// A text that is quoted in statements but not escaped: see ToFormatedValue(). Use Text() for
+    /// one that comes from outside. One of 2 GiB or more makes no value and is logged at ERR.
     SqliteValue(const std::string& text);
     SqliteValue(const char* text);  ///< No value when it is null.
 
@@ -51,34 +53,62 @@ class ORVADRCORE_API SqliteValue {
     SqliteValue(SqliteValue&&) noexcept = default;
     ~SqliteValue() = default;
 
+    // ------------------------------------------------------------------------------------ makers
+    // Values that SQLite stores without loss, whether they are written as a literal or passed to
+    // SqliteDB::InsertRecords().
+
+    /// A text with any bytes. Its literal doubles the quotes, so it always stands for this text.
+    /// One of 2 GiB or more makes no value and is logged at ERR.
+    static SqliteValue Text(const std::string& text);
+    static SqliteValue Text(const char* text);  ///< No value when it is null.
+
+    static SqliteValue Integer(std::int64_t number);
+
+    /// SQLite stores infinities, but NULL for not-a-number.
+    static SqliteValue Real(double number);
+
+    /// Bytes that are no text. 1 GiB or more make no value and are logged at ERR.
+    static SqliteValue Blob(const std::string& bytes);
+
+    static SqliteValue Null();  ///< SQL's NULL. Unlike SqliteValue() it is valid.
+
     /// Copies what the other value holds, but not whether it is valid.
     /// \warning `SqliteValue v; v = SqliteValue(1);` leaves `v` invalid. Build values where you
     ///          need them, or put them into a SqliteValueList.
     SqliteValue& operator=(const SqliteValue& other);
 
     bool IsValid() const;  ///< Whether it was built with a value and still holds one.
+    bool IsNull() const;   ///< Whether it holds Null(). False for a value that holds nothing.
 
-    /// Reads the value as `std::string`, `unsigned int`, `int` or `bool`. Nothing is converted, but
-    /// the integers 0 and 1 can be read as `bool`.
+    /// Reads the value as `std::string` (a text or the bytes of a blob), `int`, `unsigned int`,
+    /// `std::int64_t` (an integer that fits), `double` (any number) or `bool`. Nothing else is
+    /// converted, but the integers 0 and 1 can be read as `bool`. An integer beyond 2^53 may be
+    /// rounded when it is read as `double`.
     /// \return false, with a WARN line, when the value is of another kind; `out` is unchanged then
     template <class T>
-    bool GetValue(T& out) const = delete;  // T: std::string, unsigned int, int or bool
+    bool GetValue(T& out) const = delete;  // T: one of the types above
 
     /// The value as an SQL literal; empty when there is none.
-    /// \warning Quotes inside a text end the literal, and what follows is read as SQL. Build values
-    ///          from EscapeText() if the text comes from outside.
+    /// \warning Quotes inside a text end the literal, and what follows is read as SQL, unless the
+    ///          value was made by Text().
     std::string ToFormatedValue() const;
 
-    /// Doubles every single quote, so that the literal stands for the original text.
-    /// \note A zero byte ends a statement, so no literal can contain one.
+    /// Doubles every single quote, for a statement or condition that is put together by hand.
+    /// \warning Do not combine it with Text(), which does the same.
+    /// \note A zero byte ends a statement.
     static std::string EscapeText(const std::string& text);
 
   private:
     friend struct SqliteInternals;
 
-    ORVADRCORE_LOCAL SqliteValue(const char* text, std::size_t length);
+    // What the payload alone does not tell.
+    enum class Kind : unsigned char { Plain, Text, Blob, Null };
+
+    ORVADRCORE_LOCAL SqliteValue(Kind kind, Json::Value&& payload);
+    ORVADRCORE_LOCAL SqliteValue(Kind kind, const char* bytes, std::size_t length);
 
     bool valid_ = false;
+    Kind kind_ = Kind::Plain;
     Json::Value value_;
 };
 
@@ -89,6 +119,10 @@ template <>
 ORVADRCORE_API bool SqliteValue::GetValue<unsigned int>(unsigned int& out) const;
 template <>
 ORVADRCORE_API bool SqliteValue::GetValue<int>(int& out) const;
+template <>
+ORVADRCORE_API bool SqliteValue::GetValue<std::int64_t>(std::int64_t& out) const;
+template <>
+ORVADRCORE_API bool SqliteValue::GetValue<double>(double& out) const;
 template <>
 ORVADRCORE_API bool SqliteValue::GetValue<bool>(bool& out) const;
 /// \endcond
@@ -121,8 +155,7 @@ class ORVADRCORE_API SqliteValueList {
     /// Reads a field as SqliteValue::GetValue() does.
     /// \return false, with `out` unchanged, when it cannot be read; DEBUG when it is missing
     template <class T>
-    bool GetValue(  // T: std::string, unsigned int, int or bool
-        const std::string& field, T& out) const = delete;
+    bool GetValue(const std::string& field, T& out) const = delete;
 
     /// All fields, valid as long as the record.
     const std::map<std::string, SqliteValue>& GetValues() const { return values_; }
@@ -148,6 +181,11 @@ ORVADRCORE_API bool SqliteValueList::GetValue<unsigned int>(const std::string& f
                                                             unsigned int& out) const;
 template <>
 ORVADRCORE_API bool SqliteValueList::GetValue<int>(const std::string& field, int& out) const;
+template <>
+ORVADRCORE_API bool SqliteValueList::GetValue<std::int64_t>(const std::string& field,
+                                                            std::int64_t& out) const;
+template <>
+ORVADRCORE_API bool SqliteValueList::GetValue<double>(const std::string& field, double& out) const;
 template <>
 ORVADRCORE_API bool SqliteValueList::GetValue<bool>(const std::string& field, bool& out) const;
 /// \endcond

@@ -45,19 +45,27 @@ std::string InsertStatement(const std::string& table, const SqliteValueList& rec
     return verb + table + " (" + fields + ") VALUES (" + places + ");";
 }
 
-// Texts are not copied: the record outlives the run of the statement. Returns SQLite's code.
+// Bytes are not copied: the record outlives the run of the statement.
+int BindBytes(sqlite3_stmt* statement, int place, const SqliteValue& value)
+{
+    const std::string_view bytes = BytesOf(SqliteInternals::Payload(value));
+    if (SqliteInternals::KindOf(value) == SqliteInternals::Kind::Blob) {
+        return sqlite3_bind_blob64(statement, place, bytes.data(), bytes.size(), SQLITE_STATIC);
+    }
+    return sqlite3_bind_text64(statement, place, bytes.data(), bytes.size(), SQLITE_STATIC,
+                               SQLITE_UTF8);
+}
+
+// Returns SQLite's code.
 int BindValue(sqlite3_stmt* statement, int place, const SqliteValue& value)
 {
     const Json::Value& payload = SqliteInternals::Payload(value);
-    if (payload.isString()) {
-        const char* begin = nullptr;
-        const char* end = nullptr;
-        payload.getString(&begin, &end);
-        return sqlite3_bind_text64(statement, place, begin,
-                                   static_cast<sqlite3_uint64>(end - begin), SQLITE_STATIC,
-                                   SQLITE_UTF8);
+    switch (payload.type()) {
+        case Json::stringValue: return BindBytes(statement, place, value);
+        case Json::realValue: return sqlite3_bind_double(statement, place, payload.asDouble());
+        case Json::nullValue: return sqlite3_bind_null(statement, place);
+        default: return sqlite3_bind_int64(statement, place, payload.asInt64());
     }
-    return sqlite3_bind_int64(statement, place, payload.asInt64());
 }
 
 // Returns SQLite's code, SQLITE_OK when the row is there.

@@ -16,8 +16,8 @@ namespace OrvaDRCore {
 // Whether a record has a field and all of its values are valid.
 bool IsStorable(const SqliteValueList& record);
 
-// Inserts the records in their order and stores what their literals would store, except that texts
-// are stored byte for byte. Stops at the first record that fails, whose error is set.
+// Inserts the records in their order and stores what their literals would store, except that plain
+// texts are stored byte for byte. Stops at the first record that fails, whose error is set.
 bool InsertRows(sqlite3* handle, const std::string& table,
                 const std::vector<SqliteValueList>& records, bool replacable, SqliteError& error);
 

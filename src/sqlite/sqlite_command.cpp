@@ -127,6 +127,12 @@ bool InsertCommand::AddFieldValue(const std::string& field, const unsigned int& 
     return OrvaDRCore::AddFieldValue(fieldValues_, field, value);
 }
 
+template <>
+bool InsertCommand::AddFieldValue(const std::string& field, const SqliteValue& value)
+{
+    return OrvaDRCore::AddFieldValue(fieldValues_, field, value);
+}
+
 bool InsertCommand::AddFieldValue(const std::string& field, const char* text)
 {
     return OrvaDRCore::AddFieldValue(fieldValues_, field, text);
@@ -192,6 +198,12 @@ bool UpdateCommand::AddFieldValue(const std::string& field, const int& value)
 
 template <>
 bool UpdateCommand::AddFieldValue(const std::string& field, const unsigned int& value)
+{
+    return OrvaDRCore::AddFieldValue(fieldValues_, field, value);
+}
+
+template <>
+bool UpdateCommand::AddFieldValue(const std::string& field, const SqliteValue& value)
 {
     return OrvaDRCore::AddFieldValue(fieldValues_, field, value);
 }

@@ -53,7 +53,7 @@ SqliteEqual::SqliteEqual(const std::string& lvalue, const SqliteValue& value)
 
 bool SqliteEqual::SetValue(const std::string& lvalue, const SqliteValue& value)
 {
-    return SetComparison(condition, lvalue, "=", value);
+    return SetComparison(condition, lvalue, IsStoredAsNull(value) ? " IS " : "=", value);
 }
 
 SqliteNotEqual::SqliteNotEqual(const std::string& lvalue, const SqliteValue& value)
@@ -63,7 +63,7 @@ SqliteNotEqual::SqliteNotEqual(const std::string& lvalue, const SqliteValue& val
 
 bool SqliteNotEqual::SetValue(const std::string& lvalue, const SqliteValue& value)
 {
-    return SetComparison(condition, lvalue, "!=", value);
+    return SetComparison(condition, lvalue, IsStoredAsNull(value) ? " IS NOT " : "!=", value);
 }
 
 SqliteAnd::SqliteAnd(const std::string& left, const std::string& right)

@@ -2,6 +2,9 @@
 
 #include <array>
 #include <charconv>
+#include <cmath>
+
+#include "sqlite/sqlite_real.h"
 
 namespace OrvaDRCore {
 
@@ -15,27 +18,81 @@ void AppendNumber(std::string& text, Integer number)
     text.append(begin, std::to_chars(begin, begin + digits.size(), number).ptr);
 }
 
-void AppendQuoted(std::string& text, const Json::Value& payload)
+void AppendHexadecimal(std::string& text, std::string_view bytes)
 {
-    const char* begin = nullptr;
-    const char* end = nullptr;
-    payload.getString(&begin, &end);
-    text += '\'';
-    text.append(begin, end);
+    constexpr std::string_view Digits = "0123456789abcdef";
+    text.reserve(text.size() + LengthOfBlobLiteral(bytes.size()));
+    text += "X'";
+    for (const char byte : bytes) {
+        const auto number = static_cast<unsigned char>(byte);
+        text += Digits[number / 16];
+        text += Digits[number % 16];
+    }
     text += '\'';
 }
 
+// SQLite ends a statement at a zero byte, so a text that holds one is written like a blob.
+void AppendText(std::string& text, std::string_view bytes)
+{
+    if (bytes.find('\0') != std::string_view::npos) {
+        text += "CAST(";
+        AppendHexadecimal(text, bytes);
+        text += " AS TEXT)";
+        return;
+    }
+    text += '\'';
+    AppendEscaped(text, bytes);
+    text += '\'';
+}
+
+// By contract a plain text is not escaped.
+void AppendPlain(std::string& text, std::string_view bytes)
+{
+    text += '\'';
+    text += bytes;
+    text += '\'';
+}
+
+void AppendBytes(std::string& text, std::string_view bytes, SqliteInternals::Kind kind)
+{
+    switch (kind) {
+        case SqliteInternals::Kind::Text: return AppendText(text, bytes);
+        case SqliteInternals::Kind::Blob: return AppendHexadecimal(text, bytes);
+        default: return AppendPlain(text, bytes);
+    }
+}
+
 }  // namespace
+
+void AppendEscaped(std::string& text, std::string_view unescaped)
+{
+    std::size_t begin = 0;
+    for (std::size_t quote = unescaped.find('\''); quote != std::string_view::npos;
+         quote = unescaped.find('\'', begin)) {
+        text.append(unescaped, begin, quote + 1 - begin);
+        text += '\'';
+        begin = quote + 1;
+    }
+    text.append(unescaped, begin);
+}
+
+bool IsStoredAsNull(const SqliteValue& value)
+{
+    const Json::Value& payload = SqliteInternals::Payload(value);
+    return value.IsNull() || (payload.type() == Json::realValue && std::isnan(payload.asDouble()));
+}
 
 void AppendLiteral(std::string& text, const SqliteValue& value)
 {
     const Json::Value& payload = SqliteInternals::Payload(value);
     switch (payload.type()) {
-        case Json::stringValue: return AppendQuoted(text, payload);
+        case Json::stringValue:
+            return AppendBytes(text, BytesOf(payload), SqliteInternals::KindOf(value));
         case Json::booleanValue: text += payload.asBool() ? '1' : '0'; return;
         case Json::intValue: return AppendNumber(text, payload.asLargestInt());
         case Json::uintValue: return AppendNumber(text, payload.asLargestUInt());
-        default: return;
+        case Json::realValue: return AppendReal(text, payload.asDouble());
+        default: text += value.IsNull() ? "NULL" : ""; return;
     }
 }
 

@@ -4,6 +4,7 @@
 
 #include <cstring>
 #include <string>
+#include <string_view>
 
 #include <json/value.h>
 
@@ -24,6 +25,11 @@ inline bool MakesValue(const char* text)
     return text != nullptr && FitsJsonText(std::strlen(text));
 }
 
+inline bool MakesValue(const SqliteValue& value)
+{
+    return value.IsValid();
+}
+
 template <class Number>
 bool MakesValue(Number /*number*/)
 {
@@ -32,8 +38,11 @@ bool MakesValue(Number /*number*/)
 
 // Access for the library's own sources.
 struct SqliteInternals {
-    // Null, a number, a boolean or a text.
+    using Kind = SqliteValue::Kind;
+
+    // Null, a number, a boolean, or a text, which holds the bytes of a blob, too.
     static const Json::Value& Payload(const SqliteValue& value) { return value.value_; }
+    static Kind KindOf(const SqliteValue& value) { return value.kind_; }
 
     // Adds a field like AddValue(), but builds its value in place, which takes half the time.
     template <class T>
@@ -45,6 +54,27 @@ struct SqliteInternals {
         }
     }
 };
+
+// The bytes of a payload that is a text.
+inline std::string_view BytesOf(const Json::Value& payload)
+{
+    const char* begin = nullptr;
+    const char* end = nullptr;
+    payload.getString(&begin, &end);
+    return {begin, static_cast<std::size_t>(end - begin)};
+}
+
+// How many bytes the literal of a blob has.
+constexpr std::size_t LengthOfBlobLiteral(std::size_t length)
+{
+    return 2 * length + 3;
+}
+
+// Appends a text with every quote doubled.
+void AppendEscaped(std::string& text, std::string_view unescaped);
+
+// Whether SQLite stores NULL for a value: for Null() and for a number that is not a number.
+bool IsStoredAsNull(const SqliteValue& value);
 
 // Appends what SqliteValue::ToFormatedValue() returns.
 void AppendLiteral(std::string& text, const SqliteValue& value);

@@ -9,41 +9,106 @@
 
 namespace OrvaDRCore {
 
+namespace {
+
+// jsoncpp calls 5.0 an integer, too.
+bool IsInteger(const Json::Value& payload)
+{
+    return payload.type() == Json::intValue || payload.type() == Json::uintValue;
+}
+
+// How a value that is refused is shown in the log.
+std::string Shown(const SqliteValue& value)
+{
+    const bool isBlob = SqliteInternals::KindOf(value) == SqliteInternals::Kind::Blob;
+    return isBlob ? value.ToFormatedValue() : toString(SqliteInternals::Payload(value));
+}
+
+}  // namespace
+
 SqliteValue::SqliteValue(int number) : valid_(true), value_(number) {}
 
 SqliteValue::SqliteValue(unsigned int number) : valid_(true), value_(number) {}
 
 SqliteValue::SqliteValue(bool truth) : valid_(true), value_(truth) {}
 
-SqliteValue::SqliteValue(const std::string& text) : SqliteValue(text.data(), text.size()) {}
-
-SqliteValue::SqliteValue(const char* text)
-    : SqliteValue(text, text != nullptr ? std::strlen(text) : 0)
+SqliteValue::SqliteValue(const std::string& text)
+    : SqliteValue(Kind::Plain, text.data(), text.size())
 {
 }
 
-SqliteValue::SqliteValue(const char* text, std::size_t length)
-    : valid_(text != nullptr && FitsJsonText(length)),
-      value_(valid_ ? Json::Value(text, text + length) : Json::Value())
+SqliteValue::SqliteValue(const char* text)
+    : SqliteValue(Kind::Plain, text, text != nullptr ? std::strlen(text) : 0)
 {
-    if (text != nullptr && !valid_) {
+}
+
+SqliteValue::SqliteValue(Kind kind, Json::Value&& payload)
+    : valid_(true), kind_(kind), value_(std::move(payload))
+{
+}
+
+SqliteValue::SqliteValue(Kind kind, const char* bytes, std::size_t length)
+    : valid_(bytes != nullptr && FitsJsonText(length)),
+      kind_(kind),
+      value_(valid_ ? Json::Value(bytes, bytes + length) : Json::Value())
+{
+    if (bytes != nullptr && !valid_) {
         DR_LOG(Err, "text of [%zu] bytes is too long for a value", length);
     }
+}
+
+SqliteValue SqliteValue::Text(const std::string& text)
+{
+    return {Kind::Text, text.data(), text.size()};
+}
+
+SqliteValue SqliteValue::Text(const char* text)
+{
+    return {Kind::Text, text, text != nullptr ? std::strlen(text) : 0};
+}
+
+SqliteValue SqliteValue::Integer(std::int64_t number)
+{
+    return {Kind::Plain, Json::Value(static_cast<Json::Int64>(number))};
+}
+
+SqliteValue SqliteValue::Real(double number)
+{
+    return {Kind::Plain, Json::Value(number)};
+}
+
+// Refuses a blob whose literal could not be part of a statement, which has less than 2 GiB.
+SqliteValue SqliteValue::Blob(const std::string& bytes)
+{
+    if (!FitsJsonText(LengthOfBlobLiteral(bytes.size()))) {
+        DR_LOG(Err, "blob of [%zu] bytes is too long for a value", bytes.size());
+        return {};
+    }
+    return {Kind::Blob, bytes.data(), bytes.size()};
+}
+
+SqliteValue SqliteValue::Null()
+{
+    return {Kind::Null, Json::Value()};
 }
 
 // By contract `valid_` stays as it was: only construction makes a value valid.
 SqliteValue& SqliteValue::operator=(const SqliteValue& other)
 {
     value_ = other.value_;
+    kind_ = other.kind_;
     return *this;
 }
 
 bool SqliteValue::IsValid() const
 {
     // An assignment may have replaced the payload since the value was built.
-    const Json::ValueType kind = value_.type();
-    return valid_ && (kind == Json::intValue || kind == Json::uintValue ||
-                      kind == Json::stringValue || kind == Json::booleanValue);
+    return valid_ && (value_.type() != Json::nullValue || IsNull());
+}
+
+bool SqliteValue::IsNull() const
+{
+    return kind_ == Kind::Null;
 }
 
 template <>
@@ -51,7 +116,7 @@ bool SqliteValue::GetValue(std::string& out) const
 {
     if (!value_.isString()) {
         DR_LOG_AS("GetValue<std::basic_string<char> >", Warn, "[%s] is not string",
-                  toString(value_).c_str());
+                  Shown(*this).c_str());
         return false;
     }
     out = value_.asString();
@@ -61,8 +126,8 @@ bool SqliteValue::GetValue(std::string& out) const
 template <>
 bool SqliteValue::GetValue(unsigned int& out) const
 {
-    if (!value_.isUInt()) {
-        DR_LOG_AS("GetValue<unsigned int>", Warn, "[%s] is not int", toString(value_).c_str());
+    if (!IsInteger(value_) || !value_.isUInt()) {
+        DR_LOG_AS("GetValue<unsigned int>", Warn, "[%s] is not int", Shown(*this).c_str());
         return false;
     }
     out = value_.asUInt();
@@ -72,8 +137,8 @@ bool SqliteValue::GetValue(unsigned int& out) const
 template <>
 bool SqliteValue::GetValue(int& out) const
 {
-    if (!value_.isInt()) {
-        DR_LOG_AS("GetValue<int>", Warn, "[%s] is not int", toString(value_).c_str());
+    if (!IsInteger(value_) || !value_.isInt()) {
+        DR_LOG_AS("GetValue<int>", Warn, "[%s] is not int", Shown(*this).c_str());
         return false;
     }
     out = value_.asInt();
@@ -81,11 +146,34 @@ bool SqliteValue::GetValue(int& out) const
 }
 
 template <>
+bool SqliteValue::GetValue(std::int64_t& out) const
+{
+    if (!IsInteger(value_)) {
+        DR_LOG_AS("GetValue<long int>", Warn, "[%s] is not int", Shown(*this).c_str());
+        return false;
+    }
+    out = value_.asInt64();
+    return true;
+}
+
+template <>
+bool SqliteValue::GetValue(double& out) const
+{
+    if (!IsInteger(value_) && value_.type() != Json::realValue) {
+        DR_LOG_AS("GetValue<double>", Warn, "[%s] is not double", Shown(*this).c_str());
+        return false;
+    }
+    out = value_.asDouble();
+    return true;
+}
+
+template <>
 bool SqliteValue::GetValue(bool& out) const
 {
-    const bool isBit = value_.isInt() && (value_.asInt() == 0 || value_.asInt() == 1);
+    const bool isBit =
+        IsInteger(value_) && value_.isInt() && (value_.asInt() == 0 || value_.asInt() == 1);
     if (!value_.isBool() && !isBit) {
-        DR_LOG_AS("GetValue<bool>", Warn, "[%s] is not bool", toString(value_).c_str());
+        DR_LOG_AS("GetValue<bool>", Warn, "[%s] is not bool", Shown(*this).c_str());
         return false;
     }
     out = value_.asBool();
@@ -103,10 +191,7 @@ std::string SqliteValue::EscapeText(const std::string& text)
 {
     std::string escaped;
     escaped.reserve(text.size());
-    for (const char character : text) {
-        if (character == '\'') escaped += '\'';
-        escaped += character;
-    }
+    AppendEscaped(escaped, text);
     return escaped;
 }
 
@@ -206,6 +291,18 @@ bool SqliteValueList::GetValue(const std::string& field, unsigned int& out) cons
 
 template <>
 bool SqliteValueList::GetValue(const std::string& field, int& out) const
+{
+    return ReadField(field, out);
+}
+
+template <>
+bool SqliteValueList::GetValue(const std::string& field, std::int64_t& out) const
+{
+    return ReadField(field, out);
+}
+
+template <>
+bool SqliteValueList::GetValue(const std::string& field, double& out) const
 {
     return ReadField(field, out);
 }

@@ -131,7 +131,8 @@ constexpr std::size_t BehindCommand = sizeof(SqliteCommand);
 
 TEST(MemberTest, ValuesAndRecordsKeepTheirOrder)
 {
-    ExpectInOrder(0, {offsetof(SqliteValue, valid_), offsetof(SqliteValue, value_)});
+    ExpectInOrder(0, {offsetof(SqliteValue, valid_), offsetof(SqliteValue, kind_),
+                      offsetof(SqliteValue, value_)});
     ExpectInOrder(BehindTable,
                   {offsetof(SqliteValueList, invalidValue_), offsetof(SqliteValueList, values_)});
     EXPECT_EQ(sizeof(SqliteRecord), BehindTable);

@@ -14,6 +14,7 @@
 #include <orvadrcore/utils.h>
 
 #include <cstddef>
+#include <cstdint>
 #include <map>
 #include <memory>
 #include <sstream>
@@ -92,11 +93,23 @@ static_assert(std::is_convertible_v<string&, SqliteValue>);
 static_assert(std::is_constructible_v<SqliteValue, std::vector<bool>::reference>);
 static_assert(std::is_convertible_v<const bool&, SqliteValue>);
 
+// Such numbers have a name.
+static_assert(Has<SqliteValue (*)(std::int64_t)>(&SqliteValue::Integer));
+static_assert(Has<SqliteValue (*)(double)>(&SqliteValue::Real));
+static_assert(Has<SqliteValue (*)(const string&)>(&SqliteValue::Text));
+static_assert(Has<SqliteValue (*)(const char*)>(&SqliteValue::Text));
+static_assert(Has<SqliteValue (*)(const string&)>(&SqliteValue::Blob));
+static_assert(Has<SqliteValue (*)()>(&SqliteValue::Null));
+
 static_assert(Has<bool (SqliteValue::*)() const>(&SqliteValue::IsValid));
+static_assert(Has<bool (SqliteValue::*)() const>(&SqliteValue::IsNull));
 static_assert(Has<string (SqliteValue::*)() const>(&SqliteValue::ToFormatedValue));
 static_assert(Has<bool (SqliteValue::*)(string&) const>(&SqliteValue::GetValue<string>));
 static_assert(Has<bool (SqliteValue::*)(bool&) const>(&SqliteValue::GetValue<bool>));
 static_assert(Has<bool (SqliteValue::*)(int&) const>(&SqliteValue::GetValue<int>));
+static_assert(
+    Has<bool (SqliteValue::*)(std::int64_t&) const>(&SqliteValue::GetValue<std::int64_t>));
+static_assert(Has<bool (SqliteValue::*)(double&) const>(&SqliteValue::GetValue<double>));
 static_assert(
     Has<bool (SqliteValue::*)(unsigned int&) const>(&SqliteValue::GetValue<unsigned int>));
 
@@ -118,6 +131,10 @@ static_assert(
     Has<bool (SqliteValueList::*)(const string&, int&) const>(&SqliteValueList::GetValue));
 static_assert(
     Has<bool (SqliteValueList::*)(const string&, unsigned int&) const>(&SqliteValueList::GetValue));
+static_assert(
+    Has<bool (SqliteValueList::*)(const string&, std::int64_t&) const>(&SqliteValueList::GetValue));
+static_assert(
+    Has<bool (SqliteValueList::*)(const string&, double&) const>(&SqliteValueList::GetValue));
 static_assert(Has<SqliteValueList& (SqliteValueList::*)(const SqliteValueList&)>(
     &SqliteValueList::operator+=));
 // Other types are refused by the compiler, not by the linker.
@@ -127,8 +144,8 @@ template <class T>
 constexpr bool HasFieldOf<T, std::void_t<decltype(std::declval<const SqliteValueList&>().GetValue(
                                  std::declval<string>(), std::declval<T&>()))>> = true;
 static_assert(HasFieldOf<string> && HasFieldOf<bool> && HasFieldOf<int> &&
-              HasFieldOf<unsigned int>);
-static_assert(!HasFieldOf<long> && !HasFieldOf<unsigned long> && !HasFieldOf<double> &&
+              HasFieldOf<unsigned int> && HasFieldOf<std::int64_t> && HasFieldOf<double>);
+static_assert(!HasFieldOf<short> && !HasFieldOf<unsigned long> && !HasFieldOf<float> &&
               !HasFieldOf<char> && !HasFieldOf<const char*> && !HasFieldOf<SqliteValue>);
 static_assert(Has<string (SqliteValueList::*)() const>(&SqliteValueList::ToStr));
 
@@ -170,6 +187,7 @@ constexpr bool TakesValues =
     Has<bool (T::*)(const string&, const int&)>(&T::template AddFieldValue<int>) &&
     Has<bool (T::*)(const string&, const unsigned int&)>(
         &T::template AddFieldValue<unsigned int>) &&
+    Has<bool (T::*)(const string&, const SqliteValue&)>(&T::template AddFieldValue<SqliteValue>) &&
     Has<bool (T::*)(const string&, const char*)>(&T::AddFieldValue);
 template <class Command, class T, class = void>
 constexpr bool TakesValuesOf = false;
@@ -179,9 +197,10 @@ constexpr bool TakesValuesOf<Command, T,
                                  std::declval<string>(), std::declval<T>()))>> = true;
 template <class Command>
 constexpr bool TakesNothingElse =
-    TakesValuesOf<Command, string>&& TakesValuesOf<Command, const char*>&& TakesValuesOf<
-        Command, char*>&& TakesValuesOf<Command, const char (&)[4]>&& TakesValuesOf<Command, int>&&
-        TakesValuesOf<Command, unsigned int>&& TakesValuesOf<Command, bool> &&
+    TakesValuesOf<Command, string>&& TakesValuesOf<Command, const char*>&&
+        TakesValuesOf<Command, char*>&& TakesValuesOf<Command, const char (&)[4]>&&
+            TakesValuesOf<Command, int>&& TakesValuesOf<Command, unsigned int>&&
+                TakesValuesOf<Command, bool>&& TakesValuesOf<Command, SqliteValue> &&
     !TakesValuesOf<Command, long> && !TakesValuesOf<Command, unsigned long> &&
     !TakesValuesOf<Command, double> && !TakesValuesOf<Command, const unsigned char*> &&
     !TakesValuesOf<Command, void*> && !TakesValuesOf<Command, int*>;

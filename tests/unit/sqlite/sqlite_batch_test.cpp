@@ -4,6 +4,8 @@
 
 #include <gtest/gtest.h>
 
+#include <cmath>
+
 #include "base/json_helpers.h"
 #include "support/fixtures/plain_db.h"
 
@@ -61,6 +63,22 @@ TEST_F(SqliteBatchTest, RecordsMayHaveDifferentFields)
     onlyName.AddValue("name", "b");
     EXPECT_TRUE(Insert({Job(1, "a"), onlyName, Job(7, "c"), onlyName}));
     EXPECT_EQ(db.Run("SELECT id, name FROM jobs"), "1,a;2,b;7,c;8,b");
+}
+
+TEST_F(SqliteBatchTest, ValuesAreStoredByTheirKind)
+{
+    Records records;
+    for (const SqliteValue& value :
+         {SqliteValue::Text("it's"), SqliteValue("it's"), SqliteValue::Integer(5'000'000'000),
+          SqliteValue(4000000000U), SqliteValue(true), SqliteValue::Real(0.5),
+          SqliteValue::Blob("o"), SqliteValue::Blob(""), SqliteValue::Null(),
+          SqliteValue::Real(std::nan(""))}) {
+        records.emplace_back().AddValue("name", value);
+    }
+    EXPECT_TRUE(Insert(records));
+    EXPECT_EQ(db.Run("SELECT typeof(name), quote(name) FROM jobs ORDER BY id"),
+              "text,'it''s';text,'it''s';integer,5000000000;integer,4000000000;integer,1;"
+              "real,0.5;blob,X'6F';blob,X'';null,NULL;null,NULL");
 }
 
 TEST_F(SqliteBatchTest, ARowThatIsThereIsReplacedOnlyWhenThatIsAllowed)

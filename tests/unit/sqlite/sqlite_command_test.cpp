@@ -157,6 +157,20 @@ TYPED_TEST(FieldCommandTest, FieldsOfEveryTypeAreAdded)
               "values:[false=0,int=-1,text='abc',true=1,unsigned=4294967295]");
 }
 
+TYPED_TEST(FieldCommandTest, ValuesOfEveryKindAreAdded)
+{
+    TypeParam command;
+    EXPECT_TRUE(command.AddFieldValue("text", SqliteValue::Text("it's")));
+    EXPECT_TRUE(command.AddFieldValue("size", SqliteValue::Integer(5'000'000'000)));
+    EXPECT_TRUE(command.AddFieldValue("load", SqliteValue::Real(0.25)));
+    EXPECT_TRUE(command.AddFieldValue("key", SqliteValue::Blob("o")));
+    EXPECT_TRUE(command.AddFieldValue("note", SqliteValue::Null()));
+    EXPECT_TRUE(command.AddFieldValue("plain", SqliteValue(1)));
+    EXPECT_TRUE(command.AddFieldValue("plain", SqliteValue("it's")));
+    EXPECT_EQ(this->Values(command),
+              "values:[key=X'6f',load=0.25,note=NULL,plain='it's',size=5000000000,text='it''s']");
+}
+
 TYPED_TEST(FieldCommandTest, AStringLiteralIsAText)
 {
     TypeParam command;
@@ -190,6 +204,10 @@ TYPED_TEST(FieldCommandTest, AnEmptyNameOrANullTextIsRefused)
     EXPECT_FALSE(command.AddFieldValue("", true));
     this->ExpectLines({Err("AddFieldValue", "Bad Field [] /value[1]")});
     EXPECT_FALSE(command.AddFieldValue("name", NullText));
+    this->ExpectLines({Err("AddFieldValue", "Bad Field [name] /value[]")});
+    EXPECT_FALSE(command.AddFieldValue("", SqliteValue::Text("it's")));
+    this->ExpectLines({Err("AddFieldValue", "Bad Field [] /value['it''s']")});
+    EXPECT_FALSE(command.AddFieldValue("name", SqliteValue()));
     this->ExpectLines({Err("AddFieldValue", "Bad Field [name] /value[]")});
     EXPECT_FALSE(command.AddFieldValue("", NullText));
     this->ExpectLines({Err("AddFieldValue", "Bad Field [] /value[]")});

@@ -1,5 +1,6 @@
 #include <orvadrcore/sqlite_condition.h>
 
+#include <cmath>
 #include <type_traits>
 
 #include "support/fixtures/log_capture.h"
@@ -91,6 +92,27 @@ TEST_F(SqliteConditionTest, AComparisonHasNoBlanks)
     ExpectCondition(SqliteNotEqual("state", 0), true, "state!=0");
     ExpectCondition(SqliteNotEqual("state", false), true, "state!=0");
     ExpectCondition(SqliteNotEqual("name", "abc"), true, "name!='abc'");
+}
+
+TEST_F(SqliteConditionTest, AComparisonTakesEveryKind)
+{
+    ExpectCondition(SqliteEqual("id", SqliteValue::Text("it's")), true, "id='it''s'");
+    ExpectCondition(SqliteEqual("id", SqliteValue::Integer(5'000'000'000)), true, "id=5000000000");
+    ExpectCondition(SqliteNotEqual("id", SqliteValue::Real(5)), true, "id!=5.0");
+    ExpectCondition(SqliteNotEqual("id", SqliteValue::Blob("o")), true, "id!=X'6f'");
+}
+
+TEST_F(SqliteConditionTest, NullIsComparedByIs)
+{
+    ExpectCondition(SqliteEqual("note", SqliteValue::Null()), true, "note IS NULL");
+    ExpectCondition(SqliteNotEqual("note", SqliteValue::Null()), true, "note IS NOT NULL");
+    // What SQLite stores for not-a-number.
+    ExpectCondition(SqliteEqual("load", SqliteValue::Real(std::nan(""))), true, "load IS NULL");
+    ExpectCondition(SqliteEqual("note", "NULL"), true, "note='NULL'");
+    ExpectCondition(SqliteIn("note", Values{SqliteValue::Null(), SqliteValue::Text("'")}), true,
+                    "note IN ( NULL,'''' )");
+    ExpectCondition(SqliteEqual("", SqliteValue::Null()), false, "");
+    ExpectRefusal("Bad lvalue[] or rvalue[NULL]");
 }
 
 TEST_F(SqliteConditionTest, AJunctionPutsItsOperandsInParentheses)

@@ -18,7 +18,7 @@ using ::testing::ElementsAre;
 
 constexpr const char* NullText = nullptr;
 
-// A value can be read as one of four types and is not converted to others.
+// A value can be read as one of six types and is not converted to others.
 template <class T, class = void>
 constexpr bool CanBeReadAs = false;
 template <class T>
@@ -26,8 +26,9 @@ constexpr bool CanBeReadAs<
     T, std::void_t<decltype(std::declval<const SqliteValue&>().GetValue(std::declval<T&>()))>> =
     true;
 static_assert(CanBeReadAs<std::string> && CanBeReadAs<unsigned int> && CanBeReadAs<int> &&
-              CanBeReadAs<bool>);
-static_assert(!CanBeReadAs<double> && !CanBeReadAs<long> && !CanBeReadAs<char>);
+              CanBeReadAs<bool> && CanBeReadAs<std::int64_t> && CanBeReadAs<double>);
+static_assert(!CanBeReadAs<float> && !CanBeReadAs<short> && !CanBeReadAs<unsigned long> &&
+              !CanBeReadAs<char>);
 
 // The value read as T; nothing when the read fails, which must leave the output unchanged.
 template <class T>
@@ -525,6 +526,8 @@ struct TypeNames {
         if (std::is_same_v<T, std::string>) return "Text";
         if (std::is_same_v<T, bool>) return "Bool";
         if (std::is_same_v<T, int>) return "Int";
+        if (std::is_same_v<T, std::int64_t>) return "Int64";
+        if (std::is_same_v<T, double>) return "Double";
         return "Unsigned";
     }
 };
@@ -534,7 +537,7 @@ template <class T>
 class SqliteFieldReadTest : public SqliteValueListTest {
 };
 
-using FieldTypes = ::testing::Types<std::string, bool, int, unsigned int>;
+using FieldTypes = ::testing::Types<std::string, bool, int, unsigned int, std::int64_t, double>;
 TYPED_TEST_SUITE(SqliteFieldReadTest, FieldTypes, TypeNames);
 
 // DEBUG here, WARN in the form that returns a reference: the contract.
