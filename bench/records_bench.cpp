@@ -119,6 +119,34 @@ class LoopEngine {
     NamedRows rows_;
 };
 
+// Our rows one by one, into structs. Columns are read by name.
+class EachEngine {
+  public:
+    explicit EachEngine(const std::string& path) : db_(path, 0)
+    {
+        select_.SetTable(OrvaDRCore::SqliteTableHandler("nodes", NodesSchema));
+        select_.SelectAll();
+    }
+    void Exec(const char* statement) { Require(db_.Exec(statement), statement); }
+    void SelectAll()
+    {
+        rows_.clear();
+        const auto take = [this](const OrvaDRCore::SqliteRow& row) {
+            Node& node = rows_.emplace_back();
+            return row.GetValue("id", node.id) && row.GetValue("name", node.name) &&
+                   row.GetValue("address", node.address) && row.GetValue("port", node.port) &&
+                   row.GetValue("state", node.state);
+        };
+        Require(db_.SelectEach(select_, take), "a select failed");
+    }
+    std::string Selected() const { return ToText(rows_); }
+
+  private:
+    OrvaDRCore::SelectCommand select_;
+    OrvaDRCore::SqliteDB db_;
+    std::vector<Node> rows_;
+};
+
 template <class Engine>
 struct Update {
     explicit Update(Mode mode) : connection(Place::Memory, Rows, mode) {}
@@ -164,6 +192,7 @@ void AddRecords()
     constexpr double OfAutocommit = 1.05;
     constexpr double OfTransaction = 1.25;
     constexpr double OfLoop = 1.05;
+    constexpr double OfStructs = 1.1;
     AddAll<Insert>({}, "insert, autocommit, disk", Place::Disk, Mode::Autocommit);
     Aim({Bare}, OfAutocommit);
     AddAll<Insert>({}, "insert, autocommit, memory", Place::Memory, Mode::Autocommit);
@@ -181,6 +210,15 @@ void AddRecords()
 #endif
     Aim({"C loop"}, OfLoop);
     Aim({"SQLiteCpp by name", "SOCI by name"}, 1);
+    Add<SelectAll<EachEngine>>("select 10,000 rows into structs", Ours);
+    Add<SelectAll<BareEngine>>("select 10,000 rows into structs", Bare);
+#if BENCH_HAS_SQLITECPP
+    Add<SelectAll<Peer<SqliteCpp>>>("select 10,000 rows into structs", "SQLiteCpp");
+#endif
+#if BENCH_HAS_SOCI
+    Add<SelectAll<Peer<Soci>>>("select 10,000 rows into structs", "SOCI");
+#endif
+    Aim({Bare}, OfStructs);
     AddAll<Update>({}, "update, autocommit, memory", Mode::Autocommit);
     AddAll<Update>({}, "update, transaction", Mode::Transaction);
     Aim({Contract}, OfTransaction);

@@ -17,6 +17,7 @@
 #ifndef ORVADRCORE_SQLITE_DB_H
 #define ORVADRCORE_SQLITE_DB_H
 
+#include <functional>
 #include <memory>
 #include <string>
 #include <vector>
@@ -25,6 +26,7 @@
 
 #include <orvadrcore/export.h>
 #include <orvadrcore/sqlite_command.h>
+#include <orvadrcore/sqlite_row.h>
 #include <orvadrcore/sqlite_value.h>
 
 namespace OrvaDRCore {
@@ -70,6 +72,10 @@ class ORVADRCORE_API SqliteDB {
     /// Selects the first row. `record` is unchanged when there is none.
     bool SelectRecord(const SelectCommand& command, SqliteValueList& record);
 
+    /// Gives each selected row to `take`, without making records. See SelectEachByCommand().
+    [[nodiscard]] bool SelectEach(const SelectCommand& command,
+                                  const std::function<bool(const SqliteRow&)>& take);
+
     /// Deletes the rows that meet the condition, which must not be empty. Note the argument order.
     bool DeleteRecord(const std::string& condition, const SqliteTableHandler& table);
 
@@ -106,6 +112,22 @@ class ORVADRCORE_API SqliteDB {
     /// Appends all rows to `records`.
     /// \warning A failed attempt leaves its rows there, and the next one appends all rows again.
     bool SelectByCommand(const std::string& command, std::vector<SqliteValueList>& records);
+
+    /// Gives each row to `take` on the open connection, in little memory however many there are.
+    /// `take` returns whether it wants another row; to stop early is a success. What it throws
+    /// passes through, with the code 404.
+    ///
+    /// Attempts that fail before the first row are repeated. After it nothing is repeated, so no row
+    /// comes twice: a failure then returns false, with the failed attempt in the record.
+    ///
+    /// `take` may use other connections, and this one for selects, also for the same one. If it
+    /// closes this connection and wants another row, the select fails. It must neither destroy this
+    /// object nor assign to it. An empty `take` is refused with the code 401.
+    /// \warning The file is locked for reading meanwhile: a commit of another connection waits, and
+    ///          fails if `take` itself waits for it. Without the write-ahead log be quick here.
+    /// \warning Whether a row that `take` inserts through this connection is seen is not defined.
+    [[nodiscard]] bool SelectEachByCommand(const std::string& command,
+                                           const std::function<bool(const SqliteRow&)>& take);
 
     // -------------------------------------------------------------------------------- connection
 

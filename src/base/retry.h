@@ -12,17 +12,23 @@ struct RetryOutcome {
     std::uint64_t failures;
 };
 
-// Calls `attempt()` until it returns true or has failed `limit` + 1 times, with `pause()` between
-// attempts but not after the last.
-template <class Attempt, class Pause>
-RetryOutcome Retry(std::uint64_t limit, Attempt attempt, Pause pause)
+// Calls `attempt()` until it returns true, has failed `limit` + 1 times, or has failed so that
+// `mayRepeat()` is false; with `pause()` between attempts but not after the last.
+template <class Attempt, class Pause, class MayRepeat>
+RetryOutcome Retry(std::uint64_t limit, Attempt attempt, Pause pause, MayRepeat mayRepeat)
 {
     std::uint64_t failures = 0;
     while (!attempt()) {
-        if (++failures > limit) return {false, failures};
+        if (++failures > limit || !mayRepeat()) return {false, failures};
         pause();
     }
     return {true, failures};
+}
+
+template <class Attempt, class Pause>
+RetryOutcome Retry(std::uint64_t limit, Attempt attempt, Pause pause)
+{
+    return Retry(limit, attempt, pause, [] { return true; });
 }
 
 }  // namespace OrvaDRCore

@@ -168,7 +168,7 @@ BusyTimeoutAccess::BusyTimeoutAccess(BusyWait& wait, const StatementWatch& watch
 
 BusyTimeoutAccess::~BusyTimeoutAccess()
 {
-    if (!isLeftToSqlite_) return;
+    if (!isLeftToSqlite_ || !wait_.IsInstalled()) return;  // or the connection was closed
     if (watch_.IsBusyTimeoutSet()) {
         wait_.Forget();
     } else {

@@ -66,7 +66,8 @@ void SqliteConnection::Close()
     if (handle_ == nullptr) return;
     wait_.Forget();
     cache_.Clear();
-    sqlite3_close(handle_);
+    sqlite3_busy_handler(handle_, nullptr, nullptr);
+    sqlite3_close(handle_);  // fails inside of a select, which closes it at its end
     handle_ = nullptr;
 }
 
@@ -88,21 +89,57 @@ bool SqliteConnection::Execute(const std::string& command)
 bool SqliteConnection::Select(const std::string& command, const TakeRow& takeRow)
 {
     error_.Set(ERR::ERR_DATABASE_OPERATION);
+    sqlite3* const handle = handle_;
     const BusyTimeoutAccess access(wait_, watch_, command);
     Statement statement;
-    int code = cache_.Take(handle_, command, statement);
-    if (code == SQLITE_OK) code = sqlite3_step(statement.get());
-    const RowReader row(statement.get());
-    while (code == SQLITE_ROW && takeRow(row)) code = sqlite3_step(statement.get());
-    if (code == SQLITE_ROW) code = EndBeforeLastRow(statement.get());
-    if (!IsInTransaction()) wait_.NoteUnlocked();
+    const ScopeGuard end([&] {
+        statement.reset();
+        EndSelect(handle);
+    });
+    const char* message = nullptr;
+    int code = cache_.Take(handle, command, statement);
+    if (code == SQLITE_OK) code = TakeRows(statement.get(), takeRow, message);
     if (code != SQLITE_OK && code != SQLITE_DONE) {
-        SetFailure(command, code, nullptr);
+        SetFailure(command, code, message != nullptr ? message : sqlite3_errmsg(handle));
         return false;
     }
-    cache_.Keep(command, std::move(statement));
+    if (handle_ == handle) cache_.Keep(command, std::move(statement));
     error_.Set(0);
     return true;
+}
+
+// Returns SQLite's code, and a message for a failure that is not SQLite's.
+int SqliteConnection::TakeRows(sqlite3_stmt* statement, const TakeRow& takeRow,
+                               const char*& message)
+{
+    const sqlite3* const handle = handle_;
+    int code = sqlite3_step(statement);
+    RowReader row(statement);
+    while (code == SQLITE_ROW) {
+        const bool isMoreWanted = takeRow(row);
+        if (row.IsOutOfMemory()) {
+            message = sqlite3_errstr(SQLITE_NOMEM);
+            return SQLITE_NOMEM;
+        }
+        if (!isMoreWanted) return EndBeforeLastRow(statement);
+        if (handle_ != handle) {
+            message = "the connection was closed";
+            return SQLITE_ABORT;
+        }
+        code = sqlite3_step(statement);
+    }
+    return code;
+}
+
+// After the statement of a select has ended. SQLite does not close a connection while a statement
+// runs, so one that was closed meanwhile is closed here, by the last select on it.
+void SqliteConnection::EndSelect(sqlite3* handle)
+{
+    if (handle_ != handle) {
+        sqlite3_close(handle);
+    } else if (!IsInTransaction()) {
+        wait_.NoteUnlocked();
+    }
 }
 
 bool SqliteConnection::RunAtomically(bool isNested, const std::function<bool()>& work)
@@ -127,9 +164,10 @@ bool SqliteConnection::RunAtomically(bool isNested, const std::function<bool()>&
     return true;
 }
 
-Attempts SqliteConnection::Retry(const std::function<bool()>& attempt)
+Attempts SqliteConnection::Retry(const std::function<bool()>& attempt,
+                                 const std::function<bool()>& mayRepeat)
 {
-    return RunWithRetries(error_, owner_ != nullptr ? 0 : retryLimit_, attempt);
+    return RunWithRetries(error_, owner_ != nullptr ? 0 : retryLimit_, attempt, mayRepeat);
 }
 
 bool SqliteConnection::IsInTransaction() const

@@ -49,8 +49,8 @@ class SqliteConnection {
     bool Execute(const std::string& command);
 
     // One attempt to run a statement that has rows. Each row is given to `takeRow`, which returns
-    // whether it wants another.
-    using TakeRow = std::function<bool(const RowReader&)>;
+    // whether it wants another. It may use this connection, close it, and throw.
+    using TakeRow = std::function<bool(RowReader&)>;
     bool Select(const std::string& command, const TakeRow& takeRow);
 
     // One attempt to do work in a transaction of its own or, nested, in a savepoint of the open
@@ -59,7 +59,8 @@ class SqliteConnection {
 
     // While a transaction has an owner, nothing is retried: SQLite may have rolled it back by
     // itself, and a second attempt would run outside of it.
-    Attempts Retry(const std::function<bool()>& attempt);
+    Attempts Retry(const std::function<bool()>& attempt,
+                   const std::function<bool()>& mayRepeat = AlwaysRepeat);
 
     bool IsInTransaction() const;
 
@@ -71,6 +72,9 @@ class SqliteConnection {
     void SetOwner(const SqliteTransaction* owner) { owner_ = owner; }
 
   private:
+    int TakeRows(sqlite3_stmt* statement, const TakeRow& takeRow, const char*& message);
+    void EndSelect(sqlite3* handle);
+
     const std::string path_;
     const unsigned int retryLimit_;
     SqliteError error_;

@@ -42,22 +42,27 @@ SqliteConnection::TakeRow AppendTo(std::vector<SqliteValueList>& records)
     };
 }
 
-// SelectByCommand() for all rows, each of which is given to `takeRow`.
-bool SelectRows(SqliteConnection& connection, const std::string& command,
-                const SqliteConnection::TakeRow& takeRow)
+// Reports how a select of all rows went.
+bool LogAttempts(const char* function, const std::string& command, const Attempts& attempts)
 {
-    constexpr const char* Function = "SelectByCommand";
-    const Attempts attempts = connection.Retry([&] { return connection.Select(command, takeRow); });
     if (!attempts.succeeded) {
-        DR_LOG_AS(Function, Warn,
+        DR_LOG_AS(function, Warn,
                   "Reach retry limit [%u], failed to exec command [%s] with errors [%s]",
                   attempts.failures, command.c_str(), attempts.errors.c_str());
     } else if (attempts.failures > 0) {
-        DR_LOG_AS(Function, Info,
+        DR_LOG_AS(function, Info,
                   "After retry [%u] times, success to select command, previous errs [%s]",
                   attempts.failures, attempts.errors.c_str());
     }
     return attempts.succeeded;
+}
+
+// SelectByCommand() for all rows, each of which is given to `takeRow`.
+bool SelectRows(SqliteConnection& connection, const std::string& command,
+                const SqliteConnection::TakeRow& takeRow)
+{
+    return LogAttempts("SelectByCommand", command,
+                       connection.Retry([&] { return connection.Select(command, takeRow); }));
 }
 
 // Takes the connection out of an object. The object stays usable: closed, with the same path and
@@ -184,6 +189,29 @@ bool SqliteDB::SelectByCommand(const std::string& command, std::vector<SqliteVal
         return false;
     }
     return SelectRows(*connection_, command, AppendTo(records));
+}
+
+bool SqliteDB::SelectEachByCommand(const std::string& command,
+                                   const std::function<bool(const SqliteRow&)>& take)
+{
+    SqliteConnection& connection = *connection_;  // stays where it is when this object is moved
+    if (command.empty()) {
+        connection.Error().Set(ERR::BAD_PARAMETER);
+        DR_LOG(Err, "Empty command to select records");
+        return false;
+    }
+    if (take == nullptr) {
+        connection.Error().Set(ERR::BAD_PARAMETER);
+        DR_LOG(Err, "no function takes the rows of [%s]", command.c_str());
+        return false;
+    }
+    bool hasRow = false;
+    const auto takeRow = [&](RowReader& reader) {
+        hasRow = true;
+        return take(SqliteRow(reader));
+    };
+    const auto select = [&] { return connection.Select(command, takeRow); };
+    return LogAttempts(__func__, command, connection.Retry(select, [&] { return !hasRow; }));
 }
 
 bool SqliteDB::Open()

@@ -64,14 +64,14 @@ bool ExecCommand(const Operation& operation, SqliteDB& db, const SqliteCommand& 
     return true;
 }
 
-// `Output` is a record or a vector of records.
-template <class Output>
-bool SelectCommandInto(const Operation& operation, SqliteDB& db, const SelectCommand& command,
-                       Output& output)
+// `select` runs the statement.
+template <class Select>
+bool RunSelect(const Operation& operation, SqliteDB& db, const SelectCommand& command,
+               Select select)
 {
     if (!Prepare(operation, db, command)) return false;
     const std::string statement = command.GetCommand();
-    if (!db.SelectByCommand(statement, output)) {
+    if (!select(statement)) {
         DR_LOG_AS(operation.function, Err, "Failed to select by command [%s]", statement.c_str());
         return false;
     }
@@ -120,12 +120,21 @@ bool SqliteDB::UpdateRecord(const UpdateCommand& command)
 
 bool SqliteDB::SelectRecords(const SelectCommand& command, std::vector<SqliteValueList>& records)
 {
-    return SelectCommandInto({__func__, "select", ERR::BAD_PARAMETER}, *this, command, records);
+    const auto select = [&](const std::string& text) { return SelectByCommand(text, records); };
+    return RunSelect({__func__, "select", ERR::BAD_PARAMETER}, *this, command, select);
 }
 
 bool SqliteDB::SelectRecord(const SelectCommand& command, SqliteValueList& record)
 {
-    return SelectCommandInto({__func__, "select", ERR::BAD_PARAMETER}, *this, command, record);
+    const auto select = [&](const std::string& text) { return SelectByCommand(text, record); };
+    return RunSelect({__func__, "select", ERR::BAD_PARAMETER}, *this, command, select);
+}
+
+bool SqliteDB::SelectEach(const SelectCommand& command,
+                          const std::function<bool(const SqliteRow&)>& take)
+{
+    const auto select = [&](const std::string& text) { return SelectEachByCommand(text, take); };
+    return RunSelect({__func__, "select", ERR::BAD_PARAMETER}, *this, command, select);
 }
 
 bool SqliteDB::DeleteRecord(const std::string& condition, const SqliteTableHandler& table)

@@ -18,7 +18,8 @@ constexpr unsigned int MaxPauseMSec = 1000;
 }  // namespace
 
 Attempts RunWithRetries(SqliteError& error, unsigned int limit,
-                        const std::function<bool()>& attempt)
+                        const std::function<bool()>& attempt,
+                        const std::function<bool()>& mayRepeat)
 {
     Json::Value entries;
     const auto attemptAndNote = [&] {
@@ -28,7 +29,7 @@ Attempts RunWithRetries(SqliteError& error, unsigned int limit,
         return false;
     };
     const auto pause = [] { RandomSleepInMSec(MinPauseMSec, MaxPauseMSec); };
-    const RetryOutcome outcome = Retry(limit, attemptAndNote, pause);
+    const RetryOutcome outcome = Retry(limit, attemptAndNote, pause, mayRepeat);
 
     Attempts attempts{outcome.succeeded, static_cast<unsigned int>(outcome.failures), {}};
     if (outcome.failures > 0) attempts.errors = toString(entries);

@@ -1,5 +1,8 @@
 #include "sqlite/sqlite_row_reader.h"
 
+#include <algorithm>
+#include <numeric>
+
 #include "sqlite/sqlite_internals.h"
 
 namespace OrvaDRCore {
@@ -32,6 +35,34 @@ SqliteValueList RowReader::Read(LeftOut leftOut) const
         ++column;
     }
     return record;
+}
+
+std::size_t RowReader::Find(const std::string& name)
+{
+    if (!followers_.empty()) {
+        const std::size_t guess = followers_[last_];
+        if (guess < names_.size() && names_[guess] == name) return last_ = guess;
+    }
+    return Search(name);
+}
+
+std::size_t RowReader::Search(const std::string& name)
+{
+    const auto isLess = [this](std::size_t one, std::size_t other) {
+        return names_[one] < names_[other];
+    };
+    if (followers_.size() != names_.size()) {
+        sorted_.resize(names_.size());
+        std::iota(sorted_.begin(), sorted_.end(), std::size_t{0});
+        std::stable_sort(sorted_.begin(), sorted_.end(), isLess);
+        followers_.assign(names_.size(), names_.size());
+    }
+    const auto after = std::upper_bound(
+        sorted_.begin(), sorted_.end(), name,
+        [this](const std::string& wanted, std::size_t column) { return wanted < names_[column]; });
+    if (after == sorted_.begin() || names_[*(after - 1)] != name) return names_.size();
+    followers_[last_] = *(after - 1);
+    return last_ = *(after - 1);
 }
 
 }  // namespace OrvaDRCore

@@ -4,6 +4,7 @@
 
 #include <sqlite3.h>
 
+#include <cstddef>
 #include <string>
 #include <vector>
 
@@ -11,7 +12,7 @@
 
 namespace OrvaDRCore {
 
-// Reads the row that a statement has stepped to.
+// Reads the row that a statement has stepped to. One reader serves all rows of a select.
 class RowReader {
   public:
     // Reads the column names, so the statement must have been stepped once: SQLite prepares a
@@ -28,9 +29,36 @@ class RowReader {
     // the same name the last one counts.
     SqliteValueList Read(LeftOut leftOut) const;
 
+    const std::vector<std::string>& GetNames() const { return names_; }
+
+    // The last column with this name, GetNames().size() if there is none.
+    std::size_t Find(const std::string& name);
+
+    // A column's value in this row, which may be read in this thread until the next row. The
+    // column must exist.
+    sqlite3_value* GetColumn(std::size_t column) const
+    {
+        return sqlite3_column_value(statement_, static_cast<int>(column));
+    }
+
+    // For a value that could not be read because SQLite has run out of memory: the select fails
+    // then, or the value could be taken for NULL.
+    void NoteOutOfMemory() { isOutOfMemory_ = true; }
+    bool IsOutOfMemory() const { return isOutOfMemory_; }
+
   private:
+    std::size_t Search(const std::string& name);
+
     sqlite3_stmt* statement_;
     std::vector<std::string> names_;
+    bool isOutOfMemory_ = false;
+
+    // Set by the first search: the columns in the order of their names, and for each column the one
+    // that was looked up after it the last time. Callers read every row in the same order, so this
+    // is nearly always the one that they want.
+    std::vector<std::size_t> sorted_;
+    std::vector<std::size_t> followers_;
+    std::size_t last_ = 0;
 };
 
 }  // namespace OrvaDRCore

@@ -36,25 +36,30 @@ bool IsWorthCaching(const std::string& command, sqlite3_stmt* statement)
 int StatementCache::Take(sqlite3* handle, const std::string& command, Statement& statement)
 {
     if (!HasNothingAttached(handle)) selects_.clear();
-    const auto cached = std::find_if(selects_.begin(), selects_.end(), [&](const Select& select) {
-        return select.command == command;
-    });
-    if (cached == selects_.end()) return PrepareStatement(handle, command, statement);
-    std::rotate(cached, cached + 1, selects_.end());
-    statement = std::move(selects_.back().statement);
-    if (statement == nullptr) return PrepareStatement(handle, command, statement);
-    return SQLITE_OK;
+    if (MakeLast(command)) statement = std::move(selects_.back().statement);
+    return statement != nullptr ? SQLITE_OK : PrepareStatement(handle, command, statement);
 }
 
 void StatementCache::Keep(const std::string& command, Statement statement)
 {
     if (!IsWorthCaching(command, statement.get())) return;
     sqlite3_reset(statement.get());
-    if (selects_.empty() || selects_.back().command != command) {
+    if (!MakeLast(command)) {
         if (selects_.size() == MaxCached) selects_.erase(selects_.begin());
         selects_.push_back({command, nullptr});
     }
     selects_.back().statement = std::move(statement);
+}
+
+bool StatementCache::MakeLast(const std::string& command)
+{
+    if (!selects_.empty() && selects_.back().command == command) return true;
+    const auto cached = std::find_if(selects_.begin(), selects_.end(), [&](const Select& select) {
+        return select.command == command;
+    });
+    if (cached == selects_.end()) return false;
+    std::rotate(cached, cached + 1, selects_.end());
+    return true;
 }
 
 }  // namespace OrvaDRCore

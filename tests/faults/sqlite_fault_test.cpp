@@ -15,6 +15,7 @@
 using OrvaDRCore::InsertCommand;
 using OrvaDRCore::SelectCommand;
 using OrvaDRCore::SqliteDB;
+using OrvaDRCore::SqliteRow;
 using OrvaDRCore::SqliteTableHandler;
 using OrvaDRCore::SqliteTransaction;
 using OrvaDRCore::SqliteValueList;
@@ -105,6 +106,27 @@ bool Select(SqliteDB& db)
     return isRead;
 }
 
+bool SelectEach(SqliteDB& db)
+{
+    SelectCommand select;
+    select.SetTable(Nodes);
+    select.SelectAll();
+    int rows = 0;
+    bool isWhole = true;
+    const bool isRead = db.SelectEach(select, [&](const SqliteRow& row) {
+        std::string name;
+        isWhole = row.GetValue("name", name) && isWhole;
+        EXPECT_TRUE(name.empty() || name.size() == Long('a').size());
+        ++rows;
+        return true;
+    });
+    if (isRead) {
+        EXPECT_TRUE(isWhole);
+        EXPECT_EQ(rows, 3);
+    }
+    return isRead;
+}
+
 bool InsertWithRow(SqliteDB& db)
 {
     SqliteValueList record;
@@ -129,6 +151,7 @@ const std::vector<Operation>& Operations()
         {"UpdateRecord", [](SqliteDB& db) { return db.UpdateRecord(UpdateOfAll('x', Nodes)); },
          "1x,2x,3x"},
         {"SelectRecords and SelectRecord", Select, Before},
+        {"SelectEach", SelectEach, Before},
         {"DeleteRecord", [](SqliteDB& db) { return db.DeleteRecord("id=2", Nodes); }, "1a,3c"},
         {"DeleteAllRecords", [](SqliteDB& db) { return db.DeleteAllRecords(Nodes); }, ""},
         {"Exec", [](SqliteDB& db) { return db.Open() && db.Exec("DELETE FROM nodes WHERE id=3"); },

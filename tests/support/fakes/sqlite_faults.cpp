@@ -88,3 +88,9 @@ extern "C" const char* sqlite3_column_name(sqlite3_stmt* statement, int column)
     if (current != nullptr && current->columnName) return current->columnName(statement, column);
     return RealFunction<decltype(sqlite3_column_name)>("sqlite3_column_name")(statement, column);
 }
+
+extern "C" const unsigned char* sqlite3_value_text(sqlite3_value* value)
+{
+    if (current != nullptr && current->valueText) return current->valueText(value);
+    return RealFunction<decltype(sqlite3_value_text)>("sqlite3_value_text")(value);
+}

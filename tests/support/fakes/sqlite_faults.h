@@ -13,6 +13,7 @@ struct SqliteFaults {
     std::function<int(sqlite3_stmt*)> step;
     std::function<const unsigned char*(sqlite3_stmt*, int)> columnText;
     std::function<const char*(sqlite3_stmt*, int)> columnName;
+    std::function<const unsigned char*(sqlite3_value*)> valueText;
 
     SqliteFaults();
     SqliteFaults(const SqliteFaults&) = delete;

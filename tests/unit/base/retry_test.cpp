@@ -48,6 +48,18 @@ TEST(RetryTest, ALimitOfZeroMeansOneAttempt)
     EXPECT_EQ(attempts, 1);
 }
 
+TEST(RetryTest, StopsAfterAFailureThatMustNotBeRepeated)
+{
+    int attempts = 0;
+    int pauses = 0;
+    const auto outcome = Retry(
+        5, [&] { return ++attempts < 0; }, [&] { ++pauses; }, [&] { return attempts < 2; });
+    EXPECT_FALSE(outcome.succeeded);
+    EXPECT_EQ(outcome.failures, 2U);
+    EXPECT_EQ(attempts, 2);
+    EXPECT_EQ(pauses, 1);
+}
+
 TEST(RetryTest, TheLargestLimitDoesNotOverflow)
 {
     constexpr unsigned int Limit = std::numeric_limits<unsigned int>::max();

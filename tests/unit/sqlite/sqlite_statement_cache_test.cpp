@@ -12,6 +12,7 @@ namespace {
 using OrvaDRCore::InsertCommand;
 using OrvaDRCore::SelectCommand;
 using OrvaDRCore::SqliteDB;
+using OrvaDRCore::SqliteRow;
 using OrvaDRCore::SqliteTableHandler;
 using OrvaDRCore::SqliteValueList;
 
@@ -142,6 +143,25 @@ TEST_F(SqliteStatementCacheTest, TheMostRecentSelectsAreCached)
     EXPECT_EQ(Select(number(1)), "x:1; cached");
     EXPECT_EQ(Select(number(3)), "x:3; cached");
     EXPECT_EQ(Select(number(2)), "x:2; prepared");
+}
+
+TEST_F(SqliteStatementCacheTest, ASelectInsideOfTheSameSelectIsPreparedOnceMore)
+{
+    RunEach({"CREATE TABLE jobs (id)", "INSERT INTO jobs VALUES (1), (2)"});
+    ASSERT_TRUE(db.Open());
+    EXPECT_EQ(Select(ids), "id:1; prepared");
+    prepared.clear();
+    EXPECT_TRUE(db.SelectEachByCommand(ids, [&](const SqliteRow&) {
+        SqliteValueList record;
+        EXPECT_TRUE(db.SelectByCommand(ids, record));  // prepared once for both rows
+        EXPECT_TRUE(db.SelectByCommand("SELECT 1 AS x", record));
+        return true;
+    }));
+    EXPECT_EQ(prepared, (std::vector<std::string>{ids, "SELECT 1 AS x"}));
+    EXPECT_EQ(Select("SELECT 1 AS x"), "x:1; cached");
+    EXPECT_EQ(Select(ids), "id:1; cached");  // there is one of the two
+    EXPECT_EQ(Select("SELECT 2 AS x"), "x:2; prepared");
+    EXPECT_EQ(Select(ids), "id:1; cached");
 }
 
 TEST_F(SqliteStatementCacheTest, OtherStatementsAndVeryLongSelectsAreNotCached)

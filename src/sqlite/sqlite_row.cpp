@@ -1,0 +1,262 @@
+#include <orvadrcore/sqlite_row.h>
+
+#include <array>
+#include <charconv>
+#include <limits>
+#include <string_view>
+
+#include "base/json_helpers.h"
+#include "base/log.h"
+#include "sqlite/sqlite_row_reader.h"
+
+namespace OrvaDRCore {
+
+namespace {
+
+enum class Reading { Done, Refused, OutOfMemory };
+
+// What the lines about a refused value say.
+template <class T>
+struct Kind;
+template <>
+struct Kind<std::string> {
+    static constexpr const char* Function = "GetValue<std::basic_string<char> >";
+    static constexpr const char* Word = "string";
+};
+template <>
+struct Kind<int> {
+    static constexpr const char* Function = "GetValue<int>";
+    static constexpr const char* Word = "int";
+};
+template <>
+struct Kind<unsigned int> {
+    static constexpr const char* Function = "GetValue<unsigned int>";
+    static constexpr const char* Word = "int";
+};
+template <>
+struct Kind<std::int64_t> {
+    static constexpr const char* Function = "GetValue<long>";
+    static constexpr const char* Word = "int";
+};
+template <>
+struct Kind<double> {
+    static constexpr const char* Function = "GetValue<double>";
+    static constexpr const char* Word = "double";
+};
+template <>
+struct Kind<bool> {
+    static constexpr const char* Function = "GetValue<bool>";
+    static constexpr const char* Word = "bool";
+};
+
+// For the integers and bool.
+template <class T>
+Reading Read(sqlite3_value* value, T& out)
+{
+    if (sqlite3_value_type(value) != SQLITE_INTEGER) return Reading::Refused;
+    const sqlite3_int64 number = sqlite3_value_int64(value);
+    using Limits = std::numeric_limits<T>;
+    if (number < Limits::min() || number > Limits::max()) return Reading::Refused;
+    out = static_cast<T>(number);
+    return Reading::Done;
+}
+
+template <>
+Reading Read(sqlite3_value* value, double& out)
+{
+    const int type = sqlite3_value_type(value);
+    if (type != SQLITE_FLOAT && type != SQLITE_INTEGER) return Reading::Refused;
+    out = sqlite3_value_double(value);
+    return Reading::Done;
+}
+
+template <>
+Reading Read(sqlite3_value* value, std::string& out)
+{
+    const int type = sqlite3_value_type(value);
+    if (type != SQLITE_TEXT && type != SQLITE_BLOB) return Reading::Refused;
+    // In this order: reading a text may convert it, which changes its length.
+    const void* const bytes =
+        type == SQLITE_TEXT ? sqlite3_value_text(value) : sqlite3_value_blob(value);
+    const int length = sqlite3_value_bytes(value);
+    if (bytes == nullptr && (type == SQLITE_TEXT || length > 0)) return Reading::OutOfMemory;
+    if (bytes == nullptr) {
+        out.clear();  // an empty blob
+    } else {
+        out.assign(static_cast<const char*>(bytes), static_cast<std::size_t>(length));
+    }
+    return Reading::Done;
+}
+
+std::string_view BytesOf(sqlite3_value* value, const void* bytes)
+{
+    if (bytes == nullptr) return {};
+    return {static_cast<const char*>(bytes), static_cast<std::size_t>(sqlite3_value_bytes(value))};
+}
+
+std::string ShowReal(double number)
+{
+    std::array<char, 32> digits{};
+    char* const begin = digits.data();
+    return {begin, std::to_chars(begin, begin + digits.size(), number).ptr};
+}
+
+std::string ShowBlob(std::string_view bytes)
+{
+    constexpr std::string_view Digits = "0123456789abcdef";
+    std::string literal = "X'";
+    for (const char byte : bytes) {
+        const auto number = static_cast<unsigned char>(byte);
+        literal += Digits[number / 16];
+        literal += Digits[number % 16];
+    }
+    return literal + "'";
+}
+
+// A value as the lines of a record's GetValue() show it.
+std::string Show(sqlite3_value* value)
+{
+    switch (sqlite3_value_type(value)) {
+        case SQLITE_INTEGER: return std::to_string(sqlite3_value_int64(value));
+        case SQLITE_FLOAT: return ShowReal(sqlite3_value_double(value));
+        case SQLITE_TEXT: return toString(ToJsonText(BytesOf(value, sqlite3_value_text(value))));
+        case SQLITE_BLOB: return ShowBlob(BytesOf(value, sqlite3_value_blob(value)));
+        default: return "null";
+    }
+}
+
+template <class T>
+bool ReadColumn(RowReader& reader, std::size_t column, T& out)
+{
+    sqlite3_value* const value = reader.GetColumn(column);
+    const Reading reading = Read(value, out);
+    if (reading == Reading::Done) return true;
+    if (reading == Reading::OutOfMemory) {
+        reader.NoteOutOfMemory();
+        DR_LOG_AS(Kind<T>::Function, Warn, "no memory to read field [%s]",
+                  reader.GetNames()[column].c_str());
+    } else {
+        DR_LOG_AS(Kind<T>::Function, Warn, "[%s] is not %s", Show(value).c_str(), Kind<T>::Word);
+    }
+    return false;
+}
+
+}  // namespace
+
+std::size_t SqliteRow::GetColumnCount() const
+{
+    return reader_.GetNames().size();
+}
+
+std::string SqliteRow::GetColumnName(std::size_t column) const
+{
+    const std::vector<std::string>& names = reader_.GetNames();
+    return column < names.size() ? names[column] : std::string();
+}
+
+bool SqliteRow::IsNull(const std::string& column) const
+{
+    const std::size_t found = reader_.Find(column);
+    return found == reader_.GetNames().size() ||
+           sqlite3_value_type(reader_.GetColumn(found)) == SQLITE_NULL;
+}
+
+template <class T>
+bool SqliteRow::ReadNamed(const std::string& column, T& out) const
+{
+    constexpr const char* Function = "GetValue";
+    if (column.empty()) {
+        DR_LOG_AS(Function, Err, "Invalid field [%s]", column.c_str());
+        return false;
+    }
+    const std::size_t found = reader_.Find(column);
+    if (found == reader_.GetNames().size()) {
+        DR_LOG_AS(Function, Debug, "field [%s] is not existed", column.c_str());
+        return false;
+    }
+    return ReadColumn(reader_, found, out);
+}
+
+template <class T>
+bool SqliteRow::ReadNumbered(std::size_t column, T& out) const
+{
+    if (column >= reader_.GetNames().size()) {
+        DR_LOG_AS("GetValue", Debug, "field [%zu] is not existed", column);
+        return false;
+    }
+    return ReadColumn(reader_, column, out);
+}
+
+template <>
+bool SqliteRow::GetValue(const std::string& column, std::string& out) const
+{
+    return ReadNamed(column, out);
+}
+
+template <>
+bool SqliteRow::GetValue(const std::string& column, int& out) const
+{
+    return ReadNamed(column, out);
+}
+
+template <>
+bool SqliteRow::GetValue(const std::string& column, unsigned int& out) const
+{
+    return ReadNamed(column, out);
+}
+
+template <>
+bool SqliteRow::GetValue(const std::string& column, std::int64_t& out) const
+{
+    return ReadNamed(column, out);
+}
+
+template <>
+bool SqliteRow::GetValue(const std::string& column, double& out) const
+{
+    return ReadNamed(column, out);
+}
+
+template <>
+bool SqliteRow::GetValue(const std::string& column, bool& out) const
+{
+    return ReadNamed(column, out);
+}
+
+template <>
+bool SqliteRow::GetValue(std::size_t column, std::string& out) const
+{
+    return ReadNumbered(column, out);
+}
+
+template <>
+bool SqliteRow::GetValue(std::size_t column, int& out) const
+{
+    return ReadNumbered(column, out);
+}
+
+template <>
+bool SqliteRow::GetValue(std::size_t column, unsigned int& out) const
+{
+    return ReadNumbered(column, out);
+}
+
+template <>
+bool SqliteRow::GetValue(std::size_t column, std::int64_t& out) const
+{
+    return ReadNumbered(column, out);
+}
+
+template <>
+bool SqliteRow::GetValue(std::size_t column, double& out) const
+{
+    return ReadNumbered(column, out);
+}
+
+template <>
+bool SqliteRow::GetValue(std::size_t column, bool& out) const
+{
+    return ReadNumbered(column, out);
+}
+
+}  // namespace OrvaDRCore
