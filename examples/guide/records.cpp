@@ -11,9 +11,13 @@
 using OrvaDRCore::InsertCommand;
 using OrvaDRCore::SelectCommand;
 using OrvaDRCore::SqliteAnd;
+using OrvaDRCore::SqliteContains;
 using OrvaDRCore::SqliteEqual;
 using OrvaDRCore::SqliteIn;
+using OrvaDRCore::SqliteLess;
 using OrvaDRCore::SqliteNotEqual;
+using OrvaDRCore::SqliteOr;
+using OrvaDRCore::SqliteOrder;
 using OrvaDRCore::SqliteRecord;
 using OrvaDRCore::SqliteTableHandler;
 using OrvaDRCore::SqliteValue;
@@ -128,7 +132,10 @@ void ShowStatements(const SqliteTableHandler& nodes)
     select.SetTable(nodes);
     select.AddField("name");
     select.AddField("port");
-    select.SetCondition("enabled=1 ORDER BY name LIMIT 10");
+    select.SetCondition(SqliteEqual("enabled", true));
+    select.OrderBy("port", SqliteOrder::Descending);
+    select.OrderBy("name");
+    select.Limit(10, 20);  // the third page
     std::cout << select.GetCommand() << '\n';
     // [/statements]
 }
@@ -149,10 +156,13 @@ bool ShowConditions(const SqliteTableHandler& nodes)
     const SqliteNotEqual notDefault("port", 5001);
     const SqliteIn named("name", std::vector<SqliteValue>{"a", "b"});
     const SqliteIn selected("name", "SELECT name FROM favourites");
+    const SqliteLess low("port", 1024);
+    const SqliteContains percent("name", "50%");
     const SqliteAnd both(enabled.GetCondition(), notDefault.GetCondition());
     const SqliteAnd all(both.GetCondition(), named.GetCondition());
     std::cout << selected.GetCondition() << '\n';
     std::cout << all.GetCondition() << '\n';
+    std::cout << SqliteOr(low.GetCondition(), percent.GetCondition()).GetCondition() << '\n';
     // [/conditions]
 
     SelectCommand select;

@@ -19,6 +19,7 @@
 #ifndef ORVADRCORE_SQLITE_COMMAND_H
 #define ORVADRCORE_SQLITE_COMMAND_H
 
+#include <cstdint>
 #include <sstream>
 #include <string>
 #include <vector>
@@ -148,7 +149,11 @@ class ORVADRCORE_API UpdateCommand : public SqliteCommand {
     SqliteValueList fieldValues_;
 };
 
-/// A SELECT of the rows that meet a condition, or of all rows.
+/// The order of the rows of a SELECT by one of its keys.
+enum class SqliteOrder { Ascending, Descending };
+
+/// A SELECT of the rows that meet a condition, or of all rows:
+/// `SELECT node,sum(bytes) FROM volumes WHERE state=1 GROUP BY node ORDER BY node DESC LIMIT 20`.
 class ORVADRCORE_API SelectCommand : public SqliteCommand {
   public:
     SelectCommand() = default;
@@ -166,14 +171,38 @@ class ORVADRCORE_API SelectCommand : public SqliteCommand {
     bool SetCondition(const std::string& text);
     bool SetCondition(const SqliteCondition& object);  ///< Refuses one that is not valid, too.
 
+    /// Makes one row of all rows in which the field, and those of earlier calls, are equal.
+    /// \return false, with an ERR line and nothing changed, for an empty field
+    bool GroupBy(const std::string& field);
+
+    /// Sorts the rows by a field or an expression; those that are equal in it by the field of the next
+    /// call. NULL comes first, then numbers by their value, then texts by their bytes. Without any
+    /// call the order is SQLite's choice.
+    /// \return false, with an ERR line and nothing changed, for an empty field
+    /// \warning A name given by AS comes first: with `CAST(size AS TEXT) AS size` the rows are sorted
+    ///          as texts, "5000000000" before "900". Sort by `nodes.size` then, with the table's name.
+    bool OrderBy(const std::string& field, SqliteOrder order = SqliteOrder::Ascending);
+
+    /// Selects this many rows at most, after skipping the first `offset` ones. 0 rows is a limit, too.
+    /// Numbers beyond the 64-bit integers of SQLite are lowered to the largest of these. The last
+    /// call counts.
+    void Limit(std::uint64_t rows, std::uint64_t offset = 0);
+
     bool IsValid() const override;            ///< Whether there are a table and columns.
     std::string GetCommand() const override;  ///< Does not end with ";".
-    void DumpParam(std::stringstream& out) const override;  ///< "condition:[id=1]/fields:[a, b]"
+
+    /// "condition:[id=1]/fields:[a, b]", and what is used of "/group:[a,b]", "/order:[c DESC,d]" and
+    /// "/limit:[20 OFFSET 5]".
+    void DumpParam(std::stringstream& out) const override;
 
   private:
     bool selectAll_ = false;
     std::vector<std::string> fields_;
     std::string condition_;
+    // What follows the words GROUP BY, ORDER BY and LIMIT; empty without them.
+    std::string groups_;
+    std::string orders_;
+    std::string limit_;
 };
 
 /// \cond SPECIALISATIONS

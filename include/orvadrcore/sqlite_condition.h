@@ -66,6 +66,63 @@ class ORVADRCORE_API SqliteNotEqual : public SqliteCondition {
     bool SetValue(const std::string& lvalue, const SqliteValue& value);   ///< As SqliteEqual.
 };
 
+/// A column below a value: `id<3`. Numbers come before all texts. NULL is below nothing and above
+/// nothing, and no column is below Null(). Otherwise as SqliteEqual.
+class ORVADRCORE_API SqliteLess : public SqliteCondition {
+  public:
+    SqliteLess() = default;
+    SqliteLess(const std::string& lvalue, const SqliteValue& value);     ///< As SetValue().
+    bool SetValue(const std::string& lvalue, const SqliteValue& value);  ///< As SqliteEqual.
+};
+
+/// A column below a value or equal to it: `id<=3`. Otherwise as SqliteLess.
+class ORVADRCORE_API SqliteLessEqual : public SqliteCondition {
+  public:
+    SqliteLessEqual() = default;
+    SqliteLessEqual(const std::string& lvalue, const SqliteValue& value);  ///< As SetValue().
+    bool SetValue(const std::string& lvalue, const SqliteValue& value);    ///< As SqliteEqual.
+};
+
+/// A column above a value: `id>3`. Otherwise as SqliteLess.
+class ORVADRCORE_API SqliteGreater : public SqliteCondition {
+  public:
+    SqliteGreater() = default;
+    SqliteGreater(const std::string& lvalue, const SqliteValue& value);  ///< As SetValue().
+    bool SetValue(const std::string& lvalue, const SqliteValue& value);  ///< As SqliteEqual.
+};
+
+/// A column above a value or equal to it: `id>=3`. Otherwise as SqliteLess.
+class ORVADRCORE_API SqliteGreaterEqual : public SqliteCondition {
+  public:
+    SqliteGreaterEqual() = default;
+    SqliteGreaterEqual(const std::string& lvalue, const SqliteValue& value);  ///< As SetValue().
+    bool SetValue(const std::string& lvalue, const SqliteValue& value);       ///< As SqliteEqual.
+};
+
+/// A column whose text contains another one, anywhere: `name LIKE '%50\%%' ESCAPE '\'`. The text is
+/// plain: wildcards, backslashes and quotes in it are escaped here and stand for themselves, so do
+/// not pass what EscapeText() returns. The empty text is contained in everything but NULL.
+/// \warning SQLite's LIKE takes `a` and `A` for the same letter, in ASCII. It fails for patterns of
+///          more than 50000 bytes, to which two wildcards and each escaping backslash count.
+class ORVADRCORE_API SqliteContains : public SqliteCondition {
+  public:
+    SqliteContains() = default;
+    SqliteContains(const std::string& lvalue, const std::string& text);  ///< As SetValue().
+
+    /// Replaces the text. Refuses an empty column name, and a text with a zero byte, at which LIKE
+    /// would end; the condition's text stays as it was then.
+    bool SetValue(const std::string& lvalue, const std::string& text);
+};
+
+/// A column whose text begins with another one: `name LIKE '50\%%' ESCAPE '\'`. Otherwise as
+/// SqliteContains.
+class ORVADRCORE_API SqliteBeginsWith : public SqliteCondition {
+  public:
+    SqliteBeginsWith() = default;
+    SqliteBeginsWith(const std::string& lvalue, const std::string& text);  ///< As SetValue().
+    bool SetValue(const std::string& lvalue, const std::string& text);     ///< As SqliteContains.
+};
+
 /// Two conditions that both hold: `(id=3) AND (state!=0)`.
 class ORVADRCORE_API SqliteAnd : public SqliteCondition {
   public:

@@ -1,5 +1,8 @@
 #include <orvadrcore/sqlite_command.h>
 
+#include <algorithm>
+#include <limits>
+
 #include <orvadrcore/utils.h>
 
 #include "base/log.h"
@@ -54,6 +57,25 @@ void AppendInsertValues(std::string& text, const SqliteValueList& record)
     }
     if (text.back() == ',') text.pop_back();
     text += ')';
+}
+
+// Adds a key to the list of GROUP BY or ORDER BY.
+bool AddKey(const char* function, std::string& keys, const std::string& field,
+            const char* direction)
+{
+    if (field.empty()) {
+        DR_LOG_AS(function, Err, "Invalid field [%s]", field.c_str());
+        return false;
+    }
+    keys += (keys.empty() ? "" : ",") + field + direction;
+    return true;
+}
+
+// SQLite reads a larger number as a real, which LIMIT refuses. No table has so many rows.
+std::string RowCount(std::uint64_t count)
+{
+    constexpr std::uint64_t Most = std::numeric_limits<std::int64_t>::max();
+    return std::to_string(std::min(count, Most));
 }
 
 std::string PairsForLog(const SqliteValueList& record)
@@ -283,6 +305,22 @@ bool SelectCommand::SetCondition(const SqliteCondition& object)
     return text != nullptr && SetCondition(*text);
 }
 
+bool SelectCommand::GroupBy(const std::string& field)
+{
+    return AddKey(__func__, groups_, field, "");
+}
+
+bool SelectCommand::OrderBy(const std::string& field, SqliteOrder order)
+{
+    return AddKey(__func__, orders_, field, order == SqliteOrder::Descending ? " DESC" : "");
+}
+
+void SelectCommand::Limit(std::uint64_t rows, std::uint64_t offset)
+{
+    limit_ = RowCount(rows);
+    if (offset > 0) limit_ += " OFFSET " + RowCount(offset);
+}
+
 bool SelectCommand::IsValid() const
 {
     return !GetTable().GetName().empty() && (selectAll_ || !fields_.empty());
@@ -302,6 +340,9 @@ std::string SelectCommand::GetCommand() const
     }
     text += "FROM " + GetTable().GetName();
     if (!condition_.empty()) text += " WHERE " + condition_;
+    if (!groups_.empty()) text += " GROUP BY " + groups_;
+    if (!orders_.empty()) text += " ORDER BY " + orders_;
+    if (!limit_.empty()) text += " LIMIT " + limit_;
     return text;
 }
 
@@ -309,6 +350,9 @@ void SelectCommand::DumpParam(std::stringstream& out) const
 {
     Write(out, "condition:[" + condition_ + "]/fields:[" +
                    (selectAll_ ? "all" : Container::ToString(fields_, ", ")) + "]");
+    if (!groups_.empty()) Write(out, "/group:[" + groups_ + "]");
+    if (!orders_.empty()) Write(out, "/order:[" + orders_ + "]");
+    if (!limit_.empty()) Write(out, "/limit:[" + limit_ + "]");
 }
 
 }  // namespace OrvaDRCore

@@ -25,6 +25,32 @@ bool SetComparison(std::string& condition, const std::string& lvalue, const char
     return true;
 }
 
+// The text for a pattern that escapes with backslashes.
+std::string EscapeWildcards(const std::string& text)
+{
+    std::string escaped;
+    escaped.reserve(text.size());
+    for (const char character : text) {
+        if (character == '%' || character == '_' || character == '\\') escaped += '\\';
+        escaped += character;
+    }
+    return escaped;
+}
+
+// `before` is what stands between the quote and the text.
+bool SetPattern(std::string& condition, const std::string& lvalue, const char* before,
+                const std::string& text)
+{
+    // LIKE reads a pattern up to its first zero byte only, and would match other rows.
+    const bool isReadable = text.find('\0') == std::string::npos;
+    const std::string pattern = before + EscapeWildcards(text) + "%";
+    const SqliteValue value =
+        isReadable ? SqliteValue(SqliteValue::EscapeText(pattern)) : SqliteValue();
+    if (!SetComparison(condition, lvalue, " LIKE ", value)) return false;
+    condition += R"( ESCAPE '\')";
+    return true;
+}
+
 // By contract this appends: a second call on the same object adds its text after the first one.
 bool AppendJunction(std::string& condition, const std::string& left, const char* word,
                     const std::string& right)
@@ -64,6 +90,66 @@ SqliteNotEqual::SqliteNotEqual(const std::string& lvalue, const SqliteValue& val
 bool SqliteNotEqual::SetValue(const std::string& lvalue, const SqliteValue& value)
 {
     return SetComparison(condition, lvalue, IsStoredAsNull(value) ? " IS NOT " : "!=", value);
+}
+
+SqliteLess::SqliteLess(const std::string& lvalue, const SqliteValue& value)
+{
+    SetValue(lvalue, value);
+}
+
+bool SqliteLess::SetValue(const std::string& lvalue, const SqliteValue& value)
+{
+    return SetComparison(condition, lvalue, "<", value);
+}
+
+SqliteLessEqual::SqliteLessEqual(const std::string& lvalue, const SqliteValue& value)
+{
+    SetValue(lvalue, value);
+}
+
+bool SqliteLessEqual::SetValue(const std::string& lvalue, const SqliteValue& value)
+{
+    return SetComparison(condition, lvalue, "<=", value);
+}
+
+SqliteGreater::SqliteGreater(const std::string& lvalue, const SqliteValue& value)
+{
+    SetValue(lvalue, value);
+}
+
+bool SqliteGreater::SetValue(const std::string& lvalue, const SqliteValue& value)
+{
+    return SetComparison(condition, lvalue, ">", value);
+}
+
+SqliteGreaterEqual::SqliteGreaterEqual(const std::string& lvalue, const SqliteValue& value)
+{
+    SetValue(lvalue, value);
+}
+
+bool SqliteGreaterEqual::SetValue(const std::string& lvalue, const SqliteValue& value)
+{
+    return SetComparison(condition, lvalue, ">=", value);
+}
+
+SqliteContains::SqliteContains(const std::string& lvalue, const std::string& text)
+{
+    SetValue(lvalue, text);
+}
+
+bool SqliteContains::SetValue(const std::string& lvalue, const std::string& text)
+{
+    return SetPattern(condition, lvalue, "%", text);
+}
+
+SqliteBeginsWith::SqliteBeginsWith(const std::string& lvalue, const std::string& text)
+{
+    SetValue(lvalue, text);
+}
+
+bool SqliteBeginsWith::SetValue(const std::string& lvalue, const std::string& text)
+{
+    return SetPattern(condition, lvalue, "", text);
 }
 
 SqliteAnd::SqliteAnd(const std::string& left, const std::string& right)

@@ -13,9 +13,12 @@ using OrvaDRCore::Request;
 using OrvaDRCore::Response;
 using OrvaDRCore::SelectCommand;
 using OrvaDRCore::SqliteAnd;
+using OrvaDRCore::SqliteBeginsWith;
 using OrvaDRCore::SqliteEqual;
+using OrvaDRCore::SqliteGreaterEqual;
 using OrvaDRCore::SqliteIn;
 using OrvaDRCore::SqliteNotEqual;
+using OrvaDRCore::SqliteOrder;
 using OrvaDRCore::SqliteTableHandler;
 using OrvaDRCore::SqliteValue;
 using OrvaDRCore::SqliteValueList;
@@ -122,6 +125,29 @@ TEST(EnvelopeFaults, Select)
             select.SetCondition(SqliteNotEqual("id", 7));
             return select.GetCommand();
         });
+    });
+}
+
+TEST(EnvelopeFaults, SelectWithGroupsOrderAndLimit)
+{
+    EveryCallFails("SelectCommand::OrderBy", [] {
+        ExpectText(
+            "SELECT id FROM a_table_with_a_name WHERE (name LIKE '50\\%%' ESCAPE '\\') AND (id>=7) "
+            "GROUP BY a_column_with_a_name,id ORDER BY a_column_with_a_name,id DESC LIMIT 20 "
+            "OFFSET 5",
+            [] {
+                SelectCommand select;
+                select.SetTable(SqliteTableHandler("a_table_with_a_name", ""));
+                select.AddField("id");
+                const SqliteBeginsWith begins("name", "50%");
+                const SqliteGreaterEqual large("id", 7);
+                select.SetCondition(SqliteAnd(begins.GetCondition(), large.GetCondition()));
+                for (const char* key : {"a_column_with_a_name", "id"}) select.GroupBy(key);
+                select.OrderBy("a_column_with_a_name");
+                select.OrderBy("id", SqliteOrder::Descending);
+                select.Limit(20, 5);
+                return select.GetCommand();
+            });
     });
 }
 

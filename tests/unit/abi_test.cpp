@@ -149,7 +149,8 @@ TEST(MemberTest, CommandsKeepTheirOrder)
                   {offsetof(UpdateCommand, condition_), offsetof(UpdateCommand, fieldValues_)});
     ExpectInOrder(BehindCommand,
                   {offsetof(SelectCommand, selectAll_), offsetof(SelectCommand, fields_),
-                   offsetof(SelectCommand, condition_)});
+                   offsetof(SelectCommand, condition_), offsetof(SelectCommand, groups_),
+                   offsetof(SelectCommand, orders_), offsetof(SelectCommand, limit_)});
 }
 
 TEST(MemberTest, AConnectionIsOnePointer)

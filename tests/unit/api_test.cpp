@@ -217,6 +217,10 @@ static_assert(Has<void (InsertCommand::*)(bool)>(&InsertCommand::SetReplacable))
 static_assert(Has<string (InsertCommand::*)() const>(&InsertCommand::ToFormatedInsertValues));
 static_assert(Has<void (SelectCommand::*)()>(&SelectCommand::SelectAll));
 static_assert(Has<bool (SelectCommand::*)(const string&)>(&SelectCommand::AddField));
+static_assert(Has<bool (SelectCommand::*)(const string&)>(&SelectCommand::GroupBy));
+static_assert(Has<bool (SelectCommand::*)(const string&, SqliteOrder)>(&SelectCommand::OrderBy));
+static_assert(Has<void (SelectCommand::*)(std::uint64_t, std::uint64_t)>(&SelectCommand::Limit));
+static_assert(SqliteOrder::Ascending != SqliteOrder::Descending);
 
 // ------------------------------------------------------------------------------------- conditions
 
@@ -235,6 +239,9 @@ static_assert(std::is_constructible_v<SqliteCondition, string>);
 static_assert(Has<bool (SqliteCondition::*)() const>(&SqliteCondition::IsValid));
 static_assert(Has<const string& (SqliteCondition::*)() const>(&SqliteCondition::GetCondition));
 static_assert(TakesTwo<SqliteEqual, SqliteValue> && TakesTwo<SqliteNotEqual, SqliteValue>);
+static_assert(TakesTwo<SqliteLess, SqliteValue> && TakesTwo<SqliteLessEqual, SqliteValue>);
+static_assert(TakesTwo<SqliteGreater, SqliteValue> && TakesTwo<SqliteGreaterEqual, SqliteValue>);
+static_assert(TakesTwo<SqliteContains, string> && TakesTwo<SqliteBeginsWith, string>);
 static_assert(TakesTwo<SqliteAnd, string> && TakesTwo<SqliteOr, string>);
 static_assert(TakesTwo<SqliteIn, string> && TakesTwo<SqliteIn, std::vector<SqliteValue>>);
 static_assert(TakesTwo<SqliteNotIn, string> && TakesTwo<SqliteNotIn, std::vector<SqliteValue>>);

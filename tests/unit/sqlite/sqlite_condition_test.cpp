@@ -11,10 +11,16 @@
 namespace {
 
 using OrvaDRCore::SqliteAnd;
+using OrvaDRCore::SqliteBeginsWith;
 using OrvaDRCore::SqliteCondition;
+using OrvaDRCore::SqliteContains;
 using OrvaDRCore::SqliteEqual;
+using OrvaDRCore::SqliteGreater;
+using OrvaDRCore::SqliteGreaterEqual;
 using OrvaDRCore::SqliteIn;
 using OrvaDRCore::SqliteInFamily;
+using OrvaDRCore::SqliteLess;
+using OrvaDRCore::SqliteLessEqual;
 using OrvaDRCore::SqliteNotEqual;
 using OrvaDRCore::SqliteNotIn;
 using OrvaDRCore::SqliteOr;
@@ -30,6 +36,8 @@ constexpr bool ArePlain = (... && (std::is_polymorphic_v<Conditions> &&
                                    std::is_copy_assignable_v<Conditions>));
 static_assert(ArePlain<SqliteCondition, SqliteEqual, SqliteNotEqual, SqliteAnd, SqliteOr,
                        SqliteInFamily, SqliteIn, SqliteNotIn>);
+static_assert(ArePlain<SqliteLess, SqliteLessEqual, SqliteGreater, SqliteGreaterEqual,
+                       SqliteContains, SqliteBeginsWith>);
 
 static_assert(std::is_base_of_v<SqliteInFamily, SqliteIn>);
 static_assert(std::is_base_of_v<SqliteInFamily, SqliteNotIn>);
@@ -67,6 +75,12 @@ TEST_F(SqliteConditionTest, AnEmptyConditionIsNotValid)
     ExpectCondition(SqliteNotEqual(), false, "");
     ExpectCondition(SqliteAnd(), false, "");
     ExpectCondition(SqliteOr(), false, "");
+    ExpectCondition(SqliteLess(), false, "");
+    ExpectCondition(SqliteLessEqual(), false, "");
+    ExpectCondition(SqliteGreater(), false, "");
+    ExpectCondition(SqliteGreaterEqual(), false, "");
+    ExpectCondition(SqliteContains(), false, "");
+    ExpectCondition(SqliteBeginsWith(), false, "");
 }
 
 TEST_F(SqliteConditionTest, AFinishedTextIsTakenAsItIs)
@@ -92,6 +106,10 @@ TEST_F(SqliteConditionTest, AComparisonHasNoBlanks)
     ExpectCondition(SqliteNotEqual("state", 0), true, "state!=0");
     ExpectCondition(SqliteNotEqual("state", false), true, "state!=0");
     ExpectCondition(SqliteNotEqual("name", "abc"), true, "name!='abc'");
+    ExpectCondition(SqliteLess("id", 3), true, "id<3");
+    ExpectCondition(SqliteLessEqual("id", -3), true, "id<=-3");
+    ExpectCondition(SqliteGreater("id", 4000000000U), true, "id>4000000000");
+    ExpectCondition(SqliteGreaterEqual("name", "abc"), true, "name>='abc'");
 }
 
 TEST_F(SqliteConditionTest, AComparisonTakesEveryKind)
@@ -134,16 +152,21 @@ struct TypeNames {
     {
         if (std::is_same_v<T, SqliteEqual>) return "Equal";
         if (std::is_same_v<T, SqliteNotEqual>) return "NotEqual";
+        if (std::is_same_v<T, SqliteLess>) return "Less";
+        if (std::is_same_v<T, SqliteLessEqual>) return "LessEqual";
+        if (std::is_same_v<T, SqliteGreater>) return "Greater";
+        if (std::is_same_v<T, SqliteGreaterEqual>) return "GreaterEqual";
         if (std::is_same_v<T, SqliteAnd>) return "And";
         return "Or";
     }
 };
 
-// Tests of SqliteEqual and SqliteNotEqual; SqliteAnd and SqliteOr follow below.
+// Tests of the six comparisons; SqliteAnd and SqliteOr follow below.
 template <class Condition>
 class SqliteComparisonTest : public SqliteConditionTest {
 };
-using Comparisons = ::testing::Types<SqliteEqual, SqliteNotEqual>;
+using Comparisons = ::testing::Types<SqliteEqual, SqliteNotEqual, SqliteLess, SqliteLessEqual,
+                                     SqliteGreater, SqliteGreaterEqual>;
 TYPED_TEST_SUITE(SqliteComparisonTest, Comparisons, TypeNames);
 
 TYPED_TEST(SqliteComparisonTest, SettingReplacesTheText)
