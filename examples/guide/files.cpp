@@ -1,10 +1,10 @@
-// JSON documents by path and by descriptor, replacing a document atomically, and directories.
+// JSON documents by path and by descriptor, files replaced whole, and directories.
 #include <fcntl.h>
 #include <unistd.h>
 
-#include <cstdio>
 #include <cstdlib>
 #include <iostream>
+#include <map>
 #include <string>
 
 #include <json/value.h>
@@ -63,21 +63,21 @@ bool ReadPrivate(const std::string& path, Json::Value& session)
 }
 // [/descriptor]
 
-// [replace]
-// Readers see the old document or the new one, never a part. Only one process may write at a time.
-bool Replace(const std::string& path, const Json::Value& value)
+bool ReplaceFiles()
 {
-    const std::string next = path + ".new";
-    const int fd = ::open(next.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0644);
-    if (fd < 0) return false;
-    const int kept = ::fcntl(fd, F_DUPFD_CLOEXEC, 0);  // Write() closes the other one
-    const bool stored = File::Write(fd, value) && ::fsync(kept) == 0;
-    if (kept >= 0) ::close(kept);
-    if (stored && std::rename(next.c_str(), path.c_str()) == 0) return true;
-    ::unlink(next.c_str());
-    return false;
+    // [replace]
+    Json::Value settings;
+    settings["retries"] = 5;
+    if (!File::Replace("settings.json", settings)) return false;
+    if (!File::Replace("limits.conf", "timeout=30\nretries=5\n")) return false;
+    // [/replace]
+    std::map<std::string, int> limits;
+    Json::Value stored;
+    if (!File::Read("settings.json", stored) || File::Read("limits.conf", limits) != 2)
+        return false;
+    std::cout << "replaced: " << (stored == settings) << ' ' << limits["timeout"] << '\n';
+    return true;
 }
-// [/replace]
 
 bool UseDirectories()
 {
@@ -102,8 +102,6 @@ int main()
     if (!ReadPrivate("session.json", session) || ReadPrivate(".", session)) return EXIT_FAILURE;
     std::cout << "session: " << session.asString() << '\n';
 
-    if (!Replace("settings.json", Json::Value("all new"))) return EXIT_FAILURE;
-    if (!File::Read("settings.json", session)) return EXIT_FAILURE;
-    std::cout << "replaced: " << session.asString() << '\n';
+    if (!ReplaceFiles()) return EXIT_FAILURE;
     return UseDirectories() ? EXIT_SUCCESS : EXIT_FAILURE;
 }

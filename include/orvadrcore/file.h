@@ -1,5 +1,5 @@
 /// \file
-/// Files: whole JSON documents, directories, and files of "key=value" lines.
+/// Files: whole JSON documents and texts, directories, and files of "key=value" lines.
 /// \code
 ///     Json::Value settings;
 ///     if (!File::Read("/var/dr/settings.json", settings)) return false;
@@ -11,6 +11,7 @@
 #ifndef ORVADRCORE_FILE_H
 #define ORVADRCORE_FILE_H
 
+#include <cstddef>
 #include <map>
 #include <sstream>
 #include <string>
@@ -43,6 +44,21 @@ class ORVADRCORE_API File {
     /// As above, at the offset of a descriptor, without the newline. Truncates nothing. **Closes**
     /// the descriptor, unless it is not open for writing.
     static bool Write(int fd, const Json::Value& value);
+
+    // ------------------------------------------------------------------------- replacing as a whole
+
+    /// Replaces a file by one that holds the document, without a newline. It is written beside `path`,
+    /// flushed to disk and renamed: whoever opens `path` gets the old file or the new one, never a part,
+    /// also after a power cut. Any number of threads and processes may do so at once; the last one wins.
+    /// The new file belongs to this user. It has the old file's permission bits, or 0666 less the umask.
+    /// \return false, with an ERR line, when it cannot be written, or when Read() would refuse it:
+    ///         infinities, more than 1000 levels, 2 GiB. The old file is as it was then
+    /// \warning Replaces a symbolic link, a pipe or a device by a file, instead of writing through it.
+    static bool Replace(const std::string& path, const Json::Value& value);
+    /// As above, with the bytes of any text as they are: no newline is added, no length is refused.
+    static bool Replace(const std::string& path, const std::string& text);
+    static bool Replace(const std::string& path, const char* text);         ///< Refuses null (ERR).
+    static bool Replace(const std::string& path, std::nullptr_t) = delete;  // also catches 0
 
     // --------------------------------------------------------------------------------- directories
 

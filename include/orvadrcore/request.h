@@ -6,6 +6,8 @@
 ///     request.addParam("name", "backup");
 ///     request.toStr();    // "DR.Node/get/1"
 ///     request.toJson();   // {"api":"DR.Node","method":"get","name":"backup","version":1}
+///
+///     if (!Request::FromText(line, request) || !request.isValid()) { ... }
 /// \endcode
 ///
 /// A request holds and checks its parts; it sends nothing. Its JSON form is one flat object: the
@@ -45,6 +47,13 @@ class ORVADRCORE_API Request {
     Request(const Request&) = default;             ///< Copies every part.
     Request& operator=(const Request&) = default;  ///< Copies every part.
     virtual ~Request();
+
+    /// Reads a request from a text that is one JSON object and nothing else: no comments, nothing
+    /// after the object but blanks, at most 1000 levels. If a key occurs twice, the later value counts.
+    /// Nothing stays of what `request` was: it becomes Request(object), whatever the object lacks.
+    /// \return false, with `request` unchanged, for any other text. True says nothing about the
+    ///         members: ask isValid()
+    static bool FromText(const std::string& text, Request& request);
 
     /// Reads the JSON form. "api" and "method" must be strings, "version" an integer; everything
     /// else becomes the parameters, including a reserved key of the wrong type. A part whose key is

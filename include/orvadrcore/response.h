@@ -1,7 +1,9 @@
 /// \file
-/// The reply to one web-API call.
+/// The reply to one web-API call: made by the handler, read by the caller.
 ///
 /// \code
+///     return Response(Response::Success(data)).toLine();   // {"data":{"id":"n1"},"success":true}
+///
 ///     const Response response(text);
 ///     if (!response.isSuccess()) return response.getErrCode();
 ///     const std::string id = response.getDataFieldtoStr("id");
@@ -55,7 +57,24 @@ class ORVADRCORE_API Response {
     /// Empties the reply: an object or array keeps its type, anything else becomes null.
     void clear();
 
+    // --------------------------------------------------------------------------------- new replies
+
+    /// The reply of a handler that has done its work: {"success":true,"data":data}. Null data is left
+    /// out: hasData() is false then.
+    static Json::Value Success(const Json::Value& data = Json::Value());
+
+    /// The reply of a handler that has failed: {"success":false,"error":{"code":code,"errors":errors}}.
+    /// Null errors are left out.
+    /// \param code  one of `errors.h`, such as SqliteDB::GetErrCode()
+    /// \param errors  what else is known, of any type, such as SqliteDB::GetErr()
+    static Json::Value Failure(int code, const Json::Value& errors = Json::Value());
+
     // --------------------------------------------------------------------------------- whole reply
+
+    /// The reply as JSON on one line, without a newline at its end; "null" for a null reply. Line ends
+    /// in its strings are escaped, other bytes are written as they are.
+    /// \warning Also writes what setResp() refuses: infinities, and more than 1000 levels.
+    std::string toLine() const;
 
     const Json::Value& getResp() const { return resp_; }
 

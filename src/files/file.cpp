@@ -16,6 +16,7 @@
 #include "base/file_io.h"
 #include "base/json_helpers.h"
 #include "base/log.h"
+#include "base/replace_file.h"
 
 namespace OrvaDRCore {
 
@@ -88,6 +89,20 @@ bool RunProgram(const char* path, const char* argument1, const char* argument2,
 bool IsDirectory(const std::string& path)
 {
     return CoreLibFileCheckDir(path.c_str()) == 1;
+}
+
+bool ReplaceWith(const std::string& path, const std::string& text)
+{
+    constexpr const char* Function = "Replace";
+    if (path.empty()) {
+        DR_LOG_AS(Function, Err, "Empty path to write.");
+        return false;
+    }
+    if (!ReplaceFile(path, text)) {
+        DR_LOG_AS(Function, Err, "Failed to replace [%s], errno=[%m]", path.c_str());
+        return false;
+    }
+    return true;
 }
 
 struct CloseStream {
@@ -190,6 +205,31 @@ bool File::Write(int fd, const Json::Value& value)
     const bool written = std::fprintf(stream.get(), "%s", text.c_str()) >= 0;
     if (!written) DR_LOG(Err, "Failed to write [%s] to fd[%d]", text.c_str(), fd);
     return written;
+}
+
+bool File::Replace(const std::string& path, const Json::Value& value)
+{
+    // What Read() would refuse must not take the place of a good file.
+    const std::string text = IsReadable(value) ? toString(value) : std::string();
+    if (text.empty() || !FitsJsonText(text.size())) {
+        DR_LOG(Err, "Value for [%s] cannot be read back", path.c_str());
+        return false;
+    }
+    return ReplaceWith(path, text);
+}
+
+bool File::Replace(const std::string& path, const std::string& text)
+{
+    return ReplaceWith(path, text);
+}
+
+bool File::Replace(const std::string& path, const char* text)
+{
+    if (text == nullptr) {
+        DR_LOG(Err, "Null text for [%s]", path.c_str());
+        return false;
+    }
+    return ReplaceWith(path, text);
 }
 
 bool File::CreateDir(const std::string& path, int mode)

@@ -36,6 +36,21 @@ Request::Request(const Json::Value& request)
 
 Request::~Request() = default;
 
+bool Request::FromText(const std::string& text, Request& request)
+{
+    Json::Value document;
+    if (!fromString(document, text) || !document.isObject()) return false;
+    Request read(document);
+    // From here on nothing can fail.
+    request.clear();
+    request.encryptRequired_ = false;
+    request.version_ = read.version_;
+    request.api_.swap(read.api_);
+    request.method_.swap(read.method_);
+    request.params_.swap(read.params_);
+    return true;
+}
+
 void Request::setRequest(const Json::Value& request)
 {
     params_ = request;

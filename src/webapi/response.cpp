@@ -41,6 +41,28 @@ void Response::clear()
     Clear(resp_);
 }
 
+Json::Value Response::Success(const Json::Value& data)
+{
+    Json::Value reply(Json::objectValue);
+    reply["success"] = true;
+    if (!data.isNull()) reply["data"] = data;
+    return reply;
+}
+
+Json::Value Response::Failure(int code, const Json::Value& errors)
+{
+    Json::Value reply(Json::objectValue);
+    reply["success"] = false;
+    reply["error"]["code"] = code;
+    if (!errors.isNull()) reply["error"]["errors"] = errors;
+    return reply;
+}
+
+std::string Response::toLine() const
+{
+    return toString(resp_);
+}
+
 bool Response::isValid() const
 {
     return hasField("success");

@@ -211,3 +211,32 @@ TEST(EnvelopeFaults, GettersOfAReply)
         EXPECT_EQ(refusal.getErrCode(), 507);
     });
 }
+
+TEST(EnvelopeFaults, RequestFromText)
+{
+    EveryCallFails("Request::FromText", [] {
+        const std::string old = R"({"api":"an API with a long name","method":"get","version":1})";
+        const std::string text = R"({"api":"another API of some length","name":"x","version":2})";
+        Request request{Json::Value()};
+        EXPECT_TRUE(Request::FromText(old, request));
+        request.setEncryptRequired(true);
+        const Outcome outcome = WithFault([&] { return Request::FromText(text, request); });
+        EXPECT_EQ(request.toStr(), outcome.succeeded ? "another API of some length//2"
+                                                     : "an API with a long name/get/1");
+        EXPECT_EQ(request.isEncryptRequired(), !outcome.succeeded);
+        EXPECT_TRUE(Request::FromText(text, request));
+        EXPECT_EQ(request.getParams()["name"].asString(), "x");
+    });
+}
+
+TEST(EnvelopeFaults, NewReplies)
+{
+    EveryCallFails("Response::Success and Failure", [] {
+        const Json::Value data(R"(a text with a "name" of its own)");
+        ExpectText(R"({"data":"a text with a \"name\" of its own","success":true})",
+                   [&] { return Response(Response::Success(data)).toLine(); });
+        ExpectText(
+            R"({"error":{"code":507,"errors":"a text with a \"name\" of its own"},"success":false})",
+            [&] { return Response(Response::Failure(507, data)).toLine(); });
+    });
+}

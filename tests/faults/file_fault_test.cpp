@@ -150,6 +150,30 @@ TEST(FileFaults, WriteByDescriptor)
     });
 }
 
+// Replaces the file with a fault and again without. Afterwards it is the old or the new one, with
+// nothing beside it.
+template <class Content>
+void ExpectReplaced(const Content& content)
+{
+    const Place place(Old);
+    const Outcome outcome = WithFault([&] { return File::Replace(place.path, content); });
+    outcome.ExpectLogged();
+    EXPECT_EQ(ReadFile(place.path), outcome.succeeded ? New : Old);
+    EXPECT_TRUE(File::Replace(place.path, content));
+    EXPECT_EQ(ReadFile(place.path), New);
+    EXPECT_EQ(NamesIn(place.dir.Path()).size(), 1U) << "a temporary file is left";
+}
+
+TEST(FileFaults, ReplaceByDocument)
+{
+    EveryCallFails("File::Replace(value)", [] { ExpectReplaced(Document(New)); });
+}
+
+TEST(FileFaults, ReplaceByText)
+{
+    EveryCallFails("File::Replace(text)", [] { ExpectReplaced(New); });
+}
+
 TEST(FileFaults, ReadPairs)
 {
     EveryCallFails("File::Read(map)", [] {
