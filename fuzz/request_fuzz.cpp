@@ -85,6 +85,22 @@ void CheckAdding(Request request, const Json::Value& added)
            "cleared parameters keep their type");
 }
 
+void CheckText(const std::string& text)
+{
+    Json::Value document;
+    const bool isObject = OrvaDRCore::fromString(document, text) && document.isObject();
+    Request request("api", 1, "method", Json::Value("old"));
+    request.setEncryptRequired(true);
+    Expect(Request::FromText(text, request) == isObject, "a text is one JSON object");
+    if (isObject) {
+        CheckParts(request, document);
+    } else {
+        Expect(request.toStr() == "api/method/1" && request.getParams() == "old" &&
+                   request.isEncryptRequired(),
+               "a refusal changes nothing");
+    }
+}
+
 }  // namespace
 
 void Fuzz(const std::string& input)
@@ -95,4 +111,6 @@ void Fuzz(const std::string& input)
     CheckParts(request, document);
     CheckWhole(request);
     CheckAdding(request, Parse(input.substr(end)));
+    CheckText(input.substr(0, end));
+    CheckText(input);
 }

@@ -102,6 +102,11 @@ void Fuzz(const std::string& input)
     Expect(response.setResp(input) == parses, "a reply is one JSON document");
     Check(response, reply);
     Check(Response(input), reply);
+    Expect(Response(response.toLine()).getResp() == reply, "its line is read back");
+    const Response success(Response::Success(reply));
+    Expect(success.isSuccess() && success.getData() == reply, "a success has its data");
+    const Response failure(Response::Failure(507, reply));
+    Expect(failure.getErrCode() == 507 && failure.getErrMsg() == reply, "a failure has its errors");
     response.clear();
     Expect(response.getResp().empty() && !response.isValid(), "a cleared reply is none");
 }

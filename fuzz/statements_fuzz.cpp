@@ -264,6 +264,47 @@ void CheckConditions(const Statements& statements, std::size_t rows)
     }
 }
 
+// A text matches itself, whatever wildcards and quotes it holds.
+void CheckPatterns(const Statements& statements)
+{
+    for (const auto& [name, field] : statements.fields) {
+        const auto* text = std::get_if<std::string>(&field.value);
+        if (text == nullptr) continue;
+        const SqliteContains contains(name, *text);
+        const SqliteBeginsWith begins(name, *text);
+        const Tokens tokens = Tokenize(contains.GetCondition());
+        Expect(tokens.size() == 5 && tokens[0] == name && tokens[1] == "LIKE" &&
+                   tokens[3] == "ESCAPE" && tokens[4] == "'\\'",
+               "a pattern is one literal");
+        Expect(Rows(statements.Select(contains)).size() == 1, "a text contains itself");
+        Expect(Rows(statements.Select(begins)).size() == 1, "a text begins with itself");
+    }
+}
+
+void CheckOrders(const Statements& statements)
+{
+    SelectCommand select;
+    select.SetTable(statements.table);
+    Tokens keys;
+    for (const auto& entry : statements.fields) {
+        select.AddField(entry.first);
+        Expect(select.GroupBy(entry.first) && select.OrderBy(entry.first, SqliteOrder::Descending),
+               "a name is taken");
+        Append(keys, keys.empty() ? Tokens() : Tokens{","});
+        Append(keys, {entry.first, "DESC"});
+    }
+    select.Limit(1);
+    const Tokens names = Names(statements.fields);
+    CheckTokens(select.GetCommand(), {{"SELECT"},
+                                      names,
+                                      {"FROM", statements.table.GetName(), "GROUP", "BY"},
+                                      names,
+                                      {"ORDER", "BY"},
+                                      keys,
+                                      {"LIMIT", "1"}});
+    Expect(Rows(select.GetCommand()).size() == 1, "one row is one group");
+}
+
 void CheckRuns(const Statements& statements)
 {
     const Fields& fields = statements.fields;
@@ -273,6 +314,8 @@ void CheckRuns(const Statements& statements)
     Expect(Rows(statements.Select(AllEqual(fields))) == std::vector<std::vector<Stored>>{row},
            "what was inserted is selected");
     CheckConditions(statements, 1);
+    CheckPatterns(statements);
+    CheckOrders(statements);
 
     const Field& last = fields.rbegin()->second;
     Run(statements.Update(AllEqual(fields), last));

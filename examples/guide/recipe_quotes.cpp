@@ -10,7 +10,9 @@
 
 using OrvaDRCore::InsertCommand;
 using OrvaDRCore::SelectCommand;
+using OrvaDRCore::SqliteBeginsWith;
 using OrvaDRCore::SqliteCondition;
+using OrvaDRCore::SqliteContains;
 using OrvaDRCore::SqliteDB;
 using OrvaDRCore::SqliteEqual;
 using OrvaDRCore::SqliteIn;
@@ -19,19 +21,6 @@ using OrvaDRCore::SqliteValue;
 using OrvaDRCore::SqliteValueList;
 
 namespace {
-
-// [like]
-// The condition that a column begins with `prefix`, in which wildcards are ordinary characters.
-SqliteCondition BeginsWith(const std::string& column, const std::string& prefix)
-{
-    std::string pattern;
-    for (const char character : prefix) {
-        if (character == '%' || character == '_' || character == '\\') pattern += '\\';
-        pattern += character;
-    }
-    return {column + " LIKE '" + SqliteValue::EscapeText(pattern) + "%' ESCAPE '\\'"};
-}
-// [/like]
 
 bool Print(SqliteDB& db, const SqliteTableHandler& table, const SqliteCondition& condition)
 {
@@ -65,7 +54,12 @@ int main()
     for (const std::string& name : wanted) literals.emplace_back(SqliteValue::EscapeText(name));
     const SqliteIn both("name", literals);
     // [/conditions]
+
+    // [like]
+    const SqliteBeginsWith begins("name", "50%");
+    const SqliteContains contains("name", "'");
+    // [/like]
     const bool isPrinted = Print(db, nodes, first) && Print(db, nodes, both) &&
-                           Print(db, nodes, BeginsWith("name", "50%"));
+                           Print(db, nodes, begins) && Print(db, nodes, contains);
     return isPrinted ? EXIT_SUCCESS : EXIT_FAILURE;
 }

@@ -352,6 +352,7 @@ static_assert(Has<bool (Request::*)(const Json::Value&)>(&Request::addParam));
 static_assert(Has<bool (Request::*)() const>(&Request::isValid));
 static_assert(Has<Json::Value (Request::*)() const>(&Request::toJson));
 static_assert(Has<string (Request::*)() const>(&Request::toStr));
+static_assert(Has<bool (*)(const string&, Request&)>(&Request::FromText));
 
 static_assert(IsPlainValue<Response>);
 static_assert(std::has_virtual_destructor_v<Response>);
@@ -362,6 +363,9 @@ static_assert(Has<bool (Response::*)(const string&)>(&Response::setResp));
 static_assert(Has<bool (Response::*)(const char*)>(&Response::setResp));
 static_assert(Has<void (Response::*)(const Json::Value&)>(&Response::setResp));
 static_assert(Has<void (Response::*)()>(&Response::clear));
+static_assert(Has<Json::Value (*)(const Json::Value&)>(&Response::Success));
+static_assert(Has<Json::Value (*)(int, const Json::Value&)>(&Response::Failure));
+static_assert(Has<string (Response::*)() const>(&Response::toLine));
 static_assert(Has<const Json::Value& (Response::*)() const>(&Response::getResp));
 static_assert(Has<bool (Response::*)() const>(&Response::isValid));
 static_assert(Has<bool (Response::*)() const>(&Response::isSuccess));
