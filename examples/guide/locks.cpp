@@ -1,9 +1,12 @@
-// Named locks: exclusive, shared, with retries, across a fork and between threads. Needs root.
+// Named locks: exclusive, shared, with retries, across a fork and between threads. Needs root. A lock in
+// a directory of its own, which does not.
 #include <sys/wait.h>
 #include <unistd.h>
 
 #include <atomic>
+#include <chrono>
 #include <cstdlib>
+#include <filesystem>
 #include <iostream>
 #include <string>
 #include <thread>
@@ -11,6 +14,7 @@
 #include <orvadrcore/file_lock.h>
 
 using OrvaDRCore::FileLock;
+using OrvaDRCore::FileLockState;
 
 namespace {
 
@@ -24,6 +28,21 @@ bool ChangeRegistry(const std::string& name)
     return true;  // the lock object's destructor frees the lock
 }
 // [/alone]
+
+// [own]
+// Any user can call this with a directory that it may write to.
+bool ChangeNotes(const std::string& dir)
+{
+    FileLock lock("notes", dir);
+    switch (lock.acquire(LOCK_EX, std::chrono::milliseconds(500))) {
+        case FileLockState::Taken: break;
+        case FileLockState::Held: std::cout << "somebody else changes them\n"; return false;
+        case FileLockState::Failed: return false;  // the log says why
+    }
+    std::cout << "notes changed\n";
+    return true;
+}
+// [/own]
 
 bool Share(const std::string& name)
 {
@@ -84,7 +103,8 @@ int main()
 {
     const std::string name = "guide." + std::to_string(::getpid());
     std::cout << std::boolalpha;
-    bool done = ChangeRegistry(name) && Share(name) && LockInChild(name);
+    bool done = ChangeRegistry(name) && ChangeNotes(std::filesystem::current_path() / "locks") &&
+                Share(name) && LockInChild(name);
     std::cout << "counted: " << CountInTwoThreads(name) << '\n';
 
     FileLock mine(name);
