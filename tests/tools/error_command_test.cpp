@@ -65,7 +65,7 @@ TEST(ErrorCommandTest, TellsThatThereIsNoSuchCode)
 
 TEST(ErrorCommandTest, TellsThatThereIsNoSuchName)
 {
-    for (const char* name : {"ERR_NODE", "", "404x", "99999999999999999999", "[404]", "\x1b[31m"}) {
+    for (const char* name : {"ERR_NODE", "404x", "99999999999999999999", "[404]", "\x1b[31m"}) {
         const Answer answer = Ask({"error", name, "404"});
         EXPECT_EQ(answer.code, NotWell) << name;
         ASSERT_EQ(answer.objects.size(), 2U) << name;
@@ -88,7 +88,8 @@ TEST(ErrorCommandTest, ShowsWhatIsUnknownInTheTable)
 
 TEST(CommandLineTest, RefusesWrongUsage)
 {
-    const std::vector<Words> lines{{}, {"no-such-command"}, {"--json"}, {"error", "--no-such"}};
+    const std::vector<Words> lines{
+        {}, {"no-such-command"}, {"--json"}, {"error", "--no-such"}, {"error", ""}};
     for (const Words& line : lines) {
         const ProgramResult result = RunOrvadr(line);
         EXPECT_EQ(result.code, WrongUsage);

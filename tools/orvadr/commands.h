@@ -12,6 +12,9 @@ namespace Orvadr {
 // Error codes by number or name; all of them without any.
 Report ReportErrors(const std::vector<std::string>& codesOrNames);
 
+// Lock files by name, and who holds them; all of them without any.
+Report ReportLocks(const std::vector<std::string>& names);
+
 }  // namespace Orvadr
 
 #endif

@@ -5,6 +5,7 @@
 #include <clocale>
 #include <cstdlib>
 #include <functional>
+#include <iostream>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -41,6 +42,9 @@ struct Command {
 std::vector<Command> Commands()
 {
     return {
+        {"lock", "Show who holds locks. Code 1 when one of those named is held.", "NAME",
+         "as programs name it, below /tmp/.orvadr_lock; all lock files without any", false,
+         Orvadr::ReportLocks},
         {"error", "Show what error codes mean. Code 1 for one that there is not.", "CODE|NAME",
          "such as 404 or ERR_NODE_EXIST; all of them without any", false, Orvadr::ReportErrors},
     };
@@ -97,6 +101,10 @@ ExitCode Run(int argc, const char* const* argv)
         return app.exit(error) == 0 ? ExitCode::AllWell : ExitCode::WrongUsage;
     }
     Unmark(words);
+    if (std::find(words.begin(), words.end(), "") != words.end()) {
+        std::cerr << "An empty name names nothing\nRun with --help for more information.\n";
+        return ExitCode::WrongUsage;
+    }
     const auto command = std::find_if(commands.begin(), commands.end(), [&](const Command& each) {
         return app.got_subcommand(each.name);
     });

@@ -4,6 +4,7 @@
 #include <linux/capability.h>
 #include <sched.h>
 #include <sys/mount.h>
+#include <sys/prctl.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
 #include <unistd.h>
@@ -53,6 +54,10 @@ bool BecomeRoot()
 
 bool LoseRights()
 {
+    // Programs that root of a user namespace starts would get the capabilities again.
+    for (unsigned long capability = 0; capability <= CAP_LAST_CAP; ++capability) {
+        (void)::prctl(PR_CAPBSET_DROP, capability, 0, 0, 0);
+    }
     // A user namespace has no other user to become.
     const bool changed = ::setgroups(0, nullptr) == 0 && ::setresgid(Nobody, Nobody, Nobody) == 0 &&
                          ::setresuid(Nobody, Nobody, Nobody) == 0;

@@ -13,7 +13,8 @@ constexpr uid_t Nobody = 65534;
 // namespace with its own lock directory. False when the kernel does not allow that.
 bool BecomeRoot();
 
-// Makes this process the ordinary user, without a way back. False when that fails.
+// Makes this process and the programs that it starts an ordinary user's, without a way back. False when
+// that fails.
 bool LoseRights();
 
 // Mounts a file system of `bytes` bytes on a directory, visible to this process and its children
