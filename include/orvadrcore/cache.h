@@ -8,18 +8,21 @@
 ///         bool GetUpdatedData(Json::Value& data) const override { return AskAllNodes(data); }
 ///         bool IsValidData(const Json::Value& data) const override { return data.isObject(); }
 ///     };
-///     const Json::Value status = NodeStatus().Read();
+///     Json::Value status;
+///     if (NodeStatus().ReadWithin(std::chrono::seconds(5), status) == CacheState::None) return false;
 /// \endcode
-/// An object is for one thread at a time. Nothing throws unless memory runs out or a subclass does.
-/// docs/cache.md has the protocol between the processes, the files and the log lines.
-/// \warning A refresh may run in a forked child: GetUpdatedData(), GetInfo() and IsValidData() must
+/// An object is for one thread at a time: give each thread its own, for the same file. Nothing throws
+/// unless memory runs out or a subclass does. docs/cache.md says which read to use, what to expect of
+/// many callers at once, and has the files and the log lines.
+/// \warning A refresh of Read() may run in a forked child: GetUpdatedData(), GetInfo() and IsValidData() must
 ///          not use the caller's SqliteDB, sockets or locks, nor a mutex of other threads. What they
 ///          throw there is lost, and no destructor or exit handler runs.
-/// \warning Run caches as root. If the lock file cannot be opened, it looks as if another process were
-///          refreshing: a caller that must wait then waits for ever.
+/// \warning Without a lock directory of its own a cache is for root. If the lock file cannot be opened, it
+///          looks to Read() as if another process were refreshing: one that must wait waits for ever.
 #ifndef ORVADRCORE_CACHE_H
 #define ORVADRCORE_CACHE_H
 
+#include <chrono>
 #include <memory>
 #include <string>
 
@@ -29,15 +32,28 @@
 
 namespace OrvaDRCore {
 
+/// What Cache::ReadWithin() returns.
+enum class CacheState {
+    Fresh,  ///< valid data that is not too old and needs no refresh, or that was just produced
+    Stale,  ///< valid data, but nothing fresh in time
+    None    ///< no valid data: the default value
+};
+
 /// A cache of one value; a subclass says which. The order of the virtual operations is part of the ABI.
 class ORVADRCORE_API Cache {
   public:
-    /// The file is `dir`/`file`.cached. A refresh makes up to `retries` + 2 attempts to produce data
+    /// The file is `dir`/`file`.cached; `dir` must be absolute, and is made if missing. A refresh makes up to `retries` + 2 attempts to produce data
     /// and to write it, or one if `retries` is negative.
     /// \warning If `dir` cannot be made (ERR), or one of the names is empty (WARN), the file is
     ///          /tmp/default_dr_cache, which all such caches share.
     Cache(const std::string& dir, const std::string& file, long timeoutSeconds,
           bool updatedRequired, int retries);
+
+    /// For any user who may write to `dir` and `lockDir`, an absolute path that is made with mode 0700 if
+    /// missing: lock and pid file are there, with 0600. All users of the file must name the same one.
+    /// Caches with the same `file` in different `dir` need different ones. Empty: as without it.
+    Cache(const std::string& dir, const std::string& file, long timeoutSeconds,
+          bool updatedRequired, int retries, const std::string& lockDir);
 
     Cache(const Cache& other);             ///< shares the file, and copies what is in memory
     Cache& operator=(const Cache& other);  ///< likewise
@@ -55,24 +71,37 @@ class ORVADRCORE_API Cache {
     virtual bool IsValidData(const Json::Value& data) const = 0;
     /// Whether valid data that is not too old needs a refresh all the same; false by default.
     virtual bool IsNeedUpdate(const Json::Value& data) const;
-    /// Whether the caller refreshes by itself, or waits for whoever does, instead of using old data.
-    /// By default when the constructor was told so or the cached data is not valid.
+    /// Whether Read() refreshes in the caller, or waits for another process that does, instead of using
+    /// old data: by default when the constructor was told so or the cached data is not valid. Called in
+    /// the caller before each refresh, also by ReadWithin(), which ignores the result.
     virtual bool IsUpdatedDataRequired() const;
 
     // ------------------------------------------------------------------------------------- reading
 
-    /// The data, after a refresh if it is too old, invalid or needs one. Old data, or the default
-    /// value, when the refresh failed or runs in the background.
+    /// The data, after a refresh if it is too old, invalid or needs one. Old data, or the default value
+    /// (null), when the refresh runs in the background or failed, when it could not be stored, and when
+    /// another process began it a moment earlier. Takes as long as that process, and seconds more while
+    /// others hold the lock.
     Json::Value Read() const;
     /// As Read(), without a copy. The reference, like the one that IsValidData() and IsNeedUpdate()
     /// get meanwhile, is good until the next operation on the object.
     const Json::Value& View() const;
+    /// Fresh data at once if there is some. Otherwise refreshes it here, never in a child, or waits for
+    /// the thread or process that does, looking every few milliseconds. When `patience` is over, old data
+    /// or the default value; only a GetUpdatedData() that has begun is not interrupted. With 0 or less it
+    /// waits for nobody, but refreshes if nobody else does.
+    ///
+    /// Of all that wait one produces, in its attempts with short pauses; if they fail, the next one. Data
+    /// that could not be stored, or was produced without the lock, is Fresh all the same (WARN).
+    CacheState ReadWithin(std::chrono::milliseconds patience, Json::Value& data) const;
     /// The data without a refresh. The file is read only when its modification time has changed.
     Json::Value GetCachedData() const;
     /// Reads the file into memory. On failure, and if the file holds no data, that stays as it was.
     bool Load() const;
     /// Whether the file is older than the time-out, in whole seconds, or missing.
     bool IsTimeout() const;
+    /// The cache file.
+    const std::string& GetPath() const;
     /// The longest refresh on record, in seconds.
     int GetMaxUpdateTime() const;
     /// Deletes the file; -1 with errno set on failure. What is in memory stays.
@@ -80,9 +109,9 @@ class ORVADRCORE_API Cache {
 
     // ---------------------------------------------------------------------------------- refreshing
 
-    /// Refreshes data of any age: here, in a child, or by waiting for another process. True after
-    /// starting a child or waiting, whatever comes of it. False when the refresh here failed, another
-    /// process was faster, or no child could be forked (WARN).
+    /// Refreshes data of any age: here, in a child, or by waiting for another process that was seen
+    /// refreshing. True after starting a child or waiting, whatever comes of it. False when the refresh
+    /// here failed, another process was faster (it is not waited for), or no child could be forked (WARN).
     bool Update() const;
     /// Produces and writes data without a lock or a mark.
     bool DoUpdate() const;

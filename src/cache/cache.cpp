@@ -14,11 +14,12 @@
 
 #include "base/json_helpers.h"
 #include "base/log.h"
-#include "base/retry.h"
 #include "base/scope_guard.h"
+#include "cache/attempts.h"
 #include "cache/cache_file.h"
 #include "cache/freshness.h"
 #include "cache/updater_mark.h"
+#include "common/deadline.h"
 
 namespace OrvaDRCore {
 
@@ -27,14 +28,6 @@ namespace {
 constexpr const char* DefaultPath = "/tmp/default_dr_cache";
 constexpr int CacheDirMode = 0755;
 constexpr int DetachedFork = 0x40;
-
-struct PauseMSec {
-    unsigned int min;
-    unsigned int max;
-    void operator()() const { RandomSleepInMSec(min, max); }
-};
-constexpr PauseMSec ProducePause{500, 1000};
-constexpr PauseMSec WritePause{300, 1000};
 
 std::string GetCachedPath(const std::string& dir, const std::string& file)
 {
@@ -55,19 +48,14 @@ std::string TextForLine(const Json::Value& value)
     return NestsAtMost(value, 5 * MaxLevels) ? toString(value) : "(nested too deep)";
 }
 
-// What Retry() takes as its limit: one more than a cache's own, and 0 when that is negative.
-std::uint64_t RetryLimitOf(int limit)
-{
-    return limit < 0 ? 0 : static_cast<std::uint64_t>(limit) + 1;
-}
-
 }  // namespace
 
 // The state, and the steps that only Cache calls.
 struct Cache::Impl {
-    Impl(const std::string& path, long timeoutSeconds, bool updatedRequired, int retries)
+    Impl(const std::string& path, long timeoutSeconds, bool updatedRequired, int retries,
+         const std::string& lockDir)
         : file(path),
-          mark(path),
+          mark(path, lockDir),
           timeout(timeoutSeconds),
           updatedDataRequired(updatedRequired),
           retryLimit(retries)
@@ -86,12 +74,24 @@ struct Cache::Impl {
     bool Refresh(const Cache& cache) const;
     void Unmark(const Cache& cache) const noexcept;
     [[noreturn]] void RefreshInChild(const Cache& cache) const;
+
+    bool Produce(const Cache& cache, Json::Value& data, const Pause& pause) const;
+    bool Store(const Cache& cache, const Json::Value& data, long begin, long finish,
+               const Pause& pause);
+    bool RefreshWithin(const Cache& cache, const Deadline& deadline, bool isMarked,
+                       Json::Value& data);
 };
 
 Cache::Cache(const std::string& dir, const std::string& file, long timeoutSeconds,
              bool updatedRequired, int retries)
+    : Cache(dir, file, timeoutSeconds, updatedRequired, retries, "")
+{
+}
+
+Cache::Cache(const std::string& dir, const std::string& file, long timeoutSeconds,
+             bool updatedRequired, int retries, const std::string& lockDir)
     : impl_(std::make_unique<Impl>(GetCachedPath(dir, file), timeoutSeconds, updatedRequired,
-                                   retries))
+                                   retries, lockDir))
 {
 }
 
@@ -135,6 +135,26 @@ const Json::Value& Cache::View() const
     const Json::Value& data = impl_->LoadedData(*this, modifyTime);
     const bool isRefreshed = impl_->RefreshIfStale(*this, __func__, data, modifyTime);
     return isRefreshed ? impl_->LoadedData(*this, modifyTime) : impl_->file.GetData();
+}
+
+CacheState Cache::ReadWithin(std::chrono::milliseconds patience, Json::Value& data) const
+{
+    const Deadline deadline(patience);
+    FreshnessWatch watch(*this, impl_->file, impl_->timeout);
+    const auto isFresh = [&] { return watch.Look() == CacheState::Fresh; };
+    const UpdaterMark::Claim claim = impl_->mark.ClaimWithin(deadline, isFresh);
+    const bool isMarked = claim == UpdaterMark::Claim::Marked;
+    if (isMarked || claim == UpdaterMark::Claim::Unmarked) {
+        if (impl_->RefreshWithin(*this, deadline, isMarked, data)) return CacheState::Fresh;
+    }
+    const CacheState state = watch.Look();
+    data = state == CacheState::None ? GetDefaultValue() : impl_->file.GetData();
+    return state;
+}
+
+const std::string& Cache::GetPath() const
+{
+    return impl_->file.GetPath();
 }
 
 Json::Value Cache::GetCachedData() const
@@ -198,40 +218,13 @@ bool Cache::DoUpdate() const
 {
     const long begin = std::time(nullptr);
     Json::Value data;
-    const auto produce = [&] {
-        data = Json::Value();
-        return GetUpdatedData(data);
-    };
-    const int limit = impl_->retryLimit;
-    if (!Retry(RetryLimitOf(limit), produce, ProducePause).succeeded) {
-        DR_LOG(Debug, "Failed to get updated cache [%s] and reach the retry limit[%d]",
-               toString(GetInfo()).c_str(), limit);
-        return false;
-    }
-    return UpdateWithData(data, begin, std::time(nullptr));
+    return impl_->Produce(*this, data, PauseBeforeProducing) &&
+           UpdateWithData(data, begin, std::time(nullptr));
 }
 
 bool Cache::UpdateWithData(const Json::Value& data, long begin, long finish) const
 {
-    const bool isValid = IsValidData(data);
-    Json::Value info = GetInfo();
-    if (!isValid || !IsStorable(data) || !IsStorable(info)) {
-        DR_LOG(Debug, "[%s] is not valid to update for cache [%s]", TextForLine(data).c_str(),
-               TextForLine(info).c_str());
-        return false;
-    }
-    CacheFile& file = impl_->file;
-    const int limit = impl_->retryLimit;
-    CacheDocument document = file.Compose({impl_->timeout, std::move(info), data, begin, finish});
-    const auto write = [&] { return file.Write(document); };
-    // A document that is too long could not be loaded again.
-    if (!FitsJsonText(document.text.size()) ||
-        !Retry(RetryLimitOf(limit), write, WritePause).succeeded) {
-        DR_LOG(Debug, "Failed to write cache to file [%s] and reach retry limit[%d]",
-               file.GetPath().c_str(), limit);
-        return false;
-    }
-    return true;
+    return impl_->Store(*this, data, begin, finish, PauseBeforeWriting);
 }
 
 bool Cache::UpdateWithData(const Json::Value& data) const
@@ -251,7 +244,7 @@ bool Cache::SetUpdating() const
     const char* const path = impl_->file.GetPath().c_str();
     MarkLock lock(mark);
     if (!lock.LockExclusive()) {
-        DR_LOG(Debug, "Failed to lock [%s]", FileLock::getLockFilePath(mark.GetLockName()).c_str());
+        DR_LOG(Debug, "Failed to lock [%s]", mark.GetLockPath().c_str());
         return false;
     }
     if (mark.IsOfLivingProcess()) {
@@ -315,6 +308,65 @@ bool Cache::Impl::Refresh(const Cache& cache) const
     if (cache.IsUpdating() || !cache.SetUpdating()) return false;
     const ScopeGuard unmark([&] { Unmark(cache); });  // the subclass may throw
     return cache.DoUpdate();
+}
+
+bool Cache::Impl::Produce(const Cache& cache, Json::Value& data, const Pause& pause) const
+{
+    const auto produce = [&] {
+        data = Json::Value();
+        return cache.GetUpdatedData(data);
+    };
+    if (RetryAttempts(retryLimit, produce, pause)) return true;
+    DR_LOG_AS("DoUpdate", Debug, "Failed to get updated cache [%s] and reach the retry limit[%d]",
+              toString(cache.GetInfo()).c_str(), retryLimit);
+    return false;
+}
+
+bool Cache::Impl::Store(const Cache& cache, const Json::Value& data, long begin, long finish,
+                        const Pause& pause)
+{
+    constexpr const char* Function = "UpdateWithData";
+    const bool isValid = cache.IsValidData(data);
+    Json::Value info = cache.GetInfo();
+    if (!isValid || !IsStorable(data) || !IsStorable(info)) {
+        DR_LOG_AS(Function, Debug, "[%s] is not valid to update for cache [%s]",
+                  TextForLine(data).c_str(), TextForLine(info).c_str());
+        return false;
+    }
+    CacheDocument document = file.Compose({timeout, std::move(info), data, begin, finish});
+    const auto write = [&] { return file.Write(document); };
+    // A document that is too long could not be loaded again.
+    if (FitsJsonText(document.text.size()) && RetryAttempts(retryLimit, write, pause)) return true;
+    DR_LOG_AS(Function, Debug, "Failed to write cache to file [%s] and reach retry limit[%d]",
+              file.GetPath().c_str(), retryLimit);
+    return false;
+}
+
+// The refresh of ReadWithin(), whose caller gets the data even if it cannot be stored.
+bool Cache::Impl::RefreshWithin(const Cache& cache, const Deadline& deadline, bool isMarked,
+                                Json::Value& data)
+{
+    constexpr const char* Function = "ReadWithin";
+    const char* const path = file.GetPath().c_str();
+    if (isMarked) DR_LOG_AS(Function, Debug, "---> Start to update cache [%s]", path);
+    const ScopeGuard unmark([&] {
+        if (!isMarked) return;
+        mark.EndClaim();
+        DR_LOG_AS(Function, Debug, "<--- Finish to update cache [%s]", path);
+    });
+    const Pause pause = PauseUntil(deadline);
+    (void)cache.IsUpdatedDataRequired();  // where a subclass prepares a refresh
+    const long begin = std::time(nullptr);
+    Json::Value fresh;
+    if (!Produce(cache, fresh, pause)) return false;
+    if (!Store(cache, fresh, begin, std::time(nullptr), pause)) {
+        if (!cache.IsValidData(fresh)) return false;
+        DR_LOG_AS(Function, Warn, "Failed to store cache [%s], use fresh data all the same", path);
+    } else if (!isMarked) {
+        DR_LOG_AS(Function, Warn, "Failed to lock cache [%s], refreshed it all the same", path);
+    }
+    data = std::move(fresh);
+    return true;
 }
 
 // Removes the mark even if an allocation fails. Otherwise all others would wait for this process as

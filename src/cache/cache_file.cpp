@@ -43,6 +43,13 @@ std::time_t CacheFile::GetModifyTime() const
     return ::stat(path_.c_str(), &status) == 0 ? status.st_mtime : -1;
 }
 
+std::optional<FileVersion> CacheFile::GetVersion() const
+{
+    struct stat status {};
+    if (::stat(path_.c_str(), &status) != 0) return std::nullopt;
+    return FileVersion(status);
+}
+
 bool CacheFile::IsLoaded(std::time_t modifyTime) const
 {
     return modifyTime != -1 && modifyTime == loadedModifyTime_;
@@ -60,6 +67,7 @@ CacheFile::LoadResult CacheFile::Load()
     Remember(text, LongestRefreshOf(document));
     if (FindMember(document, "cached_data") != nullptr) data_.swap(document["cached_data"]);
     loadedModifyTime_ = status.st_mtime;
+    loadedVersion_ = FileVersion(status);
     return LoadResult::Loaded;
 }
 
@@ -98,6 +106,7 @@ bool CacheFile::Write(CacheDocument& document)
     if (!ReplaceFile(path_, document.text, std::nullopt, &written)) return false;
     data_.swap(document.value["cached_data"]);
     loadedModifyTime_ = written.st_mtime;
+    loadedVersion_ = FileVersion(written);
     Remember(document.text, document.longestRefresh);
     return true;
 }

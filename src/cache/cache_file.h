@@ -2,8 +2,11 @@
 #ifndef ORVADRCORE_SRC_CACHE_CACHE_FILE_H
 #define ORVADRCORE_SRC_CACHE_CACHE_FILE_H
 
+#include <sys/stat.h>
+
 #include <cstddef>
 #include <ctime>
+#include <optional>
 #include <string>
 
 #include <json/value.h>
@@ -26,6 +29,25 @@ struct CacheDocument {
     int longestRefresh;  // seconds
 };
 
+// Tells a file from the one that was there before, even if both were written in the same second.
+struct FileVersion {
+    FileVersion() = default;
+    explicit FileVersion(const struct stat& status)
+        : inode(status.st_ino), modified(status.st_mtim), size(status.st_size)
+    {
+    }
+
+    bool operator==(const FileVersion& other) const
+    {
+        return inode == other.inode && modified.tv_sec == other.modified.tv_sec &&
+               modified.tv_nsec == other.modified.tv_nsec && size == other.size;
+    }
+
+    ino_t inode = 0;
+    timespec modified{};
+    off_t size = 0;
+};
+
 // A cache file and the data loaded from it. The modification time tells whether both still agree.
 // Nothing here logs; Cache does.
 class CacheFile {
@@ -39,11 +61,21 @@ class CacheFile {
     // In whole seconds since the epoch; -1 without a file.
     std::time_t GetModifyTime() const;
 
+    // None without a file.
+    std::optional<FileVersion> GetVersion() const;
+
     const Json::Value& GetData() const { return data_; }
-    void SetData(Json::Value data) { data_ = std::move(data); }
+    void SetData(Json::Value data)
+    {
+        data_ = std::move(data);
+        loadedVersion_.reset();
+    }
 
     // Whether the data in memory is that of a file with this modification time.
     bool IsLoaded(std::time_t modifyTime) const;
+
+    // Of the file whose data is in memory; none if the data comes from elsewhere.
+    const std::optional<FileVersion>& GetLoadedVersion() const { return loadedVersion_; }
 
     // Reads the file into memory. On failure memory stays as it was. The contract: a document without
     // "cached_data" counts as loaded and leaves the old data.
@@ -65,6 +97,7 @@ class CacheFile {
     std::string path_;
     Json::Value data_;
     std::time_t loadedModifyTime_ = -1;
+    std::optional<FileVersion> loadedVersion_;
 
     // Size, hash and longest refresh of the text that was loaded or written last.
     std::size_t knownSize_ = 0;

@@ -1,12 +1,16 @@
 #include "cache/freshness.h"
 
-#include <orvadrcore/cache.h>
+#include <algorithm>
 
 namespace OrvaDRCore {
 
 bool IsTooOld(std::time_t modifyTime, long timeoutSeconds)
 {
-    const std::time_t now = std::time(nullptr);
+    return IsTooOld(modifyTime, timeoutSeconds, std::time(nullptr));
+}
+
+bool IsTooOld(std::time_t modifyTime, long timeoutSeconds, std::time_t now)
+{
     return now == -1 || std::difftime(now, modifyTime) > static_cast<double>(timeoutSeconds);
 }
 
@@ -15,6 +19,36 @@ bool IsFresh(const Cache& cache, const Json::Value& data, std::time_t modifyTime
 {
     return !IsTooOld(modifyTime, timeoutSeconds) && cache.IsValidData(data) &&
            !cache.IsNeedUpdate(data);
+}
+
+FreshnessWatch::FreshnessWatch(const Cache& cache, CacheFile& file, long timeoutSeconds)
+    : cache_(cache), file_(file), timeoutSeconds_(timeoutSeconds)
+{
+}
+
+CacheState FreshnessWatch::Look()
+{
+    const std::optional<FileVersion> version = file_.GetVersion();
+    const bool isInMemory = version == file_.GetLoadedVersion() || state_ == CacheState::None;
+    if (hasLooked_ && version == seen_ && isInMemory) return state_;
+    state_ = Judge(version);
+    seen_ = version;
+    hasLooked_ = true;
+    return state_;
+}
+
+CacheState FreshnessWatch::Judge(const std::optional<FileVersion>& version) const
+{
+    const bool isLoaded = version && version == file_.GetLoadedVersion();
+    if (!isLoaded && !cache_.Load()) return CacheState::None;
+    const std::time_t modifyTime = file_.GetLoadedVersion()->modified.tv_sec;
+    // The earlier time, because the clock may have been set back.
+    const std::time_t now = std::min(begin_, std::time(nullptr));
+    const Json::Value& data = file_.GetData();
+    if (!cache_.IsValidData(data)) return CacheState::None;
+    return IsTooOld(modifyTime, timeoutSeconds_, now) || cache_.IsNeedUpdate(data)
+               ? CacheState::Stale
+               : CacheState::Fresh;
 }
 
 }  // namespace OrvaDRCore
