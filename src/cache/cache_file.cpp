@@ -11,6 +11,7 @@
 #include "base/file_io.h"
 #include "base/json_helpers.h"
 #include "base/replace_file.h"
+#include "cache/cache_document.h"
 
 namespace OrvaDRCore {
 
@@ -19,14 +20,6 @@ namespace {
 std::size_t HashOf(const std::string& text)
 {
     return std::hash<std::string>()(text);
-}
-
-// A real number counts as absent, although jsoncpp takes 3.0 for an int: the contract says so.
-int LongestRefreshOf(const Json::Value& document)
-{
-    const Json::Value* longest = FindMember(document, "max_updated_time");
-    const bool known = longest != nullptr && longest->isInt() && longest->type() != Json::realValue;
-    return known ? longest->asInt() : 0;
 }
 
 int ToWholeSeconds(double seconds)
@@ -65,7 +58,7 @@ CacheFile::LoadResult CacheFile::Load()
     if (!ReadRegularFile(path_, text) || !fromString(document, text)) return LoadResult::Unreadable;
 
     Remember(text, LongestRefreshOf(document));
-    if (FindMember(document, "cached_data") != nullptr) data_.swap(document["cached_data"]);
+    if (FindMember(document, CacheKey::Data) != nullptr) data_.swap(document[CacheKey::Data]);
     loadedModifyTime_ = status.st_mtime;
     loadedVersion_ = FileVersion(status);
     return LoadResult::Loaded;
@@ -89,13 +82,13 @@ CacheDocument CacheFile::Compose(CacheEntry entry) const
     const int longest = std::max(GetLongestRefresh(), ToWholeSeconds(took));
 
     Json::Value document(Json::objectValue);
-    document["timeout"] = Json::Int64{entry.timeout};
-    document["info"].swap(entry.info);
-    document["cached_data"].swap(entry.data);
-    document["begin_time_to_update"] = Json::Int64{entry.begin};
-    document["finish_time_to_update"] = Json::Int64{entry.finish};
-    document["updated_time"] = took;
-    document["max_updated_time"] = longest;
+    document[CacheKey::Timeout] = Json::Int64{entry.timeout};
+    document[CacheKey::Info].swap(entry.info);
+    document[CacheKey::Data].swap(entry.data);
+    document[CacheKey::Begin] = Json::Int64{entry.begin};
+    document[CacheKey::Finish] = Json::Int64{entry.finish};
+    document[CacheKey::LastRefresh] = took;
+    document[CacheKey::LongestRefresh] = longest;
     std::string text = toString(document);
     return {std::move(document), std::move(text), longest};
 }
@@ -104,7 +97,7 @@ bool CacheFile::Write(CacheDocument& document)
 {
     struct stat written {};
     if (!ReplaceFile(path_, document.text, std::nullopt, &written)) return false;
-    data_.swap(document.value["cached_data"]);
+    data_.swap(document.value[CacheKey::Data]);
     loadedModifyTime_ = written.st_mtime;
     loadedVersion_ = FileVersion(written);
     Remember(document.text, document.longestRefresh);

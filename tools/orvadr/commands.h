@@ -9,6 +9,9 @@
 
 namespace Orvadr {
 
+// Cache files: fresh or stale, and who refreshes them.
+Report ReportCaches(const std::vector<std::string>& files);
+
 // Error codes by number or name; all of them without any.
 Report ReportErrors(const std::vector<std::string>& codesOrNames);
 

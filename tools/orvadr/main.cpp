@@ -42,6 +42,9 @@ struct Command {
 std::vector<Command> Commands()
 {
     return {
+        {"cache",
+         "Show whether caches are fresh, and who refreshes them. Code 1 unless all are fresh.",
+         "FILE", "cache files, such as /var/dr/nodes.cached", true, Orvadr::ReportCaches},
         {"lock", "Show who holds locks. Code 1 when one of those named is held.", "NAME",
          "as programs name it, below /tmp/.orvadr_lock; all lock files without any", false,
          Orvadr::ReportLocks},
@@ -50,17 +53,22 @@ std::vector<Command> Commands()
     };
 }
 
-// CLI11 splits a word such as "[a,b]" and drops an empty one, but these may be names of files. A mark in
-// front of them keeps them whole.
+// CLI11 splits a word such as "[a,b]", drops an empty one and takes "--" only in front of all names, but
+// these may be names of files. A mark in front of them keeps them whole.
 constexpr char Mark = '\1';
 
 Words MarkWords(int argc, const char* const* argv)
 {
-    Words words(argv + 1, argv + argc);
-    for (std::string& word : words) {
+    Words words;
+    bool areNames = false;  // after "--"
+    for (const std::string& word : Words(argv + 1, argv + argc)) {
         const bool isSpecial =
             word.empty() || std::string_view("[{%\1").find(word[0]) != std::string_view::npos;
-        if (isSpecial) word.insert(word.begin(), Mark);
+        if (!areNames && word == "--") {
+            areNames = true;
+        } else {
+            words.push_back(areNames || isSpecial ? Mark + word : word);
+        }
     }
     std::reverse(words.begin(), words.end());  // as CLI11 wants them
     return words;
