@@ -125,6 +125,7 @@ class TempDir {
 // The families.
 void AddRecords();
 void AddMany();
+void AddVolumes();
 void AddTexts();
 void AddJson();
 void AddKeyValue();

@@ -61,6 +61,7 @@ void AddItems(bool curves)
     }
     Bench::AddRecords();
     Bench::AddMany();
+    Bench::AddVolumes();
     Bench::AddTexts();
     Bench::AddJson();
     Bench::AddKeyValue();

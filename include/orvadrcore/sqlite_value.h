@@ -50,7 +50,7 @@ class ORVADRCORE_API SqliteValue {
     SqliteValue(T Class::*pointer) = delete;  // a pointer to a member is not a value
 
     SqliteValue(const SqliteValue&) = default;
-    SqliteValue(SqliteValue&&) noexcept = default;
+    SqliteValue(SqliteValue&& other) noexcept;  ///< `other` holds nothing then.
     ~SqliteValue() = default;
 
     // ------------------------------------------------------------------------------------ makers
@@ -101,14 +101,23 @@ class ORVADRCORE_API SqliteValue {
   private:
     friend struct SqliteInternals;
 
-    // What the payload alone does not tell.
-    enum class Kind : unsigned char { Plain, Text, Blob, Null };
+    // What the payload is. A plain text is one that is not escaped.
+    enum class Kind : unsigned char {
+        Nothing,
+        Boolean,
+        Integer,
+        Real,
+        PlainText,
+        Text,
+        Blob,
+        Null
+    };
 
     ORVADRCORE_LOCAL SqliteValue(Kind kind, Json::Value&& payload);
     ORVADRCORE_LOCAL SqliteValue(Kind kind, const char* bytes, std::size_t length);
 
     bool valid_ = false;
-    Kind kind_ = Kind::Plain;
+    Kind kind_ = Kind::Nothing;
     Json::Value value_;
 };
 

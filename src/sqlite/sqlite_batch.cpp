@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <map>
+#include <string_view>
 
 #include "sqlite/sqlite_internals.h"
 #include "sqlite/sqlite_statement.h"
@@ -9,14 +10,6 @@
 namespace OrvaDRCore {
 
 namespace {
-
-bool HaveSameFields(const SqliteValueList& one, const SqliteValueList& other)
-{
-    const auto& left = one.GetValues();
-    const auto& right = other.GetValues();
-    return std::equal(left.begin(), left.end(), right.begin(), right.end(),
-                      [](const auto& a, const auto& b) { return a.first == b.first; });
-}
 
 // Orders records by their field names, so that a map has one entry per set of fields.
 struct ByFields {
@@ -45,39 +38,63 @@ std::string InsertStatement(const std::string& table, const SqliteValueList& rec
     return verb + table + " (" + fields + ") VALUES (" + places + ");";
 }
 
-// Bytes are not copied: the record outlives the run of the statement.
-int BindBytes(sqlite3_stmt* statement, int place, const SqliteValue& value)
-{
-    const std::string_view bytes = BytesOf(SqliteInternals::Payload(value));
-    if (SqliteInternals::KindOf(value) == SqliteInternals::Kind::Blob) {
-        return sqlite3_bind_blob64(statement, place, bytes.data(), bytes.size(), SQLITE_STATIC);
-    }
-    return sqlite3_bind_text64(statement, place, bytes.data(), bytes.size(), SQLITE_STATIC,
-                               SQLITE_UTF8);
-}
-
-// Returns SQLite's code.
+// Bytes are not copied: the record outlives the run of the statement. Returns SQLite's code.
 int BindValue(sqlite3_stmt* statement, int place, const SqliteValue& value)
 {
+    using Kind = SqliteInternals::Kind;
     const Json::Value& payload = SqliteInternals::Payload(value);
-    switch (payload.type()) {
-        case Json::stringValue: return BindBytes(statement, place, value);
-        case Json::realValue: return sqlite3_bind_double(statement, place, payload.asDouble());
-        case Json::nullValue: return sqlite3_bind_null(statement, place);
-        default: return sqlite3_bind_int64(statement, place, payload.asInt64());
+    switch (SqliteInternals::KindOf(value)) {
+        case Kind::Boolean:
+        case Kind::Integer: return sqlite3_bind_int64(statement, place, payload.asInt64());
+        case Kind::Real: return sqlite3_bind_double(statement, place, payload.asDouble());
+        case Kind::PlainText:
+        case Kind::Text: {
+            const std::string_view text = BytesOf(payload);
+            return sqlite3_bind_text64(statement, place, text.data(), text.size(), SQLITE_STATIC,
+                                       SQLITE_UTF8);
+        }
+        case Kind::Blob: {
+            const std::string_view bytes = BytesOf(payload);
+            return sqlite3_bind_blob64(statement, place, bytes.data(), bytes.size(), SQLITE_STATIC);
+        }
+        default: return sqlite3_bind_null(statement, place);
     }
+}
+
+// Inserts records that have the same fields.
+struct Insert {
+    Statement statement;
+    std::vector<std::string_view> fields;  // in the first of these records
+};
+
+int PrepareInsert(sqlite3* handle, const std::string& text, const SqliteValueList& record,
+                  Insert& insert)
+{
+    for (const auto& [field, value] : record.GetValues()) insert.fields.push_back(field);
+    return PrepareStatement(handle, text, insert.statement);
+}
+
+// Binds a record's values. Returns false if the record has other fields; otherwise `code` is
+// SQLite's.
+bool BindRecord(const Insert& insert, const SqliteValueList& record, int& code)
+{
+    const auto& values = record.GetValues();
+    if (values.size() != insert.fields.size()) return false;
+    auto expected = insert.fields.begin();
+    int place = 0;
+    for (const auto& [field, value] : values) {
+        if (field != *expected++) return false;
+        code = BindValue(insert.statement.get(), ++place, value);
+        if (code != SQLITE_OK) return true;
+    }
+    return true;
 }
 
 // Returns SQLite's code, SQLITE_OK when the row is there.
-int InsertRow(sqlite3_stmt* statement, const SqliteValueList& record)
+int InsertRow(const Insert& insert)
 {
-    int place = 0;
-    for (const auto& [field, value] : record.GetValues()) {
-        const int code = BindValue(statement, ++place, value);
-        if (code != SQLITE_OK) return code;
-    }
-    const int code = sqlite3_step(statement);
-    sqlite3_reset(statement);
+    const int code = sqlite3_step(insert.statement.get());
+    sqlite3_reset(insert.statement.get());
     return code == SQLITE_DONE ? SQLITE_OK : code;
 }
 
@@ -87,24 +104,27 @@ int InsertRow(sqlite3_stmt* statement, const SqliteValueList& record)
 bool IsStorable(const SqliteValueList& record)
 {
     const auto& values = record.GetValues();
-    return !values.empty() && std::all_of(values.begin(), values.end(),
-                                          [](const auto& field) { return field.second.IsValid(); });
+    return !values.empty() && std::all_of(values.begin(), values.end(), [](const auto& field) {
+        return SqliteInternals::IsValid(field.second);
+    });
 }
 
 bool InsertRows(sqlite3* handle, const std::string& table,
                 const std::vector<SqliteValueList>& records, bool replacable, SqliteError& error)
 {
-    std::map<const SqliteValueList*, Statement, ByFields> statements;
-    Statement* insert = nullptr;
-    const SqliteValueList* last = nullptr;
+    std::map<const SqliteValueList*, Insert, ByFields> inserts;
+    Insert* insert = nullptr;
     for (const SqliteValueList& record : records) {
-        if (last == nullptr || !HaveSameFields(*last, record)) insert = &statements[&record];
-        last = &record;
         int code = SQLITE_OK;
-        if (*insert == nullptr) {
-            code = PrepareStatement(handle, InsertStatement(table, record, replacable), *insert);
+        if (insert == nullptr || !BindRecord(*insert, record, code)) {
+            insert = &inserts[&record];
+            if (insert->statement == nullptr) {
+                code = PrepareInsert(handle, InsertStatement(table, record, replacable), record,
+                                     *insert);
+            }
+            if (code == SQLITE_OK) BindRecord(*insert, record, code);
         }
-        if (code == SQLITE_OK) code = InsertRow(insert->get(), record);
+        if (code == SQLITE_OK) code = InsertRow(*insert);
         if (code != SQLITE_OK) {
             error.SetFailure(InsertStatement(table, record, replacable), code,
                              sqlite3_errmsg(handle));

@@ -10,8 +10,7 @@ namespace OrvaDRCore {
 
 namespace {
 
-template <class Integer>
-void AppendNumber(std::string& text, Integer number)
+void AppendNumber(std::string& text, Json::LargestInt number)
 {
     std::array<char, 24> digits{};  // 64 bits need 20 digits and a sign at most
     char* const begin = digits.data();
@@ -53,15 +52,6 @@ void AppendPlain(std::string& text, std::string_view bytes)
     text += '\'';
 }
 
-void AppendBytes(std::string& text, std::string_view bytes, SqliteInternals::Kind kind)
-{
-    switch (kind) {
-        case SqliteInternals::Kind::Text: return AppendText(text, bytes);
-        case SqliteInternals::Kind::Blob: return AppendHexadecimal(text, bytes);
-        default: return AppendPlain(text, bytes);
-    }
-}
-
 }  // namespace
 
 void AppendEscaped(std::string& text, std::string_view unescaped)
@@ -78,21 +68,23 @@ void AppendEscaped(std::string& text, std::string_view unescaped)
 
 bool IsStoredAsNull(const SqliteValue& value)
 {
-    const Json::Value& payload = SqliteInternals::Payload(value);
-    return value.IsNull() || (payload.type() == Json::realValue && std::isnan(payload.asDouble()));
+    const bool isReal = SqliteInternals::KindOf(value) == SqliteInternals::Kind::Real;
+    return value.IsNull() || (isReal && std::isnan(SqliteInternals::Payload(value).asDouble()));
 }
 
 void AppendLiteral(std::string& text, const SqliteValue& value)
 {
+    using Kind = SqliteInternals::Kind;
     const Json::Value& payload = SqliteInternals::Payload(value);
-    switch (payload.type()) {
-        case Json::stringValue:
-            return AppendBytes(text, BytesOf(payload), SqliteInternals::KindOf(value));
-        case Json::booleanValue: text += payload.asBool() ? '1' : '0'; return;
-        case Json::intValue: return AppendNumber(text, payload.asLargestInt());
-        case Json::uintValue: return AppendNumber(text, payload.asLargestUInt());
-        case Json::realValue: return AppendReal(text, payload.asDouble());
-        default: text += value.IsNull() ? "NULL" : ""; return;
+    switch (SqliteInternals::KindOf(value)) {
+        case Kind::Nothing: return;
+        case Kind::Boolean: text += payload.asBool() ? '1' : '0'; return;
+        case Kind::Integer: return AppendNumber(text, payload.asLargestInt());
+        case Kind::Real: return AppendReal(text, payload.asDouble());
+        case Kind::PlainText: return AppendPlain(text, BytesOf(payload));
+        case Kind::Text: return AppendText(text, BytesOf(payload));
+        case Kind::Blob: return AppendHexadecimal(text, BytesOf(payload));
+        case Kind::Null: text += "NULL"; return;
     }
 }
 

@@ -43,6 +43,10 @@ struct SqliteInternals {
     // Null, a number, a boolean, or a text, which holds the bytes of a blob, too.
     static const Json::Value& Payload(const SqliteValue& value) { return value.value_; }
     static Kind KindOf(const SqliteValue& value) { return value.kind_; }
+    static bool IsValid(const SqliteValue& value)  // as the public one, but inline
+    {
+        return value.valid_ && value.kind_ != Kind::Nothing;
+    }
 
     // Adds a field like AddValue(), but builds its value in place, which takes half the time.
     template <class T>

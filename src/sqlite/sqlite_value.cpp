@@ -11,12 +11,6 @@ namespace OrvaDRCore {
 
 namespace {
 
-// jsoncpp calls 5.0 an integer, too.
-bool IsInteger(const Json::Value& payload)
-{
-    return payload.type() == Json::intValue || payload.type() == Json::uintValue;
-}
-
 // How a value that is refused is shown in the log.
 std::string Shown(const SqliteValue& value)
 {
@@ -26,19 +20,19 @@ std::string Shown(const SqliteValue& value)
 
 }  // namespace
 
-SqliteValue::SqliteValue(int number) : valid_(true), value_(number) {}
+SqliteValue::SqliteValue(int number) : SqliteValue(Kind::Integer, number) {}
 
-SqliteValue::SqliteValue(unsigned int number) : valid_(true), value_(number) {}
+SqliteValue::SqliteValue(unsigned int number) : SqliteValue(Kind::Integer, number) {}
 
-SqliteValue::SqliteValue(bool truth) : valid_(true), value_(truth) {}
+SqliteValue::SqliteValue(bool truth) : SqliteValue(Kind::Boolean, truth) {}
 
 SqliteValue::SqliteValue(const std::string& text)
-    : SqliteValue(Kind::Plain, text.data(), text.size())
+    : SqliteValue(Kind::PlainText, text.data(), text.size())
 {
 }
 
 SqliteValue::SqliteValue(const char* text)
-    : SqliteValue(Kind::Plain, text, text != nullptr ? std::strlen(text) : 0)
+    : SqliteValue(Kind::PlainText, text, text != nullptr ? std::strlen(text) : 0)
 {
 }
 
@@ -49,7 +43,7 @@ SqliteValue::SqliteValue(Kind kind, Json::Value&& payload)
 
 SqliteValue::SqliteValue(Kind kind, const char* bytes, std::size_t length)
     : valid_(bytes != nullptr && FitsJsonText(length)),
-      kind_(kind),
+      kind_(valid_ ? kind : Kind::Nothing),
       value_(valid_ ? Json::Value(bytes, bytes + length) : Json::Value())
 {
     if (bytes != nullptr && !valid_) {
@@ -69,12 +63,12 @@ SqliteValue SqliteValue::Text(const char* text)
 
 SqliteValue SqliteValue::Integer(std::int64_t number)
 {
-    return {Kind::Plain, Json::Value(static_cast<Json::Int64>(number))};
+    return {Kind::Integer, Json::Value(static_cast<Json::Int64>(number))};
 }
 
 SqliteValue SqliteValue::Real(double number)
 {
-    return {Kind::Plain, Json::Value(number)};
+    return {Kind::Real, Json::Value(number)};
 }
 
 // Refuses a blob whose literal could not be part of a statement, which has less than 2 GiB.
@@ -92,6 +86,13 @@ SqliteValue SqliteValue::Null()
     return {Kind::Null, Json::Value()};
 }
 
+SqliteValue::SqliteValue(SqliteValue&& other) noexcept
+    : valid_(other.valid_),
+      kind_(std::exchange(other.kind_, Kind::Nothing)),
+      value_(std::move(other.value_))
+{
+}
+
 // By contract `valid_` stays as it was: only construction makes a value valid.
 SqliteValue& SqliteValue::operator=(const SqliteValue& other)
 {
@@ -103,7 +104,7 @@ SqliteValue& SqliteValue::operator=(const SqliteValue& other)
 bool SqliteValue::IsValid() const
 {
     // An assignment may have replaced the payload since the value was built.
-    return valid_ && (value_.type() != Json::nullValue || IsNull());
+    return valid_ && kind_ != Kind::Nothing;
 }
 
 bool SqliteValue::IsNull() const
@@ -126,7 +127,7 @@ bool SqliteValue::GetValue(std::string& out) const
 template <>
 bool SqliteValue::GetValue(unsigned int& out) const
 {
-    if (!IsInteger(value_) || !value_.isUInt()) {
+    if (kind_ != Kind::Integer || !value_.isUInt()) {
         DR_LOG_AS("GetValue<unsigned int>", Warn, "[%s] is not int", Shown(*this).c_str());
         return false;
     }
@@ -137,7 +138,7 @@ bool SqliteValue::GetValue(unsigned int& out) const
 template <>
 bool SqliteValue::GetValue(int& out) const
 {
-    if (!IsInteger(value_) || !value_.isInt()) {
+    if (kind_ != Kind::Integer || !value_.isInt()) {
         DR_LOG_AS("GetValue<int>", Warn, "[%s] is not int", Shown(*this).c_str());
         return false;
     }
@@ -148,7 +149,7 @@ bool SqliteValue::GetValue(int& out) const
 template <>
 bool SqliteValue::GetValue(std::int64_t& out) const
 {
-    if (!IsInteger(value_)) {
+    if (kind_ != Kind::Integer) {
         DR_LOG_AS("GetValue<long int>", Warn, "[%s] is not int", Shown(*this).c_str());
         return false;
     }
@@ -159,7 +160,7 @@ bool SqliteValue::GetValue(std::int64_t& out) const
 template <>
 bool SqliteValue::GetValue(double& out) const
 {
-    if (!IsInteger(value_) && value_.type() != Json::realValue) {
+    if (kind_ != Kind::Integer && kind_ != Kind::Real) {
         DR_LOG_AS("GetValue<double>", Warn, "[%s] is not double", Shown(*this).c_str());
         return false;
     }
@@ -171,8 +172,8 @@ template <>
 bool SqliteValue::GetValue(bool& out) const
 {
     const bool isBit =
-        IsInteger(value_) && value_.isInt() && (value_.asInt() == 0 || value_.asInt() == 1);
-    if (!value_.isBool() && !isBit) {
+        kind_ == Kind::Integer && value_.isInt() && (value_.asInt() == 0 || value_.asInt() == 1);
+    if (kind_ != Kind::Boolean && !isBit) {
         DR_LOG_AS("GetValue<bool>", Warn, "[%s] is not bool", Shown(*this).c_str());
         return false;
     }
