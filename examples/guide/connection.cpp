@@ -33,19 +33,6 @@ InsertCommand Insert(const std::string& name)
     return insert;
 }
 
-// [constraint]
-// SQLite's code for a row that the schema refuses: SQLITE_CONSTRAINT in <sqlite3.h>.
-constexpr int SqliteConstraint = 19;
-
-// SQLite's code of the last attempt; 0 if SQLite did not fail.
-int LastSqliteCode(const SqliteDB& db)
-{
-    const Json::Value& tries = db.GetErr();
-    if (!tries.isArray() || tries.empty()) return 0;
-    return tries[tries.size() - 1]["err_msg"]["sqlite_errcode"].asInt();
-}
-// [/constraint]
-
 bool AddFromChild(const std::string& name)
 {
     // [fork]
@@ -82,13 +69,36 @@ int main()
     if (!other.Open() || !other.Exec("BEGIN IMMEDIATE")) return EXIT_FAILURE;
     if (!db.InsertRecord(Insert("backup-02"))) {  // two attempts, each waits for a second
         std::cout << "code " << db.GetErrCode() << ", tries " << db.GetErr().size()
-                  << ", SQLite's code " << LastSqliteCode(db) << '\n';
+                  << ", SQLite's code " << db.GetSqliteCode() << '\n';
     }
     if (!other.Exec("ROLLBACK")) return EXIT_FAILURE;
     // [/locked]
 
+    // [constraint]
+    constexpr int SqliteConstraint = 19;  // SQLITE_CONSTRAINT in <sqlite3.h>
     if (db.InsertRecord(Insert("backup-01"))) return EXIT_FAILURE;
-    std::cout << "refused by the schema: " << (LastSqliteCode(db) == SqliteConstraint) << '\n';
+    const bool isRefused = (db.GetSqliteCode() & 0xff) == SqliteConstraint;
+    std::cout << "refused by the schema: " << isRefused << '\n';
+    // [/constraint]
+
+    // [changes]
+    const SqliteTableHandler jobs("jobs", "id INTEGER PRIMARY KEY, state TEXT");
+    InsertCommand insert;
+    insert.SetTable(jobs);
+    insert.AddFieldValue("state", "new");
+    if (!db.InsertRecord(insert) || !db.InsertRecord(insert)) return EXIT_FAILURE;
+    std::cout << "id of the last job: " << db.GetLastInsertId() << '\n';
+    if (!db.DeleteRecord("state='new'", jobs)) return EXIT_FAILURE;
+    std::cout << "deleted: " << db.GetAffectedRows() << '\n';
+
+    SelectCommand selectJob;
+    selectJob.SetTable(jobs);
+    selectJob.SelectAll();
+    SqliteValueList job;
+    bool found = false;
+    if (!db.SelectRecord(selectJob, job, found)) return EXIT_FAILURE;
+    std::cout << (found ? "a job is left" : "no job is left") << '\n';
+    // [/changes]
 
     if (!AddFromChild("backup-03")) return EXIT_FAILURE;
     SelectCommand select;

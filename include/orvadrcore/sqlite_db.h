@@ -17,6 +17,7 @@
 #ifndef ORVADRCORE_SQLITE_DB_H
 #define ORVADRCORE_SQLITE_DB_H
 
+#include <cstdint>
 #include <functional>
 #include <memory>
 #include <string>
@@ -71,6 +72,9 @@ class ORVADRCORE_API SqliteDB {
 
     /// Selects the first row. `record` is unchanged when there is none.
     bool SelectRecord(const SelectCommand& command, SqliteValueList& record);
+
+    /// The same, and tells whether there was a row. Both outputs are unchanged after a failure.
+    bool SelectRecord(const SelectCommand& command, SqliteValueList& record, bool& found);
 
     /// Gives each selected row to `take`, without making records. See SelectEachByCommand().
     [[nodiscard]] bool SelectEach(const SelectCommand& command,
@@ -145,8 +149,24 @@ class ORVADRCORE_API SqliteDB {
     /// attempts after retries. Valid until the next operation.
     const Json::Value& GetErr() const;
 
+    /// SQLite's extended code of the last failed attempt or Open(), 2067 for a row that is not unique;
+    /// 0 after a success and when SQLite was not asked. The lower eight bits are the primary code.
+    int GetSqliteCode() const;
+
     /// Records a failure of SQLite. Without a message it is SQLite's last one.
     void SetDBErr(const std::string& command, int sqliteCode, const char* message) const;
+
+    // ------------------------------------------------------------------------------------ changes
+
+    /// How many rows the last operation inserted, updated or deleted that runs such statements: all
+    /// records of InsertRecords(), all statements of a text for Exec(). 0
+    /// after a failure. Selects, table creation, BEGIN and COMMIT leave it as it is.
+    /// \note Rows that triggers and foreign keys change do not count.
+    std::int64_t GetAffectedRows() const;
+
+    /// The row id (INTEGER PRIMARY KEY) of the row that this connection has inserted last, 0 if there
+    /// is none. It stays when an INSERT fails, and is 0 when the connection is closed.
+    std::int64_t GetLastInsertId() const;
 
     // --------------------------------------------------------------------------- single attempts
     // One attempt of the operations above, without checks, retries and log lines.
@@ -164,6 +184,9 @@ class ORVADRCORE_API SqliteDB {
     /// \endcond
 
   private:
+    ORVADRCORE_LOCAL bool SelectFirst(const std::string& command, SqliteValueList& record,
+                                      bool& found);
+
     std::unique_ptr<SqliteConnection> connection_;
 };
 

@@ -41,12 +41,35 @@ SqliteConnection::~SqliteConnection()
 
 void SqliteConnection::SetFailure(const std::string& command, int sqliteCode, const char* message)
 {
+    affectedRows_ = 0;
     error_.SetFailure(command, sqliteCode, message != nullptr ? message : sqlite3_errmsg(handle_));
+    NoteExtendedCode();
+}
+
+// SQLite's extended code says more, if it is that of the same failure.
+void SqliteConnection::NoteExtendedCode()
+{
+    constexpr int PrimaryBits = 0xff;
+    const int extended = sqlite3_extended_errcode(handle_);
+    if ((extended & PrimaryBits) == error_.GetSqliteCode()) error_.SetSqliteCode(extended);
+}
+
+void SqliteConnection::Refuse(int code)
+{
+    affectedRows_ = 0;
+    error_.Set(code);
+}
+
+std::int64_t SqliteConnection::GetLastInsertId() const
+{
+    return handle_ != nullptr ? sqlite3_last_insert_rowid(handle_) : 0;
 }
 
 bool SqliteConnection::Open()
 {
     if (sqlite3_open(path_.c_str(), &handle_) != SQLITE_OK) {
+        affectedRows_ = 0;
+        error_.SetSqliteCode(sqlite3_extended_errcode(handle_));
         Close();  // SQLite may return a handle although it fails
         return false;
     }
@@ -65,6 +88,7 @@ void SqliteConnection::Close()
 {
     if (handle_ == nullptr) return;
     wait_.Forget();
+    watch_.Stop();
     cache_.Clear();
     sqlite3_busy_handler(handle_, nullptr, nullptr);
     sqlite3_close(handle_);  // fails inside of a select, which closes it at its end
@@ -74,6 +98,7 @@ void SqliteConnection::Close()
 bool SqliteConnection::Execute(const std::string& command)
 {
     const BusyTimeoutAccess access(wait_, watch_, command);
+    const StatementWatch::Changes before = watch_.CountChanges();
     if (!IsInTransaction()) wait_.Yield();
     char* text = nullptr;  // SQLite does not set it when the handle is null
     Statement refused;
@@ -82,8 +107,26 @@ bool SqliteConnection::Execute(const std::string& command)
                          : sqlite3_exec(handle_, command.c_str(), nullptr, nullptr, &text);
     const std::unique_ptr<char, FreeText> message(text);
     if (!IsInTransaction()) wait_.NoteUnlocked();
-    if (code != SQLITE_OK) SetFailure(command, code, message.get());
-    return code == SQLITE_OK;
+    if (code != SQLITE_OK) {
+        SetFailure(command, code, message.get());
+        return false;
+    }
+    NoteChangesSince(before);
+    return true;
+}
+
+bool SqliteConnection::ExecuteInTransaction(const std::string& command)
+{
+    watch_.ForbidTransactions(true);
+    const ScopeGuard allow([&] { watch_.ForbidTransactions(false); });
+    return Execute(command);
+}
+
+// After statements that have succeeded. Those that change no rows leave the number as it was.
+void SqliteConnection::NoteChangesSince(const StatementWatch::Changes& before)
+{
+    const StatementWatch::Changes now = watch_.CountChanges();
+    if (now.statements != before.statements) affectedRows_ = now.rows - before.rows;
 }
 
 bool SqliteConnection::Select(const std::string& command, const TakeRow& takeRow)
@@ -96,6 +139,7 @@ bool SqliteConnection::Select(const std::string& command, const TakeRow& takeRow
         statement.reset();
         EndSelect(handle);
     });
+    const StatementWatch::Changes before = watch_.CountChanges();
     const char* message = nullptr;
     int code = cache_.Take(handle, command, statement);
     if (code == SQLITE_OK) code = TakeRows(statement.get(), takeRow, message);
@@ -103,6 +147,7 @@ bool SqliteConnection::Select(const std::string& command, const TakeRow& takeRow
         SetFailure(command, code, message != nullptr ? message : sqlite3_errmsg(handle));
         return false;
     }
+    if (sqlite3_stmt_readonly(statement.get()) == 0) NoteChangesSince(before);
     if (handle_ == handle) cache_.Keep(command, std::move(statement));
     error_.Set(0);
     return true;
@@ -159,7 +204,11 @@ bool SqliteConnection::RunAtomically(bool isNested, const std::function<bool()>&
             Close();
         }
     });
-    if (!work() || !Execute(bracket.end)) return false;
+    if (!work()) {
+        NoteExtendedCode();
+        return false;
+    }
+    if (!Execute(bracket.end)) return false;
     undo.Dismiss();
     return true;
 }
@@ -167,7 +216,10 @@ bool SqliteConnection::RunAtomically(bool isNested, const std::function<bool()>&
 Attempts SqliteConnection::Retry(const std::function<bool()>& attempt,
                                  const std::function<bool()>& mayRepeat)
 {
-    return RunWithRetries(error_, owner_ != nullptr ? 0 : retryLimit_, attempt, mayRepeat);
+    Attempts attempts =
+        RunWithRetries(error_, owner_ != nullptr ? 0 : retryLimit_, attempt, mayRepeat);
+    if (!attempts.succeeded) affectedRows_ = 0;
+    return attempts;
 }
 
 bool SqliteConnection::IsInTransaction() const

@@ -37,8 +37,22 @@ class SqliteConnection {
     // Sets the error to a failure of SQLite. Without a message it is SQLite's last one.
     void SetFailure(const std::string& command, int sqliteCode, const char* message);
 
+    // Sets the error of an operation that fails without SQLite.
+    void Refuse(int code);
+
+    // The rows that the last operation with rows to change has changed; 0 after a failure.
+    std::int64_t GetAffectedRows() const { return affectedRows_; }
+    void SetAffectedRows(std::int64_t rows) { affectedRows_ = rows; }
+
+    // How many rows were changed since the connection was opened, by triggers, too.
+    std::int64_t CountAllRows() const { return watch_.CountAllRows(); }
+
+    // 0 when the connection is closed or has inserted nothing.
+    std::int64_t GetLastInsertId() const;
+
     // The two steps of opening a connection that is closed. When the second fails, the connection
-    // is open and waits for no lock. Neither changes the error.
+    // is open and waits for no lock. Neither changes the error, except SQLite's code when the first
+    // fails.
     bool Open();
     bool InstallBusyWait();
 
@@ -47,6 +61,9 @@ class SqliteConnection {
 
     // One attempt to run the statements of a text. Success leaves the error as it was.
     bool Execute(const std::string& command);
+
+    // The same for a text that may not begin or end a transaction.
+    bool ExecuteInTransaction(const std::string& command);
 
     // One attempt to run a statement that has rows. Each row is given to `takeRow`, which returns
     // whether it wants another. It may use this connection, close it, and throw.
@@ -74,10 +91,13 @@ class SqliteConnection {
   private:
     int TakeRows(sqlite3_stmt* statement, const TakeRow& takeRow, const char*& message);
     void EndSelect(sqlite3* handle);
+    void NoteChangesSince(const StatementWatch::Changes& before);
+    void NoteExtendedCode();
 
     const std::string path_;
     const unsigned int retryLimit_;
     SqliteError error_;
+    std::int64_t affectedRows_ = 0;
     sqlite3* handle_ = nullptr;
     StatementWatch watch_;
     BusyWait wait_;

@@ -42,6 +42,22 @@ SqliteConnection::TakeRow AppendTo(std::vector<SqliteValueList>& records)
     };
 }
 
+// One attempt to select the first row.
+bool DoSelectFirst(SqliteConnection& connection, const std::string& command,
+                   SqliteValueList& record, bool& found)
+{
+    // A statement that writes may give a row and still fail to commit; the row does not count then.
+    std::optional<SqliteValueList> first;
+    const auto takeFirst = [&first](const RowReader& row) {
+        first = ParseRecord(row);
+        return false;
+    };
+    if (!connection.Select(command, takeFirst)) return false;
+    found = first.has_value();
+    if (first) record = std::move(*first);
+    return true;
+}
+
 // Reports how a select of all rows went.
 bool LogAttempts(const char* function, const std::string& command, const Attempts& attempts)
 {
@@ -142,12 +158,12 @@ std::string SqliteDB::GenerateDeleteCommand(const std::string& table,
 bool SqliteDB::Exec(const std::string& command)
 {
     if (!connection_->IsOpen()) {
-        connection_->Error().Set(ERR::ERR_NULL_POINTER);
+        connection_->Refuse(ERR::ERR_NULL_POINTER);
         DR_LOG(Err, "DB[%s] is not opened", connection_->GetPath().c_str());
         return false;
     }
     if (command.empty()) {
-        connection_->Error().Set(ERR::BAD_PARAMETER);
+        connection_->Refuse(ERR::BAD_PARAMETER);
         DR_LOG(Err, "empty command to exec db[%s]", connection_->GetPath().c_str());
         return false;
     }
@@ -164,27 +180,14 @@ bool SqliteDB::Exec(const std::string& command)
 
 bool SqliteDB::SelectByCommand(const std::string& command, SqliteValueList& record)
 {
-    if (command.empty()) {
-        connection_->Error().Set(ERR::BAD_PARAMETER);
-        DR_LOG(Err, "Empty command to select record");
-        return false;
-    }
-    const Attempts attempts =
-        connection_->Retry([&] { return DoSelectSqliteRecord(command, record); });
-    if (!attempts.succeeded) {
-        DR_LOG(Warn, "Reach retry limit [%u], failed to select command with errors[%s] ",
-               attempts.failures, attempts.errors.c_str());
-    } else if (attempts.failures > 0) {
-        DR_LOG(Info, "After retry [%u] times, success to exec command [%s], previous errs[%s]",
-               attempts.failures, command.c_str(), attempts.errors.c_str());
-    }
-    return attempts.succeeded;
+    bool found = false;
+    return SelectFirst(command, record, found);
 }
 
 bool SqliteDB::SelectByCommand(const std::string& command, std::vector<SqliteValueList>& records)
 {
     if (command.empty()) {
-        connection_->Error().Set(ERR::BAD_PARAMETER);
+        connection_->Refuse(ERR::BAD_PARAMETER);
         DR_LOG(Err, "Empty command to select records");
         return false;
     }
@@ -196,12 +199,12 @@ bool SqliteDB::SelectEachByCommand(const std::string& command,
 {
     SqliteConnection& connection = *connection_;  // stays where it is when this object is moved
     if (command.empty()) {
-        connection.Error().Set(ERR::BAD_PARAMETER);
+        connection.Refuse(ERR::BAD_PARAMETER);
         DR_LOG(Err, "Empty command to select records");
         return false;
     }
     if (take == nullptr) {
-        connection.Error().Set(ERR::BAD_PARAMETER);
+        connection.Refuse(ERR::BAD_PARAMETER);
         DR_LOG(Err, "no function takes the rows of [%s]", command.c_str());
         return false;
     }
@@ -244,6 +247,21 @@ const Json::Value& SqliteDB::GetErr() const
     return connection_->Error().GetRecord();
 }
 
+int SqliteDB::GetSqliteCode() const
+{
+    return connection_->Error().GetSqliteCode();
+}
+
+std::int64_t SqliteDB::GetAffectedRows() const
+{
+    return connection_->GetAffectedRows();
+}
+
+std::int64_t SqliteDB::GetLastInsertId() const
+{
+    return connection_->GetLastInsertId();
+}
+
 void SqliteDB::SetDBErr(const std::string& command, int sqliteCode, const char* message) const
 {
     connection_->SetFailure(command, sqliteCode, message);
@@ -256,21 +274,36 @@ bool SqliteDB::DoExecSqliteCommand(const std::string& command)
 
 bool SqliteDB::DoSelectSqliteRecord(const std::string& command, SqliteValueList& record)
 {
-    // A statement that writes may give a row and still fail to commit; the row does not count then.
-    std::optional<SqliteValueList> first;
-    const auto takeFirst = [&first](const RowReader& row) {
-        first = ParseRecord(row);
-        return false;
-    };
-    if (!connection_->Select(command, takeFirst)) return false;
-    if (first) record = std::move(*first);
-    return true;
+    bool found = false;
+    return DoSelectFirst(*connection_, command, record, found);
 }
 
 bool SqliteDB::DoSelectSqliteRecords(const std::string& command,
                                      std::vector<SqliteValueList>& records)
 {
     return connection_->Select(command, AppendTo(records));
+}
+
+bool SqliteDB::SelectFirst(const std::string& command, SqliteValueList& record, bool& found)
+{
+    constexpr const char* Function = "SelectByCommand";
+    if (command.empty()) {
+        connection_->Refuse(ERR::BAD_PARAMETER);
+        DR_LOG_AS(Function, Err, "Empty command to select record");
+        return false;
+    }
+    const Attempts attempts =
+        connection_->Retry([&] { return DoSelectFirst(*connection_, command, record, found); });
+    if (!attempts.succeeded) {
+        DR_LOG_AS(Function, Warn,
+                  "Reach retry limit [%u], failed to select command with errors[%s] ",
+                  attempts.failures, attempts.errors.c_str());
+    } else if (attempts.failures > 0) {
+        DR_LOG_AS(Function, Info,
+                  "After retry [%u] times, success to exec command [%s], previous errs[%s]",
+                  attempts.failures, command.c_str(), attempts.errors.c_str());
+    }
+    return attempts.succeeded;
 }
 
 }  // namespace OrvaDRCore

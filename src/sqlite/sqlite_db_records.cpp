@@ -42,10 +42,10 @@ bool OpenWithTable(const char* function, SqliteDB& db, const SqliteTableHandler&
 // The same for the operations that take a command.
 bool Prepare(const Operation& operation, SqliteDB& db, const SqliteCommand& command)
 {
-    SqliteError& error = db.Connection().Error();
-    error.Set(ERR::ERR_DATABASE_OPERATION);
+    SqliteConnection& connection = db.Connection();
+    connection.Error().Set(ERR::ERR_DATABASE_OPERATION);
     if (!command.IsValid()) {
-        error.Set(operation.invalidCode);
+        connection.Refuse(operation.invalidCode);
         DR_LOG_AS(operation.function, Err, "invalid %s command [%s]", operation.kind,
                   command.ToStr().c_str());
         return false;
@@ -90,9 +90,10 @@ bool SqliteDB::InsertRecords(const SqliteTableHandler& table,
                              const std::vector<SqliteValueList>& records, bool replacable)
 {
     connection_->Error().Set(0);
+    connection_->SetAffectedRows(0);
     if (records.empty()) return true;
     if (table.GetName().empty() || !std::all_of(records.begin(), records.end(), IsStorable)) {
-        connection_->Error().Set(ERR::BAD_PARAMETER);
+        connection_->Refuse(ERR::BAD_PARAMETER);
         DR_LOG(Err, "invalid insert records: table[%s]", table.GetName().c_str());
         return false;
     }
@@ -100,17 +101,24 @@ bool SqliteDB::InsertRecords(const SqliteTableHandler& table,
     const bool isNested = connection_->IsInTransaction();
     connection_->Error().Set(ERR::ERR_DATABASE_OPERATION);
     if (!OpenWithTable(__func__, *this, table)) return false;
+    std::int64_t rows = 0;
     const auto insert = [&] {
-        return InsertRows(connection_->GetHandle(), table.GetName(), records, replacable,
-                          connection_->Error());
+        const std::int64_t before = connection_->CountAllRows();
+        const bool areInserted = InsertRows(connection_->GetHandle(), table.GetName(), records,
+                                            replacable, connection_->Error());
+        rows = connection_->CountAllRows() - before;
+        return areInserted;
     };
     const Attempts attempts =
         connection_->Retry([&] { return connection_->RunAtomically(isNested, insert); });
     if (!attempts.succeeded) {
         DR_LOG(Err, "Failed to insert [%zu] records in db[%s]", records.size(),
                connection_->GetPath().c_str());
+        return false;
     }
-    return attempts.succeeded;
+    // Each record is a row at most; the others were changed by triggers.
+    connection_->SetAffectedRows(std::min(rows, static_cast<std::int64_t>(records.size())));
+    return true;
 }
 
 bool SqliteDB::UpdateRecord(const UpdateCommand& command)
@@ -130,6 +138,12 @@ bool SqliteDB::SelectRecord(const SelectCommand& command, SqliteValueList& recor
     return RunSelect({__func__, "select", ERR::BAD_PARAMETER}, *this, command, select);
 }
 
+bool SqliteDB::SelectRecord(const SelectCommand& command, SqliteValueList& record, bool& found)
+{
+    const auto select = [&](const std::string& text) { return SelectFirst(text, record, found); };
+    return RunSelect({__func__, "select", ERR::BAD_PARAMETER}, *this, command, select);
+}
+
 bool SqliteDB::SelectEach(const SelectCommand& command,
                           const std::function<bool(const SqliteRow&)>& take)
 {
@@ -140,7 +154,7 @@ bool SqliteDB::SelectEach(const SelectCommand& command,
 bool SqliteDB::DeleteRecord(const std::string& condition, const SqliteTableHandler& table)
 {
     if (condition.empty()) {
-        connection_->Error().Set(ERR::BAD_PARAMETER);
+        connection_->Refuse(ERR::BAD_PARAMETER);
         DR_LOG(Err, "invalid delete command: condition[%s]", condition.c_str());
         return false;
     }
@@ -155,7 +169,7 @@ bool SqliteDB::DeleteAllRecords(const SqliteTableHandler& table)
 bool SqliteDB::DoDelete(const SqliteTableHandler& table, const std::string& condition)
 {
     if (table.GetName().empty()) {
-        connection_->Error().Set(ERR::BAD_PARAMETER);
+        connection_->Refuse(ERR::BAD_PARAMETER);
         DR_LOG(Err, "invalid table:[%s]", table.GetName().c_str());
         return false;
     }

@@ -9,6 +9,7 @@ namespace OrvaDRCore {
 void SqliteError::Set(int code)
 {
     code_ = code;
+    sqliteCode_ = 0;
     if (!record_.isNull()) record_ = Json::Value();
 }
 
@@ -20,6 +21,7 @@ void SqliteError::SetFailure(const std::string& command, int sqliteCode, const c
     if (sqliteCode != 0) record["sqlite_errcode"] = sqliteCode;
     record["sqlite_errmsg"] = ToJsonText(message);
     code_ = ERR::ERR_DATABASE_OPERATION;
+    sqliteCode_ = sqliteCode;
     record_.swap(record);
 }
 

@@ -126,15 +126,14 @@ std::string Show(sqlite3_value* value)
 }
 
 template <class T>
-bool ReadColumn(RowReader& reader, std::size_t column, T& out)
+bool ReadColumn(RowReader& reader, const RowReader::Column& column, T& out)
 {
-    sqlite3_value* const value = reader.GetColumn(column);
+    sqlite3_value* const value = reader.GetValue(column);
     const Reading reading = Read(value, out);
     if (reading == Reading::Done) return true;
     if (reading == Reading::OutOfMemory) {
         reader.NoteOutOfMemory();
-        DR_LOG_AS(Kind<T>::Function, Warn, "no memory to read field [%s]",
-                  reader.GetNames()[column].c_str());
+        DR_LOG_AS(Kind<T>::Function, Warn, "no memory to read field [%s]", column.name.c_str());
     } else {
         DR_LOG_AS(Kind<T>::Function, Warn, "[%s] is not %s", Show(value).c_str(), Kind<T>::Word);
     }
@@ -145,20 +144,19 @@ bool ReadColumn(RowReader& reader, std::size_t column, T& out)
 
 std::size_t SqliteRow::GetColumnCount() const
 {
-    return reader_.GetNames().size();
+    return reader_.GetColumns().size();
 }
 
 std::string SqliteRow::GetColumnName(std::size_t column) const
 {
-    const std::vector<std::string>& names = reader_.GetNames();
-    return column < names.size() ? names[column] : std::string();
+    const auto& columns = reader_.GetColumns();
+    return column < columns.size() ? columns[column].name : std::string();
 }
 
 bool SqliteRow::IsNull(const std::string& column) const
 {
-    const std::size_t found = reader_.Find(column);
-    return found == reader_.GetNames().size() ||
-           sqlite3_value_type(reader_.GetColumn(found)) == SQLITE_NULL;
+    const RowReader::Column* const found = reader_.Find(column);
+    return found == nullptr || sqlite3_value_type(reader_.GetValue(*found)) == SQLITE_NULL;
 }
 
 template <class T>
@@ -169,22 +167,22 @@ bool SqliteRow::ReadNamed(const std::string& column, T& out) const
         DR_LOG_AS(Function, Err, "Invalid field [%s]", column.c_str());
         return false;
     }
-    const std::size_t found = reader_.Find(column);
-    if (found == reader_.GetNames().size()) {
+    const RowReader::Column* const found = reader_.Find(column);
+    if (found == nullptr) {
         DR_LOG_AS(Function, Debug, "field [%s] is not existed", column.c_str());
         return false;
     }
-    return ReadColumn(reader_, found, out);
+    return ReadColumn(reader_, *found, out);
 }
 
 template <class T>
 bool SqliteRow::ReadNumbered(std::size_t column, T& out) const
 {
-    if (column >= reader_.GetNames().size()) {
+    if (column >= reader_.GetColumns().size()) {
         DR_LOG_AS("GetValue", Debug, "field [%zu] is not existed", column);
         return false;
     }
-    return ReadColumn(reader_, column, out);
+    return ReadColumn(reader_, reader_.GetColumns()[column], out);
 }
 
 template <>

@@ -1,7 +1,6 @@
 #include "sqlite/sqlite_row_reader.h"
 
 #include <algorithm>
-#include <numeric>
 
 #include "sqlite/sqlite_internals.h"
 
@@ -10,18 +9,18 @@ namespace OrvaDRCore {
 RowReader::RowReader(sqlite3_stmt* statement) : statement_(statement)
 {
     const int columns = sqlite3_column_count(statement);
+    columns_.reserve(static_cast<std::size_t>(columns));
     for (int column = 0; column < columns; ++column) {
         // Null when SQLite has run out of memory.
         const char* name = sqlite3_column_name(statement, column);
-        names_.emplace_back(name != nullptr ? name : "");
+        columns_.push_back({name != nullptr ? name : "", column});
     }
 }
 
 SqliteValueList RowReader::Read(LeftOut leftOut) const
 {
     SqliteValueList record;
-    int column = 0;
-    for (const std::string& name : names_) {
+    for (const auto& [name, column, follower] : columns_) {
         const int type = sqlite3_column_type(statement_, column);
         const unsigned char* text =
             type == SQLITE_TEXT ? sqlite3_column_text(statement_, column) : nullptr;
@@ -32,37 +31,25 @@ SqliteValueList RowReader::Read(LeftOut leftOut) const
         } else {
             leftOut(name, type);
         }
-        ++column;
     }
     return record;
 }
 
-std::size_t RowReader::Find(const std::string& name)
+const RowReader::Column* RowReader::Search(const std::string& name)
 {
-    if (!followers_.empty()) {
-        const std::size_t guess = followers_[last_];
-        if (guess < names_.size() && names_[guess] == name) return last_ = guess;
-    }
-    return Search(name);
-}
-
-std::size_t RowReader::Search(const std::string& name)
-{
-    const auto isLess = [this](std::size_t one, std::size_t other) {
-        return names_[one] < names_[other];
-    };
-    if (followers_.size() != names_.size()) {
-        sorted_.resize(names_.size());
-        std::iota(sorted_.begin(), sorted_.end(), std::size_t{0});
-        std::stable_sort(sorted_.begin(), sorted_.end(), isLess);
-        followers_.assign(names_.size(), names_.size());
+    if (sorted_.empty()) {
+        for (Column& column : columns_) sorted_.push_back(&column);
+        std::stable_sort(
+            sorted_.begin(), sorted_.end(),
+            [](const Column* one, const Column* other) { return one->name < other->name; });
     }
     const auto after = std::upper_bound(
         sorted_.begin(), sorted_.end(), name,
-        [this](const std::string& wanted, std::size_t column) { return wanted < names_[column]; });
-    if (after == sorted_.begin() || names_[*(after - 1)] != name) return names_.size();
-    followers_[last_] = *(after - 1);
-    return last_ = *(after - 1);
+        [](const std::string& wanted, const Column* column) { return wanted < column->name; });
+    if (after == sorted_.begin() || (*(after - 1))->name != name) return nullptr;
+    Column* const found = *(after - 1);
+    if (last_ != nullptr) last_->follower = found;
+    return last_ = found;
 }
 
 }  // namespace OrvaDRCore

@@ -4,7 +4,6 @@
 
 #include <sqlite3.h>
 
-#include <cstddef>
 #include <string>
 #include <vector>
 
@@ -19,6 +18,10 @@ class RowReader {
     // cached statement again at its first step if the schema has changed.
     explicit RowReader(sqlite3_stmt* statement);
 
+    RowReader(const RowReader&) = delete;
+    RowReader& operator=(const RowReader&) = delete;
+    ~RowReader() = default;
+
     bool HasStatement() const { return statement_ != nullptr; }
 
     // Is told of each column that the record leaves out, with SQLite's number of its type. A text
@@ -29,16 +32,27 @@ class RowReader {
     // the same name the last one counts.
     SqliteValueList Read(LeftOut leftOut) const;
 
-    const std::vector<std::string>& GetNames() const { return names_; }
+    struct Column {
+        std::string name;
+        int number;
+        Column* follower = nullptr;  // the one that was looked up after it the last time
+    };
 
-    // The last column with this name, GetNames().size() if there is none.
-    std::size_t Find(const std::string& name);
+    const std::vector<Column>& GetColumns() const { return columns_; }
 
-    // A column's value in this row, which may be read in this thread until the next row. The
-    // column must exist.
-    sqlite3_value* GetColumn(std::size_t column) const
+    // The last column with this name, null if there is none.
+    const Column* Find(const std::string& name)
     {
-        return sqlite3_column_value(statement_, static_cast<int>(column));
+        // Callers look the columns up in the same order in each row.
+        Column* const guess = last_ != nullptr ? last_->follower : nullptr;
+        if (guess == nullptr || guess->name != name) return Search(name);
+        return last_ = guess;
+    }
+
+    // A column's value in this row, which may be read in this thread until the next row.
+    sqlite3_value* GetValue(const Column& column) const
+    {
+        return sqlite3_column_value(statement_, column.number);
     }
 
     // For a value that could not be read because SQLite has run out of memory: the select fails
@@ -47,18 +61,13 @@ class RowReader {
     bool IsOutOfMemory() const { return isOutOfMemory_; }
 
   private:
-    std::size_t Search(const std::string& name);
+    const Column* Search(const std::string& name);
 
     sqlite3_stmt* statement_;
-    std::vector<std::string> names_;
+    std::vector<Column> columns_;
+    std::vector<Column*> sorted_;  // by name; made by the first search
+    Column* last_ = nullptr;       // that was looked up
     bool isOutOfMemory_ = false;
-
-    // Set by the first search: the columns in the order of their names, and for each column the one
-    // that was looked up after it the last time. Callers read every row in the same order, so this
-    // is nearly always the one that they want.
-    std::vector<std::size_t> sorted_;
-    std::vector<std::size_t> followers_;
-    std::size_t last_ = 0;
 };
 
 }  // namespace OrvaDRCore

@@ -29,7 +29,7 @@ bool SqliteTransaction::Begin()
 {
     SqliteConnection& connection = db_.Connection();
     if (connection.IsInTransaction()) {
-        connection.Error().Set(ERR::BAD_PARAMETER);
+        connection.Refuse(ERR::BAD_PARAMETER);
         DR_LOG(Err, "transaction is already open in db[%s]", connection.GetPath().c_str());
         return false;
     }
@@ -50,13 +50,13 @@ bool SqliteTransaction::Commit()
 {
     SqliteConnection& connection = db_.Connection();
     if (!hasBegun_) {
-        connection.Error().Set(ERR::BAD_PARAMETER);
+        connection.Refuse(ERR::BAD_PARAMETER);
         DR_LOG(Err, "no transaction to commit in db[%s]", connection.GetPath().c_str());
         return false;
     }
     if (!IsOpen()) {
         Release();
-        connection.Error().Set(ERR::ERR_DATABASE_OPERATION);
+        connection.Refuse(ERR::ERR_DATABASE_OPERATION);
         DR_LOG(Err, "transaction in db[%s] was rolled back", connection.GetPath().c_str());
         return false;
     }

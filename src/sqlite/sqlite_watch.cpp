@@ -1,12 +1,44 @@
 #include "sqlite/sqlite_watch.h"
 
+#include <algorithm>
+#include <array>
+
 namespace OrvaDRCore {
+
+namespace {
+
+// Before SQLite 3.37 there is only the function that counts in 32 bits.
+std::int64_t CountLastRows(sqlite3* handle)
+{
+#if SQLITE_VERSION_NUMBER >= 3037000
+    return sqlite3_changes64(handle);
+#else
+    return sqlite3_changes(handle);
+#endif
+}
+
+bool IsSchemaTable(const char* name)
+{
+    constexpr std::array<const char*, 4> Names = {"sqlite_master", "sqlite_schema",
+                                                  "sqlite_temp_master", "sqlite_temp_schema"};
+    return std::any_of(Names.begin(), Names.end(),
+                       [name](const char* schema) { return sqlite3_stricmp(name, schema) == 0; });
+}
+
+}  // namespace
 
 void StatementWatch::Start(sqlite3* handle)
 {
     handle_ = handle;
     isBusyTimeoutSet_ = false;
+    allRows_ = 0;
     sqlite3_set_authorizer(handle_, Note, this);
+}
+
+void StatementWatch::Stop()
+{
+    if (handle_ != nullptr) sqlite3_set_authorizer(handle_, nullptr, nullptr);
+    handle_ = nullptr;
 }
 
 // SQLite calls this while it prepares a statement, before the statement does anything.
@@ -19,7 +51,44 @@ int StatementWatch::Note(void* watch, int action, const char* name, const char* 
     const bool beginsOrEnds = action == SQLITE_TRANSACTION || action == SQLITE_SAVEPOINT;
     // Outside of a transaction such a statement can only begin one.
     if (beginsOrEnds && sqlite3_get_autocommit(self.handle_) != 0) ++self.transactions_;
-    return SQLITE_OK;
+    const bool writes =
+        action == SQLITE_INSERT || action == SQLITE_UPDATE || action == SQLITE_DELETE;
+    if (writes && !IsSchemaTable(name) && !self.IsWriting()) {
+        self.CountChanges();  // of the previous statement of the same text
+        ++self.changes_.statements;
+    }
+    return action == SQLITE_TRANSACTION && self.isForbidden_ ? SQLITE_DENY : SQLITE_OK;
+}
+
+StatementWatch::Changes StatementWatch::CountChanges()
+{
+    // SQLite knows the rows of the last statement that changes rows. While the number of all rows
+    // stays the same, there was no such statement.
+    const std::int64_t allRows = CountAllRows();
+    if (handle_ != nullptr && allRows != allRows_) changes_.rows += CountLastRows(handle_);
+    allRows_ = allRows;
+    return changes_;
+}
+
+std::int64_t StatementWatch::CountAllRows() const
+{
+    if (handle_ == nullptr) return 0;
+#if SQLITE_VERSION_NUMBER >= 3037000
+    return sqlite3_total_changes64(handle_);
+#else
+    return sqlite3_total_changes(handle_);
+#endif
+}
+
+// Whether a statement runs that may write. SQLite prepares others for its own use meanwhile,
+// for example for a VACUUM or for what is inserted into a virtual table.
+bool StatementWatch::IsWriting() const
+{
+    sqlite3_stmt* statement = nullptr;
+    while ((statement = sqlite3_next_stmt(handle_, statement)) != nullptr) {
+        if (sqlite3_stmt_busy(statement) != 0 && sqlite3_stmt_readonly(statement) == 0) return true;
+    }
+    return false;
 }
 
 }  // namespace OrvaDRCore

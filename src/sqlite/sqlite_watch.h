@@ -9,7 +9,7 @@
 namespace OrvaDRCore {
 
 // Sees every statement that a connection prepares: the library's, the caller's, and each of several
-// in one text. It takes notes and forbids nothing.
+// in one text. It takes notes and, unless asked to, forbids nothing.
 class StatementWatch {
   public:
     StatementWatch() = default;
@@ -21,6 +21,9 @@ class StatementWatch {
     // not move while the connection is open. It can watch one connection after the other.
     void Start(sqlite3* handle);
 
+    // To be called before the connection is closed, which may be delayed by running statements.
+    void Stop();
+
     // How many outermost transactions were begun, failed attempts included. While the number stays
     // the same and a transaction is open, it is the same transaction.
     std::uint64_t CountTransactions() const { return transactions_; }
@@ -28,13 +31,35 @@ class StatementWatch {
     // Whether a statement has set the busy timeout of this connection.
     bool IsBusyTimeoutSet() const { return isBusyTimeoutSet_; }
 
+    struct Changes {
+        // Statements that insert, update or delete rows. A CREATE TABLE is none.
+        std::uint64_t statements;
+        // The rows that they have changed, without those that triggers and foreign keys change.
+        std::int64_t rows;
+    };
+
+    // What has been changed so far, through all connections. No statement may be running that
+    // changes rows.
+    Changes CountChanges();
+
+    // The rows that were changed through this connection, by triggers and foreign keys, too.
+    std::int64_t CountAllRows() const;
+
+    // From now on statements that begin or end a transaction are refused, or not any more.
+    void ForbidTransactions(bool isForbidden) { isForbidden_ = isForbidden; }
+
   private:
     static int Note(void* watch, int action, const char* first, const char* second,
                     const char* database, const char* trigger);
 
+    bool IsWriting() const;
+
     sqlite3* handle_ = nullptr;
     std::uint64_t transactions_ = 0;
     bool isBusyTimeoutSet_ = false;
+    bool isForbidden_ = false;
+    Changes changes_{};
+    std::int64_t allRows_ = 0;  // CountAllRows() when changes_ was counted
 };
 
 }  // namespace OrvaDRCore

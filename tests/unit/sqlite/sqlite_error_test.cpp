@@ -43,6 +43,19 @@ TEST(SqliteErrorTest, SettingACodeRemovesTheRecord)
     EXPECT_EQ(RecordOf(error), "null");
 }
 
+TEST(SqliteErrorTest, SqlitesCodeStaysUntilTheNextOperation)
+{
+    SqliteError error;
+    EXPECT_EQ(error.GetSqliteCode(), 0);
+    error.SetFailure("BAD", 19, "why");
+    EXPECT_EQ(error.GetSqliteCode(), 19);
+    error.SetSqliteCode(2067);
+    error.SetFailures(Json::Value(Json::arrayValue));
+    EXPECT_EQ(error.GetSqliteCode(), 2067);
+    error.Set(404);
+    EXPECT_EQ(error.GetSqliteCode(), 0);
+}
+
 TEST(SqliteErrorTest, FailuresAreAListOfEntries)
 {
     SqliteError error;

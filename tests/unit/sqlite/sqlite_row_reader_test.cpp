@@ -60,9 +60,33 @@ TEST_F(SqliteRowReaderTest, EachRowIsReadWithTheSameNames)
     EXPECT_EQ(row.Read(NoteLeftOut).ToStr(), "id:2");
 }
 
+TEST_F(SqliteRowReaderTest, TheLastColumnOfANameIsFoundInAnyOrder)
+{
+    Statement statement;
+    ASSERT_EQ(PrepareStatement(db.Handle(), "SELECT 1 AS b, 2 AS a, 3 AS b, 4 AS c", statement),
+              SQLITE_OK);
+    ASSERT_EQ(sqlite3_step(statement.get()), SQLITE_ROW);
+    RowReader row(statement.get());
+    const auto find = [&row](const std::string& name) {
+        const RowReader::Column* const column = row.Find(name);
+        return column != nullptr ? sqlite3_value_int(row.GetValue(*column)) : 0;
+    };
+    for (const std::string order : {"abc", "abc", "cba", "aabbcc", "acbacb", "bd", "da", "b"}) {
+        for (const char name : order) {
+            const int expected = name == 'a' ? 2 : name == 'b' ? 3 : name == 'c' ? 4 : 0;
+            EXPECT_EQ(find(std::string(1, name)), expected) << name << " of " << order;
+        }
+    }
+    EXPECT_EQ(find(""), 0);
+    EXPECT_EQ(find("A"), 0);
+}
+
 TEST_F(SqliteRowReaderTest, WithoutAStatementThereIsNoRow)
 {
-    EXPECT_FALSE(RowReader(nullptr).HasStatement());
+    RowReader row(nullptr);
+    EXPECT_FALSE(row.HasStatement());
+    EXPECT_EQ(row.Find("x"), nullptr);
+    EXPECT_TRUE(row.GetColumns().empty());
 }
 
 }  // namespace

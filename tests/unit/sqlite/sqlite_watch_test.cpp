@@ -68,12 +68,53 @@ TEST_F(StatementWatchTest, SeesTheBusyTimeoutSetInEverySpelling)
     }
 }
 
+TEST_F(StatementWatchTest, CountsStatementsThatChangeRowsAndTheirRows)
+{
+    struct Row {
+        const char* text;
+        std::uint64_t statements;
+        std::int64_t rows;
+    };
+    for (const Row& row : {
+             Row{"CREATE TABLE jobs (id); CREATE TEMP TABLE others (id)", 0, 0},
+             Row{"INSERT INTO jobs VALUES (1), (2); INSERT INTO jobs VALUES (3)", 2, 3},
+             Row{"SELECT * FROM jobs; CREATE INDEX ids ON jobs (id); BEGIN; COMMIT", 2, 3},
+             Row{"UPDATE jobs SET id=id WHERE id<3; DELETE FROM jobs WHERE id=7", 4, 5},
+             Row{"INSERT INTO others VALUES (1); BAD", 5, 6},
+         }) {
+        Run(row.text);
+        EXPECT_EQ(watch.CountChanges().statements, row.statements) << row.text;
+        EXPECT_EQ(watch.CountChanges().rows, row.rows) << row.text;
+    }
+    EXPECT_EQ(watch.CountAllRows(), 6);
+}
+
+TEST_F(StatementWatchTest, RefusesTransactionsWhileItIsAskedTo)
+{
+    watch.ForbidTransactions(true);
+    for (const char* text : {"BEGIN", "COMMIT", "ROLLBACK"}) {
+        EXPECT_EQ(sqlite3_exec(db.get(), text, nullptr, nullptr, nullptr), SQLITE_AUTH) << text;
+    }
+    EXPECT_EQ(sqlite3_exec(db.get(), "CREATE TABLE jobs (id); SAVEPOINT a; RELEASE a", nullptr,
+                           nullptr, nullptr),
+              SQLITE_OK);
+    watch.ForbidTransactions(false);
+    EXPECT_EQ(sqlite3_exec(db.get(), "BEGIN; COMMIT", nullptr, nullptr, nullptr), SQLITE_OK);
+}
+
 TEST_F(StatementWatchTest, KeepsCountingOnTheNextConnection)
 {
+    Run("CREATE TABLE jobs (id); INSERT INTO jobs VALUES (1)");
+    EXPECT_EQ(watch.CountChanges().rows, 1);
     Run("BEGIN");
+    watch.Stop();
+    EXPECT_EQ(watch.CountChanges().rows, 1);
+    EXPECT_EQ(watch.CountAllRows(), 0);
     db = OpenInMemory(watch);
     Run("BEGIN");
     EXPECT_EQ(watch.CountTransactions(), 2U);
+    Run("CREATE TABLE jobs (id); INSERT INTO jobs VALUES (1)");
+    EXPECT_EQ(watch.CountChanges().rows, 2);
 }
 
 }  // namespace
