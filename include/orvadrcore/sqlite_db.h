@@ -97,6 +97,20 @@ class ORVADRCORE_API SqliteDB {
     /// \note A schema without a name is refused, and the error code stays as it was.
     bool CreateTable(const SqliteTableHandler& table);
 
+    /// Brings the file's schema to the version `steps.size()`. Opens the file if necessary.
+    ///
+    /// Step n, counted from 1, holds one or more statements that lead from version n-1 to n. It is
+    /// run if the file's version (`PRAGMA user_version`, 0 in a new file) is below n, in one
+    /// transaction with the new version: after a failure the file has the version of the last
+    /// whole step. An attempt is a whole step. Any number of processes may call this at once; each
+    /// step is run once.
+    ///
+    /// \return false with 401 when a step is empty or a transaction is open on the connection; with
+    ///         404 when the file's version is beyond the last step, with the ERR line `db[%s] has
+    ///         version [%d], newer than [%zu]`, or when SQLite fails
+    /// \note A step can neither begin nor end a transaction: SQLite refuses it with its code 23.
+    [[nodiscard]] bool Upgrade(const std::vector<std::string>& steps);
+
     /// Returns "DELETE FROM t WHERE c;", or "DELETE FROM t;" for an empty condition.
     std::string GenerateDeleteCommand(const std::string& table, const std::string& condition) const;
 
@@ -159,7 +173,7 @@ class ORVADRCORE_API SqliteDB {
     // ------------------------------------------------------------------------------------ changes
 
     /// How many rows the last operation inserted, updated or deleted that runs such statements: all
-    /// records of InsertRecords(), all statements of a text for Exec(). 0
+    /// records of InsertRecords(), all statements of a text for Exec(), all steps of Upgrade(). 0
     /// after a failure. Selects, table creation, BEGIN and COMMIT leave it as it is.
     /// \note Rows that triggers and foreign keys change do not count.
     std::int64_t GetAffectedRows() const;

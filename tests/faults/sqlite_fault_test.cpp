@@ -159,6 +159,12 @@ const std::vector<Operation>& Operations()
         {"SelectByCommand of an INSERT with RETURNING", InsertWithRow, "1a,2b,3c,4d", true},
         {"CreateTable", [](SqliteDB& db) { return db.Open() && db.CreateTable(Others); }, Before,
          true},
+        {"Upgrade",
+         [](SqliteDB& db) {
+             return db.Upgrade({"UPDATE nodes SET name='" + Long('x') +
+                                "' WHERE id<3; DELETE FROM nodes WHERE id=1"});
+         },
+         "2x,3c"},
         {"a transaction that is committed", CommitWork, "2x,3x,4x,5x"},
         {"a transaction that is rolled back", RollBackWork, Before},
         {"a transaction that is abandoned", AbandonWork, Before},
