@@ -1,4 +1,4 @@
-// Columns that records cannot hold (64-bit, real, blob, NULL), written and read as text.
+// Columns that records cannot hold (64-bit, real, blob, NULL), written as values and read row by row.
 #include <cstdint>
 #include <cstdlib>
 #include <iostream>
@@ -7,13 +7,37 @@
 #include <orvadrcore/sqlite_command.h>
 #include <orvadrcore/sqlite_condition.h>
 #include <orvadrcore/sqlite_db.h>
+#include <orvadrcore/sqlite_row.h>
 
 using OrvaDRCore::InsertCommand;
 using OrvaDRCore::SelectCommand;
 using OrvaDRCore::SqliteDB;
-using OrvaDRCore::SqliteEqual;
+using OrvaDRCore::SqliteGreaterEqual;
+using OrvaDRCore::SqliteOrder;
+using OrvaDRCore::SqliteRow;
 using OrvaDRCore::SqliteTableHandler;
+using OrvaDRCore::SqliteValue;
 using OrvaDRCore::SqliteValueList;
+
+namespace {
+
+// [row]
+bool Print(const SqliteRow& row)
+{
+    std::string path;
+    std::int64_t bytes = 0;
+    double load = 0;
+    std::string key;
+    std::string note = "no note";
+    if (!row.GetValue("path", path) || !row.GetValue("bytes", bytes)) return false;
+    if (!row.GetValue("load", load) || !row.GetValue("key", key)) return false;
+    if (!row.IsNull("note")) row.GetValue("note", note);
+    std::cout << path << ' ' << bytes << ' ' << load << ' ' << key.size() << ' ' << note << '\n';
+    return true;  // the next row, please
+}
+// [/row]
+
+}  // namespace
 
 int main()
 {
@@ -21,38 +45,34 @@ int main()
     SqliteDB db("recipe_columns.db", 3);
     const SqliteTableHandler volumes(
         "volumes", "path TEXT PRIMARY KEY, bytes INTEGER, load REAL, key BLOB, note TEXT");
-    const std::int64_t bytes = 5'000'000'000;
+    SqliteValueList volume;
+    volume.AddValue("path", SqliteValue::Text("/volume1"));
+    volume.AddValue("bytes", SqliteValue::Integer(5'000'000'000));
+    volume.AddValue("load", SqliteValue::Real(0.25));
+    volume.AddValue("key", SqliteValue::Blob(std::string("\0\xff'", 3)));
+    volume.AddValue("note", SqliteValue::Null());
     InsertCommand insert;
     insert.SetTable(volumes);
-    insert.AddFieldValue("path", "/volume1");
-    insert.AddFieldValue("bytes", std::to_string(bytes));  // INTEGER and REAL columns turn
-    insert.AddFieldValue("load", "0.25");                  // such texts into numbers
-    if (!db.InsertRecord(insert)) return EXIT_FAILURE;     // key and note stay NULL
-    if (!db.Exec("UPDATE volumes SET key=x'00ff27' WHERE path='/volume1'")) return EXIT_FAILURE;
+    insert.SetFieldValues(volume);
+    if (!db.InsertRecord(insert)) return EXIT_FAILURE;
     // [/write]
-
-    SelectCommand everything;
-    everything.SetTable(volumes);
-    everything.SelectAll();
-    SqliteValueList damaged;
-    if (!db.SelectRecord(everything, damaged)) return EXIT_FAILURE;
-    std::cout << damaged.ToStr() << '\n';
+    volume.AddValue("path", SqliteValue::Text("/volume2"));
+    volume.AddValue("bytes", SqliteValue::Integer(900));
+    volume.AddValue("note", SqliteValue::Text("it's small"));
+    insert.SetFieldValues(volume);
+    if (!db.InsertRecord(insert)) return EXIT_FAILURE;
 
     // [read]
     SelectCommand select;
     select.SetTable(volumes);
-    select.AddField("CAST(bytes AS TEXT) AS bytes");
-    select.AddField("printf('%!.17g',load) AS load");
-    select.AddField("hex(key) AS key");
-    select.AddField("ifnull(note,'') AS note");
-    select.AddField("note IS NULL AS has_no_note");
-    select.SetCondition(SqliteEqual("bytes", std::to_string(bytes)));
-    SqliteValueList row;
-    if (!db.SelectRecord(select, row)) return EXIT_FAILURE;
-    std::cout << row.ToStr() << '\n';
-    std::string text;
-    if (!row.GetValue("bytes", text)) return EXIT_FAILURE;
-    const std::int64_t read = std::strtoll(text.c_str(), nullptr, 10);
+    select.SelectAll();
+    select.SetCondition(SqliteGreaterEqual("bytes", SqliteValue::Integer(900)));
+    select.OrderBy("bytes", SqliteOrder::Descending);
+    if (!db.SelectEach(select, Print)) return EXIT_FAILURE;
     // [/read]
-    return read == bytes ? EXIT_SUCCESS : EXIT_FAILURE;
+
+    SqliteValueList damaged;
+    if (!db.SelectRecord(select, damaged)) return EXIT_FAILURE;
+    std::cout << damaged.ToStr() << '\n';
+    return EXIT_SUCCESS;
 }

@@ -42,17 +42,19 @@ int main()
     for (const std::string name : {"O'Brien's NAS", "'; DROP TABLE nodes; --", "50%_a", "50-b"}) {
         InsertCommand insert;
         insert.SetTable(nodes);
-        insert.AddFieldValue("name", SqliteValue::EscapeText(name));
+        SqliteValueList node;
+        node.AddValue("name", SqliteValue::Text(name));
+        insert.SetFieldValues(node);
         if (!db.InsertRecord(insert)) return EXIT_FAILURE;
     }
 
     // [conditions]
     const std::vector<std::string> wanted = {"O'Brien's NAS", "'; DROP TABLE nodes; --"};
-    const SqliteEqual first("name", SqliteValue::EscapeText(wanted.front()));
-    std::vector<SqliteValue> literals;
-    literals.reserve(wanted.size());
-    for (const std::string& name : wanted) literals.emplace_back(SqliteValue::EscapeText(name));
-    const SqliteIn both("name", literals);
+    const SqliteEqual first("name", SqliteValue::Text(wanted.front()));
+    std::vector<SqliteValue> values;
+    values.reserve(wanted.size());
+    for (const std::string& name : wanted) values.push_back(SqliteValue::Text(name));
+    const SqliteIn both("name", values);
     // [/conditions]
 
     // [like]

@@ -44,8 +44,7 @@ bool SetPattern(std::string& condition, const std::string& lvalue, const char* b
     // LIKE reads a pattern up to its first zero byte only, and would match other rows.
     const bool isReadable = text.find('\0') == std::string::npos;
     const std::string pattern = before + EscapeWildcards(text) + "%";
-    const SqliteValue value =
-        isReadable ? SqliteValue(SqliteValue::EscapeText(pattern)) : SqliteValue();
+    const SqliteValue value = isReadable ? SqliteValue::Text(pattern) : SqliteValue();
     if (!SetComparison(condition, lvalue, " LIKE ", value)) return false;
     condition += R"( ESCAPE '\')";
     return true;

@@ -133,6 +133,15 @@ TEST_F(SqliteConditionTest, NullIsComparedByIs)
     ExpectRefusal("Bad lvalue[] or rvalue[NULL]");
 }
 
+// SQL has no rows that are less than NULL.
+TEST_F(SqliteConditionTest, OtherComparisonsWriteNullAsItIs)
+{
+    ExpectCondition(SqliteLess("note", SqliteValue::Null()), true, "note<NULL");
+    ExpectCondition(SqliteGreaterEqual("note", SqliteValue::Null()), true, "note>=NULL");
+    ExpectCondition(SqliteGreater("note", SqliteValue::Text("it's")), true, "note>'it''s'");
+    ExpectCondition(SqliteLessEqual("load", SqliteValue::Real(0.5)), true, "load<=0.5");
+}
+
 TEST_F(SqliteConditionTest, AJunctionPutsItsOperandsInParentheses)
 {
     const SqliteEqual left("id", 3);
