@@ -1,18 +1,17 @@
 // Processes and threads that all need data which is not there: Cache::ReadWithin().
 #include <gmock/gmock.h>
 #include <signal.h>
-#include <sys/resource.h>
 #include <sys/stat.h>
+#include <syslog.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <array>
 #include <atomic>
 #include <chrono>
-#include <cstdlib>
 #include <filesystem>
-#include <functional>
-#include <stdexcept>
+#include <fstream>
+#include <set>
 #include <string>
 #include <thread>
 #include <vector>
@@ -22,24 +21,26 @@
 #include "support/fixtures/process_test.h"
 #include "support/fixtures/scale.h"
 #include "support/processes/await.h"
-#include "support/processes/child_checks.h"
 #include "support/processes/child_process.h"
 #include "support/processes/crowd.h"
+#include "support/processes/kills.h"
 #include "support/processes/reap.h"
 #include "support/processes/rights.h"
 #include "support/processes/shared_memory.h"
-#include "support/processes/traced_process.h"
 
 namespace {
 
 using OrvaDRCore::Cache;
 using OrvaDRCore::CacheState;
 using std::chrono::milliseconds;
+using ::testing::AnyOf;
 using ::testing::Each;
 using ::testing::ElementsAre;
 using Clock = std::chrono::steady_clock;
 
+constexpr int Old = 1;
 constexpr int New = 2;
+constexpr int Later = 3;
 constexpr milliseconds Long{60'000};
 constexpr milliseconds Production{300};
 
@@ -216,6 +217,217 @@ TEST_F(ColdCacheTest, ThreadsOfManyProcessesShareOneProduction)
     const int slowest = SlowestMSec(Processes * Threads);
     ReportCount("ms from the end of a production to the last of 64 x 8 threads", slowest);
     EXPECT_LT(slowest, 2 * BusyMachineMSec);
+}
+
+// ---------------------------------------------------------------------------------- with other readers
+
+TEST_F(ColdCacheTest, ReadersInTimeWaitForARefreshInTheBackground)
+{
+    constexpr int Readers = 16;
+    ASSERT_TRUE(MakeOwn(nullptr).UpdateWithData(DocumentOf(Old)));
+    SetModifyTime(Path(), std::time(nullptr) - 2 * DocumentCache::TimeoutSeconds);
+    EXPECT_EQ(NumberOf(MakeOwn(After(Production)).Read()), Old);
+    ASSERT_TRUE(AwaitUntil([this] { return round->productions == 1; }));
+    ReadAtOnce(Readers, 1, Long, After(Production, Later));
+    EXPECT_EQ(round->productions, 1);
+    EXPECT_THAT(States(Readers), Each(CacheState::Fresh));
+    EXPECT_THAT(Numbers(Readers), Each(New));
+}
+
+TEST_F(ColdCacheTest, ReadWaitsForARefreshOfAReaderInTime)
+{
+    ChildProcess reader([this](ChildProcess::Link& link) {
+        Json::Value data;
+        MakeOwn([&link](Json::Value& produced) {
+            link.Tell();
+            return link.Await() && Gives(New)(produced);
+        }).ReadWithin(Long, data);
+    });
+    ASSERT_TRUE(reader.Await());
+    std::thread later([&reader] {
+        std::this_thread::sleep_for(Production);
+        reader.Tell();
+    });
+    EXPECT_EQ(NumberOf(MakeOwn(Gives(Later)).Read()), New);
+    later.join();
+    EXPECT_EQ(reader.Join(), 0);
+    EXPECT_EQ(round->productions, 1);
+}
+
+TEST_F(ColdCacheTest, NobodyWaitsBeyondItsTimeForAProducerThatHangs)
+{
+    constexpr int Readers = 8;
+    ChildProcess hanging([this](ChildProcess::Link& link) {
+        Json::Value data;
+        MakeOwn([&link](Json::Value& /*produced*/) {
+            link.Tell();
+            return link.Await();
+        }).ReadWithin(Long, data);
+    });
+    ASSERT_TRUE(hanging.Await());
+    const auto begin = Clock::now();
+    ReadAtOnce(2, Readers / 2, milliseconds(200), Gives(New));
+    const auto took = std::chrono::duration_cast<milliseconds>(Clock::now() - begin);
+    EXPECT_THAT(States(Readers), Each(CacheState::None));
+    EXPECT_EQ(round->productions, 1);
+    EXPECT_GE(took, milliseconds(200));
+    EXPECT_LT(took, milliseconds(200 + BusyMachineMSec));
+    ReportCount("ms that 8 readers took whose time was 200 ms", static_cast<int>(took.count()));
+}
+
+// ---------------------------------------------------------------------------------------- failures
+
+TEST_F(ColdCacheTest, ReadersTakeOverOneAfterTheOtherFromProducersThatDie)
+{
+    constexpr int Readers = 16;
+    constexpr int Deaths = 5;
+    const Crowd crowd(Readers, [this](int reader) {
+        Read(reader, Long, [this](Json::Value& data) {
+            if (round->productions <= Deaths) {
+                --round->producing;
+                ::raise(SIGKILL);
+            }
+            return After(Production)(data);
+        });
+    });
+    for (int i = 0; i < Readers; ++i) round->readers.at(std::size_t(i)).state = CacheState::None;
+    ASSERT_TRUE(crowd.Start());
+    EXPECT_FALSE(crowd.Join());
+    const std::vector<CacheState> states = States(Readers);
+    EXPECT_EQ(std::count(states.begin(), states.end(), CacheState::Fresh), Readers - Deaths);
+    EXPECT_EQ(round->productions, Deaths + 1);
+    EXPECT_EQ(round->overlaps, 0);
+    EXPECT_THAT(FilesIn("cache"), ElementsAre("x.cached"));
+}
+
+TEST_F(ColdCacheTest, ReadersTryOneAfterTheOtherWhenProductionsFail)
+{
+    constexpr int Readers = 16;
+    constexpr int Failures = 5;
+    const Crowd crowd(Readers, [this](int number) {
+        Reader& reader = round->readers.at(static_cast<std::size_t>(number));
+        const auto produce = [this](Json::Value& data) {
+            std::this_thread::sleep_for(milliseconds(20));
+            return round->productions > Failures && Gives(New)(data);
+        };
+        Json::Value data;
+        reader.state = MakeOwn(produce, DocumentCache::SingleTry).ReadWithin(Long, data);
+    });
+    ASSERT_TRUE(crowd.Start());
+    EXPECT_TRUE(crowd.Join());
+    const std::vector<CacheState> states = States(Readers);
+    EXPECT_EQ(std::count(states.begin(), states.end(), CacheState::Fresh), Readers - Failures);
+    EXPECT_EQ(std::count(states.begin(), states.end(), CacheState::None), Failures);
+    EXPECT_EQ(round->productions, Failures + 1);
+    EXPECT_EQ(round->overlaps, 0);
+}
+
+TEST_F(ColdCacheTest, AReaderKilledAnywhereBlocksNobody)
+{
+    const auto prepare = [this] {
+        for (const std::string name : {"cache", "locks"}) {
+            std::filesystem::remove_all(dir.File(name));
+            std::filesystem::create_directory(dir.File(name));
+        }
+    };
+    const auto read = [this](int number) {
+        Json::Value data;
+        const CacheState state = MakeOwn(Gives(number)).ReadWithin(milliseconds(0), data);
+        return state == CacheState::Fresh ? NumberOf(data) : NoDocument;
+    };
+    const auto inspect = [&] {
+        EXPECT_THAT(read(Later), AnyOf(New, Later));
+        SetModifyTime(Path(), std::time(nullptr) - 2 * DocumentCache::TimeoutSeconds);
+        EXPECT_EQ(read(Later), Later);
+        EXPECT_THAT(FilesIn("cache"), ElementsAre("x.cached"));
+        EXPECT_THAT(FilesIn("locks"), ElementsAre("x.cached.lock"));
+    };
+    KillEverywhere({prepare, [&] { (void)read(New); }, inspect});
+}
+
+TEST_F(ColdCacheTest, OnAFullDiskEveryReaderGetsWhatItProduced)
+{
+    constexpr int Size = 16 * 1024;
+    constexpr int Threads = 4;
+    constexpr int Large = 999;  // about 100 KB
+    ChildProcess process([&](ChildProcess::Link& /*link*/) {
+        if (!BecomeRoot() || !MountSmallDisk(dir.File("cache"), Size)) {
+            // As if it were full.
+            (void)::chmod(dir.File("cache").c_str(), 0555);
+            if (::geteuid() == 0) (void)LoseRights();
+        }
+        std::vector<std::thread> threads;
+        for (int i = 0; i < Threads; ++i) {
+            threads.emplace_back([&, i] { Read(i, Long, Gives(Large)); });
+        }
+        for (std::thread& thread : threads) thread.join();
+    });
+    EXPECT_EQ(process.Join(), 0);
+    EXPECT_EQ(round->productions, Threads);
+    EXPECT_THAT(States(Threads), Each(CacheState::Fresh));
+    EXPECT_THAT(Numbers(Threads), Each(Large));
+    EXPECT_THAT(FilesIn("locks"), ElementsAre("x.cached.lock"));
+}
+
+// ----------------------------------------------------------------------------------- ordinary users
+
+class OrdinaryUserTest : public ColdCacheTest {
+  protected:
+    static constexpr int Readers = 16;
+
+    // All files of the test belong to whoever an ordinary process is.
+    void GiveAway() const
+    {
+        constexpr unsigned int Nobody = 65534;
+        for (const std::string& path : {dir.Path(), dir.File("cache")}) {
+            ASSERT_TRUE(::geteuid() != 0 || ::chown(path.c_str(), Nobody, Nobody) == 0);
+        }
+    }
+
+    // Each in a process without root's rights.
+    void ReadAsOrdinaryUsers(milliseconds patience, const Producer& produce)
+    {
+        const Crowd crowd(Readers, [&](int reader) {
+            if (::geteuid() == 0 && !LoseRights()) ::_exit(2);
+            Read(reader, patience, produce);
+        });
+        ASSERT_TRUE(crowd.Start());
+        EXPECT_TRUE(crowd.Join());
+    }
+};
+
+TEST_F(OrdinaryUserTest, ShareOneProductionWithALockOfTheirOwn)
+{
+    GiveAway();
+    ReadAsOrdinaryUsers(Long, After(Production));
+    EXPECT_EQ(round->productions, 1);
+    EXPECT_THAT(States(Readers), Each(CacheState::Fresh));
+    EXPECT_THAT(FilesIn("cache"), ElementsAre("x.cached"));
+    ReportCount("ms from the end of a production to the last of 16 ordinary processes",
+                SlowestMSec(Readers));
+}
+
+// The named lock is root's: some produce at the same time, and nobody hangs.
+TEST_F(OrdinaryUserTest, GetDataWithoutALockOfTheirOwn)
+{
+    GiveAway();
+    locks = "";
+    const auto begin = Clock::now();
+    ReadAsOrdinaryUsers(Long, Gives(New));
+    EXPECT_THAT(States(Readers), Each(CacheState::Fresh));
+    EXPECT_THAT(Numbers(Readers), Each(New));
+    EXPECT_LT(Clock::now() - begin, Long / 2);
+}
+
+TEST_F(OrdinaryUserTest, GetDataThatTheyCannotStore)
+{
+    GiveAway();
+    ASSERT_EQ(::chmod(dir.File("cache").c_str(), 0555), 0);
+    ReadAsOrdinaryUsers(Long, Gives(New));
+    EXPECT_THAT(States(Readers), Each(CacheState::Fresh));
+    EXPECT_THAT(Numbers(Readers), Each(New));
+    EXPECT_EQ(round->productions, Readers);
+    EXPECT_THAT(FilesIn("cache"), ElementsAre());
 }
 
 }  // namespace
