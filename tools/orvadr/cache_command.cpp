@@ -177,11 +177,7 @@ Report ReportCaches(const std::vector<std::string>& files)
         {"TIME-OUT", duration("timeout_seconds")},
         {"LAST", duration("last_refresh_seconds")},
         {"LONGEST", duration("longest_refresh_seconds")},
-        {"SIZE",
-         [](const Json::Value& object) {
-             const Json::Value& size = object["size_bytes"];
-             return size.isNull() ? "" : SizeText(size.asDouble());
-         }},
+        {"SIZE", SizeCell},
         {"FILE", [](const Json::Value& object) { return Printable(object["path"].asString()); }},
         {"UPDATER", [](const Json::Value& object) { return UpdaterLines(object["updater"]); }}};
     for (const std::string& file : files) ReportOne(file, report);

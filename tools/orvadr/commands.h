@@ -12,6 +12,9 @@ namespace Orvadr {
 // Cache files: fresh or stale, and who refreshes them.
 Report ReportCaches(const std::vector<std::string>& files);
 
+// SQLite databases: whether they are whole, and who has them open.
+Report ReportDatabases(const std::vector<std::string>& files);
+
 // Error codes by number or name; all of them without any.
 Report ReportErrors(const std::vector<std::string>& codesOrNames);
 

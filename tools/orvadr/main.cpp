@@ -45,6 +45,8 @@ std::vector<Command> Commands()
         {"cache",
          "Show whether caches are fresh, and who refreshes them. Code 1 unless all are fresh.",
          "FILE", "cache files, such as /var/dr/nodes.cached", true, Orvadr::ReportCaches},
+        {"db", "Check SQLite databases, and show who has them open. Code 1 unless all are ok.",
+         "FILE", "databases, such as /var/dr/nodes.db", true, Orvadr::ReportDatabases},
         {"lock", "Show who holds locks. Code 1 when one of those named is held.", "NAME",
          "as programs name it, below /tmp/.orvadr_lock; all lock files without any", false,
          Orvadr::ReportLocks},

@@ -13,6 +13,7 @@
 
 #include "base/file_io.h"
 #include "base/json_helpers.h"
+#include "table.h"
 #include "text.h"
 
 namespace Orvadr {
@@ -102,12 +103,9 @@ Json::Value DescribeProcess(pid_t pid, const std::string& command)
 
 std::string ProcessLines(const Json::Value& processes)
 {
-    std::string lines;
-    for (const Json::Value& process : processes) {
-        if (!lines.empty()) lines += '\n';
-        lines += process["pid"].asString() + " " + Printable(process["command"].asString());
-    }
-    return lines;
+    return LinesOf(processes, [](const Json::Value& process) {
+        return process["pid"].asString() + " " + Printable(process["command"].asString());
+    });
 }
 
 FileUses FindUses(const std::set<FileId>& files)

@@ -127,6 +127,17 @@ std::string FormatRow(const std::vector<Lines>& cells, const std::vector<std::si
 
 }  // namespace
 
+std::string LinesOf(const Json::Value& array,
+                    const std::function<std::string(const Json::Value&)>& line)
+{
+    std::string lines;
+    for (const Json::Value& element : array) {
+        if (!lines.empty()) lines += '\n';
+        lines += line(element);
+    }
+    return lines;
+}
+
 std::string FormatTable(const std::vector<Column>& columns, const Json::Value& objects,
                         const Screen& screen)
 {

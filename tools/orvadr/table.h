@@ -17,6 +17,10 @@ struct Column {
     std::function<std::string(const Json::Value&)> cell;
 };
 
+// A printable text for each object of an array, one per line of a cell.
+std::string LinesOf(const Json::Value& array,
+                    const std::function<std::string(const Json::Value&)>& line);
+
 // What the output can do.
 struct Screen {
     std::size_t columns = 0;  // 0: lines may be of any length

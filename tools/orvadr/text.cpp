@@ -181,6 +181,12 @@ std::string SizeText(double bytes)
     return Format("%.1f %s", bytes, Units[unit]);
 }
 
+std::string SizeCell(const Json::Value& object)
+{
+    const Json::Value& size = object["size_bytes"];
+    return size.isNull() ? "" : SizeText(size.asDouble());
+}
+
 std::string TimeText(std::time_t time)
 {
     std::tm local{};

@@ -35,6 +35,9 @@ std::string DurationText(double seconds);
 // "512 B", "1.2 kB", "3.4 MB".
 std::string SizeText(double bytes);
 
+// The `size_bytes` of an object, or nothing.
+std::string SizeCell(const Json::Value& object);
+
 // Local time, as "2026-11-22 03:02:11".
 std::string TimeText(std::time_t time);
 
