@@ -319,8 +319,8 @@ static_assert(!ReadsPairsInto<string, long> && !ReadsPairsInto<string, bool> &&
 
 static_assert(Has<Json::Value (Cache::*)() const>(&Cache::Read));
 static_assert(Has<const Json::Value& (Cache::*)() const>(&Cache::View));
-static_assert(Has<CacheState (Cache::*)(std::chrono::milliseconds, Json::Value&) const>(
-    &Cache::ReadWithin));
+static_assert(
+    Has<CacheState (Cache::*)(std::chrono::milliseconds, Json::Value&) const>(&Cache::ReadWithin));
 static_assert(Has<const string& (Cache::*)() const>(&Cache::GetPath));
 static_assert(Has<Json::Value (Cache::*)() const>(&Cache::GetCachedData));
 
