@@ -53,7 +53,7 @@ set(CPACK_DEBIAN_DEVELOPMENT_PACKAGE_DEPENDS
     "liborvadrcore${PROJECT_VERSION_MAJOR} (= ${PROJECT_VERSION}), libjsoncpp-dev")
 set(CPACK_DEBIAN_EXAMPLES_PACKAGE_ARCHITECTURE all)
 set(CPACK_DEBIAN_EXAMPLES_PACKAGE_RECOMMENDS liborvadrcore-dev)
-set(CPACK_DEBIAN_EXAMPLES_PACKAGE_SUGGESTS "libcpp-httplib-dev, pkg-config")
+set(CPACK_DEBIAN_EXAMPLES_PACKAGE_SUGGESTS "libcli11-dev, libcpp-httplib-dev, pkg-config")
 
 find_program(GZIP_PROGRAM gzip REQUIRED)
 execute_process(

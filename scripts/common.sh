@@ -7,7 +7,7 @@ cd "$(dirname "${BASH_SOURCE[0]}")/.."
 # shellcheck disable=SC2034  # used by the scripts that read this file
 build_packages=(g++ make cmake libsqlite3-dev libjsoncpp-dev uuid-runtime
     libcpp-httplib-dev pkg-config # these two for examples/node_service
-    libcli11-dev)                 # for tools/orvadr
+    libcli11-dev)                 # for tools/orvadr, examples/node_registry and node_service
 # shellcheck disable=SC2034
 test_packages=(libgtest-dev libgmock-dev)
 # shellcheck disable=SC2034

@@ -65,9 +65,7 @@ int main(int argc, char** argv)
     }
     // A reader that has gone makes a write fail; it must not end the program by a signal.
     static_cast<void>(std::signal(SIGPIPE, SIG_IGN));
-    if (options.wantsHelp) {
-        return Print(NodeRegistry::HelpText());
-    }
+    if (!options.help.empty()) return Print(options.help);
     ::openlog("node_registry", LOG_PID | (options.isVerbose ? LOG_PERROR : 0), LOG_USER);
     return Serve(options);
 }

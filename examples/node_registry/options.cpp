@@ -1,6 +1,7 @@
 #include "options.h"
 
 #include "api_help.h"
+#include "command_line.h"
 
 namespace NodeRegistry {
 
@@ -12,15 +13,6 @@ Answers requests about the remote nodes of a storage appliance. Reads one JSON
 object a line from the file INPUT, or from standard input when it is missing or
 "-", and writes one JSON reply a line. The nodes are kept in an SQLite file,
 which several of these programs may use at the same time.
-
-Options:
-)";
-
-constexpr const char* OwnOptions =
-    R"(  --verbose   log lines also on standard error; they always go to syslog
-  --pretty    for people: each request before its reply, errors by their name
-  --help      this text
-
 )";
 
 constexpr const char* ExitCodes =
@@ -38,33 +30,22 @@ const char* const UsageText =
     "                     [--status-dir DIRECTORY] [--verbose] [--pretty] [--help]\n"
     "                     [INPUT]\n";
 
-std::string HelpText()
-{
-    return std::string(UsageText) + Introduction + SettingsHelp + OwnOptions + ApiHelp + ExitCodes;
-}
-
 bool ReadOptions(int argc, const char* const* argv, Options& ret_options)
 {
+    CLI::App app;
     Options options;
-    bool hasInput = false;
-    for (int index = 1; index < argc; ++index) {
-        const Reading reading = ReadSetting(argc, argv, index, options.settings);
-        if (reading == Reading::Refused) return false;
-        if (reading == Reading::Taken) continue;
-
-        const std::string word = argv[index];
-        if (word == "--verbose") {
-            options.isVerbose = true;
-        } else if (word == "--pretty") {
-            options.isPretty = true;
-        } else if (word == "--help") {
-            options.wantsHelp = true;
-        } else if (!hasInput && (word == "-" || word.compare(0, 1, "-") != 0)) {
-            options.input = word;
-            hasInput = true;
-        } else {
-            return false;
-        }
+    bool wantsHelp = false;
+    AddSettings(app, options.settings);
+    app.add_flag("--verbose", options.isVerbose,
+                 "log lines also on standard error; they always go to syslog");
+    app.add_flag("--pretty", options.isPretty,
+                 "for people: each request before its reply, errors by their name");
+    AddHelp(app, wantsHelp);
+    app.add_option("INPUT", options.input);
+    if (!Parse(app, argc, argv)) return false;
+    if (wantsHelp) {
+        options.help =
+            std::string(UsageText) + Introduction + OptionsText(app) + "\n" + ApiHelp + ExitCodes;
     }
     ret_options = options;
     return true;

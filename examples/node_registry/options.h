@@ -13,15 +13,14 @@ struct Options {
     std::string input = "-";  // standard input
     bool isVerbose = false;
     bool isPretty = false;
-    bool wantsHelp = false;
+    std::string help;  // the text to print if --help is given
 };
 
 // False if the command line is wrong.
 bool ReadOptions(int argc, const char* const* argv, Options& ret_options);
 
-// The short help after a wrong command line, and the full one.
+// The short help after a wrong command line.
 extern const char* const UsageText;
-std::string HelpText();
 
 }  // namespace NodeRegistry
 

@@ -85,7 +85,7 @@ int main(int argc, char** argv)
     }
     // A client that has gone makes a write fail; it must not end the service by a signal.
     static_cast<void>(std::signal(SIGPIPE, SIG_IGN));
-    if (options.wantsHelp) return Print(NodeService::HelpText()) ? EXIT_SUCCESS : EXIT_FAILURE;
+    if (!options.help.empty()) return Print(options.help) ? EXIT_SUCCESS : EXIT_FAILURE;
     ::openlog("node_service", LOG_PID | (options.isVerbose ? LOG_PERROR : 0), LOG_DAEMON);
     return Serve(options);
 }

@@ -19,15 +19,14 @@ struct Options {
     int threads = 16;
     NodeRegistry::Settings settings;
     bool isVerbose = false;
-    bool wantsHelp = false;
+    std::string help;  // the text to print if --help is given
 };
 
 // False if the command line is wrong.
 bool ReadOptions(int argc, const char* const* argv, Options& ret_options);
 
-// The short help after a wrong command line, and the full one.
+// The short help after a wrong command line.
 extern const char* const UsageText;
-std::string HelpText();
 
 }  // namespace NodeService
 

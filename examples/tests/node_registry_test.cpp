@@ -585,6 +585,9 @@ TEST_F(NodeRegistryTest, WrongOptionsPrintTheUsage)
         {"--status-timeout", "-1"},
         {"--status-timeout", "1s"},
         {"--status-timeout", "99999999999"},
+        {"--status-timeout", "0x10"},
+        {"--status-timeout=1s"},
+        {"--db="},
         {"--status-dir"},
         {"--status-dir", ""},
     };
@@ -594,6 +597,19 @@ TEST_F(NodeRegistryTest, WrongOptionsPrintTheUsage)
         EXPECT_EQ(result.out, "") << options[0];
         EXPECT_EQ(result.err, Usage) << options[0];
     }
+}
+
+TEST_F(NodeRegistryTest, AValueMayFollowAnEqualsSignAndTheLastOneCounts)
+{
+    const std::string other = dir.File("other.db");
+    EXPECT_EQ(Run({"--db=" + other}, CreateCall("a")).code, 0);
+    EXPECT_TRUE(std::filesystem::exists(other));
+    EXPECT_FALSE(std::filesystem::exists(database));
+}
+
+TEST_F(NodeRegistryTest, NumbersAreDecimalEvenWithLeadingZeros)
+{
+    EXPECT_EQ(Run({"--status-timeout", "08"}, Call("list")).code, 0);
 }
 
 TEST_F(NodeRegistryTest, HelpListsOptionsMethodsAndCodes)

@@ -546,6 +546,7 @@ TEST_F(NodeServiceTest, WrongOptionsPrintTheUsage)
         {"--threads", "0"},
         {"--threads", "257"},
         {"--threads", "4x"},
+        {"--threads", "0400"},
         {"--status-timeout", "-1"},
         {"--status-dir", ""},
     };

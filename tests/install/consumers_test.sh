@@ -58,10 +58,13 @@ quietly cmake -S "$prefix/share/doc/liborvadrcore-examples/examples" -B "$work/e
 quietly cmake --build "$work/examples" -j "$(nproc)"
 (cd "$work" && examples/quick_start >/dev/null)
 [[ -x $work/examples/node_service ]]
-step "the installed examples without cpp-httplib"
-quietly cmake -S "$prefix/share/doc/liborvadrcore-examples/examples" -B "$work/fewer" \
-    -DCMAKE_PREFIX_PATH="$prefix" -DCMAKE_DISABLE_FIND_PACKAGE_PkgConfig=ON
-grep -q 'node_service is left out' "$work/log"
+step "the installed examples without cpp-httplib, and without CLI11"
+for missing in PkgConfig CLI11; do
+    quietly cmake -S "$prefix/share/doc/liborvadrcore-examples/examples" -B "$work/no-$missing" \
+        -DCMAKE_PREFIX_PATH="$prefix" -DCMAKE_DISABLE_FIND_PACKAGE_$missing=ON
+    grep -q 'node_service is left out' "$work/log"
+done
+grep -q 'node_registry is left out' "$work/log"
 
 step "the lock directory at boot"
 grep '^d /tmp/.orvadr_lock ' "$prefix/lib/tmpfiles.d/orvadrcore.conf" |

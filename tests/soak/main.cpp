@@ -6,15 +6,18 @@
 // findings, report.
 #include <unistd.h>
 
-#include <charconv>
+#include <CLI/CLI.hpp>
+
+#include <chrono>
 #include <csignal>
 #include <cstdio>
 #include <cstdlib>
-#include <cstring>
 #include <filesystem>
+#include <limits>
 #include <string>
 #include <system_error>
 
+#include "examples/node_registry/command_line.h"
 #include "neighbour.h"
 #include "plan.h"
 #include "soak.h"
@@ -25,40 +28,27 @@ constexpr int ExitUsage = 2;
 constexpr int ExitNoRights = 77;                 // CTest counts the test as skipped
 constexpr unsigned int LastResortSeconds = 300;  // longer than the run: then the soak itself hangs
 
-constexpr const char* Usage =
-    "usage: soak [--seconds COUNT] [--dir DIRECTORY]\n"
-    "\n"
+constexpr const char* Description =
     "Runs the node registry as a service, twice on the command line, and a neighbour, all\n"
-    "on one database, with 64 clients on 127.0.0.1, for COUNT seconds (default 120, at\n"
-    "least 10). Meanwhile it kills processes, fills the disk of the status and locks the\n"
-    "database. Prints measurements and each broken promise. If a promise was broken, keeps\n"
-    "DIRECTORY (default: a new one in /tmp) with the database and the log. Needs root or\n"
-    "user namespaces.\n"
-    "\n"
-    "Exit codes: 0 all promises kept, 1 a promise broken, 2 wrong options, 77 no rights.\n";
+    "on one database, with 64 clients on 127.0.0.1. Meanwhile it kills processes, fills the\n"
+    "disk of the status and locks the database. Prints measurements and each broken promise.\n"
+    "Needs root or user namespaces.\n";
+constexpr const char* ExitCodes =
+    "Exit codes: 0 all promises kept, 1 a promise broken, 2 wrong options, 77 no rights.";
 
-bool ReadSeconds(const char* text, std::chrono::seconds& ret_length)
-{
-    int count = 0;
-    const char* end = text + std::strlen(text);
-    const auto [rest, error] = std::from_chars(text, end, count);
-    if (error != std::errc() || rest != end || count < 10) return false;
-    ret_length = std::chrono::seconds(count);
-    return true;
-}
+constexpr int LeastSeconds = 10;
 
-bool ReadOptions(int argc, char** argv, Soak::Plan& plan)
+void AddOptions(CLI::App& app, int& ret_seconds, std::string& ret_directory)
 {
-    for (int index = 1; index < argc; index += 2) {
-        const std::string option = argv[index];
-        if (index + 1 == argc) return false;
-        if (option == "--dir") {
-            plan.directory = argv[index + 1];
-        } else if (option != "--seconds" || !ReadSeconds(argv[index + 1], plan.length)) {
-            return false;
-        }
-    }
-    return true;
+    app.add_option("--seconds", ret_seconds, "how long")
+        ->type_name("COUNT")
+        ->transform(NodeRegistry::Decimal(LeastSeconds, std::numeric_limits<int>::max()))
+        ->capture_default_str();
+    app.add_option("--dir", ret_directory,
+                   "keeps the database and the log if a promise was broken (default: a new\n"
+                   "one in /tmp)")
+        ->type_name("DIRECTORY");
+    app.footer(ExitCodes);
 }
 
 // Makes an empty directory. Returns its full path, or an empty text on failure.
@@ -84,10 +74,15 @@ int main(int argc, char** argv)
     if (role == "--hold" && argc == 3) return Soak::HoldLock(argv[2]);
 
     Soak::Plan plan;
-    if (!ReadOptions(argc, argv, plan)) {
-        std::fputs(Usage, stderr);
-        return ExitUsage;
+    auto seconds = static_cast<int>(plan.length.count());
+    CLI::App app(Description, "soak");
+    AddOptions(app, seconds, plan.directory);
+    try {
+        app.parse(argc, argv);
+    } catch (const CLI::ParseError& error) {
+        return app.exit(error) == 0 ? EXIT_SUCCESS : ExitUsage;
     }
+    plan.length = std::chrono::seconds(seconds);
     plan.directory = MakeDirectory(plan.directory);
     if (plan.directory.empty() || !Soak::Prepare(plan)) {
         std::fputs("soak: cannot make the directory or mount in it\n", stderr);
