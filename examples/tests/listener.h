@@ -15,20 +15,20 @@
 class Listener {
   public:
     explicit Listener(int backlog = SOMAXCONN)
-        : fd(::socket(AF_INET, SOCK_STREAM | SOCK_NONBLOCK | SOCK_CLOEXEC, 0))
+        : fd_(::socket(AF_INET, SOCK_STREAM | SOCK_NONBLOCK | SOCK_CLOEXEC, 0))
     {
         address.sin_family = AF_INET;
         address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
         socklen_t size = sizeof address;
         auto* any = reinterpret_cast<sockaddr*>(&address);
-        if (::bind(fd, any, size) != 0 || ::listen(fd, backlog) != 0 ||
-            ::getsockname(fd, any, &size) != 0) {
+        if (::bind(fd_, any, size) != 0 || ::listen(fd_, backlog) != 0 ||
+            ::getsockname(fd_, any, &size) != 0) {
             std::abort();
         }
     }
     Listener(const Listener&) = delete;
     Listener& operator=(const Listener&) = delete;
-    ~Listener() { ::close(fd); }
+    ~Listener() { ::close(fd_); }
 
     int Port() const { return ntohs(address.sin_port); }
 
@@ -37,19 +37,19 @@ class Listener {
     {
         for (int taken = Accept(); taken >= 0; taken = Accept()) {
             ::close(taken);
-            ++count;
+            ++count_;
         }
-        return count;
+        return count_;
     }
 
   protected:
     sockaddr_in address{};
 
   private:
-    int Accept() const { return ::accept(fd, nullptr, nullptr); }
+    int Accept() const { return ::accept(fd_, nullptr, nullptr); }
 
-    int fd;
-    int count = 0;
+    int fd_;
+    int count_ = 0;
 };
 
 // A port that neither accepts nor refuses connections, because its queue is full.
@@ -60,9 +60,9 @@ class SilentListener : public Listener {
         constexpr int SettleMSec = 200;
         bool isTaken = true;
         while (isTaken) {
-            callers.push_back(::socket(AF_INET, SOCK_STREAM | SOCK_NONBLOCK | SOCK_CLOEXEC, 0));
-            (void)::connect(callers.back(), reinterpret_cast<sockaddr*>(&address), sizeof address);
-            pollfd waiting{callers.back(), POLLOUT, 0};
+            callers_.push_back(::socket(AF_INET, SOCK_STREAM | SOCK_NONBLOCK | SOCK_CLOEXEC, 0));
+            (void)::connect(callers_.back(), reinterpret_cast<sockaddr*>(&address), sizeof address);
+            pollfd waiting{callers_.back(), POLLOUT, 0};
             isTaken = ::poll(&waiting, 1, SettleMSec) == 1;
         }
     }
@@ -70,11 +70,11 @@ class SilentListener : public Listener {
     SilentListener& operator=(const SilentListener&) = delete;
     ~SilentListener()
     {
-        for (const int caller : callers) ::close(caller);
+        for (const int caller : callers_) ::close(caller);
     }
 
   private:
-    std::vector<int> callers;
+    std::vector<int> callers_;
 };
 
 #endif

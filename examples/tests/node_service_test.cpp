@@ -78,28 +78,28 @@ void InThreads(int count, const std::function<void(int)>& body)
 class Service {
   public:
     explicit Service(const std::vector<std::string>& options, const std::string& address)
-        : program(Words(options, address))
+        : program_(Words(options, address))
     {
-        const std::string line = program.ReadLine();
+        const std::string line = program_.ReadLine();
         EXPECT_THAT(line, StartsWith("listening on 127.0.0.1:"));
-        port = std::atoi(line.substr(line.rfind(':') + 1).c_str());
+        port_ = std::atoi(line.substr(line.rfind(':') + 1).c_str());
     }
 
-    int Port() const { return port; }
-    std::string Address() const { return "127.0.0.1:" + std::to_string(port); }
-    pid_t Pid() const { return program.Pid(); }
-    void Kill(int signal) const { program.Kill(signal); }
+    int Port() const { return port_; }
+    std::string Address() const { return "127.0.0.1:" + std::to_string(port_); }
+    pid_t Pid() const { return program_.Pid(); }
+    void Kill(int signal) const { program_.Kill(signal); }
 
-    HttpReply Ask(const std::string& request) const { return Post(port, "/webapi", request); }
+    HttpReply Ask(const std::string& request) const { return Post(port_, "/webapi", request); }
 
     // Ends the service. Returns what it has printed.
     ProgramResult End(int signal = SIGTERM)
     {
-        program.Kill(signal);
-        return program.Finish();
+        program_.Kill(signal);
+        return program_.Finish();
     }
 
-    bool IsListening() const { return HttpConnection(port).IsOpen(); }
+    bool IsListening() const { return HttpConnection(port_).IsOpen(); }
 
   private:
     static std::vector<std::string> Words(const std::vector<std::string>& options,
@@ -110,8 +110,8 @@ class Service {
         return words;
     }
 
-    Program program;
-    int port = 0;
+    Program program_;
+    int port_ = 0;
 };
 
 class NodeServiceTest : public NodeRegistryTest {

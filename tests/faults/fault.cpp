@@ -198,30 +198,30 @@ class System {
   public:
     System()
     {
-        lockPlace = &locks;
-        Let(faults.open, OpenPlaced, Call::Open);
-        Let(faults.read, RealRead, Call::Read);
-        Let(faults.write, RealWrite, Call::Write);
-        Let(faults.fchmod, RealFchmod, Call::Fchmod);
-        Let(faults.fsync, NoSync, Call::Fsync);
-        Let(faults.fdatasync, NoSync, Call::Fsync);
-        Let(faults.rename, RealRename, Call::Rename);
-        Let(faults.unlink, RealUnlink, Call::Unlink);
-        Let(faults.stat, StatPlaced, Call::Stat);
-        Let(faults.stat64, RealStat64, Call::Stat);
-        Let(faults.lstat, RealLstat, Call::Stat);
-        Let(faults.fstat, RealFstat, Call::Fstat);
-        Let(faults.flock, RealFlock, Call::Flock);
-        Let(faults.fcntl, RealFcntl, Call::Fcntl);
-        Let(faults.clone, RealClone, Call::Clone);
-        Let(faults.pipe2, RealPipe2, Call::Pipe);
-        Let(faults.dup2, RealDup2, Call::Dup);
-        Let(faults.waitpid, RealWaitpid, Call::Waitpid);
-        Let(faults.getrandom, RealGetrandom, Call::Getrandom);
-        Let(faults.fdopen, RealFdopen, Call::Fdopen);
-        Let(processes.fork, RealFork, Call::Fork);
-        faults.close = CloseAnyway;
-        faults.spawn = SpawnPlaced;
+        lockPlace = &locks_;
+        Let(faults_.open, OpenPlaced, Call::Open);
+        Let(faults_.read, RealRead, Call::Read);
+        Let(faults_.write, RealWrite, Call::Write);
+        Let(faults_.fchmod, RealFchmod, Call::Fchmod);
+        Let(faults_.fsync, NoSync, Call::Fsync);
+        Let(faults_.fdatasync, NoSync, Call::Fsync);
+        Let(faults_.rename, RealRename, Call::Rename);
+        Let(faults_.unlink, RealUnlink, Call::Unlink);
+        Let(faults_.stat, StatPlaced, Call::Stat);
+        Let(faults_.stat64, RealStat64, Call::Stat);
+        Let(faults_.lstat, RealLstat, Call::Stat);
+        Let(faults_.fstat, RealFstat, Call::Fstat);
+        Let(faults_.flock, RealFlock, Call::Flock);
+        Let(faults_.fcntl, RealFcntl, Call::Fcntl);
+        Let(faults_.clone, RealClone, Call::Clone);
+        Let(faults_.pipe2, RealPipe2, Call::Pipe);
+        Let(faults_.dup2, RealDup2, Call::Dup);
+        Let(faults_.waitpid, RealWaitpid, Call::Waitpid);
+        Let(faults_.getrandom, RealGetrandom, Call::Getrandom);
+        Let(faults_.fdopen, RealFdopen, Call::Fdopen);
+        Let(processes_.fork, RealFork, Call::Fork);
+        faults_.close = CloseAnyway;
+        faults_.spawn = SpawnPlaced;
         // The C library allocates for the texts of errors once. It does so now, before we count.
         for (const Kind& kind : Kinds()) {
             for (const int error : kind.errors) {
@@ -232,7 +232,7 @@ class System {
         // So does our library for JSON.
         Json::Value document;
         EXPECT_TRUE(OrvaDRCore::fromString(document, OrvaDRCore::toString(document)));
-        faults.sleep = [](unsigned int /*seconds*/) { return 0U; };
+        faults_.sleep = [](unsigned int /*seconds*/) { return 0U; };
         SendLogTo(CountLine);
         AskBeforeAllocating(AllocationFails);
     }
@@ -261,9 +261,9 @@ class System {
         };
     }
 
-    TempDir locks;
-    SyscallFaults faults;
-    ProcessFaults processes;
+    TempDir locks_;
+    SyscallFaults faults_;
+    ProcessFaults processes_;
 };
 
 void AwaitChildren()

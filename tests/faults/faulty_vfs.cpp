@@ -169,16 +169,16 @@ int Access(sqlite3_vfs* /*vfs*/, const char* name, int flags, int* result)
 FaultyVfs::FaultyVfs()
 {
     theirs = sqlite3_vfs_find("unix");
-    vfs = *theirs;
-    vfs.zName = "faulty";
-    vfs.szOsFile += static_cast<int>(sizeof(File));
-    vfs.xOpen = Open;
-    vfs.xDelete = Delete;
-    vfs.xAccess = Access;
-    sqlite3_vfs_register(&vfs, 1);
+    vfs_ = *theirs;
+    vfs_.zName = "faulty";
+    vfs_.szOsFile += static_cast<int>(sizeof(File));
+    vfs_.xOpen = Open;
+    vfs_.xDelete = Delete;
+    vfs_.xAccess = Access;
+    sqlite3_vfs_register(&vfs_, 1);
 }
 
 FaultyVfs::~FaultyVfs()
 {
-    sqlite3_vfs_unregister(&vfs);
+    sqlite3_vfs_unregister(&vfs_);
 }

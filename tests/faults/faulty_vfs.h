@@ -13,7 +13,7 @@ class FaultyVfs {
     ~FaultyVfs();
 
   private:
-    sqlite3_vfs vfs;
+    sqlite3_vfs vfs_;
 };
 
 #endif

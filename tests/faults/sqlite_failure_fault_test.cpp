@@ -46,8 +46,8 @@ class Refusal {
   public:
     Refusal(const std::string& text, int count)
     {
-        faults.prepare = [text, count](sqlite3* db, const char* sql,
-                                       sqlite3_stmt** statement) mutable {
+        faults_.prepare = [text, count](sqlite3* db, const char* sql,
+                                        sqlite3_stmt** statement) mutable {
             if (text != sql || count-- <= 0) return RealPrepare(db, sql, statement);
             *statement = nullptr;
             return SQLITE_IOERR;
@@ -55,7 +55,7 @@ class Refusal {
     }
 
   private:
-    SqliteFaults faults;
+    SqliteFaults faults_;
 };
 
 void RefuseInTransaction(const std::string& text, int count)

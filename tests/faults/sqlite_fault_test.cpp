@@ -187,10 +187,10 @@ class Originals {
             }
         }
     }
-    std::string Of(const std::string& mode) const { return dir.File(mode + ".db"); }
+    std::string Of(const std::string& mode) const { return dir_.File(mode + ".db"); }
 
   private:
-    TempDir dir;
+    TempDir dir_;
 };
 
 std::string Content(const std::string& path)

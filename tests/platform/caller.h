@@ -27,7 +27,7 @@ class Pipe {
   public:
     Pipe()
     {
-        if (::pipe2(ends.data(), O_CLOEXEC) < 0) std::abort();
+        if (::pipe2(ends_.data(), O_CLOEXEC) < 0) std::abort();
     }
     Pipe(const Pipe&) = delete;
     Pipe& operator=(const Pipe&) = delete;
@@ -37,10 +37,10 @@ class Pipe {
         CloseWriting();
     }
 
-    int Reading() const { return ends[0]; }
-    int Writing() const { return ends[1]; }
-    void CloseReading() { Close(ends[0]); }
-    void CloseWriting() { Close(ends[1]); }
+    int Reading() const { return ends_[0]; }
+    int Writing() const { return ends_[1]; }
+    void CloseReading() { Close(ends_[0]); }
+    void CloseWriting() { Close(ends_[1]); }
 
     void Write(const std::string& text) const
     {
@@ -89,7 +89,7 @@ class Pipe {
         return true;
     }
 
-    std::array<int, 2> ends{-1, -1};
+    std::array<int, 2> ends_{-1, -1};
 };
 
 // The number that a text begins with, or 0.

@@ -68,12 +68,12 @@ class OrvaCoreTest : public ::testing::Test {
   protected:
     void TearDown() override
     {
-        EXPECT_EQ(CountDescriptors(), descriptors);
+        EXPECT_EQ(CountDescriptors(), descriptors_);
         EXPECT_FALSE(HasChildren());
     }
 
   private:
-    std::size_t descriptors = CountDescriptors();
+    std::size_t descriptors_ = CountDescriptors();
 };
 
 TEST_F(OrvaCoreTest, TheOutputIsReadToItsEnd)

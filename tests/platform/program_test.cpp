@@ -271,8 +271,8 @@ TEST_F(ProgramTest, ReturnsTheResultWhateverTheCallerDoesWithSigchld)
 class Reaper {
   public:
     Reaper()
-        : thread([this] {
-              while (!done) {
+        : thread_([this] {
+              while (!done_) {
                   ReapChildren(0);
                   ::sched_yield();
               }
@@ -283,13 +283,13 @@ class Reaper {
     Reaper& operator=(const Reaper&) = delete;
     ~Reaper()
     {
-        done = true;
-        thread.join();
+        done_ = true;
+        thread_.join();
     }
 
   private:
-    std::atomic<bool> done{false};
-    std::thread thread;
+    std::atomic<bool> done_{false};
+    std::thread thread_;
 };
 
 TEST_F(ProgramTest, ACompanionHidesTheResultFromAThreadThatReapsAllChildren)

@@ -58,14 +58,14 @@ class ObservedPauses {
   public:
     explicit ObservedPauses(const std::function<void()>& action)
     {
-        pauses.OnPause([this, action](std::size_t /*count*/) {
+        pauses_.OnPause([this, action](std::size_t /*count*/) {
             action();
-            std::this_thread::sleep_for(std::chrono::microseconds(pauses.Taken().back()));
+            std::this_thread::sleep_for(std::chrono::microseconds(pauses_.Taken().back()));
         });
     }
 
   private:
-    Pauses pauses;
+    Pauses pauses_;
 };
 
 // ------------------------------------------------------------------------------ many at once
@@ -76,20 +76,20 @@ class Barrier {
   public:
     Barrier()
     {
-        if (::pipe2(ends.data(), O_CLOEXEC) < 0) std::abort();
+        if (::pipe2(ends_.data(), O_CLOEXEC) < 0) std::abort();
     }
     Barrier(const Barrier&) = delete;
     Barrier& operator=(const Barrier&) = delete;
     ~Barrier()
     {
         Arrive();
-        ::close(ends[0]);
+        ::close(ends_[0]);
     }
 
     void Arrive()
     {
-        if (ends[1] >= 0) ::close(ends[1]);
-        ends[1] = -1;
+        if (ends_[1] >= 0) ::close(ends_[1]);
+        ends_[1] = -1;
     }
 
     // Arrives and waits until all others have arrived. False after the deadline.
@@ -97,12 +97,12 @@ class Barrier {
     {
         constexpr int DeadlineMSec = 60'000;
         Arrive();
-        pollfd waiting{ends[0], POLLIN, 0};
+        pollfd waiting{ends_[0], POLLIN, 0};
         return ::poll(&waiting, 1, DeadlineMSec) > 0;
     }
 
   private:
-    std::array<int, 2> ends{};  // a pipe; processes that have not arrived hold its write end
+    std::array<int, 2> ends_{};  // a pipe; processes that have not arrived hold its write end
 };
 
 class ManyReadersTest : public ProcessTest {
@@ -119,7 +119,7 @@ class ManyReadersTest : public ProcessTest {
 
     // The productions of the last round, and the documents that readers got which waited or did
     // not.
-    int RoundProductions() const { return Productions() - productionsBefore; }
+    int RoundProductions() const { return Productions() - productionsBefore_; }
     std::vector<int> NumbersRead(bool waited) const;
 
   private:
@@ -135,8 +135,8 @@ class ManyReadersTest : public ProcessTest {
 
     void ReadInRound(Mode mode, Reader& reader, const Producer& produce, Barrier& barrier);
 
-    SharedMemory<Round> round;
-    int productionsBefore = 0;
+    SharedMemory<Round> round_;
+    int productionsBefore_ = 0;
 };
 
 void ManyReadersTest::ReadInRound(Mode mode, Reader& reader, const Producer& produce,
@@ -152,28 +152,28 @@ void ManyReadersTest::ReadInRound(Mode mode, Reader& reader, const Producer& pro
 void ManyReadersTest::ReadAtOnce(int number, const std::function<Mode(int)>& modeOf,
                                  const Action& whileProducing)
 {
-    productionsBefore = Productions();
+    productionsBefore_ = Productions();
     Barrier barrier;
     const auto produce = [&](Json::Value& data) {
-        if (round->producing++ != 0) ++round->overlaps;
+        if (round_->producing++ != 0) ++round_->overlaps;
         const bool succeeded = whileProducing(barrier);
-        --round->producing;
+        --round_->producing;
         return succeeded && Gives(number)(data);
     };
 
-    for (Reader& reader : round->readers) {
+    for (Reader& reader : round_->readers) {
         reader.number = NoDocument;
         reader.waited = false;
     }
     const Crowd crowd(Readers, [&](int i) {
-        ReadInRound(modeOf(i), round->readers.at(static_cast<std::size_t>(i)), produce, barrier);
+        ReadInRound(modeOf(i), round_->readers.at(static_cast<std::size_t>(i)), produce, barrier);
     });
     barrier.Arrive();
     ASSERT_TRUE(crowd.Start());
     EXPECT_TRUE(crowd.Join());
     ReapAll();
 
-    EXPECT_EQ(round->overlaps, 0);
+    EXPECT_EQ(round_->overlaps, 0);
     EXPECT_EQ(NumberInFile(), number);
     EXPECT_THAT(Files(), ElementsAre("x.cached"));
 }
@@ -181,7 +181,7 @@ void ManyReadersTest::ReadAtOnce(int number, const std::function<Mode(int)>& mod
 std::vector<int> ManyReadersTest::NumbersRead(bool waited) const
 {
     std::vector<int> numbers;
-    for (const Reader& reader : round->readers) {
+    for (const Reader& reader : round_->readers) {
         if (reader.waited == waited) numbers.push_back(reader.number);
     }
     return numbers;

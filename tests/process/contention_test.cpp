@@ -103,17 +103,17 @@ struct Writer {
 class Work {
   public:
     Work(SqliteDB&& connection, int number, Writer& notes)
-        : db(std::move(connection)), firstId(number * MaxRecords), writer(notes)
+        : db_(std::move(connection)), firstId_(number * MaxRecords), writer_(notes)
     {
     }
 
     // Inserts a record, changes it and reads it back. Removes every other one.
     void DoNext()
     {
-        const int record = writer.records++;
-        const int id = firstId + record;
-        std::atomic<unsigned char>& state = writer.states.at(static_cast<std::size_t>(record));
-        if (Take([&] { return Insert(db, id); })) state = Made;
+        const int record = writer_.records++;
+        const int id = firstId_ + record;
+        std::atomic<unsigned char>& state = writer_.states.at(static_cast<std::size_t>(record));
+        if (Take([&] { return Insert(db_, id); })) state = Made;
         // Change() returns true even without such a record.
         if (Take([&] { return Change(id); }, &Writer::statementWait) && state == Made)
             state = Changed;
@@ -130,11 +130,11 @@ class Work {
         const Slept before = CountSlept();
         const bool done = operation();
         const Slept after = CountSlept();
-        KeepLonger(writer.longest, Clock::now() - begin);
-        KeepLonger(writer.*wait,
+        KeepLonger(writer_.longest, Clock::now() - begin);
+        KeepLonger(writer_.*wait,
                    std::chrono::microseconds(after.microseconds - before.microseconds));
-        writer.pauses += after.pauses - before.pauses;
-        ++(done ? writer.done : writer.failed);
+        writer_.pauses += after.pauses - before.pauses;
+        ++(done ? writer_.done : writer_.failed);
         return done;
     }
 
@@ -151,10 +151,10 @@ class Work {
         update.SetTable(SqliteTableHandler(Jobs().GetName(), ""));
         update.AddFieldValue("state", Changed);
         update.SetCondition(SqliteEqual("id", id));
-        return db.UpdateRecord(update);
+        return db_.UpdateRecord(update);
     }
 
-    bool Delete(int id) { return db.DeleteRecord(SqliteEqual("id", id).GetCondition(), Jobs()); }
+    bool Delete(int id) { return db_.DeleteRecord(SqliteEqual("id", id).GetCondition(), Jobs()); }
 
     void Check(int id, int expected)
     {
@@ -163,16 +163,16 @@ class Work {
         select.AddField("state");
         select.SetCondition(SqliteEqual("id", id));
         std::vector<SqliteValueList> rows;
-        if (!Take([&] { return db.SelectRecords(select, rows); })) return;
+        if (!Take([&] { return db_.SelectRecords(select, rows); })) return;
         int state = Absent;
         // An attempt that failed halfway may have left its rows in front.
         if (!rows.empty() && !rows.back().GetValue("state", state)) state = -1;
-        if (state != expected) ++writer.wrong;
+        if (state != expected) ++writer_.wrong;
     }
 
-    SqliteDB db;
-    int firstId;
-    Writer& writer;
+    SqliteDB db_;
+    int firstId_;
+    Writer& writer_;
 };
 
 class ContentionTest : public ProcessTest {

@@ -46,8 +46,8 @@ class BusyThreads {
     BusyThreads(int count, const std::function<void()>& work)
     {
         for (int i = 0; i < count; ++i) {
-            threads.emplace_back([this, work] {
-                while (!done) {
+            threads_.emplace_back([this, work] {
+                while (!done_) {
                     for (int turn = 0; turn < Turns; ++turn) work();
                     std::this_thread::sleep_for(std::chrono::milliseconds(1));
                 }
@@ -58,15 +58,15 @@ class BusyThreads {
     BusyThreads& operator=(const BusyThreads&) = delete;
     ~BusyThreads()
     {
-        done = true;
-        for (std::thread& thread : threads) thread.join();
+        done_ = true;
+        for (std::thread& thread : threads_) thread.join();
     }
 
   private:
     static constexpr int Turns = 50;
 
-    std::atomic<bool> done{false};
-    std::vector<std::thread> threads;
+    std::atomic<bool> done_{false};
+    std::vector<std::thread> threads_;
 };
 
 void Log()
@@ -202,20 +202,20 @@ class Sleepers {
                                        nullptr};
         pid_t pid = 0;
         if (::posix_spawn(&pid, "/bin/sleep", nullptr, nullptr, arguments.data(), environ) == 0) {
-            pids.push_back(pid);
+            pids_.push_back(pid);
         }
     }
 
     void End()
     {
-        for (const pid_t pid : std::exchange(pids, {})) {
+        for (const pid_t pid : std::exchange(pids_, {})) {
             ::kill(pid, SIGKILL);
             ::waitpid(pid, nullptr, 0);
         }
     }
 
   private:
-    std::vector<pid_t> pids;
+    std::vector<pid_t> pids_;
 };
 
 TEST_F(ThreadedCallerTest, ProgramsStartedDuringAnUpdateDoNotKeepTheCachesLock)

@@ -63,26 +63,26 @@ Invalid InvalidOf(int which)
 
 }  // namespace
 
-HttpChannel::HttpChannel(int servicePort, Findings& where) : port(servicePort), findings(where) {}
+HttpChannel::HttpChannel(int servicePort, Findings& where) : port_(servicePort), findings_(where) {}
 
 Answer HttpChannel::Ask(const std::string& request)
 {
     const auto begin = Clock::now();
-    const HttpConnection connection(port, Patience);
+    const HttpConnection connection(port_, Patience);
     if (!connection.IsOpen()) return {};
     connection.Send(HttpRequest("POST", "/webapi", request));
     const HttpReply reply = connection.Receive();
     if (reply.status == 200) return ToldBy(reply.body);
-    if (Clock::now() - begin >= Patience) ReportNoAnswer(findings, request);
+    if (Clock::now() - begin >= Patience) ReportNoAnswer(findings_, request);
     if (reply.status != 0) {
-        findings.Add(Promise::Answers, request + " got HTTP " + std::to_string(reply.status));
+        findings_.Add(Promise::Answers, request + " got HTTP " + std::to_string(reply.status));
     }
     return Lost();
 }
 
 std::optional<bool> HttpChannel::AskNonsense(int which)
 {
-    const HttpConnection connection(port, Patience);
+    const HttpConnection connection(port_, Patience);
     if (!connection.IsOpen()) return std::nullopt;
     const Invalid invalid = InvalidOf(which);
     connection.Send(invalid.bytes);
@@ -91,7 +91,7 @@ std::optional<bool> HttpChannel::AskNonsense(int which)
     return reply.status == invalid.status && !Response(reply.body).isSuccess();
 }
 
-LineChannel::LineChannel(std::string who, Findings& where) : name(std::move(who)), findings(where)
+LineChannel::LineChannel(std::string who, Findings& where) : name_(std::move(who)), findings_(where)
 {
 }
 
@@ -102,21 +102,21 @@ LineChannel::~LineChannel()
 
 void LineChannel::Give(Pipes fresh)
 {
-    const std::lock_guard<std::mutex> lock(mutex);
-    given = fresh;
-    changed.notify_all();
+    const std::lock_guard<std::mutex> lock(mutex_);
+    given_ = fresh;
+    changed_.notify_all();
 }
 
 void LineChannel::Close()
 {
-    if (current.in < 0) TakeFresh();
-    if (current.in >= 0) ::close(current.in);
-    current.in = -1;
+    if (current_.in < 0) TakeFresh();
+    if (current_.in >= 0) ::close(current_.in);
+    current_.in = -1;
 }
 
 Answer LineChannel::Ask(const std::string& request)
 {
-    if (current.in < 0 && !TakeFresh()) return {};
+    if (current_.in < 0 && !TakeFresh()) return {};
     if (!Write(request + "\n")) {
         CloseCurrent();
         return Lost();
@@ -134,35 +134,35 @@ std::optional<bool> LineChannel::AskNonsense(int /*which*/)
 
 std::optional<std::string> LineChannel::ReadLine()
 {
-    if (current.out < 0 && !TakeFresh()) return std::nullopt;
-    std::size_t end = unread.find('\n');
+    if (current_.out < 0 && !TakeFresh()) return std::nullopt;
+    std::size_t end = unread_.find('\n');
     while (end == std::string::npos) {
-        pollfd waiting{current.out, POLLIN, 0};
+        pollfd waiting{current_.out, POLLIN, 0};
         if (::poll(&waiting, 1, static_cast<int>(milliseconds(Patience).count())) == 0) {
-            ReportNoAnswer(findings, name);
+            ReportNoAnswer(findings_, name_);
         }
         std::array<char, 16384> buffer{};
         const ssize_t count =
-            waiting.revents == 0 ? 0 : ::read(current.out, buffer.data(), buffer.size());
+            waiting.revents == 0 ? 0 : ::read(current_.out, buffer.data(), buffer.size());
         if (count <= 0) {
             CloseCurrent();
             return std::nullopt;
         }
-        unread.append(buffer.data(), static_cast<std::size_t>(count));
-        end = unread.find('\n');
+        unread_.append(buffer.data(), static_cast<std::size_t>(count));
+        end = unread_.find('\n');
     }
-    std::string line = unread.substr(0, end);
-    unread.erase(0, end + 1);
+    std::string line = unread_.substr(0, end);
+    unread_.erase(0, end + 1);
     return line;
 }
 
 // Takes the pipes of the next process, if one starts soon.
 bool LineChannel::TakeFresh()
 {
-    std::unique_lock<std::mutex> lock(mutex);
-    if (!changed.wait_for(lock, AwaitFresh, [this] { return given.has_value(); })) return false;
-    current = *given;
-    given.reset();
+    std::unique_lock<std::mutex> lock(mutex_);
+    if (!changed_.wait_for(lock, AwaitFresh, [this] { return given_.has_value(); })) return false;
+    current_ = *given_;
+    given_.reset();
     return true;
 }
 
@@ -171,7 +171,7 @@ bool LineChannel::Write(const std::string& text) const
     std::size_t written = 0;
     while (written < text.size()) {
         const ssize_t count = RetryOnEintr(
-            [&] { return ::write(current.in, text.data() + written, text.size() - written); });
+            [&] { return ::write(current_.in, text.data() + written, text.size() - written); });
         if (count <= 0) return false;
         written += static_cast<std::size_t>(count);
     }
@@ -180,10 +180,10 @@ bool LineChannel::Write(const std::string& text) const
 
 void LineChannel::CloseCurrent()
 {
-    if (current.in >= 0) ::close(current.in);
-    if (current.out >= 0) ::close(current.out);
-    current = {};
-    unread.clear();
+    if (current_.in >= 0) ::close(current_.in);
+    if (current_.out >= 0) ::close(current_.out);
+    current_ = {};
+    unread_.clear();
 }
 
 }  // namespace Soak

@@ -22,8 +22,8 @@ class HttpChannel {
     std::optional<bool> AskNonsense(int which);
 
   private:
-    int port;
-    Findings& findings;
+    int port_;
+    Findings& findings_;
 };
 
 // One thread writes and reads lines, another passes in the pipes of each new process.
@@ -51,14 +51,14 @@ class LineChannel {
     bool Write(const std::string& text) const;
     void CloseCurrent();
 
-    std::string name;
-    Findings& findings;
-    Pipes current;
-    std::string unread;
+    std::string name_;
+    Findings& findings_;
+    Pipes current_;
+    std::string unread_;
 
-    std::mutex mutex;  // guards `given`
-    std::condition_variable changed;
-    std::optional<Pipes> given;
+    std::mutex mutex_;  // guards `given`
+    std::condition_variable changed_;
+    std::optional<Pipes> given_;
 };
 
 }  // namespace Soak

@@ -37,22 +37,22 @@ std::string Ballast(const Plan& plan)
 }  // namespace
 
 Chaos::Chaos(const Plan& thePlan, Company& theCompany, Reaper& theReaper)
-    : plan(thePlan), company(theCompany), reaper(theReaper)
+    : plan_(thePlan), company_(theCompany), reaper_(theReaper)
 {
 }
 
 void Chaos::Step(bool areSurvivorsSpared)
 {
     const auto now = Clock::now();
-    if (isDiskFull && now >= diskEmptyDue) EmptyDisk();
-    if (now < due) return;
-    due = now + EventEvery;
-    switch (Order.at(next++ % Order.size())) {
+    if (isDiskFull_ && now >= diskEmptyDue_) EmptyDisk();
+    if (now < due_) return;
+    due_ = now + EventEvery;
+    switch (Order.at(next_++ % Order.size())) {
         case Event::KillService:
-            return areSurvivorsSpared ? KillRefresh() : KillSome(company.Service());
-        case Event::KillRegistry: return KillSome(company.Registry(areSurvivorsSpared ? 1 : 0));
-        case Event::KillOtherRegistry: return KillSome(company.Registry(1));
-        case Event::KillNeighbour: return KillSome(company.Neighbour());
+            return areSurvivorsSpared ? KillRefresh() : KillSome(company_.Service());
+        case Event::KillRegistry: return KillSome(company_.Registry(areSurvivorsSpared ? 1 : 0));
+        case Event::KillOtherRegistry: return KillSome(company_.Registry(1));
+        case Event::KillNeighbour: return KillSome(company_.Neighbour());
         case Event::KillRefresh: return KillRefresh();
         case Event::FillDisk: return FillDisk();
         case Event::HoldLock: return HoldLock();
@@ -61,8 +61,8 @@ void Chaos::Step(bool areSurvivorsSpared)
 
 void Chaos::Calm()
 {
-    if (isDiskFull) EmptyDisk();
-    if (holder) static_cast<void>(reaper.AwaitEnd(*holder, plan.bounds.end));
+    if (isDiskFull_) EmptyDisk();
+    if (holder_) static_cast<void>(reaper_.AwaitEnd(*holder_, plan_.bounds.end));
 }
 
 void Chaos::KillSome(Member& member)
@@ -77,47 +77,47 @@ void Chaos::KillRefresh()
     pid_t updater = 0;
     const auto deadline = Clock::now() + EventEvery;
     while (updater == 0 && Clock::now() < deadline) {
-        std::ifstream(plan.StatusFile() + ".pid") >> updater;
+        std::ifstream(plan_.StatusFile() + ".pid") >> updater;
     }
     // Kills only our own processes, whatever the file contains.
-    if (updater <= 0 || CommandOf(updater).find(plan.directory) == std::string::npos) return;
-    for (const auto& member : company.Members()) {
+    if (updater <= 0 || CommandOf(updater).find(plan_.directory) == std::string::npos) return;
+    for (const auto& member : company_.Members()) {
         if (member->Pid() == updater) return;
     }
-    if (::kill(updater, SIGKILL) == 0) ++events.refreshesKilled;
+    if (::kill(updater, SIGKILL) == 0) ++events_.refreshesKilled;
 }
 
 void Chaos::FillDisk()
 {
-    const int file = ::open(Ballast(plan).c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0600);
+    const int file = ::open(Ballast(plan_).c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0600);
     const std::array<char, 512> block{};
     while (::write(file, block.data(), block.size()) > 0) {
     }
     ::close(file);
-    isDiskFull = true;
-    diskEmptyDue = Clock::now() + DiskIsFull;
-    ++events.disksFilled;
+    isDiskFull_ = true;
+    diskEmptyDue_ = Clock::now() + DiskIsFull;
+    ++events_.disksFilled;
 }
 
 void Chaos::EmptyDisk()
 {
-    ::unlink(Ballast(plan).c_str());
-    isDiskFull = false;
+    ::unlink(Ballast(plan_).c_str());
+    isDiskFull_ = false;
 }
 
 void Chaos::HoldLock()
 {
-    if (holder) {
-        const auto end = reaper.EndOf(*holder);
+    if (holder_) {
+        const auto end = reaper_.EndOf(*holder_);
         if (!end) return;  // it is still waiting for the lock
-        if (ExitCodeOf(*end) != 0) ++events.locksMissed;
+        if (ExitCodeOf(*end) != 0) ++events_.locksMissed;
     }
     Pipes pipes;
-    holder =
-        StartProgram({"/proc/self/exe", "--hold", plan.Database()}, plan.LogFile("holder"), pipes);
+    holder_ = StartProgram({"/proc/self/exe", "--hold", plan_.Database()}, plan_.LogFile("holder"),
+                           pipes);
     ::close(pipes.in);
     ::close(pipes.out);
-    ++events.locksHeld;
+    ++events_.locksHeld;
 }
 
 }  // namespace Soak

@@ -30,8 +30,8 @@ class Chaos {
     // Ends what is still going on.
     void Calm();
 
-    bool IsDiskFull() const { return isDiskFull; }
-    const Events& GetEvents() const { return events; }
+    bool IsDiskFull() const { return isDiskFull_; }
+    const Events& GetEvents() const { return events_; }
 
   private:
     void KillSome(Member& member);
@@ -40,15 +40,15 @@ class Chaos {
     void EmptyDisk();
     void HoldLock();
 
-    const Plan& plan;
-    Company& company;
-    Reaper& reaper;
-    Events events;
-    std::size_t next = 0;
-    Clock::time_point due = Clock::now();
-    Clock::time_point diskEmptyDue;
-    std::atomic<bool> isDiskFull{false};
-    std::optional<pid_t> holder;
+    const Plan& plan_;
+    Company& company_;
+    Reaper& reaper_;
+    Events events_;
+    std::size_t next_ = 0;
+    Clock::time_point due_ = Clock::now();
+    Clock::time_point diskEmptyDue_;
+    std::atomic<bool> isDiskFull_{false};
+    std::optional<pid_t> holder_;
 };
 
 }  // namespace Soak

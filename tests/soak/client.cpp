@@ -61,31 +61,31 @@ bool IsTold(const Answer& answer)
 
 const char* NameOf(Kind kind)
 {
-    constexpr std::array<const char*, Kinds> names = {"create", "get",    "set",     "delete",
+    constexpr std::array<const char*, Kinds> Names = {"create", "get",    "set",     "delete",
                                                       "list",   "status", "nonsense"};
-    return names.at(static_cast<std::size_t>(kind));
+    return Names.at(static_cast<std::size_t>(kind));
 }
 
 Client::Client(const std::string& clientName, Ask how, AskNonsense howNonsense,
                const Bounds& limits, Findings& where)
-    : name(clientName),
-      ask(std::move(how)),
-      nonsense(std::move(howNonsense)),
-      bounds(limits),
-      findings(where),
-      random(static_cast<unsigned int>(std::hash<std::string>()(clientName)))
+    : name_(clientName),
+      ask_(std::move(how)),
+      nonsense_(std::move(howNonsense)),
+      bounds_(limits),
+      findings_(where),
+      random_(static_cast<unsigned int>(std::hash<std::string>()(clientName)))
 {
 }
 
 void Client::ForgetGap()
 {
-    lastAnswer = Clock::now();
+    lastAnswer_ = Clock::now();
 }
 
 std::size_t Client::CountAnswers() const
 {
     std::size_t count = 0;
-    for (const auto& times : notes.microseconds) count += times.size();
+    for (const auto& times : notes_.microseconds) count += times.size();
     return count;
 }
 
@@ -106,14 +106,14 @@ void Client::AskOne()
 // Creates a new node, or one again whose state is unknown.
 void Client::Create()
 {
-    const auto unknown = std::find_if(ledger.begin(), ledger.end(), IsToBeRetried);
-    if (unknown != ledger.end() && Random(1) == 0) return CreateAs(*unknown);
+    const auto unknown = std::find_if(ledger_.begin(), ledger_.end(), IsToBeRetried);
+    if (unknown != ledger_.end() && Random(1) == 0) return CreateAs(*unknown);
 
     const auto isStored = [](const Node& node) { return node.second.state == State::Stored; };
-    if (std::count_if(ledger.begin(), ledger.end(), isStored) >= LiveNodes) {
+    if (std::count_if(ledger_.begin(), ledger_.end(), isStored) >= LiveNodes) {
         return Delete(*PickStored());
     }
-    const auto [node, isNew] = ledger.try_emplace(name + "-" + std::to_string(++made));
+    const auto [node, isNew] = ledger_.try_emplace(name_ + "-" + std::to_string(++made_));
     node->second.ports = {Random(MaxPort - 1) + 1};
     CreateAs(*node);
 }
@@ -182,7 +182,7 @@ void Client::Delete(Node& node)
 void Client::ListSome()
 {
     Json::Value ids(Json::arrayValue);
-    for (const auto& [nodeName, account] : ledger) {
+    for (const auto& [nodeName, account] : ledger_) {
         if (account.state == State::Stored && !account.id.empty()) ids.append(account.id);
     }
     Json::Value parameters(Json::objectValue);
@@ -205,9 +205,9 @@ void Client::Status()
 void Client::Nonsense()
 {
     Measure(Kind::Nonsense, [this]() -> Answer {
-        const std::optional<bool> isRight = nonsense(Random(3));
+        const std::optional<bool> isRight = nonsense_(Random(3));
         if (!isRight) return {};
-        if (!*isRight) findings.Add(Promise::Answers, name + ": nonsense got a wrong answer");
+        if (!*isRight) findings_.Add(Promise::Answers, name_ + ": nonsense got a wrong answer");
         return {Answer::Outcome::Told, {}};
     });
 }
@@ -215,7 +215,7 @@ void Client::Nonsense()
 Client::Node* Client::PickStored()
 {
     std::vector<Node*> stored;
-    for (Node& node : ledger) {
+    for (Node& node : ledger_) {
         if (node.second.state == State::Stored) stored.push_back(&node);
     }
     if (stored.empty()) return nullptr;
@@ -228,7 +228,7 @@ Answer Client::Request(Kind kind, const std::string& method, const Json::Value& 
     request["api"] = "DR.Node";
     request["version"] = 1;
     request["method"] = method;
-    return Measure(kind, [&] { return ask(NodeRegistry::ToLine(request)); });
+    return Measure(kind, [&] { return ask_(NodeRegistry::ToLine(request)); });
 }
 
 template <class Operation>
@@ -238,20 +238,20 @@ Answer Client::Measure(Kind kind, Operation operation)
     Answer answer = operation();
     const auto end = Clock::now();
     if (answer.outcome == Answer::Outcome::NotSent) std::this_thread::sleep_for(TryAgain);
-    if (answer.outcome == Answer::Outcome::Lost) ++notes.lost;
+    if (answer.outcome == Answer::Outcome::Lost) ++notes_.lost;
     if (!IsTold(answer)) return answer;
 
     const auto took = std::chrono::duration_cast<std::chrono::microseconds>(end - start);
-    notes.microseconds.at(static_cast<std::size_t>(kind))
+    notes_.microseconds.at(static_cast<std::size_t>(kind))
         .push_back(static_cast<std::uint32_t>(took.count()));
-    if (took > bounds.wait) {
+    if (took > bounds_.wait) {
         const auto waited = std::chrono::duration_cast<milliseconds>(took);
-        findings.Add(Promise::Waits, name + ": " + NameOf(kind) + " took " +
-                                         std::to_string(waited.count()) + " ms");
+        findings_.Add(Promise::Waits, name_ + ": " + NameOf(kind) + " took " +
+                                          std::to_string(waited.count()) + " ms");
     }
-    notes.longestGap =
-        std::max(notes.longestGap, std::chrono::duration_cast<milliseconds>(end - lastAnswer));
-    lastAnswer = end;
+    notes_.longestGap =
+        std::max(notes_.longestGap, std::chrono::duration_cast<milliseconds>(end - lastAnswer_));
+    lastAnswer_ = end;
     return answer;
 }
 
@@ -263,19 +263,19 @@ bool Client::IsGivenUp(const Answer& answer)
         code != ERR::ERR_NODE_GET && code != ERR::ERR_NO_PERMISSION) {
         return false;
     }
-    ++notes.givenUp[code];
+    ++notes_.givenUp[code];
     return true;
 }
 
 void Client::ReportWrong(const std::string& what, const Answer& answer)
 {
-    findings.Add(Promise::Answers,
-                 name + ": " + what + " got the reply " + NodeRegistry::ToLine(answer.reply));
+    findings_.Add(Promise::Answers,
+                  name_ + ": " + what + " got the reply " + NodeRegistry::ToLine(answer.reply));
 }
 
 int Client::Random(int most)
 {
-    return std::uniform_int_distribution<int>(0, most)(random);
+    return std::uniform_int_distribution<int>(0, most)(random_);
 }
 
 }  // namespace Soak

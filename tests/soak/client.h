@@ -58,9 +58,9 @@ class Client {
     // From now on counts the time without an answer anew: the client was paused.
     void ForgetGap();
 
-    const std::string& Name() const { return name; }
-    const Ledger& Accounts() const { return ledger; }
-    const Notes& GetNotes() const { return notes; }
+    const std::string& Name() const { return name_; }
+    const Ledger& Accounts() const { return ledger_; }
+    const Notes& GetNotes() const { return notes_; }
     std::size_t CountAnswers() const;
 
   private:
@@ -83,16 +83,16 @@ class Client {
     void ReportWrong(const std::string& what, const Answer& answer);
     int Random(int most);
 
-    std::string name;
-    Ask ask;
-    AskNonsense nonsense;
-    const Bounds& bounds;
-    Findings& findings;
-    Ledger ledger;
-    Notes notes;
-    int made = 0;
-    std::mt19937 random;
-    Clock::time_point lastAnswer = Clock::now();
+    std::string name_;
+    Ask ask_;
+    AskNonsense nonsense_;
+    const Bounds& bounds_;
+    Findings& findings_;
+    Ledger ledger_;
+    Notes notes_;
+    int made_ = 0;
+    std::mt19937 random_;
+    Clock::time_point lastAnswer_ = Clock::now();
 };
 
 }  // namespace Soak

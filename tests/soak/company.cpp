@@ -49,59 +49,59 @@ bool AwaitListening(Pipes pipes, milliseconds patience)
 
 Member::Member(std::string called, Program started, const Bounds& limits, Reaper& reaping,
                Findings& where)
-    : name(std::move(called)),
-      program(std::move(started)),
-      bounds(limits),
-      reaper(reaping),
-      findings(where)
+    : name_(std::move(called)),
+      program_(std::move(started)),
+      bounds_(limits),
+      reaper_(reaping),
+      findings_(where)
 {
 }
 
 void Member::Start()
 {
     const auto begin = Clock::now();
-    isKilled = false;
+    isKilled_ = false;
     bool isWelcome = false;
-    while (!isWelcome && Clock::now() - begin < bounds.start) {
+    while (!isWelcome && Clock::now() - begin < bounds_.start) {
         Pipes pipes;
-        pid = StartProgram(program.words, program.logFile, pipes);
-        isWelcome = program.welcome(pipes);
+        pid_ = StartProgram(program_.words, program_.logFile, pipes);
+        isWelcome = program_.welcome(pipes);
         if (!isWelcome) std::this_thread::sleep_for(StartAgain);
     }
-    if (!isWelcome) findings.Add(Promise::Ends, name + " cannot be started again");
-    longestStart =
-        std::max(longestStart, std::chrono::duration_cast<milliseconds>(Clock::now() - begin));
+    if (!isWelcome) findings_.Add(Promise::Ends, name_ + " cannot be started again");
+    longestStart_ =
+        std::max(longestStart_, std::chrono::duration_cast<milliseconds>(Clock::now() - begin));
 }
 
 void Member::Kill()
 {
-    isKilled = true;
-    ++kills;
-    ::kill(pid, SIGKILL);
+    isKilled_ = true;
+    ++kills_;
+    ::kill(pid_, SIGKILL);
 }
 
 void Member::Tend()
 {
-    const auto end = reaper.EndOf(pid);
+    const auto end = reaper_.EndOf(pid_);
     if (!end) return;
-    if (!isKilled) findings.Add(Promise::Ends, name + " ended by itself: " + DescribeEnd(*end));
+    if (!isKilled_) findings_.Add(Promise::Ends, name_ + " ended by itself: " + DescribeEnd(*end));
     Start();
 }
 
 void Member::End() const
 {
-    program.tellToEnd(pid);
-    const auto end = reaper.AwaitEnd(pid, bounds.end);
+    program_.tellToEnd(pid_);
+    const auto end = reaper_.AwaitEnd(pid_, bounds_.end);
     if (!end) {
-        findings.Add(Promise::Ends, name + " does not end: " + Describe(pid));
-        ::kill(pid, SIGKILL);
+        findings_.Add(Promise::Ends, name_ + " does not end: " + Describe(pid_));
+        ::kill(pid_, SIGKILL);
     } else if (ExitCodeOf(*end) != 0) {
-        findings.Add(Promise::Ends, name + " ended with " + DescribeEnd(*end));
+        findings_.Add(Promise::Ends, name_ + " ended with " + DescribeEnd(*end));
     }
 }
 
 Company::Company(const Plan& plan, Reaper& reaping, Findings& where)
-    : reaper(reaping), findings(where), port(FreePort())
+    : reaper_(reaping), findings_(where), port_(FreePort())
 {
     const std::vector<std::string> settings = {
         "--db", plan.Database(), "--status-dir", plan.StatusDirectory(), "--status-timeout", "0"};
@@ -109,14 +109,14 @@ Company::Company(const Plan& plan, Reaper& reaping, Findings& where)
         words.insert(words.end(), settings.begin(), settings.end());
         return words;
     };
-    const std::string address = "127.0.0.1:" + std::to_string(port);
+    const std::string address = "127.0.0.1:" + std::to_string(port_);
     const auto await = [&plan](Pipes pipes) { return AwaitListening(pipes, plan.bounds.start); };
     const auto terminate = [](pid_t pid) { ::kill(pid, SIGTERM); };
-    members.push_back(std::make_unique<Member>(
+    members_.push_back(std::make_unique<Member>(
         "node_service",
         Member::Program{withSettings({NODE_SERVICE_PROGRAM, "--verbose", "--listen", address}),
                         plan.LogFile("node_service"), await, terminate},
-        plan.bounds, reaper, findings));
+        plan.bounds, reaper_, findings_));
     for (int index = 1; index <= Registries; ++index) {
         AddLineProgram(plan, "node_registry " + std::to_string(index),
                        withSettings({NODE_REGISTRY_PROGRAM}));
@@ -129,31 +129,31 @@ Company::Company(const Plan& plan, Reaper& reaping, Findings& where)
 void Company::AddLineProgram(const Plan& plan, const std::string& name,
                              std::vector<std::string> words)
 {
-    channels.push_back(std::make_unique<LineChannel>(name, findings));
-    LineChannel* channel = channels.back().get();
+    channels_.push_back(std::make_unique<LineChannel>(name, findings_));
+    LineChannel* channel = channels_.back().get();
     const auto give = [channel](Pipes pipes) {
         channel->Give(pipes);
         return true;
     };
     const auto close = [channel](pid_t /*pid*/) { channel->Close(); };
-    members.push_back(std::make_unique<Member>(
+    members_.push_back(std::make_unique<Member>(
         name, Member::Program{std::move(words), plan.LogFile(name), give, close}, plan.bounds,
-        reaper, findings));
+        reaper_, findings_));
 }
 
 void Company::Start()
 {
-    for (const auto& member : members) member->Start();
+    for (const auto& member : members_) member->Start();
 }
 
 void Company::Tend()
 {
-    for (const auto& member : members) member->Tend();
+    for (const auto& member : members_) member->Tend();
 }
 
 void Company::End()
 {
-    for (const auto& member : members) member->End();
+    for (const auto& member : members_) member->End();
 }
 
 }  // namespace Soak

@@ -40,21 +40,21 @@ class Member {
     // Ends it. It must do so in time and with exit code 0.
     void End() const;
 
-    const std::string& Name() const { return name; }
-    pid_t Pid() const { return pid; }
-    int Kills() const { return kills; }
-    milliseconds LongestStart() const { return longestStart; }
+    const std::string& Name() const { return name_; }
+    pid_t Pid() const { return pid_; }
+    int Kills() const { return kills_; }
+    milliseconds LongestStart() const { return longestStart_; }
 
   private:
-    std::string name;
-    Program program;
-    const Bounds& bounds;
-    Reaper& reaper;
-    Findings& findings;
-    pid_t pid = -1;
-    bool isKilled = false;
-    int kills = 0;
-    milliseconds longestStart{0};
+    std::string name_;
+    Program program_;
+    const Bounds& bounds_;
+    Reaper& reaper_;
+    Findings& findings_;
+    pid_t pid_ = -1;
+    bool isKilled_ = false;
+    int kills_ = 0;
+    milliseconds longestStart_{0};
 };
 
 // All members and the channels to them. For one thread, except that each channel has a client of
@@ -68,23 +68,23 @@ class Company {
     void End();
 
     // The service first, then the registries, the neighbour last.
-    const std::vector<std::unique_ptr<Member>>& Members() const { return members; }
-    Member& Service() const { return *members.front(); }
-    Member& Registry(std::size_t index) const { return *members.at(1 + index); }
-    Member& Neighbour() const { return *members.back(); }
+    const std::vector<std::unique_ptr<Member>>& Members() const { return members_; }
+    Member& Service() const { return *members_.front(); }
+    Member& Registry(std::size_t index) const { return *members_.at(1 + index); }
+    Member& Neighbour() const { return *members_.back(); }
 
-    int Port() const { return port; }
-    LineChannel& RegistryChannel(std::size_t index) const { return *channels.at(index); }
-    LineChannel& NeighbourChannel() const { return *channels.back(); }
+    int Port() const { return port_; }
+    LineChannel& RegistryChannel(std::size_t index) const { return *channels_.at(index); }
+    LineChannel& NeighbourChannel() const { return *channels_.back(); }
 
   private:
     void AddLineProgram(const Plan& plan, const std::string& name, std::vector<std::string> words);
 
-    Reaper& reaper;
-    Findings& findings;
-    int port;
-    std::vector<std::unique_ptr<LineChannel>> channels;
-    std::vector<std::unique_ptr<Member>> members;
+    Reaper& reaper_;
+    Findings& findings_;
+    int port_;
+    std::vector<std::unique_ptr<LineChannel>> channels_;
+    std::vector<std::unique_ptr<Member>> members_;
 };
 
 }  // namespace Soak

@@ -26,15 +26,15 @@ const char* WordsOf(Promise promise)
 
 void Findings::Add(Promise promise, const std::string& text)
 {
-    const std::lock_guard<std::mutex> lock(mutex);
-    texts[promise].push_back(text);
+    const std::lock_guard<std::mutex> lock(mutex_);
+    texts_[promise].push_back(text);
 }
 
 std::vector<std::string> Findings::Of(Promise promise) const
 {
-    const std::lock_guard<std::mutex> lock(mutex);
-    const auto found = texts.find(promise);
-    if (found == texts.end()) return {};
+    const std::lock_guard<std::mutex> lock(mutex_);
+    const auto found = texts_.find(promise);
+    if (found == texts_.end()) return {};
     std::vector<std::string> shown = found->second;
     if (shown.size() > MaxShown) {
         const std::size_t more = shown.size() - MaxShown;
@@ -46,8 +46,8 @@ std::vector<std::string> Findings::Of(Promise promise) const
 
 bool Findings::IsEmpty() const
 {
-    const std::lock_guard<std::mutex> lock(mutex);
-    return texts.empty();
+    const std::lock_guard<std::mutex> lock(mutex_);
+    return texts_.empty();
 }
 
 }  // namespace Soak

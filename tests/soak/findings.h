@@ -37,8 +37,8 @@ class Findings {
     bool IsEmpty() const;
 
   private:
-    mutable std::mutex mutex;
-    std::map<Promise, std::vector<std::string>> texts;
+    mutable std::mutex mutex_;
+    std::map<Promise, std::vector<std::string>> texts_;
 };
 
 }  // namespace Soak

@@ -32,10 +32,10 @@ class Gate {
     void Open();
 
   private:
-    std::mutex mutex;
-    std::condition_variable changed;
-    bool isClosed = false;
-    int inside = 0;
+    std::mutex mutex_;
+    std::condition_variable changed_;
+    bool isClosed_ = false;
+    int inside_ = 0;
 };
 
 class Load {
@@ -62,13 +62,13 @@ class Load {
     void Add(const std::string& name, Channel& channel);
     void Run(Client& client);
 
-    const Plan& plan;
-    Findings& findings;
-    HttpChannel http;
-    std::vector<std::unique_ptr<Client>> clients;
-    std::vector<std::thread> threads;
-    Gate gate;
-    std::atomic<bool> isStopping{false};
+    const Plan& plan_;
+    Findings& findings_;
+    HttpChannel http_;
+    std::vector<std::unique_ptr<Client>> clients_;
+    std::vector<std::thread> threads_;
+    Gate gate_;
+    std::atomic<bool> isStopping_{false};
 };
 
 }  // namespace Soak

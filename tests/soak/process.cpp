@@ -68,28 +68,28 @@ int CountOpen(pid_t pid)
 Reaper::Reaper()
 {
     ::prctl(PR_SET_CHILD_SUBREAPER, 1);
-    thread = std::thread([this] { Collect(); });
+    thread_ = std::thread([this] { Collect(); });
 }
 
 Reaper::~Reaper()
 {
     {
-        const std::lock_guard<std::mutex> lock(mutex);
-        isStopping = true;
+        const std::lock_guard<std::mutex> lock(mutex_);
+        isStopping_ = true;
     }
-    thread.join();
+    thread_.join();
 }
 
 void Reaper::Collect()
 {
     while (true) {
         {
-            const std::lock_guard<std::mutex> lock(mutex);
-            if (isStopping) return;
+            const std::lock_guard<std::mutex> lock(mutex_);
+            if (isStopping_) return;
             int status = 0;
             for (pid_t pid = ::waitpid(-1, &status, WNOHANG); pid > 0;
                  pid = ::waitpid(-1, &status, WNOHANG)) {
-                ends[pid] = status;
+                ends_[pid] = status;
             }
         }
         std::this_thread::sleep_for(ReapEvery);
@@ -98,9 +98,9 @@ void Reaper::Collect()
 
 std::optional<int> Reaper::EndOf(pid_t pid)
 {
-    const std::lock_guard<std::mutex> lock(mutex);
-    const auto found = ends.find(pid);
-    if (found == ends.end()) return std::nullopt;
+    const std::lock_guard<std::mutex> lock(mutex_);
+    const auto found = ends_.find(pid);
+    if (found == ends_.end()) return std::nullopt;
     return found->second;
 }
 

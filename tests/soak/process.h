@@ -33,10 +33,10 @@ class Reaper {
   private:
     void Collect();
 
-    std::mutex mutex;
-    std::map<pid_t, int> ends;
-    bool isStopping = false;
-    std::thread thread;
+    std::mutex mutex_;
+    std::map<pid_t, int> ends_;
+    bool isStopping_ = false;
+    std::thread thread_;
 };
 
 // "exit code 1" or "signal 9".

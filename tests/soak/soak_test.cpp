@@ -365,7 +365,7 @@ class FakeRegistry {
     using Falsify = std::function<void(const std::string& method, Answer& answer)>;
 
     explicit FakeRegistry(Falsify how = [](const std::string& /*method*/, Answer& /*answer*/) {})
-        : falsify(std::move(how))
+        : falsify_(std::move(how))
     {
     }
 
@@ -375,14 +375,14 @@ class FakeRegistry {
         EXPECT_TRUE(NodeRegistry::ParseLine(text, request));
         const std::string method = request["method"].asString();
         Answer answer{Answer::Outcome::Told, Do(method, request)};
-        falsify(method, answer);
+        falsify_(method, answer);
         return answer;
     }
 
     std::vector<Row> Rows() const
     {
         std::vector<Row> rows;
-        for (const auto& [name, node] : nodes) {
+        for (const auto& [name, node] : nodes_) {
             rows.push_back({node["id"].asString(), name, node["port"].asInt()});
         }
         return rows;
@@ -394,19 +394,19 @@ class FakeRegistry {
         const std::string name = request["name"].asString();
         if (method == "status") return Success({});
         if (method == "list") return List(request["filter"]["ids"]);
-        if (method == "create") return nodes.count(name) == 1 ? Failure(508, {}) : Create(request);
-        if (nodes.count(name) == 0) return Failure(507, {});
-        if (method == "set") nodes[name]["port"] = request["port"];
-        const Json::Value node = nodes[name];
-        if (method == "delete") nodes.erase(name);
+        if (method == "create") return nodes_.count(name) == 1 ? Failure(508, {}) : Create(request);
+        if (nodes_.count(name) == 0) return Failure(507, {});
+        if (method == "set") nodes_[name]["port"] = request["port"];
+        const Json::Value node = nodes_[name];
+        if (method == "delete") nodes_.erase(name);
         return Success(node);
     }
 
     Json::Value Create(const Json::Value& request)
     {
         Json::Value node = request;
-        node["id"] = "id" + std::to_string(++made);
-        return Success(nodes[request["name"].asString()] = node);
+        node["id"] = "id" + std::to_string(++made_);
+        return Success(nodes_[request["name"].asString()] = node);
     }
 
     Json::Value List(const Json::Value& ids) const
@@ -414,16 +414,16 @@ class FakeRegistry {
         Json::Value data(Json::objectValue);
         data["nodes"] = Json::Value(Json::arrayValue);
         for (const Json::Value& id : ids) {
-            for (const auto& [name, node] : nodes) {
+            for (const auto& [name, node] : nodes_) {
                 if (node["id"] == id) data["nodes"].append(node);
             }
         }
         return Success(data);
     }
 
-    Falsify falsify;
-    std::map<std::string, Json::Value> nodes;
-    int made = 0;
+    Falsify falsify_;
+    std::map<std::string, Json::Value> nodes_;
+    int made_ = 0;
 };
 
 class SoakClientTest : public SoakTest {

@@ -30,16 +30,16 @@ pid_t MarkedIn(const std::string& pidFile)
 }  // namespace
 
 RefreshWatch::RefreshWatch(const Plan& thePlan, std::function<bool()> isFull, Findings& where)
-    : plan(thePlan), isDiskFull(std::move(isFull)), findings(where)
+    : plan_(thePlan), isDiskFull_(std::move(isFull)), findings_(where)
 {
     // Taken before the thread starts: every later refresh counts.
-    thread = std::thread([this, first = EditionOf(plan.StatusFile())] { Watch(first); });
+    thread_ = std::thread([this, first = EditionOf(plan_.StatusFile())] { Watch(first); });
 }
 
 void RefreshWatch::Stop()
 {
-    isStopping = true;
-    if (thread.joinable()) thread.join();
+    isStopping_ = true;
+    if (thread_.joinable()) thread_.join();
 }
 
 void RefreshWatch::Watch(Edition last)
@@ -47,17 +47,17 @@ void RefreshWatch::Watch(Edition last)
     auto lastChange = Clock::now();
     auto lastReport = lastChange;
     pid_t reported = -1;  // report each process once
-    while (!isStopping) {
+    while (!isStopping_) {
         std::this_thread::sleep_for(LookEvery);
         const auto now = Clock::now();
-        const Edition edition = EditionOf(plan.StatusFile());
-        if (edition != last) ++refreshes;
-        if (edition != last || isDiskFull()) lastChange = lastReport = now;
+        const Edition edition = EditionOf(plan_.StatusFile());
+        if (edition != last) ++refreshes_;
+        if (edition != last || isDiskFull_()) lastChange = lastReport = now;
         last = edition;
-        longestGap =
-            std::max(longestGap, std::chrono::duration_cast<milliseconds>(now - lastChange));
-        if (now - lastReport > plan.bounds.stale) {
-            const pid_t updater = MarkedIn(plan.StatusFile() + ".pid");
+        longestGap_ =
+            std::max(longestGap_, std::chrono::duration_cast<milliseconds>(now - lastChange));
+        if (now - lastReport > plan_.bounds.stale) {
+            const pid_t updater = MarkedIn(plan_.StatusFile() + ".pid");
             if (updater != reported) Report(updater);
             reported = updater;
             lastReport = now;
@@ -67,33 +67,33 @@ void RefreshWatch::Watch(Edition last)
 
 void RefreshWatch::Report(pid_t updater)
 {
-    findings.Add(Promise::Refreshes,
-                 "the status has not been refreshed for " +
-                     std::to_string(plan.bounds.stale.count()) + " ms; " +
-                     (updater == 0 ? std::string("no process is marked as refreshing")
-                                   : "marked as refreshing: " + Describe(updater)));
+    findings_.Add(Promise::Refreshes,
+                  "the status has not been refreshed for " +
+                      std::to_string(plan_.bounds.stale.count()) + " ms; " +
+                      (updater == 0 ? std::string("no process is marked as refreshing")
+                                    : "marked as refreshing: " + Describe(updater)));
 }
 
 NeighbourWatch::NeighbourWatch(LineChannel& channel)
 {
-    thread = std::thread([this, &channel] { Watch(channel); });
+    thread_ = std::thread([this, &channel] { Watch(channel); });
 }
 
 void NeighbourWatch::Stop()
 {
-    isStopping = true;
-    if (thread.joinable()) thread.join();
+    isStopping_ = true;
+    if (thread_.joinable()) thread_.join();
 }
 
 void NeighbourWatch::Watch(LineChannel& channel)
 {
     auto last = Clock::now();
-    while (!isStopping) {
+    while (!isStopping_) {
         const std::optional<std::string> line = channel.ReadLine();
         if (!line) continue;
         const auto now = Clock::now();
-        ++(*line == "read" ? reads : failures);
-        longestGap = std::max(longestGap, std::chrono::duration_cast<milliseconds>(now - last));
+        ++(*line == "read" ? reads_ : failures_);
+        longestGap_ = std::max(longestGap_, std::chrono::duration_cast<milliseconds>(now - last));
         last = now;
     }
 }

@@ -40,20 +40,20 @@ class RefreshWatch {
 
     void Stop();
 
-    int Refreshes() const { return refreshes; }
-    milliseconds LongestGap() const { return longestGap; }
+    int Refreshes() const { return refreshes_; }
+    milliseconds LongestGap() const { return longestGap_; }
 
   private:
     void Watch(Edition last);
     void Report(pid_t updater);
 
-    const Plan& plan;
-    std::function<bool()> isDiskFull;
-    Findings& findings;
-    std::atomic<int> refreshes{0};
-    milliseconds longestGap{0};
-    std::atomic<bool> isStopping{false};
-    std::thread thread;
+    const Plan& plan_;
+    std::function<bool()> isDiskFull_;
+    Findings& findings_;
+    std::atomic<int> refreshes_{0};
+    milliseconds longestGap_{0};
+    std::atomic<bool> isStopping_{false};
+    std::thread thread_;
 };
 
 // Reads the neighbour's output: a line for each time it has read the status.
@@ -67,18 +67,18 @@ class NeighbourWatch {
     void Stop();
 
     // For use after Stop().
-    int Reads() const { return reads; }
-    int Failures() const { return failures; }
-    milliseconds LongestGap() const { return longestGap; }
+    int Reads() const { return reads_; }
+    int Failures() const { return failures_; }
+    milliseconds LongestGap() const { return longestGap_; }
 
   private:
     void Watch(LineChannel& channel);
 
-    int reads = 0;
-    int failures = 0;
-    milliseconds longestGap{0};
-    std::atomic<bool> isStopping{false};
-    std::thread thread;
+    int reads_ = 0;
+    int failures_ = 0;
+    milliseconds longestGap_{0};
+    std::atomic<bool> isStopping_{false};
+    std::thread thread_;
 };
 
 // Measures the service and the registries. The neighbour is never idle.

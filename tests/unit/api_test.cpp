@@ -504,13 +504,13 @@ TEST(ApiTest, AssigningDoesNotMakeAValueValid)
 template <class Base>
 class Derived : public Base {
   public:
-    explicit Derived(int& count) : destructions(count) {}
+    explicit Derived(int& count) : destructions_(count) {}
     Derived(const Derived&) = delete;
     Derived& operator=(const Derived&) = delete;
-    ~Derived() override { ++destructions; }
+    ~Derived() override { ++destructions_; }
 
   private:
-    int& destructions;
+    int& destructions_;
 };
 
 TEST(ApiTest, ClassesThatCallersDeriveFromAreDeletedThroughTheirBase)

@@ -18,15 +18,15 @@ class GlobalLocale {
   public:
     template <class Facet>
     explicit GlobalLocale(Facet* facet)
-        : before(std::locale::global(std::locale(std::locale::classic(), facet)))
+        : before_(std::locale::global(std::locale(std::locale::classic(), facet)))
     {
     }
     GlobalLocale(const GlobalLocale&) = delete;
     GlobalLocale& operator=(const GlobalLocale&) = delete;
-    ~GlobalLocale() { std::locale::global(before); }
+    ~GlobalLocale() { std::locale::global(before_); }
 
   private:
-    std::locale before;
+    std::locale before_;
 };
 
 #endif

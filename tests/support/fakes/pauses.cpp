@@ -33,7 +33,7 @@ extern "C" int usleep(useconds_t microseconds)
 Pauses::Pauses()
 {
     if (current != nullptr) std::abort();
-    taken.reserve(EnoughRoom);
+    taken_.reserve(EnoughRoom);
     current = this;
 }
 
@@ -45,18 +45,18 @@ Pauses::~Pauses()
 void Pauses::Note(unsigned int microseconds)
 {
     if (microseconds < ShortestOwnPause) {
-        if (!onWait) return;
-        waits.push_back(microseconds);
-        onWait(waits.size());
+        if (!onWait_) return;
+        waits_.push_back(microseconds);
+        onWait_(waits_.size());
         return;
     }
-    taken.push_back(microseconds);
-    if (onPause) onPause(taken.size());
+    taken_.push_back(microseconds);
+    if (onPause_) onPause_(taken_.size());
 }
 
 void Pauses::OnWait(std::function<void(std::size_t)> action)
 {
-    onWait = std::move(action);
+    onWait_ = std::move(action);
 }
 
 Slept CountSlept()

@@ -16,24 +16,24 @@ class Pauses {
     ~Pauses();
 
     // The pauses between attempts so far, in microseconds.
-    const std::vector<unsigned int>& Taken() const { return taken; }
+    const std::vector<unsigned int>& Taken() const { return taken_; }
 
     // At each pause between attempts calls `action` with its number, from 1, instead of sleeping.
-    void OnPause(std::function<void(std::size_t)> action) { onPause = std::move(action); }
+    void OnPause(std::function<void(std::size_t)> action) { onPause_ = std::move(action); }
 
     // The same for the pauses within an attempt. They are recorded after the first call of
     // OnWait().
-    const std::vector<unsigned int>& Waits() const { return waits; }
+    const std::vector<unsigned int>& Waits() const { return waits_; }
     void OnWait(std::function<void(std::size_t)> action);
-    void ForgetWaits() { waits.clear(); }
+    void ForgetWaits() { waits_.clear(); }
 
     void Note(unsigned int microseconds);
 
   private:
-    std::vector<unsigned int> taken;
-    std::function<void(std::size_t)> onPause;
-    std::vector<unsigned int> waits;
-    std::function<void(std::size_t)> onWait;
+    std::vector<unsigned int> taken_;
+    std::function<void(std::size_t)> onPause_;
+    std::vector<unsigned int> waits_;
+    std::function<void(std::size_t)> onWait_;
 };
 
 // What this process has really slept in usleep, while no Pauses object lived. Includes what its

@@ -28,7 +28,7 @@ std::filesystem::path Place()
 
 }  // namespace
 
-SteadyDisk::SteadyDisk() : dir(Place())
+SteadyDisk::SteadyDisk() : dir_(Place())
 {
     isSteady = true;
 }

@@ -15,10 +15,10 @@ class SteadyDisk {
     SteadyDisk& operator=(const SteadyDisk&) = delete;
     ~SteadyDisk();
 
-    std::string File(const std::string& name) const { return dir.File(name); }
+    std::string File(const std::string& name) const { return dir_.File(name); }
 
   private:
-    const TempDir dir;
+    const TempDir dir_;
 };
 
 #endif

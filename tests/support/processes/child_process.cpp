@@ -24,22 +24,22 @@ constexpr int DeadlineMSec = 60'000;
 void ChildProcess::Link::Tell() const
 {
     const char byte = 0;
-    (void)RetryOnEintr([&] { return ::write(out, &byte, 1); });
+    (void)RetryOnEintr([&] { return ::write(out_, &byte, 1); });
 }
 
 bool ChildProcess::Link::Await() const
 {
-    pollfd waiting{in, POLLIN, 0};
+    pollfd waiting{in_, POLLIN, 0};
     if (::poll(&waiting, 1, DeadlineMSec) <= 0) return false;
     char byte = 0;
-    return ::read(in, &byte, 1) == 1;
+    return ::read(in_, &byte, 1) == 1;
 }
 
 void ChildProcess::Link::Close()
 {
-    if (in >= 0) ::close(in);
-    if (out >= 0) ::close(out);
-    in = out = -1;
+    if (in_ >= 0) ::close(in_);
+    if (out_ >= 0) ::close(out_);
+    in_ = out_ = -1;
 }
 
 ChildProcess::ChildProcess(const std::function<void(Link&)>& body)
@@ -49,9 +49,9 @@ ChildProcess::ChildProcess(const std::function<void(Link&)>& body)
     if (::pipe2(toChild.data(), O_CLOEXEC) < 0 || ::pipe2(fromChild.data(), O_CLOEXEC) < 0) {
         std::abort();
     }
-    pid = ::fork();
-    if (pid < 0) std::abort();
-    if (pid == 0) {
+    pid_ = ::fork();
+    if (pid_ < 0) std::abort();
+    if (pid_ == 0) {
         ::close(toChild[1]);
         ::close(fromChild[0]);
         (void)::signal(SIGPIPE, SIG_IGN);
@@ -66,24 +66,24 @@ ChildProcess::ChildProcess(const std::function<void(Link&)>& body)
     }
     ::close(toChild[0]);
     ::close(fromChild[1]);
-    link = Link(fromChild[0], toChild[1]);
+    link_ = Link(fromChild[0], toChild[1]);
 }
 
 ChildProcess::~ChildProcess()
 {
-    if (pid > 0) {
+    if (pid_ > 0) {
         Kill(SIGKILL);
         Join();
     }
-    link.Close();
+    link_.Close();
 }
 
 void ChildProcess::Kill(int signal) const
 {
-    ::kill(pid, signal);
+    ::kill(pid_, signal);
 }
 
 int ChildProcess::Join()
 {
-    return Reap(std::exchange(pid, -1));
+    return Reap(std::exchange(pid_, -1));
 }

@@ -24,7 +24,7 @@ class ChildProcess {
     // One end of the connection between test and child.
     class Link {
       public:
-        Link(int readEnd, int writeEnd) : in(readEnd), out(writeEnd) {}
+        Link(int readEnd, int writeEnd) : in_(readEnd), out_(writeEnd) {}
 
         // Ends one Await() of the other side.
         void Tell() const;
@@ -35,8 +35,8 @@ class ChildProcess {
         void Close();
 
       private:
-        int in;
-        int out;
+        int in_;
+        int out_;
     };
 
     // Forks a process that runs `body` and exits with code 0, or 1 when `body` throws. It runs no
@@ -46,9 +46,9 @@ class ChildProcess {
     ChildProcess& operator=(const ChildProcess&) = delete;
     ~ChildProcess();  // kills a child that was not joined
 
-    void Tell() const { link.Tell(); }
-    bool Await() const { return link.Await(); }
-    pid_t Pid() const { return pid; }
+    void Tell() const { link_.Tell(); }
+    bool Await() const { return link_.Await(); }
+    pid_t Pid() const { return pid_; }
 
     void Kill(int signal) const;
 
@@ -57,8 +57,8 @@ class ChildProcess {
     int Join();
 
   private:
-    pid_t pid = -1;
-    Link link{-1, -1};
+    pid_t pid_ = -1;
+    Link link_{-1, -1};
 };
 
 #endif

@@ -18,23 +18,24 @@ class Crowd {
     // Forks the processes. Each will run `body` with its number, from 0.
     Crowd(int size, const std::function<void(int)>& body)
     {
-        children.reserve(static_cast<std::size_t>(size));
+        children_.reserve(static_cast<std::size_t>(size));
         for (int i = 0; i < size; ++i) {
-            children.push_back(std::make_unique<ChildProcess>([&body, i](ChildProcess::Link& link) {
-                link.Tell();
-                if (!link.Await()) return;
-                ::alarm(DeadlineSeconds);
-                body(i);
-            }));
+            children_.push_back(
+                std::make_unique<ChildProcess>([&body, i](ChildProcess::Link& link) {
+                    link.Tell();
+                    if (!link.Await()) return;
+                    ::alarm(DeadlineSeconds);
+                    body(i);
+                }));
         }
     }
 
     // Lets all of them start. False when one has not come up.
     bool Start() const
     {
-        const bool ready = std::all_of(children.begin(), children.end(),
+        const bool ready = std::all_of(children_.begin(), children_.end(),
                                        [](const auto& child) { return child->Await(); });
-        for (const auto& child : children) child->Tell();
+        for (const auto& child : children_) child->Tell();
         return ready;
     }
 
@@ -42,12 +43,12 @@ class Crowd {
     bool Join() const
     {
         int failed = 0;
-        for (const auto& child : children) failed += child->Join() != 0 ? 1 : 0;
+        for (const auto& child : children_) failed += child->Join() != 0 ? 1 : 0;
         return failed == 0;
     }
 
   private:
-    std::vector<std::unique_ptr<ChildProcess>> children;
+    std::vector<std::unique_ptr<ChildProcess>> children_;
 };
 
 #endif

@@ -41,13 +41,13 @@ long NumberAfter(const std::string& head, const std::string& name)
 }  // namespace
 
 HttpConnection::HttpConnection(int port, std::chrono::seconds patience)
-    : fd(Connect(port, patience))
+    : fd_(Connect(port, patience))
 {
 }
 
 HttpConnection::~HttpConnection()
 {
-    if (fd >= 0) ::close(fd);
+    if (fd_ >= 0) ::close(fd_);
 }
 
 void HttpConnection::Send(const std::string& part) const
@@ -55,7 +55,7 @@ void HttpConnection::Send(const std::string& part) const
     std::size_t sent = 0;
     while (sent < part.size()) {
         const ssize_t count = RetryOnEintr(
-            [&] { return ::send(fd, part.data() + sent, part.size() - sent, MSG_NOSIGNAL); });
+            [&] { return ::send(fd_, part.data() + sent, part.size() - sent, MSG_NOSIGNAL); });
         if (count <= 0) return;
         sent += static_cast<std::size_t>(count);
     }
@@ -64,7 +64,8 @@ void HttpConnection::Send(const std::string& part) const
 std::string HttpConnection::ReceiveSome() const
 {
     std::array<char, 16384> buffer{};
-    const ssize_t count = RetryOnEintr([&] { return ::recv(fd, buffer.data(), buffer.size(), 0); });
+    const ssize_t count =
+        RetryOnEintr([&] { return ::recv(fd_, buffer.data(), buffer.size(), 0); });
     return {buffer.data(), count > 0 ? static_cast<std::size_t>(count) : 0};
 }
 

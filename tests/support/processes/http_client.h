@@ -27,7 +27,7 @@ class HttpConnection {
     HttpConnection& operator=(const HttpConnection&) = delete;
     ~HttpConnection();
 
-    bool IsOpen() const { return fd >= 0; }
+    bool IsOpen() const { return fd_ >= 0; }
 
     // Sends a part of a request. Receive() notices when the server has closed the connection.
     void Send(const std::string& part) const;
@@ -39,7 +39,7 @@ class HttpConnection {
     HttpReply Receive() const;
 
   private:
-    int fd;
+    int fd_;
 };
 
 std::string HttpRequest(const std::string& method, const std::string& path,

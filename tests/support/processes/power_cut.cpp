@@ -37,8 +37,8 @@ class Disk {
     explicit Disk(const Directory& before)
     {
         for (const auto& [name, file] : before) {
-            names[name] = static_cast<int>(files.size());
-            files.push_back({file, file});
+            names_[name] = static_cast<int>(files_.size());
+            files_.push_back({file, file});
         }
     }
 
@@ -59,17 +59,18 @@ class Disk {
     Names NamesAfterCut(std::size_t reached) const;
     void AddStates(const Names& found, std::set<Directory>& states) const;
 
-    std::vector<File> files;
-    Names names;                    // synced
-    std::vector<NewName> unsynced;  // in the order of the changes
+    std::vector<File> files_;
+    Names names_;                    // synced
+    std::vector<NewName> unsynced_;  // in the order of the changes
 };
 
 void Disk::Do(const Change& change)
 {
-    if (change.kind == Kind::Make) files.push_back({{{}, change.mode}, {{}, change.mode}});
-    File* const file = change.file < 0 ? nullptr : &files.at(static_cast<std::size_t>(change.file));
+    if (change.kind == Kind::Make) files_.push_back({{{}, change.mode}, {{}, change.mode}});
+    File* const file =
+        change.file < 0 ? nullptr : &files_.at(static_cast<std::size_t>(change.file));
     switch (change.kind) {
-        case Kind::Make: unsynced.push_back({change.name, change.file}); break;
+        case Kind::Make: unsynced_.push_back({change.name, change.file}); break;
         case Kind::Resize: file->now.text.resize(change.at, '\0'); break;
         case Kind::Write: {
             std::string& text = file->now.text;
@@ -80,13 +81,13 @@ void Disk::Do(const Change& change)
         case Kind::SetMode: file->now.mode = change.mode; break;
         case Kind::Sync: file->synced = file->now; break;
         case Kind::Rename:
-            unsynced.push_back({change.newName, change.file});
-            unsynced.push_back({change.name, std::nullopt});
+            unsynced_.push_back({change.newName, change.file});
+            unsynced_.push_back({change.name, std::nullopt});
             break;
-        case Kind::Remove: unsynced.push_back({change.name, std::nullopt}); break;
+        case Kind::Remove: unsynced_.push_back({change.name, std::nullopt}); break;
         case Kind::SyncDirectory:
-            names = NamesAfterCut(~std::size_t{0});
-            unsynced.clear();
+            names_ = NamesAfterCut(~std::size_t{0});
+            unsynced_.clear();
             break;
     }
 }
@@ -94,8 +95,8 @@ void Disk::Do(const Change& change)
 // The names on the disk, when those unsynced changes have reached it whose bits are set.
 Disk::Names Disk::NamesAfterCut(std::size_t reached) const
 {
-    Names found = names;
-    for (const NewName& change : unsynced) {
+    Names found = names_;
+    for (const NewName& change : unsynced_) {
         const bool hasReached = (reached & 1U) != 0;
         reached >>= 1U;
         if (!hasReached) continue;
@@ -113,7 +114,7 @@ void Disk::AddStates(const Names& found, std::set<Directory>& states) const
 {
     std::set<Directory> all{{}};
     for (const auto& [name, number] : found) {
-        const File& file = files.at(static_cast<std::size_t>(number));
+        const File& file = files_.at(static_cast<std::size_t>(number));
         std::set<Directory> more;
         for (const StoredFile& remain : Remains(file.synced, file.now)) {
             for (Directory directory : all) {
@@ -129,7 +130,7 @@ void Disk::AddStates(const Names& found, std::set<Directory>& states) const
 std::set<Directory> Disk::AfterCut() const
 {
     std::set<Directory> states;
-    const std::size_t ways = std::size_t{1} << unsynced.size();
+    const std::size_t ways = std::size_t{1} << unsynced_.size();
     for (std::size_t reached = 0; reached < ways; ++reached) {
         AddStates(NamesAfterCut(reached), states);
     }

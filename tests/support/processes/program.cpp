@@ -51,7 +51,7 @@ void Receive(int& descriptor, std::string& text)
 }  // namespace
 
 Program::Program(const std::vector<std::string>& arguments)
-    : deadline(std::chrono::steady_clock::now() + Deadline)
+    : deadline_(std::chrono::steady_clock::now() + Deadline)
 {
     // When the program ends early, writing to it must not end the test.
     static_cast<void>(std::signal(SIGPIPE, SIG_IGN));
@@ -80,7 +80,7 @@ Program::Program(const std::vector<std::string>& arguments)
         words.push_back(const_cast<char*>(argument.c_str()));
     }
     words.push_back(nullptr);
-    if (::posix_spawn(&pid, words[0], &actions, &attributes, words.data(), environ) != 0) {
+    if (::posix_spawn(&pid_, words[0], &actions, &attributes, words.data(), environ) != 0) {
         std::abort();
     }
     ::posix_spawnattr_destroy(&attributes);
@@ -89,88 +89,88 @@ Program::Program(const std::vector<std::string>& arguments)
     ::close(toIn.readEnd);
     ::close(fromOut.writeEnd);
     ::close(fromErr.writeEnd);
-    in = toIn.writeEnd;
-    out = fromOut.readEnd;
-    err = fromErr.readEnd;
-    ::fcntl(in, F_SETFL, O_NONBLOCK);  // a full pipe must not keep us from reading
+    in_ = toIn.writeEnd;
+    out_ = fromOut.readEnd;
+    err_ = fromErr.readEnd;
+    ::fcntl(in_, F_SETFL, O_NONBLOCK);  // a full pipe must not keep us from reading
 }
 
 Program::~Program()
 {
-    Close(in);
-    Close(out);
-    Close(err);
-    if (pid < 0) return;
-    ::kill(pid, SIGKILL);
-    Reap(pid);
+    Close(in_);
+    Close(out_);
+    Close(err_);
+    if (pid_ < 0) return;
+    ::kill(pid_, SIGKILL);
+    Reap(pid_);
 }
 
 void Program::Send(const std::string& text)
 {
-    unsent += text;
+    unsent_ += text;
     WriteUnsent();
 }
 
 std::string Program::ReadLine()
 {
-    std::size_t end = unread.find('\n');
+    std::size_t end = unread_.find('\n');
     while (end == std::string::npos) {
-        if (out < 0 || !Pump()) return {};
-        end = unread.find('\n');
+        if (out_ < 0 || !Pump()) return {};
+        end = unread_.find('\n');
     }
-    std::string line = unread.substr(0, end);
-    unread.erase(0, end + 1);
+    std::string line = unread_.substr(0, end);
+    unread_.erase(0, end + 1);
     return line;
 }
 
 void Program::CloseOutput()
 {
-    Close(out);
+    Close(out_);
 }
 
 void Program::Kill(int signal) const
 {
-    ::kill(pid, signal);
+    ::kill(pid_, signal);
 }
 
 ProgramResult Program::Finish()
 {
-    isInputComplete = true;
-    while (in >= 0 || out >= 0 || err >= 0) {
+    isInputComplete_ = true;
+    while (in_ >= 0 || out_ >= 0 || err_ >= 0) {
         if (Pump()) continue;
-        ::kill(pid, SIGKILL);
+        ::kill(pid_, SIGKILL);
         break;
     }
-    return {Reap(std::exchange(pid, -1)), unread, errors};
+    return {Reap(std::exchange(pid_, -1)), unread_, errors_};
 }
 
 // Writes as much as fits into the pipe. Gives up when the program has closed it.
 void Program::WriteUnsent()
 {
-    const ssize_t count = ::write(in, unsent.data(), unsent.size());
-    if (count > 0) unsent.erase(0, static_cast<std::size_t>(count));
+    const ssize_t count = ::write(in_, unsent_.data(), unsent_.size());
+    if (count > 0) unsent_.erase(0, static_cast<std::size_t>(count));
     if (count < 0 && errno == EPIPE) {
-        unsent.clear();
-        Close(in);
+        unsent_.clear();
+        Close(in_);
     }
 }
 
 // Waits for an event on the pipes and handles it. False after the deadline.
 bool Program::Pump()
 {
-    if (isInputComplete && unsent.empty()) Close(in);
+    if (isInputComplete_ && unsent_.empty()) Close(in_);
     // poll ignores -1: a closed pipe, or the input when nothing is left to write.
-    std::array<pollfd, 3> pipes{pollfd{unsent.empty() ? -1 : in, POLLOUT, 0},
-                                pollfd{out, POLLIN, 0}, pollfd{err, POLLIN, 0}};
+    std::array<pollfd, 3> pipes{pollfd{unsent_.empty() ? -1 : in_, POLLOUT, 0},
+                                pollfd{out_, POLLIN, 0}, pollfd{err_, POLLIN, 0}};
     const auto left = std::chrono::duration_cast<std::chrono::milliseconds>(
-        deadline - std::chrono::steady_clock::now());
+        deadline_ - std::chrono::steady_clock::now());
     if (left.count() <= 0) return false;
-    if (in < 0 && out < 0 && err < 0) return true;
+    if (in_ < 0 && out_ < 0 && err_ < 0) return true;
     if (::poll(pipes.data(), pipes.size(), static_cast<int>(left.count())) <= 0) return true;
 
     if (pipes[0].revents != 0) WriteUnsent();
-    if (pipes[1].revents != 0) Receive(out, unread);
-    if (pipes[2].revents != 0) Receive(err, errors);
+    if (pipes[1].revents != 0) Receive(out_, unread_);
+    if (pipes[2].revents != 0) Receive(err_, errors_);
     return true;
 }
 

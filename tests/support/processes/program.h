@@ -42,7 +42,7 @@ class Program {
     // Closes our end of its standard output, so that it can write no more.
     void CloseOutput();
 
-    pid_t Pid() const { return pid; }
+    pid_t Pid() const { return pid_; }
 
     void Kill(int signal) const;
 
@@ -53,15 +53,15 @@ class Program {
     void WriteUnsent();
     bool Pump();
 
-    pid_t pid = -1;
-    int in = -1;  // our ends of the pipes; -1 when closed
-    int out = -1;
-    int err = -1;
-    bool isInputComplete = false;
-    std::string unsent;
-    std::string unread;
-    std::string errors;
-    std::chrono::steady_clock::time_point deadline;
+    pid_t pid_ = -1;
+    int in_ = -1;  // our ends of the pipes; -1 when closed
+    int out_ = -1;
+    int err_ = -1;
+    bool isInputComplete_ = false;
+    std::string unsent_;
+    std::string unread_;
+    std::string errors_;
+    std::chrono::steady_clock::time_point deadline_;
 };
 
 // Runs a program with this input to its end.

@@ -36,19 +36,20 @@ std::size_t ToSize(std::uint64_t argument)
 // Turns the system calls of a process into changes.
 class Recorder {
   public:
-    Recorder(std::string path, const TracedProcess& traced) : dir(std::move(path)), process(traced)
+    Recorder(std::string path, const TracedProcess& traced)
+        : dir_(std::move(path)), process_(traced)
     {
-        for (const auto& [name, file] : ReadDirectory(dir)) names[name] = files++;
+        for (const auto& [name, file] : ReadDirectory(dir_)) names_[name] = files_++;
     }
 
     // A call begins. Its paths are read now, before the process can overwrite them.
     void Begin(const SystemCall& begun)
     {
-        call = begun;
-        first = second = {};
-        const auto [one, other] = PathsOf(call);
-        if (one >= 0) first = NameIn(Argument(one));
-        if (other >= 0) second = NameIn(Argument(other));
+        call_ = begun;
+        first_ = second_ = {};
+        const auto [one, other] = PathsOf(call_);
+        if (one >= 0) first_ = NameIn(Argument(one));
+        if (other >= 0) second_ = NameIn(Argument(other));
     }
 
     void End(std::int64_t result)
@@ -56,7 +57,7 @@ class Recorder {
         if (result >= 0) Note(result);
     }
 
-    Record Take() { return std::move(record); }
+    Record Take() { return std::move(record_); }
 
   private:
     static constexpr int Self = -1;  // the directory
@@ -69,7 +70,7 @@ class Recorder {
 
     std::uint64_t Argument(int place) const
     {
-        return call.arguments.at(static_cast<std::size_t>(place));
+        return call_.arguments.at(static_cast<std::size_t>(place));
     }
 
     // Which arguments of a call are paths; -1 for none.
@@ -92,15 +93,15 @@ class Recorder {
     // The path's name in the directory; "." for the directory itself, none for paths elsewhere.
     std::optional<std::string> NameIn(std::uint64_t address) const
     {
-        const std::string path = process.Text(address);
-        if (path == dir) return ".";
-        if (path.compare(0, dir.size() + 1, dir + "/") != 0) return {};
-        return path.substr(dir.size() + 1);
+        const std::string path = process_.Text(address);
+        if (path == dir_) return ".";
+        if (path.compare(0, dir_.size() + 1, dir_ + "/") != 0) return {};
+        return path.substr(dir_.size() + 1);
     }
 
     void Note(std::int64_t result)
     {
-        switch (call.number) {
+        switch (call_.number) {
             case SYS_openat: return NoteOpen(static_cast<int>(result), Argument(2));
             case SYS_unlinkat: return NoteRemove();
             case SYS_renameat:
@@ -119,53 +120,58 @@ class Recorder {
             case SYS_copy_file_range: return Refuse();
             default: break;
         }
-        const auto found = descriptors.find(static_cast<int>(Argument(0)));
-        if (found != descriptors.end()) NoteOfFile(found->second, result);
+        const auto found = descriptors_.find(static_cast<int>(Argument(0)));
+        if (found != descriptors_.end()) NoteOfFile(found->second, result);
     }
 
     [[noreturn]] void Refuse() const
     {
-        throw std::runtime_error("system call " + std::to_string(call.number) + " is not known");
+        throw std::runtime_error("system call " + std::to_string(call_.number) + " is not known");
     }
 
     void NoteOpen(int fd, std::uint64_t flags)
     {
-        if (!first) return;
-        if (*first == ".") {
-            descriptors[fd] = {Self, 0, false};
+        if (!first_) return;
+        if (*first_ == ".") {
+            descriptors_[fd] = {Self, 0, false};
             return;
         }
-        const auto [name, isNew] = names.emplace(*first, files);
+        const auto [name, isNew] = names_.emplace(*first_, files_);
         if (isNew) {
-            ++files;
-            record.push_back(
-                {Kind::Make, name->second, *first, {}, 0, {}, ReadStored(dir + "/" + *first).mode});
+            ++files_;
+            record_.push_back({Kind::Make,
+                               name->second,
+                               *first_,
+                               {},
+                               0,
+                               {},
+                               ReadStored(dir_ + "/" + *first_).mode});
         } else if ((flags & O_TRUNC) != 0) {
-            record.push_back({Kind::Resize, name->second});
+            record_.push_back({Kind::Resize, name->second});
         }
-        descriptors[fd] = {name->second, 0, (flags & O_APPEND) != 0};
+        descriptors_[fd] = {name->second, 0, (flags & O_APPEND) != 0};
     }
 
     void NoteRemove()
     {
-        if (!first) return;
-        record.push_back({Kind::Remove, names.at(*first), *first});
-        names.erase(*first);
+        if (!first_) return;
+        record_.push_back({Kind::Remove, names_.at(*first_), *first_});
+        names_.erase(*first_);
     }
 
     void NoteRename()
     {
-        if (!first != !second) throw std::runtime_error("a file is moved in or out");
-        if (!first) return;
-        record.push_back({Kind::Rename, names.at(*first), *first, *second});
-        names[*second] = names.at(*first);
-        names.erase(*first);
+        if (!first_ != !second_) throw std::runtime_error("a file is moved in or out");
+        if (!first_) return;
+        record_.push_back({Kind::Rename, names_.at(*first_), *first_, *second_});
+        names_[*second_] = names_.at(*first_);
+        names_.erase(*first_);
     }
 
     // A call whose first argument is an open file.
     void NoteOfFile(Open& open, std::int64_t result)
     {
-        switch (call.number) {
+        switch (call_.number) {
             case SYS_write:
                 if (open.appends) throw std::runtime_error("a file is appended to");
                 NoteWrite(open.file, open.at, result);
@@ -174,18 +180,19 @@ class Recorder {
             case SYS_pwrite64: return NoteWrite(open.file, ToSize(Argument(3)), result);
             case SYS_lseek: open.at = static_cast<std::size_t>(result); return;
             case SYS_ftruncate:
-                record.push_back({Kind::Resize, open.file, {}, {}, ToSize(Argument(1))});
+                record_.push_back({Kind::Resize, open.file, {}, {}, ToSize(Argument(1))});
                 return;
             case SYS_fchmod: {
                 const auto mode = static_cast<mode_t>(Argument(1)) & PermissionBits;
-                record.push_back({Kind::SetMode, open.file, {}, {}, 0, {}, mode});
+                record_.push_back({Kind::SetMode, open.file, {}, {}, 0, {}, mode});
                 return;
             }
             case SYS_fsync:
             case SYS_fdatasync:
-                record.push_back({open.file == Self ? Kind::SyncDirectory : Kind::Sync, open.file});
+                record_.push_back(
+                    {open.file == Self ? Kind::SyncDirectory : Kind::Sync, open.file});
                 return;
-            case SYS_close: descriptors.erase(static_cast<int>(Argument(0))); return;
+            case SYS_close: descriptors_.erase(static_cast<int>(Argument(0))); return;
             case SYS_read: open.at += static_cast<std::size_t>(result); return;
             case SYS_fcntl:
             case SYS_fstat:
@@ -197,20 +204,20 @@ class Recorder {
 
     void NoteWrite(int file, std::size_t at, std::int64_t size)
     {
-        const std::string text = process.Memory(Argument(1), static_cast<std::size_t>(size));
-        record.push_back({Kind::Write, file, {}, {}, at, text});
+        const std::string text = process_.Memory(Argument(1), static_cast<std::size_t>(size));
+        record_.push_back({Kind::Write, file, {}, {}, at, text});
     }
 
-    std::string dir;
-    const TracedProcess& process;
-    std::map<std::string, int> names;  // to files, as they are now
-    int files = 0;
-    std::map<int, Open> descriptors;
-    Record record;
+    std::string dir_;
+    const TracedProcess& process_;
+    std::map<std::string, int> names_;  // to files, as they are now
+    int files_ = 0;
+    std::map<int, Open> descriptors_;
+    Record record_;
 
-    SystemCall call{};
-    std::optional<std::string> first;  // the names in its arguments
-    std::optional<std::string> second;
+    SystemCall call_{};
+    std::optional<std::string> first_;  // the names in its arguments
+    std::optional<std::string> second_;
 };
 
 }  // namespace

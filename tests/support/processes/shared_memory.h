@@ -17,17 +17,17 @@ class SharedMemory {
         void* memory =
             ::mmap(nullptr, sizeof(T), PROT_READ | PROT_WRITE, MAP_SHARED | MAP_ANONYMOUS, -1, 0);
         if (memory == MAP_FAILED) std::abort();
-        object = new (memory) T{};
+        object_ = new (memory) T{};
     }
     SharedMemory(const SharedMemory&) = delete;
     SharedMemory& operator=(const SharedMemory&) = delete;
-    ~SharedMemory() { ::munmap(object, sizeof(T)); }
+    ~SharedMemory() { ::munmap(object_, sizeof(T)); }
 
-    T& operator*() const { return *object; }
-    T* operator->() const { return object; }
+    T& operator*() const { return *object_; }
+    T* operator->() const { return object_; }
 
   private:
-    T* object = nullptr;
+    T* object_ = nullptr;
 };
 
 #endif

@@ -62,17 +62,17 @@ SystemCall CallOf(pid_t pid)
 class Family {
   public:
     Family(pid_t first, int member, int call)
-        : victim(static_cast<std::size_t>(member)), callsLeft(call)
+        : victim_(static_cast<std::size_t>(member)), callsLeft_(call)
     {
         Meet(first);
     }
 
-    bool IsAlive() const { return !living.empty(); }
-    bool HasKilled() const { return killed; }
+    bool IsAlive() const { return !living_.empty(); }
+    bool HasKilled() const { return killed_; }
 
     void Go(pid_t pid, int signal)
     {
-        const bool isWatched = !killed && members.at(pid) == victim;
+        const bool isWatched = !killed_ && members_.at(pid) == victim_;
         Trace(isWatched ? PTRACE_SYSCALL : PTRACE_CONT, pid, signal);
     }
 
@@ -80,7 +80,7 @@ class Family {
     void Take(pid_t pid, int status)
     {
         if (!WIFSTOPPED(status)) {
-            living.erase(pid);  // reported twice if its parent was killed before reaping it
+            living_.erase(pid);  // reported twice if its parent was killed before reaping it
             return;
         }
         Meet(pid);
@@ -88,8 +88,8 @@ class Family {
         const int signal = WSTOPSIG(status);
         if (event != 0) {
             Meet(ForkedBy(pid));  // when a program is started, the process itself
-        } else if (signal == SystemCallStop && !CallOf(pid).hasEnded && --callsLeft == 0) {
-            killed = true;
+        } else if (signal == SystemCallStop && !CallOf(pid).hasEnded && --callsLeft_ == 0) {
+            killed_ = true;
             ::kill(pid, SIGKILL);
             return;
         }
@@ -102,23 +102,23 @@ class Family {
     // Parent and child both report a fork, in any order. The child may have ended by then.
     void Meet(pid_t pid)
     {
-        if (pid > 0 && members.emplace(pid, members.size()).second) living.insert(pid);
+        if (pid > 0 && members_.emplace(pid, members_.size()).second) living_.insert(pid);
     }
 
-    std::map<pid_t, std::size_t> members;  // those that have ended, too
-    std::set<pid_t> living;
-    std::size_t victim;
-    int callsLeft;
-    bool killed = false;
+    std::map<pid_t, std::size_t> members_;  // those that have ended, too
+    std::set<pid_t> living_;
+    std::size_t victim_;
+    int callsLeft_;
+    bool killed_ = false;
 };
 
 }  // namespace
 
 TracedProcess::TracedProcess(const std::function<void()>& body)
 {
-    pid = ::fork();
-    if (pid < 0) std::abort();
-    if (pid == 0) {
+    pid_ = ::fork();
+    if (pid_ < 0) std::abort();
+    if (pid_ == 0) {
         Trace(PTRACE_TRACEME, 0, 0);
         ::setenv("ORVADR_TRACED", "1", 1);  // NOLINT(concurrency-mt-unsafe): for coverage_exit.cpp
         ::alarm(DeadlineSeconds);
@@ -130,7 +130,7 @@ TracedProcess::TracedProcess(const std::function<void()>& body)
         }
         ::_exit(0);
     }
-    if (!Await(pid) || !Trace(PTRACE_SETOPTIONS, pid, UsualOptions)) {
+    if (!Await(pid_) || !Trace(PTRACE_SETOPTIONS, pid_, UsualOptions)) {
         std::abort();
     }
 }
@@ -142,22 +142,22 @@ TracedProcess::~TracedProcess()
 
 bool TracedProcess::Step()
 {
-    if (pid < 0) return false;
+    if (pid_ < 0) return false;
     int signal = 0;
     do {
-        Trace(PTRACE_SYSCALL, pid, signal);
-        if (!Await(pid)) {
-            pid = -1;
+        Trace(PTRACE_SYSCALL, pid_, signal);
+        if (!Await(pid_)) {
+            pid_ = -1;
             return false;
         }
-        signal = WSTOPSIG(status);
+        signal = WSTOPSIG(status_);
     } while (signal != SystemCallStop);
     return true;
 }
 
 SystemCall TracedProcess::Call() const
 {
-    return CallOf(pid);
+    return CallOf(pid_);
 }
 
 std::string TracedProcess::Memory(std::uint64_t address, std::size_t size) const
@@ -166,7 +166,7 @@ std::string TracedProcess::Memory(std::uint64_t address, std::size_t size) const
     iovec ours{bytes.data(), size};
     void* const there = reinterpret_cast<void*>(address);  // NOLINT(performance-no-int-to-ptr)
     iovec theirs{there, size};
-    const ssize_t count = ::process_vm_readv(pid, &ours, 1, &theirs, 1, 0);
+    const ssize_t count = ::process_vm_readv(pid_, &ours, 1, &theirs, 1, 0);
     bytes.resize(static_cast<std::size_t>(std::max<ssize_t>(count, 0)));
     return bytes;
 }
@@ -183,31 +183,31 @@ std::string TracedProcess::Text(std::uint64_t address) const
 bool TracedProcess::KillBefore(int member, int call)
 {
     // Without PTRACE_O_TRACEEXEC a started program gets a SIGTRAP, which ends it.
-    Trace(PTRACE_SETOPTIONS, pid, UsualOptions | PTRACE_O_TRACEEXEC | StartEvents);
-    Family family(pid, member, call);
-    family.Go(pid, 0);
+    Trace(PTRACE_SETOPTIONS, pid_, UsualOptions | PTRACE_O_TRACEEXEC | StartEvents);
+    Family family(pid_, member, call);
+    family.Go(pid_, 0);
     while (family.IsAlive()) {
         int news = 0;
         const pid_t who = RetryOnEintr([&] { return ::waitpid(-1, &news, __WALL); });
         if (who < 0) std::abort();
         family.Take(who, news);
-        if (who == pid) status = news;
+        if (who == pid_) status_ = news;
     }
-    pid = -1;
+    pid_ = -1;
     return family.HasKilled();
 }
 
 pid_t TracedProcess::RunToStartedProgram()
 {
-    Trace(PTRACE_SETOPTIONS, pid, PTRACE_O_EXITKILL | PTRACE_O_TRACEEXEC | StartEvents);
-    Trace(PTRACE_CONT, pid, 0);
-    pid_t newest = pid;
+    Trace(PTRACE_SETOPTIONS, pid_, PTRACE_O_EXITKILL | PTRACE_O_TRACEEXEC | StartEvents);
+    Trace(PTRACE_CONT, pid_, 0);
+    pid_t newest = pid_;
     while (Await(newest)) {
-        const int event = EventOf(status);
+        const int event = EventOf(status_);
         if (event == PTRACE_EVENT_EXEC) return newest;
         const pid_t forked = event != 0 ? ForkedBy(newest) : -1;
         // An intermediate process is released, because nobody here waits for its end.
-        Trace(forked > 0 && newest != pid ? PTRACE_DETACH : PTRACE_CONT, newest, 0);
+        Trace(forked > 0 && newest != pid_ ? PTRACE_DETACH : PTRACE_CONT, newest, 0);
         if (forked > 0) newest = forked;
     }
     return -1;
@@ -220,21 +220,21 @@ void TracedProcess::Release(pid_t program)
 
 void TracedProcess::Kill()
 {
-    if (pid < 0) return;
-    ::kill(pid, SIGKILL);
-    while (Await(pid)) {
+    if (pid_ < 0) return;
+    ::kill(pid_, SIGKILL);
+    while (Await(pid_)) {
     }
-    pid = -1;
+    pid_ = -1;
 }
 
 int TracedProcess::ExitCode() const
 {
-    return ExitCodeOf(status);
+    return ExitCodeOf(status_);
 }
 
 // Waits for the next stop. False when the process has ended.
 bool TracedProcess::Await(pid_t whom)
 {
-    if (RetryOnEintr([&] { return ::waitpid(whom, &status, __WALL); }) < 0) std::abort();
-    return WIFSTOPPED(status);
+    if (RetryOnEintr([&] { return ::waitpid(whom, &status_, __WALL); }) < 0) std::abort();
+    return WIFSTOPPED(status_);
 }

@@ -60,8 +60,8 @@ class TracedProcess {
   private:
     bool Await(pid_t whom);
 
-    pid_t pid = -1;  // -1 after its end
-    int status = 0;  // from the last waitpid()
+    pid_t pid_ = -1;  // -1 after its end
+    int status_ = 0;  // from the last waitpid()
 };
 
 #endif

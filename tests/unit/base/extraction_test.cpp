@@ -74,17 +74,17 @@ void ExpectSameOfAllKinds(Extraction& extraction, const std::string& text)
 // Random texts of pieces that occur in numbers, and of some that do not.
 std::string MakeText(std::mt19937& random)
 {
-    static const std::vector<std::string> Pieces = {
+    static const std::vector<std::string> pieces = {
         "0",    "1",  "7",    "9",    "00",  "12",         "345",    "2147483647", "2147483648",
         "e308", "-",  "+",    ".",    ",",   "e",          "E",      "e-",         "e+5",
         "e400", " ",  "\t",   "\r",   "x",   "0x",         "p",      "inf",        "nan",
         "abc",  "=",  ".5",   "5.",   "'",   "4294967296", "e-400",  "e-320",      "1.234",
         "1,5",  "\v", "\xa0", "1e5",  "d",   "f",          "1e-5",   "'000",       "99999999999",
         "0.1",  "-0", "+-",   "2.25", "1e1", "3.14159265", "e99999", "INF",        Bytes("\0")};
-    std::uniform_int_distribution<std::size_t> piece(0, Pieces.size() - 1);
+    std::uniform_int_distribution<std::size_t> piece(0, pieces.size() - 1);
     std::string text;
     for (std::size_t count = 1 + piece(random) % 5; count > 0; --count) {
-        text += Pieces[piece(random)];
+        text += pieces[piece(random)];
     }
     return text;
 }

@@ -168,19 +168,19 @@ TEST_F(CacheBackgroundRefreshTest, AChildThatFailsPrintsNothingAndLeavesTheFile)
 // Makes a file if it is destroyed in another process than its owner's.
 class Witness {
   public:
-    explicit Witness(std::string note) : file(std::move(note)) {}
+    explicit Witness(std::string note) : file_(std::move(note)) {}
     Witness(const Witness&) = delete;
     Witness& operator=(const Witness&) = delete;
     ~Witness() { Note(); }
 
     void Note() const
     {
-        if (::getpid() != owner) WriteFile(file, "seen");
+        if (::getpid() != owner_) WriteFile(file_, "seen");
     }
 
   private:
-    std::string file;
-    pid_t owner = ::getpid();
+    std::string file_;
+    pid_t owner_ = ::getpid();
 };
 
 TEST_F(CacheBackgroundRefreshTest, TheChildRunsNoDestructorOrExitHandler)

@@ -24,15 +24,15 @@ class ProgramStandIn {
     // Starting a program fails with `error`.
     explicit ProgramStandIn(int error)
     {
-        faults.spawn = [this, error](const SpawnCall& call) {
-            asked = call.Arguments();
+        faults_.spawn = [this, error](const SpawnCall& call) {
+            asked_ = call.Arguments();
             return error;
         };
     }
     explicit ProgramStandIn(std::vector<std::string> command)
     {
-        faults.spawn = [this, command](SpawnCall call) mutable {
-            asked = call.Arguments();
+        faults_.spawn = [this, command](SpawnCall call) mutable {
+            asked_ = call.Arguments();
             std::vector<char*> texts;
             texts.reserve(command.size() + 1);
             for (std::string& text : command) texts.push_back(text.data());
@@ -44,11 +44,11 @@ class ProgramStandIn {
     }
 
     // The last program that was asked for, and its arguments.
-    const std::vector<std::string>& Asked() const { return asked; }
+    const std::vector<std::string>& Asked() const { return asked_; }
 
   private:
-    SyscallFaults faults;
-    std::vector<std::string> asked;
+    SyscallFaults faults_;
+    std::vector<std::string> asked_;
 };
 
 using OrvaDRCore::Container;

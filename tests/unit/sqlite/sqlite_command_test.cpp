@@ -447,11 +447,11 @@ TYPED_TEST(ConditionCommandTest, AnInvalidConditionIsRefused)
 // NOLINTNEXTLINE(cppcoreguidelines-virtual-class-destructor)
 class AnyCondition final : public SqliteCondition {
   public:
-    AnyCondition(const std::string& text, bool answer) : SqliteCondition(text), valid(answer) {}
-    bool IsValid() const override { return valid; }
+    AnyCondition(const std::string& text, bool answer) : SqliteCondition(text), valid_(answer) {}
+    bool IsValid() const override { return valid_; }
 
   private:
-    bool valid;
+    bool valid_;
 };
 
 TYPED_TEST(ConditionCommandTest, ACallersConditionDecidesWhetherItIsValid)
@@ -528,12 +528,12 @@ TEST_F(SqliteCommandTest, ACopyIsIndependent)
 template <class Command>
 class Decided : public Command {
   public:
-    Decided(const Command& command, bool answer) : Command(command), valid(answer) {}
-    bool IsValid() const override { return valid; }
+    Decided(const Command& command, bool answer) : Command(command), valid_(answer) {}
+    bool IsValid() const override { return valid_; }
     void DumpParam(std::stringstream& out) const override { out << "own parameters"; }
 
   private:
-    bool valid;
+    bool valid_;
 };
 
 TEST_F(SqliteCommandTest, ASubclassDecidesWhetherItIsValid)
@@ -564,16 +564,16 @@ TYPED_TEST(AnyCommandTest, ASubclassDescribesItsOwnParameters)
 template <class Command>
 class Careless : public Command {
   public:
-    Careless(const Command& command, const char* text) : Command(command), comment(text) {}
+    Careless(const Command& command, const char* text) : Command(command), comment_(text) {}
     void DumpParam(std::stringstream& out) const noexcept override
     {
         Command::DumpParam(out);
-        out << "/comment:[" << comment << "]";
+        out << "/comment:[" << comment_ << "]";
         Command::DumpParam(out);
     }
 
   private:
-    const char* comment;
+    const char* comment_;
 };
 
 TYPED_TEST(AnyCommandTest, ANullTextWrittenByASubclassOnlyTruncatesTheDescription)
@@ -588,7 +588,7 @@ TYPED_TEST(AnyCommandTest, ANullTextWrittenByASubclassOnlyTruncatesTheDescriptio
 // While it lives, the program's locale groups digits by three.
 class GroupedDigits {
   public:
-    GroupedDigits() : before(std::locale::global({std::locale::classic(), new Grouping}))
+    GroupedDigits() : before_(std::locale::global({std::locale::classic(), new Grouping}))
     {
         std::ostringstream out;
         out << 1234567;
@@ -596,7 +596,7 @@ class GroupedDigits {
     }
     GroupedDigits(const GroupedDigits&) = delete;
     GroupedDigits& operator=(const GroupedDigits&) = delete;
-    ~GroupedDigits() { std::locale::global(before); }
+    ~GroupedDigits() { std::locale::global(before_); }
 
   private:
     class Grouping : public std::numpunct<char> {
@@ -605,7 +605,7 @@ class GroupedDigits {
         std::string do_truename() const override { return "wahr"; }
     };
 
-    std::locale before;
+    std::locale before_;
 };
 
 TEST_F(SqliteCommandTest, NumbersAreWrittenPlainlyUnderEveryLocale)

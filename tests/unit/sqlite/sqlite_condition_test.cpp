@@ -419,11 +419,11 @@ TEST_F(SqliteConditionTest, ACopyIsIndependent)
 // NOLINTNEXTLINE(cppcoreguidelines-virtual-class-destructor)
 class AnyKeyword final : public SqliteInFamily {
   public:
-    AnyKeyword(const std::string& word, bool answer) : SqliteInFamily(word), valid(answer) {}
-    bool IsValid() const override { return valid; }
+    AnyKeyword(const std::string& word, bool answer) : SqliteInFamily(word), valid_(answer) {}
+    bool IsValid() const override { return valid_; }
 
   private:
-    bool valid;
+    bool valid_;
 };
 
 TEST_F(SqliteConditionTest, ASubclassDecidesWhetherItIsValid)
