@@ -73,7 +73,7 @@ class ORVADRCORE_API SqliteDB {
     /// Selects the first row. `record` is unchanged when there is none.
     bool SelectRecord(const SelectCommand& command, SqliteValueList& record);
 
-    /// The same, and tells whether there was a row. Both outputs are unchanged after a failure.
+    /// The same, and tells whether there was a row.
     bool SelectRecord(const SelectCommand& command, SqliteValueList& record, bool& found);
 
     /// Gives each selected row to `take`, without making records. See SelectEachByCommand().
@@ -97,18 +97,11 @@ class ORVADRCORE_API SqliteDB {
     /// \note A schema without a name is refused, and the error code stays as it was.
     bool CreateTable(const SqliteTableHandler& table);
 
-    /// Brings the file's schema to the version `steps.size()`. Opens the file if necessary.
-    ///
-    /// Step n, counted from 1, holds one or more statements that lead from version n-1 to n. It is
-    /// run if the file's version (`PRAGMA user_version`, 0 in a new file) is below n, in one
-    /// transaction with the new version: after a failure the file has the version of the last
-    /// whole step. An attempt is a whole step. Any number of processes may call this at once; each
-    /// step is run once.
-    ///
-    /// \return false with 401 when a step is empty or a transaction is open on the connection; with
-    ///         404 when the file's version is beyond the last step, with the ERR line `db[%s] has
-    ///         version [%d], newer than [%zu]`, or when SQLite fails
-    /// \note A step can neither begin nor end a transaction: SQLite refuses it with its code 23.
+    /// Opens the file and brings its schema to version `steps.size()` (`PRAGMA user_version`). Step n
+    /// holds the statements that lead from version n-1 to n. Each is run once, in one transaction
+    /// with its version, also when many processes call this at once. An attempt is a whole step.
+    /// \return false with 401 for an empty step or inside a transaction; with 404, and nothing
+    ///         changed, when the file's version is beyond the last step
     [[nodiscard]] bool Upgrade(const std::vector<std::string>& steps);
 
     /// Returns "DELETE FROM t WHERE c;", or "DELETE FROM t;" for an empty condition.
@@ -124,26 +117,18 @@ class ORVADRCORE_API SqliteDB {
     ///
     /// NULL, real and blob columns are left out, with a WARN line, and a text ends at its first
     /// zero byte. Of columns with the same name the last that is not left out counts.
-    /// \warning Integers are cut to 32 bits. Select larger ones by `CAST(size AS TEXT) AS size`.
+    /// \warning Integers are cut to 32 bits. SelectEachByCommand() reads all of this whole.
     bool SelectByCommand(const std::string& command, SqliteValueList& record);
 
     /// Appends all rows to `records`.
     /// \warning A failed attempt leaves its rows there, and the next one appends all rows again.
     bool SelectByCommand(const std::string& command, std::vector<SqliteValueList>& records);
 
-    /// Gives each row to `take` on the open connection, in little memory however many there are.
-    /// `take` returns whether it wants another row; to stop early is a success. What it throws
-    /// passes through, with the code 404.
-    ///
-    /// Attempts that fail before the first row are repeated. After it nothing is repeated, so no row
-    /// comes twice: a failure then returns false, with the failed attempt in the record.
-    ///
-    /// `take` may use other connections, and this one for selects, also for the same one. If it
-    /// closes this connection and wants another row, the select fails. It must neither destroy this
-    /// object nor assign to it. An empty `take` is refused with the code 401.
-    /// \warning The file is locked for reading meanwhile: a commit of another connection waits, and
-    ///          fails if `take` itself waits for it. Without the write-ahead log be quick here.
-    /// \warning Whether a row that `take` inserts through this connection is seen is not defined.
+    /// Gives each row to `take` on the open connection, in little memory. `take` returns whether it
+    /// wants another row. Nothing is repeated after the first row, so no row comes twice. What
+    /// `take` throws passes through, with the code 404. It may use this connection for selects, but
+    /// neither destroy nor assign to this object. An empty `take` gives the code 401.
+    /// \warning Without the write-ahead log nobody else can commit to the file meanwhile.
     [[nodiscard]] bool SelectEachByCommand(const std::string& command,
                                            const std::function<bool(const SqliteRow&)>& take);
 
@@ -164,7 +149,7 @@ class ORVADRCORE_API SqliteDB {
     const Json::Value& GetErr() const;
 
     /// SQLite's extended code of the last failed attempt or Open(), 2067 for a row that is not unique;
-    /// 0 after a success and when SQLite was not asked. The lower eight bits are the primary code.
+    /// 0 after a success.
     int GetSqliteCode() const;
 
     /// Records a failure of SQLite. Without a message it is SQLite's last one.
@@ -172,15 +157,11 @@ class ORVADRCORE_API SqliteDB {
 
     // ------------------------------------------------------------------------------------ changes
 
-    /// How many rows the last operation inserted, updated or deleted that runs such statements: all
-    /// records of InsertRecords(), all statements of a text for Exec(), all steps of Upgrade(). 0
-    /// after a failure. Selects, table creation, BEGIN and COMMIT leave it as it is.
-    /// \note Rows that triggers and foreign keys change do not count.
+    /// The rows that the last operation with an INSERT, UPDATE or DELETE has changed, of all its
+    /// statements, without those that triggers change. 0 after a failure; a select leaves it.
     std::int64_t GetAffectedRows() const;
 
-    /// The row id (INTEGER PRIMARY KEY) of the row that this connection has inserted last, 0 if there
-    /// is none. It stays when an INSERT fails, and is 0 when the connection is closed.
-    std::int64_t GetLastInsertId() const;
+    std::int64_t GetLastInsertId() const;  ///< The row id; 0 if this connection inserted nothing.
 
     // --------------------------------------------------------------------------- single attempts
     // One attempt of the operations above, without checks, retries and log lines.

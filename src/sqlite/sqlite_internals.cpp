@@ -88,6 +88,12 @@ void AppendLiteral(std::string& text, const SqliteValue& value)
     }
 }
 
+std::string Shown(const SqliteValue& value)
+{
+    const bool isBlob = SqliteInternals::KindOf(value) == SqliteInternals::Kind::Blob;
+    return isBlob ? value.ToFormatedValue() : toString(SqliteInternals::Payload(value));
+}
+
 std::string JoinPairs(const SqliteValueList& record, const char* between, const char* separator)
 {
     std::string text;

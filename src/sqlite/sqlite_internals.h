@@ -83,6 +83,9 @@ bool IsStoredAsNull(const SqliteValue& value);
 // Appends what SqliteValue::ToFormatedValue() returns.
 void AppendLiteral(std::string& text, const SqliteValue& value);
 
+// How a value that is refused is shown in the log: as JSON, a blob by its literal.
+std::string Shown(const SqliteValue& value);
+
 // The fields as one text: name, `between` and literal of each, with `separator` between fields.
 std::string JoinPairs(const SqliteValueList& record, const char* between, const char* separator);
 

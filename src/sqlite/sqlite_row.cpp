@@ -1,12 +1,9 @@
 #include <orvadrcore/sqlite_row.h>
 
-#include <array>
-#include <charconv>
 #include <limits>
-#include <string_view>
 
-#include "base/json_helpers.h"
 #include "base/log.h"
+#include "sqlite/sqlite_internals.h"
 #include "sqlite/sqlite_row_reader.h"
 
 namespace OrvaDRCore {
@@ -35,7 +32,7 @@ struct Kind<unsigned int> {
 };
 template <>
 struct Kind<std::int64_t> {
-    static constexpr const char* Function = "GetValue<long>";
+    static constexpr const char* Function = "GetValue<long int>";
     static constexpr const char* Word = "int";
 };
 template <>
@@ -88,41 +85,15 @@ Reading Read(sqlite3_value* value, std::string& out)
     return Reading::Done;
 }
 
-std::string_view BytesOf(sqlite3_value* value, const void* bytes)
+// Null also for a text or blob that SQLite has no memory for.
+SqliteValue ToValue(sqlite3_value* value)
 {
-    if (bytes == nullptr) return {};
-    return {static_cast<const char*>(bytes), static_cast<std::size_t>(sqlite3_value_bytes(value))};
-}
-
-std::string ShowReal(double number)
-{
-    std::array<char, 32> digits{};
-    char* const begin = digits.data();
-    return {begin, std::to_chars(begin, begin + digits.size(), number).ptr};
-}
-
-std::string ShowBlob(std::string_view bytes)
-{
-    constexpr std::string_view Digits = "0123456789abcdef";
-    std::string literal = "X'";
-    for (const char byte : bytes) {
-        const auto number = static_cast<unsigned char>(byte);
-        literal += Digits[number / 16];
-        literal += Digits[number % 16];
-    }
-    return literal + "'";
-}
-
-// A value as the lines of a record's GetValue() show it.
-std::string Show(sqlite3_value* value)
-{
-    switch (sqlite3_value_type(value)) {
-        case SQLITE_INTEGER: return std::to_string(sqlite3_value_int64(value));
-        case SQLITE_FLOAT: return ShowReal(sqlite3_value_double(value));
-        case SQLITE_TEXT: return toString(ToJsonText(BytesOf(value, sqlite3_value_text(value))));
-        case SQLITE_BLOB: return ShowBlob(BytesOf(value, sqlite3_value_blob(value)));
-        default: return "null";
-    }
+    const int type = sqlite3_value_type(value);
+    if (type == SQLITE_INTEGER) return SqliteValue::Integer(sqlite3_value_int64(value));
+    if (type == SQLITE_FLOAT) return SqliteValue::Real(sqlite3_value_double(value));
+    std::string bytes;
+    if (Read(value, bytes) != Reading::Done) return SqliteValue::Null();
+    return type == SQLITE_TEXT ? SqliteValue::Text(bytes) : SqliteValue::Blob(bytes);
 }
 
 template <class T>
@@ -135,7 +106,8 @@ bool ReadColumn(RowReader& reader, const RowReader::Column& column, T& out)
         reader.NoteOutOfMemory();
         DR_LOG_AS(Kind<T>::Function, Warn, "no memory to read field [%s]", column.name.c_str());
     } else {
-        DR_LOG_AS(Kind<T>::Function, Warn, "[%s] is not %s", Show(value).c_str(), Kind<T>::Word);
+        DR_LOG_AS(Kind<T>::Function, Warn, "[%s] is not %s", Shown(ToValue(value)).c_str(),
+                  Kind<T>::Word);
     }
     return false;
 }

@@ -9,17 +9,6 @@
 
 namespace OrvaDRCore {
 
-namespace {
-
-// How a value that is refused is shown in the log.
-std::string Shown(const SqliteValue& value)
-{
-    const bool isBlob = SqliteInternals::KindOf(value) == SqliteInternals::Kind::Blob;
-    return isBlob ? value.ToFormatedValue() : toString(SqliteInternals::Payload(value));
-}
-
-}  // namespace
-
 SqliteValue::SqliteValue(int number) : SqliteValue(Kind::Integer, number) {}
 
 SqliteValue::SqliteValue(unsigned int number) : SqliteValue(Kind::Integer, number) {}
