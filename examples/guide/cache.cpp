@@ -1,25 +1,32 @@
-// A cache that two processes share: the first reader asks the nodes, the other gets stored data.
-// Needs root.
+// A cache that threads and processes share: one of them asks the nodes, the others get its answer.
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <atomic>
+#include <chrono>
 #include <cstdlib>
 #include <filesystem>
 #include <iostream>
 #include <string>
+#include <thread>
+#include <vector>
 
 #include <json/value.h>
 
 #include <orvadrcore/cache.h>
 
 using OrvaDRCore::Cache;
+using OrvaDRCore::CacheState;
 
 namespace {
 
 // [cache]
 class NodeStatus : public Cache {
   public:
-    explicit NodeStatus(const std::string& dir) : Cache(dir, "status", 30, false, 2) {}
+    // Its lock is in a directory of its own, so that any user can use it.
+    explicit NodeStatus(const std::string& dir) : Cache(dir, "status", 30, false, 2, dir + "/locks")
+    {
+    }
 
     Json::Value GetInfo() const override { return "node status"; }
 
@@ -34,6 +41,24 @@ class NodeStatus : public Cache {
     bool IsValidData(const Json::Value& data) const override { return data.isObject(); }
 };
 // [/cache]
+
+// [within]
+// Asks in each thread by an object of its own, for half a minute at most. Returns how many got an answer.
+int AskInThreads(const std::string& dir, int count)
+{
+    std::atomic<int> answers{0};
+    std::vector<std::thread> threads;
+    for (int i = 0; i < count; ++i) {
+        threads.emplace_back([&] {
+            const NodeStatus status(dir);
+            Json::Value nodes;
+            if (status.ReadWithin(std::chrono::seconds(30), nodes) == CacheState::Fresh) ++answers;
+        });
+    }
+    for (std::thread& thread : threads) thread.join();
+    return answers;
+}
+// [/within]
 
 void Tell(const std::string& who, const NodeStatus& status)
 {
@@ -59,8 +84,8 @@ int main()
 {
     const std::string dir = std::filesystem::current_path();
     const NodeStatus status(dir);
-    Tell("first", status);
-    Tell("again", status);
+    std::cout << AskInThreads(dir, 8) << " threads have the status" << std::endl;
+    Tell("parent", status);
     TellAll(status);
 
     const pid_t child = ::fork();

@@ -9,16 +9,16 @@
 ///         bool IsValidData(const Json::Value& data) const override { return data.isObject(); }
 ///     };
 ///     Json::Value status;
-///     if (NodeStatus().ReadWithin(std::chrono::seconds(5), status) == CacheState::None) return false;
+///     if (NodeStatus().ReadWithin(std::chrono::seconds(5), status) == CacheState::None) ...
 /// \endcode
 /// An object is for one thread at a time: give each thread its own, for the same file. Nothing throws
-/// unless memory runs out or a subclass does. docs/cache.md says which read to use, what to expect of
-/// many callers at once, and has the files and the log lines.
-/// \warning A refresh of Read() may run in a forked child: GetUpdatedData(), GetInfo() and IsValidData() must
+/// unless memory runs out or a subclass does. docs/cache.md says what to expect of many callers at
+/// once, and has the files and the log lines.
+/// \warning Read() may refresh in a forked child: GetUpdatedData(), GetInfo() and IsValidData() must
 ///          not use the caller's SqliteDB, sockets or locks, nor a mutex of other threads. What they
 ///          throw there is lost, and no destructor or exit handler runs.
-/// \warning Without a lock directory of its own a cache is for root. If the lock file cannot be opened, it
-///          looks to Read() as if another process were refreshing: one that must wait waits for ever.
+/// \warning Without a lock directory a cache is for root. A lock file that cannot be opened looks to
+///          Read() as if another process were refreshing: one that must wait waits for ever.
 #ifndef ORVADRCORE_CACHE_H
 #define ORVADRCORE_CACHE_H
 
@@ -42,16 +42,16 @@ enum class CacheState {
 /// A cache of one value; a subclass says which. The order of the virtual operations is part of the ABI.
 class ORVADRCORE_API Cache {
   public:
-    /// The file is `dir`/`file`.cached; `dir` must be absolute, and is made if missing. A refresh makes up to `retries` + 2 attempts to produce data
-    /// and to write it, or one if `retries` is negative.
+    /// The file is `dir`/`file`.cached; `dir` must be absolute, and is made if missing. A refresh makes
+    /// up to `retries` + 2 attempts to produce data and to write it, or one if `retries` is negative.
     /// \warning If `dir` cannot be made (ERR), or one of the names is empty (WARN), the file is
     ///          /tmp/default_dr_cache, which all such caches share.
     Cache(const std::string& dir, const std::string& file, long timeoutSeconds,
           bool updatedRequired, int retries);
 
-    /// For any user who may write to `dir` and `lockDir`, an absolute path that is made with mode 0700 if
-    /// missing: lock and pid file are there, with 0600. All users of the file must name the same one.
-    /// Caches with the same `file` in different `dir` need different ones. Empty: as without it.
+    /// For any user who may write to `dir` and `lockDir`, where lock and pid file are (0600). `lockDir` is
+    /// an absolute path, made with mode 0700 if missing; empty is as without it. All processes must give
+    /// a file the same one, and files of the same name in different `dir` different ones.
     Cache(const std::string& dir, const std::string& file, long timeoutSeconds,
           bool updatedRequired, int retries, const std::string& lockDir);
 
@@ -71,9 +71,9 @@ class ORVADRCORE_API Cache {
     virtual bool IsValidData(const Json::Value& data) const = 0;
     /// Whether valid data that is not too old needs a refresh all the same; false by default.
     virtual bool IsNeedUpdate(const Json::Value& data) const;
-    /// Whether Read() refreshes in the caller, or waits for another process that does, instead of using
-    /// old data: by default when the constructor was told so or the cached data is not valid. Called in
-    /// the caller before each refresh, also by ReadWithin(), which ignores the result.
+    /// Whether Read() refreshes in the caller, or waits for whoever does, instead of using old data: by
+    /// default when the constructor was told so or the cached data is not valid. Also called before a
+    /// refresh of ReadWithin(), which ignores the result.
     virtual bool IsUpdatedDataRequired() const;
 
     // ------------------------------------------------------------------------------------- reading
@@ -87,12 +87,10 @@ class ORVADRCORE_API Cache {
     /// get meanwhile, is good until the next operation on the object.
     const Json::Value& View() const;
     /// Fresh data at once if there is some. Otherwise refreshes it here, never in a child, or waits for
-    /// the thread or process that does, looking every few milliseconds. When `patience` is over, old data
-    /// or the default value; only a GetUpdatedData() that has begun is not interrupted. With 0 or less it
-    /// waits for nobody, but refreshes if nobody else does.
-    ///
-    /// Of all that wait one produces, in its attempts with short pauses; if they fail, the next one. Data
-    /// that could not be stored, or was produced without the lock, is Fresh all the same (WARN).
+    /// the thread or process that does, looking every few milliseconds. When `patience` is over: old data
+    /// or the default value. A GetUpdatedData() that has begun is not interrupted. With 0 or less it
+    /// waits for nobody, but refreshes if nobody else does. Of all that wait one produces; if its attempts
+    /// fail, the next. Data that could not be stored or locked is Fresh all the same (WARN).
     CacheState ReadWithin(std::chrono::milliseconds patience, Json::Value& data) const;
     /// The data without a refresh. The file is read only when its modification time has changed.
     Json::Value GetCachedData() const;

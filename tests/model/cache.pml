@@ -1,6 +1,6 @@
 /*
- * The update protocol of src/cache/cache.cpp, with one step for each system call that other processes can
- * notice. run.sh lists which properties are checked in which variants, docs/cache.md the consequences.
+ * The update protocol of src/cache/, with one step for each system call that other processes can notice.
+ * run.sh lists which properties are checked in which variants, README.md the consequences.
  *
  * The process table has three places. A new process takes a free one, started by the world or by a fork,
  * with a new id or the id of the place's last process. It reads the cache as often as the world wants, and
@@ -10,6 +10,8 @@
  * A pause is not a step, because the others may always be faster. All attempts to take a lock are one step:
  * it succeeds if the lock is free, and may give up if it is not. Taking a lock and the first read under it
  * are one step, and so are the last access and the release: nobody can tell the difference.
+ *
+ * With WITHIN the processes also call ReadWithin(). Its time may be over at any look, which ends it.
  *
  * Variants, each a -D. Conditions of the world:
  *   ID_ONLY            pid files hold no start time
@@ -21,14 +23,27 @@
  *   ONLY_OLD           data is refreshed only because it is old
  *   ONLY_MARKED        only a marked process writes the cache file
  *   ALL_BLOCK          all readers require fresh data
+ *   WITHIN             process 1 reads by ReadWithin(), the others by that or by Read()
+ *   ALL_WITHIN         all processes read by ReadWithin()
+ *   PATIENT            nobody's time in ReadWithin() is ever over
  *   UNNOTICED_BIRTHS   a new process does not count as a disturbance of a lone reader
  * Changes of the protocol, which show that the checks can fail:
  *   NO_LOCK  SHARED_MARKING  NO_SECOND_LOOK  BLIND_REMOVAL  UNLOCKED_REMOVAL  NO_LIFE_CHECK
- *   WAIT_FOR_FRESH  WAIT_FOR_UPDATER
+ *   WAIT_FOR_FRESH  WAIT_FOR_UPDATER  NO_LOOK_UNDER_LOCK  NO_CHECK_UNDER_LOCK  NO_TIME  STUBBORN_MARK
  * CHECK_... selects a property.
  */
 
 #define Places 3 /* numbered from 1 */
+
+#ifdef ALL_WITHIN
+#define ReadsWithin
+#endif
+#ifdef WITHIN
+#define ReadsWithin
+#define MayCallRead(p) (p != 1)
+#else
+#define MayCallRead(p) true
+#endif
 
 /* The state of a process, in the order of the code. */
 #define None 0         /* no process */
@@ -42,11 +57,24 @@
 #define Set 8          /* SetUpdating */
 #define SetSeen 9      /*     exclusive lock held */
 #define SetFree 10     /*     exclusive lock held, and nobody else refreshes */
-#define Produce 11     /* marked; DoUpdate */
-#define Unset 12       /* UnsetUpdating */
-#define UnsetSeen 13
-#define UnsetAgain 14  /*     a living process is marked; shared lock held */
-#define UnsetRemove 15 /*     shared lock held */
+#define Within 11      /* ClaimWithin */
+#define WithinSeen 12  /*     has read the pid file without a lock */
+#define Claim 13       /* TryClaim */
+#define ClaimSeen 14   /*     exclusive lock held, as in the next two */
+#define ClaimFree 15   /*     nobody else refreshes */
+#define ClaimStale 16  /*     no fresh data has arrived */
+#define Alone 17       /* RefreshWithin without a mark */
+#define Produce 18     /* marked; DoUpdate */
+#define Renew 19       /* marked; RefreshWithin */
+#define Unset 20       /* UnsetUpdating */
+#define End 21         /* EndClaim */
+#define EndSeen 22     /*     has read the pid file without the lock, which could not be had */
+#define EndRemove 23   /*     without the lock */
+#define UnsetSeen 24
+#define UnsetAgain 25  /*     a living process is marked; shared lock held */
+#define UnsetRemove 26 /*     shared lock held */
+#define HeldSeen 27    /* EndClaim; shared lock held */
+#define HeldRemove 28  /*     shared lock held */
 
 byte at[Places + 1];
 
@@ -72,7 +100,7 @@ bit retired; /* no process is started, killed or made to read any more */
 #endif
 
 /* The lock. Who holds it follows from the states. */
-#define Marks(p) (at[p] == SetSeen || at[p] == SetFree)
+#define Marks(p) (at[p] == SetSeen || at[p] == SetFree || (at[p] >= ClaimSeen && at[p] <= ClaimStale))
 #define Probes(p) (at[p] == UpdateSeen || at[p] == WaitSeen || at[p] == RefreshSeen)
 #ifdef UNLOCKED_REMOVAL
 #define Removes(p) false
@@ -144,6 +172,26 @@ bit retired; /* no process is started, killed or made to read any more */
 #define AssertLoserWaits assert(fresh || !IsOwners(mark))
 #else
 #define AssertLoserWaits skip
+#endif
+
+/* The time of process 1 in ReadWithin(): over once this is true. */
+#ifdef CHECK_ENDS_IN_TIME
+bit late;
+#define TimeIsLeft(p) (p != 1 || !late)
+#define TimeBegins(p) late = (late && p != 1)
+#else
+#define TimeIsLeft(p) true
+#define TimeBegins(p) skip
+#endif
+#ifdef ONLY_OLD
+#define MayBeUnwanted false
+#else
+#define MayBeUnwanted true
+#endif
+#ifdef NO_LOOK_UNDER_LOCK
+#define LooksUnderLock false
+#else
+#define LooksUnderLock true
 #endif
 
 /* Process 1 waits for a working updater until something is written or an updater ends. */
@@ -274,6 +322,12 @@ inline GiveUpRefresh() {
     Finish()
 }
 
+/* ReadWithin, when another process refreshes or holds the lock: looks again. */
+inline LookAgain() {
+    AssertNotLone;
+    GoTo(Within)
+}
+
 inline RemoveMark() {
     AssertOwnRemoval;
     mark = 0;
@@ -353,6 +407,62 @@ endRest:
        }
     :: atomic { at[me] == UnsetRemove -> RemoveMark() }
 #endif
+
+#ifdef ReadsWithin
+    :: atomic { at[me] == Within && fresh -> Finish() }
+    :: atomic { at[me] == Within && (!fresh || MayBeUnwanted) && TimeIsLeft(me) ->
+           ReadMark();
+           at[me] = WithinSeen
+       }
+#ifndef NO_TIME
+#ifndef PATIENT
+    :: atomic { at[me] == Within -> Finish() }
+#endif
+#endif
+    :: atomic { at[me] == WithinSeen && SeenLives -> LookAgain() }
+    :: atomic { at[me] == WithinSeen && !SeenLives -> GoTo(Claim) }
+
+    :: atomic { at[me] == Claim && MayExclude -> ReadMark(); at[me] = ClaimSeen }
+    :: atomic { at[me] == Claim && !MayExclude -> LookAgain() }
+#ifdef LOCK_FAULTS
+    :: atomic { at[me] == Claim -> at[me] = Alone }
+#endif
+#ifdef NO_CHECK_UNDER_LOCK
+    :: atomic { at[me] == ClaimSeen -> GoTo(ClaimFree) }
+#else
+    :: atomic { at[me] == ClaimSeen && SeenLives -> LookAgain() }
+    :: atomic { at[me] == ClaimSeen && !SeenLives -> GoTo(ClaimFree) }
+#endif
+    :: atomic { at[me] == ClaimFree && fresh && LooksUnderLock -> Finish() }
+    :: atomic { at[me] == ClaimFree && (!fresh || MayBeUnwanted || !LooksUnderLock) ->
+           at[me] = ClaimStale
+       }
+    :: atomic {
+           at[me] == ClaimStale -> AssertOneUpdater;
+           AssertNoLateRefresh;
+           mark = me;
+           at[me] = Renew
+       }
+    :: atomic { at[me] == ClaimStale -> at[me] = Alone } /* the pid file cannot be written */
+#ifndef ONLY_MARKED
+    :: atomic { at[me] == Alone -> fresh = true; News; Finish() }
+#endif
+    :: atomic { at[me] == Alone -> Finish() } /* no data, or it could not be written */
+
+    :: atomic { at[me] == Renew -> fresh = true; News; at[me] = End }
+    :: atomic { at[me] == Renew -> at[me] = End }
+    :: atomic { at[me] == End && MayShare -> ReadMark(); at[me] = HeldSeen }
+#ifdef STUBBORN_MARK
+    :: atomic { at[me] == End && GivesUp(MayShare) -> News; Finish() }
+#else
+    :: atomic { at[me] == End && GivesUp(MayShare) -> ReadMark(); at[me] = EndSeen }
+#endif
+    :: atomic { at[me] == HeldSeen && (Place(seen[me]) == me || !SeenLives) -> GoTo(HeldRemove) }
+    :: atomic { at[me] == HeldSeen && Place(seen[me]) != me && SeenLives -> News; Finish() }
+    :: atomic { at[me] == EndSeen && (Place(seen[me]) == me || !SeenLives) -> GoTo(EndRemove) }
+    :: atomic { at[me] == EndSeen && Place(seen[me]) != me && SeenLives -> News; Finish() }
+    :: atomic { at[me] == HeldRemove || at[me] == EndRemove -> RemoveMark() }
+#endif
     od
 }
 
@@ -370,7 +480,12 @@ endRest:
 inline Disturb(p) {
     if
     :: at[p] == None -> Bear(p, Rest)
-    :: at[p] == Rest && MayRead -> BeginsToRead(p); at[p] = Update
+#ifndef ALL_WITHIN
+    :: at[p] == Rest && MayRead && MayCallRead(p) -> BeginsToRead(p); at[p] = Update
+#endif
+#ifdef ReadsWithin
+    :: at[p] == Rest && MayRead -> BeginsToRead(p); TimeBegins(p); at[p] = Within
+#endif
     :: MayEnd(p) -> Kill(p)
     :: else
     fi
@@ -388,6 +503,9 @@ active proctype World() {
 #endif
 #ifdef OUTSIDER
     :: atomic { mark != 0 -> mark = 0 }
+#endif
+#ifdef CHECK_ENDS_IN_TIME
+    :: atomic { at[1] == Within || at[1] == WithinSeen -> late = true }
 #endif
     :: atomic { true -> retired = true; break }
     od
@@ -410,4 +528,8 @@ ltl { (<>retired && <>[](!IsUpdater(1) && !IsUpdater(2) && !IsUpdater(3))) -> En
 /* When data is fresh again and again, and the process checks again and again. */
 #ifdef CHECK_READ_ENDS_BY_FRESH_MOMENTS
 ltl { ([]<>fresh && []<>(at[1] == WaitSeen)) -> Ends }
+#endif
+/* ReadWithin() ends in its time, whatever the others do. */
+#ifdef CHECK_ENDS_IN_TIME
+ltl { [](late -> <>(at[1] <= Rest)) }
 #endif
