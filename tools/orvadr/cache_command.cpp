@@ -4,7 +4,6 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <cstring>
 #include <ctime>
 #include <optional>
 
@@ -63,14 +62,14 @@ CacheLook LookAt(const std::string& path)
     if (::stat(path.c_str(), &status) != 0) {
         const int error = errno;
         look.isMissing = IsAbsence(error);
-        return look.isMissing ? look : Trouble(look, std::strerror(error), ExitCode::NotSeen);
+        return look.isMissing ? look : Trouble(look, ErrorText(error), ExitCode::NotSeen);
     }
     look.status = status;
     if (!S_ISREG(status.st_mode)) return Trouble(look, "no regular file", ExitCode::NotSeen);
 
     std::string text;
     if (!OrvaDRCore::ReadRegularFile(path, text, LargestDocument + 1)) {
-        return Trouble(look, std::strerror(errno), ExitCode::NotSeen);
+        return Trouble(look, ErrorText(errno), ExitCode::NotSeen);
     }
     Json::Value document;
     if (text.size() > LargestDocument && BeginsLikeAnObject(text)) {
@@ -91,7 +90,7 @@ Json::Value FindUpdater(const std::string& cachePath, Report& report)
     struct stat status {};
     if (::stat(path.c_str(), &status) != 0 || !S_ISREG(status.st_mode)) return {};
     if (::access(path.c_str(), R_OK) != 0) {
-        report.remarks.push_back(Printable(path) + ": " + std::strerror(errno));
+        report.remarks.push_back(Printable(path) + ": " + ErrorText(errno));
         report.Worsen(ExitCode::NotSeen);
         return {};
     }

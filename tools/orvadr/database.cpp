@@ -6,7 +6,6 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
-#include <cstring>
 #include <filesystem>
 #include <memory>
 #include <new>
@@ -17,6 +16,7 @@
 
 #include "base/file_io.h"
 #include "reading_vfs.h"
+#include "text.h"
 
 namespace Orvadr {
 
@@ -258,7 +258,7 @@ std::optional<DatabaseLook> LookOnce(const std::string& path, const DatabaseLook
     std::string header;
     const Stamps before = StampsOf(path);
     if (!OrvaDRCore::ReadRegularFile(path, header, ReadVersionAt + 1)) {
-        look.reason = std::strerror(errno);
+        look.reason = ErrorText(errno);
         return look;
     }
     const bool hasHeader =

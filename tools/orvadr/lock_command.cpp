@@ -1,7 +1,6 @@
 #include <sys/stat.h>
 
 #include <cerrno>
-#include <cstring>
 #include <filesystem>
 #include <optional>
 #include <set>
@@ -127,7 +126,7 @@ void Describe(const LockFile& file, Knowledge& knowledge, Report& report)
     object["holders"] = Json::Value(Json::arrayValue);
     if (file.error != 0) {
         object["state"] = Json::Value();
-        NoteUnseen(file.path, std::strerror(file.error), report);
+        NoteUnseen(file.path, ErrorText(file.error), report);
     } else if (file.id) {
         DescribeHolders(file, knowledge, object, report);
     }

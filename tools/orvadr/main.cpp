@@ -3,7 +3,8 @@
 
 #include <algorithm>
 #include <clocale>
-#include <cstdlib>
+#include <cstdio>
+#include <exception>
 #include <functional>
 #include <iostream>
 #include <string>
@@ -126,6 +127,11 @@ ExitCode Run(int argc, const char* const* argv)
 int main(int argc, char** argv)
 {
     // The width of characters is that of UTF-8, whatever the user's language.
-    (void)std::setlocale(LC_CTYPE, "C.UTF-8");
-    return static_cast<int>(Run(argc, argv));
+    (void)std::setlocale(LC_CTYPE, "C.UTF-8");  // NOLINT(concurrency-mt-unsafe)
+    try {
+        return static_cast<int>(Run(argc, argv));
+    } catch (const std::exception& error) {                        // out of memory
+        (void)std::fprintf(stderr, "orvadr: %s\n", error.what());  // GCOVR_EXCL_LINE: see above
+        return static_cast<int>(ExitCode::NotSeen);                // GCOVR_EXCL_LINE
+    }
 }

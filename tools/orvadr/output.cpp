@@ -6,7 +6,6 @@
 #include <cerrno>
 #include <cstdio>
 #include <cstdlib>
-#include <cstring>
 #include <memory>
 #include <sstream>
 #include <string_view>
@@ -23,13 +22,13 @@ namespace {
 
 bool IsSet(const char* variable)
 {
-    const char* const value = std::getenv(variable);
+    const char* const value = std::getenv(variable);  // NOLINT(concurrency-mt-unsafe)
     return value != nullptr && *value != '\0';
 }
 
 bool IsDumbTerminal()
 {
-    const char* const terminal = std::getenv("TERM");
+    const char* const terminal = std::getenv("TERM");  // NOLINT(concurrency-mt-unsafe)
     return terminal == nullptr || std::string_view(terminal) == "dumb";
 }
 
@@ -76,7 +75,7 @@ ExitCode Print(const Report& report, Style style)
     }
     if (isWritten) return report.code;
     (void)std::fprintf(stderr, "orvadr: cannot write to standard output: %s\n",
-                       std::strerror(error));
+                       ErrorText(error).c_str());
     return ExitCode::NotSeen;
 }
 

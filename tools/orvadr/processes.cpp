@@ -32,6 +32,7 @@ Directory OpenDirectory(const std::string& path)
 // Calls a function with each name in a directory that is a number.
 void ForEachNumber(const Directory& directory, const std::function<void(int)>& take)
 {
+    // NOLINTNEXTLINE(concurrency-mt-unsafe): each directory has one reader
     while (const dirent* const entry = ::readdir(directory.get())) {
         const std::string name = entry->d_name;
         int number = 0;

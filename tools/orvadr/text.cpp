@@ -6,6 +6,7 @@
 #include <array>
 #include <cmath>
 #include <cstdio>
+#include <system_error>
 #include <utility>
 
 #include "base/json_helpers.h"
@@ -152,6 +153,11 @@ Json::Value ToUtf8(const Json::Value& value)
         }
     }
     return result;
+}
+
+std::string ErrorText(int error)
+{
+    return std::generic_category().message(error);
 }
 
 std::string DurationText(double seconds)

@@ -29,6 +29,9 @@ std::size_t ColumnsOf(std::string_view text);
 // The value with all its texts and names in UTF-8: each wrong byte becomes U+FFFD.
 Json::Value ToUtf8(const Json::Value& value);
 
+// What a value of errno means.
+std::string ErrorText(int error);
+
 // "45s", "12m 05s", "2h 14m", "3d 04h", with a minus in front if negative.
 std::string DurationText(double seconds);
 
