@@ -1,5 +1,5 @@
-# `cmake --install`, in three components: Runtime (the library), Development (headers, files for CMake
-# and pkg-config) and Examples (sources). The installed tree may be moved.
+# `cmake --install`, in four components: Runtime (the library), Development (headers, files for CMake
+# and pkg-config), Examples (sources) and Tools (orvadr; see tools/orvadr). The installed tree may be moved.
 include(GNUInstallDirs)
 include(CMakePackageConfigHelpers)
 

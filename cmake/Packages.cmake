@@ -6,6 +6,9 @@ set(CPACK_PACKAGE_DESCRIPTION_SUMMARY "")  # each package has its own
 set(CPACK_PACKAGE_CONTACT "OrvaDRCore maintainers <maintainers@orvadrcore.invalid>")
 set(CPACK_PACKAGE_DIRECTORY ${PROJECT_BINARY_DIR}/packages)
 set(CPACK_COMPONENTS_ALL Runtime Development Examples)
+if(TARGET orvadr)
+    list(APPEND CPACK_COMPONENTS_ALL Tools)
+endif()
 set(CPACK_STRIP_FILES ON)
 set(CPACK_DEB_COMPONENT_INSTALL ON)
 set(CPACK_DEBIAN_FILE_NAME DEB-DEFAULT)
@@ -38,10 +41,16 @@ orvadr_debian_package(Development liborvadrcore-dev libdevel same
 orvadr_debian_package(Examples liborvadrcore-examples doc foreign
     "common services of disaster recovery programs - examples"
     "This package holds programs that use the library, to read and to build.")
+if(TARGET orvadr)
+    orvadr_debian_package(Tools orvadr-tools admin foreign
+        "common services of disaster recovery programs - operator's tool"
+        "This package holds the program orvadr. It shows caches, locks, databases and\nerror codes.")
+endif()
 
 # The library runs uuidgen, which the list of shared libraries does not show.
 set(CPACK_DEBIAN_RUNTIME_PACKAGE_DEPENDS uuid-runtime)
 set(CPACK_DEBIAN_RUNTIME_PACKAGE_SHLIBDEPS ON)
+set(CPACK_DEBIAN_TOOLS_PACKAGE_SHLIBDEPS ON)
 set(CPACK_DEBIAN_PACKAGE_GENERATE_SHLIBS ON)
 set(CPACK_DEBIAN_PACKAGE_GENERATE_SHLIBS_POLICY ">=")
 # Debian's policy wants a trigger for ldconfig; CPack would write scripts, of which lintian warns. The
