@@ -9,7 +9,7 @@ build_packages=(g++ make cmake libsqlite3-dev libjsoncpp-dev uuid-runtime
     libcpp-httplib-dev pkg-config # these two for examples/node_service
     libcli11-dev)                 # for tools/orvadr, examples/node_registry and node_service
 # shellcheck disable=SC2034
-test_packages=(libgtest-dev libgmock-dev)
+test_packages=(libgtest-dev libgmock-dev sqlite3)
 # shellcheck disable=SC2034
 bench_packages=(libbenchmark-dev libcli11-dev pkg-config)
 # shellcheck disable=SC2034
