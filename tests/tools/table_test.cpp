@@ -145,9 +145,34 @@ TEST(TerminalTest, FitsTheTerminal)
     for (const std::uint16_t columns : {std::uint16_t{80}, std::uint16_t{40}}) {
         const ProgramResult result = RunInTerminal(CommandLine({"error"}), columns);
         EXPECT_EQ(result.code, AllWell);
-        EXPECT_THAT(LinesOf(result.out), Each(SizeIs(Le(columns))));
+        EXPECT_THAT(LinesOf(result.out), Each(SizeIs(Le(std::size_t{columns}))));
         EXPECT_THAT(result.out, HasSubstr("out of memory"));
     }
+}
+
+TEST(TerminalTest, ShowsLongNamesOnSeveralLines)
+{
+    const std::string name = "/" + std::string(150, 'x') + "/" + std::string(100, 'y');
+    const ProgramResult result = RunInTerminal(CommandLine({"cache", name}), 80, {"NO_COLOR=1"});
+    EXPECT_EQ(result.code, NotWell);
+    const Words lines = LinesOf(result.out);
+    EXPECT_THAT(lines, Each(SizeIs(Le(80U))));
+    ASSERT_GE(lines.size(), 5U);
+    EXPECT_EQ(lines[0], "STATE    FILE");
+    EXPECT_EQ(lines[1], "missing  /" + std::string(70, 'x'));
+}
+
+TEST(TerminalTest, HasColourUnlessThatIsNotWanted)
+{
+    const Words line = CommandLine({"cache", "/no such file"});
+    const std::string colour = "\033[31mmissing\033[0m";
+    EXPECT_THAT(RunInTerminal(line, 80).out, HasSubstr(colour));
+    EXPECT_THAT(RunInTerminal(line, 80, {"NO_COLOR="}).out, HasSubstr(colour));
+    EXPECT_THAT(RunInTerminal(line, 80, {"NO_COLOR=1"}).out, Not(HasSubstr("\033")));
+    EXPECT_THAT(RunInTerminal(line, 80, {"TERM=dumb"}).out, Not(HasSubstr("\033")));
+    EXPECT_THAT(RunOrvadr({"cache", "/no such file"}).out, Not(HasSubstr("\033")));
+    const Words json = CommandLine({"--json", "cache", "/no such file"});
+    EXPECT_THAT(RunInTerminal(json, 80).out, Not(HasSubstr("\033")));
 }
 
 TEST(TerminalTest, WritesLongLinesIntoAPipe)
