@@ -71,7 +71,8 @@ class SqliteRowTest : public LoggedTest {
     {
         ExpectRefused(expression, 7, "GetValue<int>", "[" + shown + "] is not int");
         ExpectRefused(expression, 7U, "GetValue<unsigned int>", "[" + shown + "] is not int");
-        ExpectRefused(expression, std::int64_t{7}, "GetValue<long int>", "[" + shown + "] is not int");
+        ExpectRefused(expression, std::int64_t{7}, "GetValue<long int>",
+                      "[" + shown + "] is not int");
         ExpectRefused(expression, true, "GetValue<bool>", "[" + shown + "] is not bool");
     }
 
