@@ -9,12 +9,14 @@
 #include <orvadrcore/sqlite_command.h>
 #include <orvadrcore/sqlite_condition.h>
 #include <orvadrcore/sqlite_db.h>
+#include <orvadrcore/sqlite_row.h>
 #include <orvadrcore/sqlite_transaction.h>
 #include <orvadrcore/sqlite_value.h>
 #include <orvadrcore/utils.h>
 
 #include <cstddef>
 #include <cstdint>
+#include <functional>
 #include <map>
 #include <memory>
 #include <sstream>
@@ -289,6 +291,24 @@ static_assert(
 static_assert(Has<bool (SqliteDB::*)(const SqliteTableHandler&)>(&SqliteDB::DeleteAllRecords));
 static_assert(
     Has<bool (SqliteDB::*)(const string&, const SqliteTableHandler&)>(&SqliteDB::DeleteRecord));
+
+using RowTaker = std::function<bool(const SqliteRow&)>;
+static_assert(
+    Has<bool (SqliteDB::*)(const SelectCommand&, const RowTaker&)>(&SqliteDB::SelectEach));
+static_assert(
+    Has<bool (SqliteDB::*)(const string&, const RowTaker&)>(&SqliteDB::SelectEachByCommand));
+static_assert(Has<bool (SqliteDB::*)(const SelectCommand&, SqliteValueList&, bool&)>(
+    &SqliteDB::SelectRecord));
+static_assert(Has<bool (SqliteDB::*)(const std::vector<string>&)>(&SqliteDB::Upgrade));
+static_assert(Has<std::int64_t (SqliteDB::*)() const>(&SqliteDB::GetAffectedRows));
+static_assert(Has<std::int64_t (SqliteDB::*)() const>(&SqliteDB::GetLastInsertId));
+static_assert(Has<int (SqliteDB::*)() const>(&SqliteDB::GetSqliteCode));
+
+static_assert(!std::is_polymorphic_v<SqliteRow>);
+static_assert(!std::is_copy_constructible_v<SqliteRow> && !std::is_copy_assignable_v<SqliteRow>);
+static_assert(Has<std::size_t (SqliteRow::*)() const>(&SqliteRow::GetColumnCount));
+static_assert(Has<string (SqliteRow::*)(std::size_t) const>(&SqliteRow::GetColumnName));
+static_assert(Has<bool (SqliteRow::*)(const string&) const>(&SqliteRow::IsNull));
 
 static_assert(!std::is_polymorphic_v<SqliteTransaction>);
 static_assert(std::is_constructible_v<SqliteTransaction, SqliteDB&>);
