@@ -49,7 +49,7 @@ Methods:
           counts. All get the same volume (default /volume1/replica).
   export  file                                       data: {"count":COUNT}
           Writes all nodes into a file, as one JSON document. The file is
-          written in place.
+          replaced as a whole.
   restore file                                       data: {"count":COUNT}
           Makes the nodes those of an exported file, with the ids that they have
           there: all of them, or none when one is bad. Of all exports and

@@ -10,6 +10,7 @@
 #include <orvadrcore/file.h>
 #include <orvadrcore/file_lock.h>
 #include <orvadrcore/request.h>
+#include <orvadrcore/response.h>
 
 #include "documents.h"
 #include "json_line.h"
@@ -24,6 +25,7 @@ using OrvaDRCore::ERR;
 using OrvaDRCore::File;
 using OrvaDRCore::FileLock;
 using OrvaDRCore::Request;
+using OrvaDRCore::Response;
 
 namespace {
 
@@ -38,17 +40,17 @@ constexpr unsigned int LockRetries = 3;
 
 Json::Value BadRequest(const std::string& reason)
 {
-    return Failure(ERR::BAD_PARAMETER, Reason("request", reason));
+    return Response::Failure(ERR::BAD_PARAMETER, Reason("request", reason));
 }
 
 Json::Value BadParameter(const Parameters& parameters)
 {
-    return Failure(ERR::BAD_PARAMETER, parameters.GetErr());
+    return Response::Failure(ERR::BAD_PARAMETER, parameters.GetErr());
 }
 
 Json::Value NoSuchApi(const std::string& what)
 {
-    return Failure(ERR::ERR_NO_SUCH_API, Reason(what, "is unknown"));
+    return Response::Failure(ERR::ERR_NO_SUCH_API, Reason(what, "is unknown"));
 }
 
 // {"success":true,"data":{"id":id}}
@@ -56,7 +58,7 @@ Json::Value DoneWith(const std::string& id)
 {
     Json::Value data(Json::objectValue);
     data["id"] = id;
-    return Success(data);
+    return Response::Success(data);
 }
 
 // {"success":true,"data":{"count":count}}
@@ -64,17 +66,18 @@ Json::Value DoneWith(std::size_t count)
 {
     Json::Value data(Json::objectValue);
     data["count"] = Json::UInt64{count};
-    return Success(data);
+    return Response::Success(data);
 }
 
 Json::Value BadFile(const std::string& reason)
 {
-    return Failure(ERR::BAD_PARAMETER, Reason("file", reason));
+    return Response::Failure(ERR::BAD_PARAMETER, Reason("file", reason));
 }
 
 Json::Value NotAlone(int code)
 {
-    return Failure(code, Reason("lock", "is held by another handler, or may not be opened"));
+    return Response::Failure(code,
+                             Reason("lock", "is held by another handler, or may not be opened"));
 }
 
 // A missing file would count as empty, and a pipe or device might never end.
@@ -188,7 +191,7 @@ Json::Value Handler::Get(const Json::Value& params)
     }
     Node node;
     if (!registry_.Find(key, node)) return RegistryFailure();
-    return Success(node.ToJson());
+    return Response::Success(node.ToJson());
 }
 
 // With an id, "name" is the new name; without one, it says which node is meant.
@@ -248,7 +251,7 @@ Json::Value Handler::List(const Json::Value& params)
     Json::Value data(Json::objectValue);
     data["nodes"] = Json::Value(Json::arrayValue);
     for (const Node& node : nodes) data["nodes"].append(node.ToJson());
-    return Success(data);
+    return Response::Success(data);
 }
 
 Json::Value Handler::Status(const Json::Value& params)
@@ -256,18 +259,18 @@ Json::Value Handler::Status(const Json::Value& params)
     Parameters parameters(params);
     if (!parameters.AreOnly({})) return BadParameter(parameters);
     if (!StatusCache::IsUsable(statusPath_)) {
-        return Failure(ERR::ERR_NO_PERMISSION,
-                       Reason("status", "has no directory or no lock that may be used"));
+        return Response::Failure(ERR::ERR_NO_PERMISSION,
+                                 Reason("status", "has no directory or no lock that may be used"));
     }
     const StatusCache cache(statusPath_, statusTimeout_, registry_);
     Json::Value status = cache.Read();
     if (cache.IsValidData(status)) {
         const Json::Int64 age = std::time(nullptr) - status["time"].asInt64();
         status["age"] = std::max(age, Json::Int64{0});
-        return Success(status);
+        return Response::Success(status);
     }
     if (cache.HasFailedToList()) return RegistryFailure();
-    return Failure(ERR::ERR_NODE_GET, Reason("status", "could not be taken or stored"));
+    return Response::Failure(ERR::ERR_NODE_GET, Reason("status", "could not be taken or stored"));
 }
 
 // Creates the nodes one by one, like that many create requests. A refused node does not affect the
@@ -302,11 +305,10 @@ Json::Value Handler::Import(const Json::Value& params)
     Json::Value data(Json::objectValue);
     data["created"] = created;
     data["refused"] = refused;
-    return Success(data);
+    return Response::Success(data);
 }
 
-// The lock only excludes other exports and restores. The file is written in place, so a reader without
-// the lock may see a partial document.
+// The lock only excludes other exports and restores. Other readers see the old file or the new one.
 Json::Value Handler::Export(const Json::Value& params)
 {
     Parameters parameters(params);
@@ -320,8 +322,8 @@ Json::Value Handler::Export(const Json::Value& params)
 
     std::vector<Node> nodes;
     if (!registry_.List("", nodes)) return RegistryFailure();
-    if (!File::Write(file, ToDocument(nodes))) {
-        return Failure(ERR::ERR_NODE_GET, Reason("file", "cannot be written"));
+    if (!File::Replace(file, ToDocument(nodes))) {
+        return Response::Failure(ERR::ERR_NODE_GET, Reason("file", "cannot be written"));
     }
     return DoneWith(nodes.size());
 }
@@ -348,7 +350,7 @@ Json::Value Handler::Restore(const Json::Value& params)
 
 Json::Value Handler::RegistryFailure() const
 {
-    return Failure(registry_.GetErrCode(), registry_.GetErr());
+    return Response::Failure(registry_.GetErrCode(), registry_.GetErr());
 }
 
 }  // namespace NodeRegistry

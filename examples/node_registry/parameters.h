@@ -5,7 +5,7 @@
 //     Node node;
 //     if (!parameters.AreOnly({"name", "port"}) || !parameters.ReadFields({"name", "port"}, node))
 //     {
-//         return Failure(ERR::BAD_PARAMETER, parameters.GetErr());
+//         return Response::Failure(ERR::BAD_PARAMETER, parameters.GetErr());
 //     }
 #ifndef NODE_REGISTRY_PARAMETERS_H
 #define NODE_REGISTRY_PARAMETERS_H

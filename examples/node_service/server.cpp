@@ -11,6 +11,7 @@
 #include <json/value.h>
 
 #include <orvadrcore/errors.h>
+#include <orvadrcore/response.h>
 
 #include "connection_queue.h"
 #include "node_registry/handler.h"
@@ -60,7 +61,8 @@ void Refuse(httplib::Response& response, int status, const char* name, const cha
 {
     const bool isUnknown = status == NotFound || status == NoMethod;
     const int code = isUnknown ? ERR::ERR_NO_SUCH_API : ERR::BAD_PARAMETER;
-    SetReply(response, status, NodeRegistry::Failure(code, NodeRegistry::Reason(name, reason)));
+    SetReply(response, status,
+             OrvaDRCore::Response::Failure(code, NodeRegistry::Reason(name, reason)));
 }
 
 void RefuseTooLarge(httplib::Response& response)
@@ -93,8 +95,8 @@ void ExplainException(const httplib::Request& /*request*/, httplib::Response& re
                       const std::exception_ptr& /*exception*/)
 {
     SetReply(response, Failed,
-             NodeRegistry::Failure(ERR::ERR_ALLOCATE_MEMORY,
-                                   NodeRegistry::Reason("request", "ran out of memory")));
+             OrvaDRCore::Response::Failure(ERR::ERR_ALLOCATE_MEMORY,
+                                           NodeRegistry::Reason("request", "ran out of memory")));
 }
 
 void Log(const httplib::Request& request, const httplib::Response& response)

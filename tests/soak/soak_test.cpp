@@ -2,6 +2,7 @@
 #include <fcntl.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <orvadrcore/response.h>
 #include <signal.h>
 #include <sqlite3.h>
 #include <sys/file.h>
@@ -20,7 +21,6 @@
 #include "client.h"
 #include "company.h"
 #include "examples/node_registry/json_line.h"
-#include "examples/node_registry/reply.h"
 #include "findings.h"
 #include "ledger.h"
 #include "plan.h"
@@ -33,8 +33,7 @@
 namespace {
 
 using namespace Soak;  // NOLINT(google-build-using-namespace): what is tested
-using NodeRegistry::Failure;
-using NodeRegistry::Success;
+using OrvaDRCore::Response;
 using ::testing::ElementsAre;
 using ::testing::HasSubstr;
 using ::testing::IsEmpty;
@@ -392,21 +391,22 @@ class FakeRegistry {
     Json::Value Do(const std::string& method, const Json::Value& request)
     {
         const std::string name = request["name"].asString();
-        if (method == "status") return Success({});
+        if (method == "status") return Response::Success();
         if (method == "list") return List(request["filter"]["ids"]);
-        if (method == "create") return nodes_.count(name) == 1 ? Failure(508, {}) : Create(request);
-        if (nodes_.count(name) == 0) return Failure(507, {});
+        const bool isThere = nodes_.count(name) == 1;
+        if (method == "create") return isThere ? Response::Failure(508) : Create(request);
+        if (!isThere) return Response::Failure(507);
         if (method == "set") nodes_[name]["port"] = request["port"];
         const Json::Value node = nodes_[name];
         if (method == "delete") nodes_.erase(name);
-        return Success(node);
+        return Response::Success(node);
     }
 
     Json::Value Create(const Json::Value& request)
     {
         Json::Value node = request;
         node["id"] = "id" + std::to_string(++made_);
-        return Success(nodes_[request["name"].asString()] = node);
+        return Response::Success(nodes_[request["name"].asString()] = node);
     }
 
     Json::Value List(const Json::Value& ids) const
@@ -418,7 +418,7 @@ class FakeRegistry {
                 if (node["id"] == id) data["nodes"].append(node);
             }
         }
-        return Success(data);
+        return Response::Success(data);
     }
 
     Falsify falsify_;
@@ -488,7 +488,7 @@ TEST_F(SoakClientTest, AcceptsLostAnswers)
 TEST_F(SoakClientTest, CountsFailuresOfTheRegistry)
 {
     FakeRegistry registry([](const std::string& method, Answer& answer) {
-        if (method == "get") answer.reply = Failure(404, {});
+        if (method == "get") answer.reply = Response::Failure(404);
     });
     AskOften(registry, std::nullopt);
     EXPECT_TRUE(findings.IsEmpty());
@@ -497,8 +497,8 @@ TEST_F(SoakClientTest, CountsFailuresOfTheRegistry)
 
 TEST_F(SoakClientTest, FindsWrongAnswers)
 {
-    const auto fails = [](Json::Value& reply) { reply = Failure(507, {}); };
-    EXPECT_THAT(FindingOf("create", [](Json::Value& reply) { reply = Failure(508, {}); }),
+    const auto fails = [](Json::Value& reply) { reply = Response::Failure(507); };
+    EXPECT_THAT(FindingOf("create", [](Json::Value& reply) { reply = Response::Failure(508); }),
                 HasSubstr("c: create c-1 got the reply"));
     EXPECT_THAT(FindingOf("create", [](Json::Value& reply) { reply["data"]["id"] = "other"; }),
                 HasSubstr("c: get c-"));
