@@ -22,6 +22,12 @@ std::size_t HashOf(const std::string& text)
     return std::hash<std::string>()(text);
 }
 
+std::int64_t BeginOf(const Json::Value& document)
+{
+    const Json::Value* begin = FindMember(document, CacheKey::Begin);
+    return begin != nullptr && begin->isInt64() ? begin->asInt64() : 0;
+}
+
 int ToWholeSeconds(double seconds)
 {
     constexpr double Largest = std::numeric_limits<int>::max();
@@ -61,6 +67,7 @@ CacheFile::LoadResult CacheFile::Load()
     if (FindMember(document, CacheKey::Data) != nullptr) data_.swap(document[CacheKey::Data]);
     loadedModifyTime_ = status.st_mtime;
     loadedVersion_ = FileVersion(status);
+    loadedBegin_ = BeginOf(document);
     return LoadResult::Loaded;
 }
 
@@ -100,6 +107,7 @@ bool CacheFile::Write(CacheDocument& document)
     data_.swap(document.value[CacheKey::Data]);
     loadedModifyTime_ = written.st_mtime;
     loadedVersion_ = FileVersion(written);
+    loadedBegin_ = BeginOf(document.value);
     Remember(document.text, document.longestRefresh);
     return true;
 }

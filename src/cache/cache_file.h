@@ -5,6 +5,7 @@
 #include <sys/stat.h>
 
 #include <cstddef>
+#include <cstdint>
 #include <ctime>
 #include <optional>
 #include <string>
@@ -77,6 +78,9 @@ class CacheFile {
     // Of the file whose data is in memory; none if the data comes from elsewhere.
     const std::optional<FileVersion>& GetLoadedVersion() const { return loadedVersion_; }
 
+    // When producing that data began, in seconds since the epoch; 0 if not known.
+    std::int64_t GetLoadedBegin() const { return loadedBegin_; }
+
     // Reads the file into memory. On failure memory stays as it was. The contract: a document without
     // "cached_data" counts as loaded and leaves the old data.
     LoadResult Load();
@@ -98,6 +102,7 @@ class CacheFile {
     Json::Value data_;
     std::time_t loadedModifyTime_ = -1;
     std::optional<FileVersion> loadedVersion_;
+    std::int64_t loadedBegin_ = 0;
 
     // Size, hash and longest refresh of the text that was loaded or written last.
     std::size_t knownSize_ = 0;

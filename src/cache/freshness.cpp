@@ -46,6 +46,7 @@ CacheState FreshnessWatch::Judge(const std::optional<FileVersion>& version) cons
     const std::time_t now = std::min(begin_, std::time(nullptr));
     const Json::Value& data = file_.GetData();
     if (!cache_.IsValidData(data)) return CacheState::None;
+    if (hasLooked_ && file_.GetLoadedBegin() >= begin_) return CacheState::Fresh;
     return IsTooOld(modifyTime, timeoutSeconds_, now) || cache_.IsNeedUpdate(data)
                ? CacheState::Stale
                : CacheState::Fresh;

@@ -24,8 +24,9 @@ bool IsTooOld(std::time_t modifyTime, long timeoutSeconds, std::time_t now);
 bool IsFresh(const Cache& cache, const Json::Value& data, std::time_t modifyTime,
              long timeoutSeconds);
 
-// Looks at a cache's file again and again while fresh data is waited for. Data does not become too old
-// meanwhile: what counts is its age when the object was made.
+// Looks at a cache's file again and again while fresh data is waited for. What counts is the data's age
+// when the object was made. Valid data that a later refresh has brought is fresh in any case: if all
+// that wait found it stale, each would refresh in turn.
 class FreshnessWatch {
   public:
     // Both must outlive the object.

@@ -9,7 +9,7 @@
 set -euo pipefail
 model=$(dirname "$(readlink -f "$0")")/cache.pml
 folder=$1
-max_depth=200000
+max_depth=1000000
 max_memory_mb=8000
 wrong=() # properties with an unexpected result
 

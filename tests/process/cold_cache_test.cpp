@@ -219,6 +219,36 @@ TEST_F(ColdCacheTest, ThreadsOfManyProcessesShareOneProduction)
     EXPECT_LT(slowest, 2 * BusyMachineMSec);
 }
 
+// A cache whose data is always stale, and whose time-out has passed when a reader looks.
+TEST_F(ColdCacheTest, ReadersShareOneProductionOfDataThatIsNeverFresh)
+{
+    constexpr int Threads = 8;
+    class NeverFresh : public OwnCache {
+      public:
+        using OwnCache::OwnCache;
+        bool IsNeedUpdate(const Json::Value& /*data*/) const override { return true; }
+    };
+    std::this_thread::sleep_until(std::chrono::system_clock::from_time_t(std::time(nullptr) + 1));
+    ChildProcess process([this](ChildProcess::Link& /*link*/) {
+        std::vector<std::thread> threads;
+        for (int i = 0; i < Threads; ++i) {
+            threads.emplace_back([this, i] {
+                Reader& reader = round->readers.at(static_cast<std::size_t>(i));
+                const NeverFresh cache(dir.File("cache"), locks, [this](Json::Value& data) {
+                    ++round->productions;
+                    return After(Production)(data);
+                });
+                Json::Value data;
+                reader.state = cache.ReadWithin(Long, data);
+            });
+        }
+        for (std::thread& thread : threads) thread.join();
+    });
+    EXPECT_EQ(process.Join(), 0);
+    EXPECT_EQ(round->productions, 1);
+    EXPECT_THAT(States(Threads), Each(CacheState::Fresh));
+}
+
 // ---------------------------------------------------------------------------------- with other readers
 
 TEST_F(ColdCacheTest, ReadersInTimeWaitForARefreshInTheBackground)

@@ -345,6 +345,43 @@ TEST_F(CacheReadWithinTest, OldAndUnwantedFilesThatArriveAreNotFresh)
     TakeLines();
 }
 
+// Otherwise each of those that wait would refresh in turn.
+TEST_F(CacheReadWithinTest, WhatALaterRefreshBringsIsFreshWhateverTheRulesSay)
+{
+    const std::time_t now = std::time(nullptr);
+    for (const long timeout : {0L, -1L}) {
+        Mark();
+        TestCache always = Another(false, 0, timeout);
+        always.isNeedUpdate = [](const Json::Value&) { return true; };
+        always.isValid = [](const Json::Value& value) {
+            return value.isString() && value != "bad";
+        };
+        std::size_t waits = 0;
+        onWait = [&](std::size_t) {
+            ++waits;
+            if (waits == 3) {
+                EXPECT_TRUE(cache.UpdateWithData("before", now - 2, now));
+            }
+            if (waits == 6) {
+                EXPECT_TRUE(cache.UpdateWithData("bad", now + 9, now + 9));
+            }
+            if (waits == 9) {
+                EXPECT_TRUE(cache.UpdateWithData("later", now + 9, now + 9));
+            }
+        };
+        cache.isValid = [](const Json::Value&) { return true; };
+        EXPECT_EQ(Ask(always, Long), CacheState::Fresh);
+        EXPECT_EQ(data, "later");
+        EXPECT_EQ(always.CountCalls("GetUpdatedData"), 0U);
+        std::filesystem::remove(pidPath);
+
+        EXPECT_EQ(Ask(always, NoTime), CacheState::Fresh);
+        EXPECT_EQ(data, "new") << "what was there before the call is stale";
+        EXPECT_EQ(cache.Remove(), 0);
+    }
+    TakeLines();
+}
+
 TEST_F(CacheReadWithinTest, TakesOverFromAnUpdaterThatHasDied)
 {
     WriteStale("old");
