@@ -43,6 +43,10 @@ struct LibraryLock {
 };
 LibraryLock* libraryLock = nullptr;
 
+// By how many seconds the monotonic clock advances whenever it is read.
+std::atomic<std::time_t> clockStep{0};
+std::atomic<std::time_t> clockAhead{0};
+
 }  // namespace
 
 // Replaces that of the C library in the test program.
@@ -65,6 +69,15 @@ extern "C" int setlogmask(int mask) noexcept
     }
     static const auto real = RealFunction<int(int)>("setlogmask");
     return real(mask);
+}
+
+// Likewise.
+extern "C" int clock_gettime(clockid_t clock, timespec* time) noexcept
+{
+    static const auto real = RealFunction<int(clockid_t, timespec*)>("clock_gettime");
+    const int result = real(clock, time);
+    if (clock == CLOCK_MONOTONIC) time->tv_sec += clockAhead += clockStep;
+    return result;
 }
 
 namespace {
@@ -477,6 +490,20 @@ TEST_F(LockedLibraryTest, ALockThatIsNeverFreeIsAFailure)
         Lock(INT_MAX, WaitForEver);
         ExpectNotForked(EDEADLK);
         EXPECT_LT(lock->waits, INT_MAX - 10);
+    });
+}
+
+// On a machine where forks are slow, five seconds may be too short for a lock to become free.
+TEST_F(LockedLibraryTest, FiftyAttemptsAreMadeHoweverLongTheyTake)
+{
+    constexpr int MinAttempts = 50;
+    CheckInChild([this] {
+        Lock(INT_MAX, WaitForEver);
+        clockStep = 3600;
+        errno = 0;
+        EXPECT_EQ(CoreLibProcForkEx(CORELIB_FORK_DETACHED), -1);
+        EXPECT_EQ(errno, EDEADLK);
+        EXPECT_EQ(lock->waits, INT_MAX - MinAttempts);
     });
 }
 
