@@ -114,6 +114,13 @@ class SqliteRoundTripTest : public ::testing::Test {
         for (std::size_t id = 0; id < values.size(); ++id) {
             EXPECT_EQ(stored[id], values[id]) << ValueOf(values[id]).ToFormatedValue();
         }
+        std::size_t read = 0;
+        const auto take = [&](const SqliteRow& row) {
+            EXPECT_TRUE(IsReadAs(row, values[read++]));
+            return true;
+        };
+        EXPECT_TRUE(db.SelectEachByCommand("SELECT value FROM t ORDER BY id", take));
+        EXPECT_EQ(read, values.size());
     }
 
     // Whether the condition is met by the row with this id.
