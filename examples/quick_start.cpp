@@ -16,7 +16,7 @@ int main()
         OrvaDRCore::InsertCommand insert;
         insert.SetTable(nodes);
         insert.SetReplacable(true);
-        insert.AddFieldValue("name", OrvaDRCore::SqliteValue::EscapeText(name));
+        insert.AddFieldValue("name", OrvaDRCore::SqliteValue::Text(name));
         insert.AddFieldValue("port", 5001);
         if (!db.InsertRecord(insert)) return EXIT_FAILURE;
     }

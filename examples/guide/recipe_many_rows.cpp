@@ -9,6 +9,7 @@
 
 using OrvaDRCore::SqliteDB;
 using OrvaDRCore::SqliteTableHandler;
+using OrvaDRCore::SqliteValue;
 using OrvaDRCore::SqliteValueList;
 
 namespace {
@@ -32,7 +33,7 @@ int main()
     std::vector<SqliteValueList> records;
     for (int number = 1; number <= 1200; ++number) {
         SqliteValueList record;
-        record.AddValue("name", "O'Brien's node " + std::to_string(number));  // not escaped
+        record.AddValue("name", SqliteValue::Text("O'Brien's node " + std::to_string(number)));
         record.AddValue("port", 5000);
         records.push_back(record);
     }

@@ -27,13 +27,13 @@ bool MoveVolume(SqliteDB& db, const std::string& volume, const std::string& node
 {
     UpdateCommand move;
     move.SetTable(SqliteTableHandler("volumes", ""));
-    move.AddFieldValue("node", SqliteValue::EscapeText(node));
-    move.SetCondition(SqliteEqual("name", SqliteValue::EscapeText(volume)));
+    move.AddFieldValue("node", SqliteValue::Text(node));
+    move.SetCondition(SqliteEqual("name", SqliteValue::Text(volume)));
 
     InsertCommand note;
     note.SetTable(SqliteTableHandler("moves", ""));
-    note.AddFieldValue("volume", SqliteValue::EscapeText(volume));
-    note.AddFieldValue("node", SqliteValue::EscapeText(node));
+    note.AddFieldValue("volume", SqliteValue::Text(volume));
+    note.AddFieldValue("node", SqliteValue::Text(node));
 
     SqliteTransaction transaction(db);
     return transaction.Begin() && db.UpdateRecord(move) && db.InsertRecord(note) &&
@@ -49,7 +49,7 @@ bool Evacuate(SqliteDB& db, const std::string& from, const std::string& to, std:
     SqliteTransaction transaction(db);
     if (!transaction.Begin()) return false;
     std::vector<SqliteValueList> rows;
-    const std::string isThere = SqliteEqual("node", SqliteValue::EscapeText(from)).GetCondition();
+    const std::string isThere = SqliteEqual("node", SqliteValue::Text(from)).GetCondition();
     if (!db.SelectByCommand("SELECT name FROM volumes WHERE " + isThere, rows)) return false;
     if (rows.size() > most) {
         transaction.Rollback();  // now, so that others can write while we continue
@@ -58,7 +58,7 @@ bool Evacuate(SqliteDB& db, const std::string& from, const std::string& to, std:
     }
     UpdateCommand move;
     move.SetTable(SqliteTableHandler("volumes", ""));
-    move.AddFieldValue("node", SqliteValue::EscapeText(to));
+    move.AddFieldValue("node", SqliteValue::Text(to));
     move.SetCondition(isThere);
     return db.UpdateRecord(move) && transaction.Commit();
 }

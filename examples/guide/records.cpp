@@ -37,11 +37,11 @@ struct Node : SqliteRecord {
         return {"name", "port", "enabled"};
     }
 
-    // To the database: the only place where texts are escaped.
+    // To the database.
     SqliteValueList BuildRecord(const std::vector<std::string>& fields) const override
     {
         SqliteValueList all;
-        all.AddValue("name", SqliteValue::EscapeText(name));
+        all.AddValue("name", SqliteValue::Text(name));
         all.AddValue("port", port);
         all.AddValue("enabled", enabled);
         SqliteValueList record;
@@ -71,7 +71,11 @@ void ShowValues()
     std::cout << SqliteValue(true).ToFormatedValue() << '\n';
     std::cout << SqliteValue("backup").ToFormatedValue() << '\n';
     std::cout << SqliteValue("it's").ToFormatedValue() << "   <- no literal\n";
-    std::cout << SqliteValue(SqliteValue::EscapeText("it's")).ToFormatedValue() << '\n';
+    std::cout << SqliteValue::Text("it's").ToFormatedValue() << '\n';
+    std::cout << SqliteValue::Integer(5'000'000'000).ToFormatedValue() << '\n';
+    std::cout << SqliteValue::Real(0.25).ToFormatedValue() << '\n';
+    std::cout << SqliteValue::Blob("it's").ToFormatedValue() << '\n';
+    std::cout << SqliteValue::Null().ToFormatedValue() << '\n';
 
     int number = 0;
     bool truth = false;
@@ -125,7 +129,7 @@ void ShowStatements(const SqliteTableHandler& nodes)
     UpdateCommand update;
     update.SetTable(nodes);
     update.SetFieldValues(node.BuildRecord({"port", "enabled"}));
-    update.SetCondition(SqliteEqual("name", SqliteValue::EscapeText(node.name)));
+    update.SetCondition(SqliteEqual("name", SqliteValue::Text(node.name)));
     std::cout << update.GetCommand() << '\n';
 
     SelectCommand select;

@@ -1,4 +1,4 @@
-// An SQL injection, with and without EscapeText, and column names that are checked.
+// An SQL injection, with a plain text and with a Text, and column names that are checked.
 #include <algorithm>
 #include <cstdlib>
 #include <iostream>
@@ -41,7 +41,7 @@ int main()
     // [quoting]
     const std::string given = "x' OR '1'='1";  // sent by a caller
     const SqliteEqual wrong("name", given);
-    const SqliteEqual right("name", SqliteValue::EscapeText(given));
+    const SqliteEqual right("name", SqliteValue::Text(given));
     // [/quoting]
     std::cout << "wrong: " << Select(wrong) << '\n';
     std::cout << "right: " << Select(right) << '\n';

@@ -44,7 +44,7 @@ bool MatchIds(const Json::Value& ids, std::string& ret_condition)
     std::vector<SqliteValue> values;
     for (const Json::Value& id : ids) {
         if (!id.isString() || !IsPlainText(id.asString(), MaxIdBytes)) return false;
-        values.emplace_back(SqliteValue::EscapeText(id.asString()));
+        values.push_back(SqliteValue::Text(id.asString()));
     }
     ret_condition = Membership("id", values).GetCondition();
     return true;

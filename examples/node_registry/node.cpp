@@ -8,11 +8,11 @@ using OrvaDRCore::SqliteValueList;
 SqliteValueList Node::BuildRecord(const std::vector<std::string>& fields) const
 {
     SqliteValueList all;
-    all.AddValue("id", SqliteValue::EscapeText(id));
-    all.AddValue("name", SqliteValue::EscapeText(name));
-    all.AddValue("address", SqliteValue::EscapeText(address));
+    all.AddValue("id", SqliteValue::Text(id));
+    all.AddValue("name", SqliteValue::Text(name));
+    all.AddValue("address", SqliteValue::Text(address));
     all.AddValue("port", port);
-    all.AddValue("volume", SqliteValue::EscapeText(volume));
+    all.AddValue("volume", SqliteValue::Text(volume));
     all.AddValue("enabled", enabled);
 
     SqliteValueList record;

@@ -26,7 +26,7 @@ struct Node : OrvaDRCore::SqliteRecord {
     std::string volume;  // where the node stores replicas
     bool enabled = true;
 
-    // The named fields, with texts escaped for a statement.
+    // The named fields.
     OrvaDRCore::SqliteValueList BuildRecord(const std::vector<std::string>& fields) const override;
 
     // Reads a row. False, with nothing changed, if a field is missing or has another type.

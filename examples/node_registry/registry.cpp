@@ -39,7 +39,7 @@ Json::Value NameTaken()
 
 SqliteEqual Matches(const NodeKey& key)
 {
-    return {key.field, SqliteValue::EscapeText(key.text)};
+    return {key.field, SqliteValue::Text(key.text)};
 }
 
 // Whether the last attempt failed because the schema refuses the row.

@@ -60,7 +60,8 @@ class ORVADRCORE_API SqliteDB {
 
     /// Inserts all records or none, in one transaction or, inside an open one, in a savepoint. An
     /// attempt is the whole of it. Much faster than one by one; the records may differ in fields.
-    /// \warning Texts are stored as they are. Do not pass them through SqliteValue::EscapeText().
+    /// \note A plain text is stored as it is here, but read as part of a literal by InsertRecord().
+    ///       A SqliteValue::Text() is stored as it is by both.
     bool InsertRecords(const SqliteTableHandler& table, const std::vector<SqliteValueList>& records,
                        bool replacable = false);
 
