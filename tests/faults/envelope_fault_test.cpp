@@ -165,6 +165,25 @@ TEST(EnvelopeFaults, Records)
     });
 }
 
+TEST(EnvelopeFaults, ValuesOfEveryKind)
+{
+    EveryCallFails("SqliteValue::Text", [] {
+        ExpectText(
+            "a:'it''s long enough', b:CAST(X'6100' AS TEXT), c:X'61207465', d:5000000000, "
+            "e:0.61225628777280094, f:NULL",
+            [] {
+                SqliteValueList record;
+                record.AddValue("a", SqliteValue::Text("it's long enough"));
+                record.AddValue("b", SqliteValue::Text(std::string("a\0", 2)));
+                record.AddValue("c", SqliteValue::Blob("a te"));
+                record.AddValue("d", SqliteValue::Integer(5'000'000'000));
+                record.AddValue("e", SqliteValue::Real(0.612256287772801));
+                record.AddValue("f", SqliteValue::Null());
+                return record.ToStr();
+            });
+    });
+}
+
 TEST(EnvelopeFaults, RequestToJson)
 {
     EveryCallFails("Request", [] {

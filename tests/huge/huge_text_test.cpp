@@ -76,6 +76,27 @@ TEST_F(HugeTextTest, ATextThatIsTooLongGivesAnInvalidValue)
     EXPECT_EQ(static_cast<std::size_t>(end - begin), Longest);
 }
 
+TEST_F(HugeTextTest, TextsAndBlobsThatAreTooLongMakeNoValue)
+{
+    constexpr std::size_t LongestBlob = (Longest - 3) / 2;  // of which the literal fits
+    std::string bytes(TooLong, 'x');
+    EXPECT_FALSE(SqliteValue::Text(bytes).IsValid());
+    EXPECT_FALSE(SqliteValue::Text(bytes.c_str()).IsValid());
+    ExpectLines({NoValue(bytes), NoValue(bytes)});
+    for (const std::size_t length : {TooLong, LongestBlob + 1}) {
+        bytes.resize(length);
+        EXPECT_FALSE(SqliteValue::Blob(bytes).IsValid());
+        ExpectLines(
+            {Err("Blob", "blob of [" + std::to_string(length) + "] bytes is too long for a value")
+                 .In("sqlite_value.cpp")});
+    }
+    bytes.resize(LongestBlob);
+    const SqliteValue blob = SqliteValue::Blob(bytes);
+    bytes = std::string();
+    EXPECT_TRUE(blob.IsValid());
+    EXPECT_EQ(blob.ToFormatedValue().size(), 2 * LongestBlob + 3);
+}
+
 TEST_F(HugeTextTest, ATextThatIsTooLongIsRefusedByCommandsRecordsAndConditions)
 {
     const std::string text(TooLong, 'x');
