@@ -11,8 +11,6 @@ using OrvaDRCore::IsTooOld;
 using ::testing::ElementsAre;
 using ::testing::IsEmpty;
 
-constexpr std::time_t Now = 1'700'000'000;
-
 class FreshnessTest : public CacheFixture {
   protected:
     FreshnessTest()
