@@ -244,7 +244,7 @@ TEST_F(CacheCommandTest, TellsWhatItMayNotRead)
     std::filesystem::permissions(pidPath, std::filesystem::perms::none);
     ASSERT_EQ(::chmod(dir.Path().c_str(), 0755), 0);
     CheckInChild([&] {
-        ASSERT_TRUE(LoseRights());
+        ASSERT_TRUE(LoseCapabilities());
         const Answer answer = Ask({"cache", path});
         EXPECT_EQ(answer.code, NotSeen);
         EXPECT_EQ(answer.Only()["state"], "unreadable");

@@ -190,6 +190,27 @@ TEST_F(DbCommandTest, DoesNotCallADatabaseDamagedThatNeedsMoreThanSqlite)
     EXPECT_THAT(RunOrvadr({"db", path}).out, HasSubstr("v ?"));
 }
 
+TEST_F(DbCommandTest, TellsWhatKeepsItFromChecking)
+{
+    Make(std::string(MakeNodes) +
+         "PRAGMA writable_schema=1;"
+         "UPDATE sqlite_master SET sql='CREATE TABLE nodes(name TEXT "
+         "COLLATE nobody PRIMARY KEY, port INTEGER)' WHERE type='table';");
+    const Answer answer = Ask({"db", path});
+    EXPECT_EQ(answer.code, NotSeen);
+    EXPECT_EQ(answer.Only()["state"], "unreadable");
+    EXPECT_EQ(answer.err, "orvadr: " + path + ": no such collation sequence: nobody\n");
+}
+
+TEST_F(DbCommandTest, DoesNotRemoveAJournalThatSqliteWouldRemove)
+{
+    WriteFile(path, "");
+    WriteFile(path + "-journal", "of a database that is empty now");
+    WriteFile(path + "-wal", "");
+    Look(AllWell);
+    EXPECT_TRUE(std::filesystem::exists(path + "-journal"));
+}
+
 TEST_F(DbCommandTest, ShowsWhoHasADatabaseOpen)
 {
     Make(MakeNodes);
@@ -205,8 +226,9 @@ TEST_F(DbCommandTest, ShowsWhoHasLockedADatabase)
 {
     Make(MakeNodes);
     const ChildProcess reader = Start("SELECT * FROM nodes LIMIT 1");
+    ASSERT_TRUE(reader.Await());
     const ChildProcess writer = Start("BEGIN EXCLUSIVE");
-    ASSERT_TRUE(reader.Await() && writer.Await());
+    ASSERT_TRUE(writer.Await());
     const Json::Value locked = Look(NotWell);
     EXPECT_EQ(locked["state"], "locked");
     ASSERT_EQ(locked["holders"].size(), 1U) << "the reader keeps nobody out";
@@ -232,7 +254,7 @@ TEST_F(DbCommandTest, NamesAHolderThatMayNotBeLookedAt)
         Start("BEGIN EXCLUSIVE", [] { ::prctl(PR_SET_DUMPABLE, 0, 0, 0, 0); });
     ASSERT_TRUE(writer.Await());
     CheckInChild([&] {
-        ASSERT_TRUE(LoseRights());
+        ASSERT_TRUE(LoseCapabilities());
         const Json::Value locked = Look(NotWell);
         EXPECT_EQ(locked["state"], "locked");
         ASSERT_EQ(locked["holders"].size(), 1U);
@@ -289,14 +311,14 @@ TEST_F(DbCommandTest, ReadsALogInADirectoryThatMayNotBeWritten)
     std::filesystem::remove(path + "-shm");
     ASSERT_EQ(::chmod(dir.Path().c_str(), 0555), 0);
     CheckInChild([&] {
-        ASSERT_TRUE(LoseRights());
+        ASSERT_TRUE(LoseCapabilities());
         EXPECT_THAT(TablesOf(Look(AllWell)), ElementsAre("nodes 5000"));
     });
     ASSERT_EQ(::chmod(dir.Path().c_str(), 0755), 0);
     std::filesystem::remove(path + "-wal");
     ASSERT_EQ(::chmod(dir.Path().c_str(), 0555), 0);
     CheckInChild([&] {
-        ASSERT_TRUE(LoseRights());
+        ASSERT_TRUE(LoseCapabilities());
         EXPECT_EQ(Look(AllWell)["journal_mode"], "wal");
     });
     ASSERT_EQ(::chmod(dir.Path().c_str(), 0755), 0);
@@ -351,7 +373,7 @@ TEST_F(DbCommandTest, TellsWhatItMayNotRead)
     ASSERT_EQ(::chmod(dir.Path().c_str(), 0755), 0);
     ASSERT_EQ(::chmod(path.c_str(), 0), 0);
     CheckInChild([&] {
-        ASSERT_TRUE(LoseRights());
+        ASSERT_TRUE(LoseCapabilities());
         const Answer answer = Ask({"db", path});
         EXPECT_EQ(answer.code, NotSeen);
         EXPECT_EQ(answer.Only()["state"], "unreadable");

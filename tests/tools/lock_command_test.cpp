@@ -17,11 +17,13 @@
 
 #include "kernel_locks.h"
 #include "orvadr.h"
+#include "processes.h"
 #include "support/fixtures/temp_dir.h"
 #include "support/fixtures/test_files.h"
 #include "support/processes/await.h"
 #include "support/processes/child_checks.h"
 #include "support/processes/child_process.h"
+#include "support/processes/reap.h"
 #include "support/processes/rights.h"
 
 namespace {
@@ -167,7 +169,7 @@ TEST_F(LockCommandTest, NamesAHolderThatMayNotBeLookedAt)
     const ChildProcess holder = StartHolder(LOCK_EX, [] { ::prctl(PR_SET_DUMPABLE, 0, 0, 0, 0); });
     ASSERT_TRUE(holder.Await());
     CheckInChild([&] {
-        ASSERT_TRUE(LoseRights());
+        ASSERT_TRUE(LoseCapabilities());
         const Json::Value held = Look(NotWell);
         EXPECT_EQ(held["state"], "exclusive");
         ASSERT_EQ(held["holders"].size(), 1U);
@@ -182,7 +184,7 @@ TEST_F(LockCommandTest, TellsThatItCannotSeeAnHeir)
     const ChildProcess heir = StartHeir([] { ::prctl(PR_SET_DUMPABLE, 0, 0, 0, 0); });
     ASSERT_TRUE(heir.Await());
     CheckInChild([&] {
-        ASSERT_TRUE(LoseRights());
+        ASSERT_TRUE(LoseCapabilities());
         const Json::Value held = Look(NotSeen);
         EXPECT_EQ(held["state"], "exclusive");
         EXPECT_EQ(held["holders"].size(), 0U);
@@ -231,7 +233,7 @@ TEST_F(LockCommandTest, TellsWhatCannotBeLookedAt)
 
     std::filesystem::permissions(LockDir + dir.Path(), std::filesystem::perms::none);
     CheckInChild([&] {
-        ASSERT_TRUE(LoseRights());
+        ASSERT_TRUE(LoseCapabilities());
         const Answer answer = Ask({"lock", Name()});
         EXPECT_EQ(answer.code, NotSeen);
         EXPECT_TRUE(answer.Only()["state"].isNull());
@@ -280,6 +282,15 @@ TEST(KernelLocksTest, FindsTheDeviceOfAMount)
         "22 27 0:21 / /proc rw - proc proc rw\nnonsense\n27 1 254:16 / / rw - ext4 /dev/vda rw\n";
     EXPECT_EQ(Orvadr::FindMountDevice(mounts, 27), dev_t{0xfe10});
     EXPECT_EQ(Orvadr::FindMountDevice(mounts, 28), std::nullopt);
+}
+
+TEST(ProcessesTest, ShowsTheNameOfAProcessWithoutACommandLine)
+{
+    const pid_t zombie = ::fork();
+    if (zombie == 0) ::_exit(0);
+    EXPECT_TRUE(AwaitUntil([&] { return Orvadr::CommandOf(zombie) == "[tool_tests]"; }));
+    EXPECT_EQ(Reap(zombie), 0);
+    EXPECT_EQ(Orvadr::CommandOf(zombie), "not permitted");
 }
 
 TEST(KernelLocksTest, KnowsNoFileThatIsMissing)

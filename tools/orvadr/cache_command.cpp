@@ -149,35 +149,33 @@ void ReportOne(const std::string& path, Report& report)
     report.objects.append(std::move(object));
 }
 
-std::string Duration(const Json::Value& seconds)
+Column DurationColumn(const char* title, const char* key)
 {
-    return seconds.isNull() ? "" : DurationText(seconds.asDouble());
+    return {title, [key](const Json::Value& object) {
+                const Json::Value& seconds = object[key];
+                return seconds.isNull() ? "" : DurationText(seconds.asDouble());
+            }};
 }
 
 std::string UpdaterLines(const Json::Value& updater)
 {
     if (updater.isNull()) return {};
-    Json::Value processes(Json::arrayValue);
-    processes.append(updater);
-    return ProcessLines(processes) + "\nsince " + TimeText(updater["since"].asInt64());
+    return ProcessLine(updater) + "\nsince " + TimeText(updater["since"].asInt64());
 }
 
 }  // namespace
 
 Report ReportCaches(const std::vector<std::string>& files)
 {
-    const auto duration = [](const char* key) {
-        return [key](const Json::Value& object) { return Duration(object[key]); };
-    };
     Report report;
     report.columns = {
-        {"STATE", [](const Json::Value& object) { return object["state"].asString(); }},
-        {"AGE", duration("age_seconds")},
-        {"TIME-OUT", duration("timeout_seconds")},
-        {"LAST", duration("last_refresh_seconds")},
-        {"LONGEST", duration("longest_refresh_seconds")},
+        TextColumn("STATE", "state"),
+        DurationColumn("AGE", "age_seconds"),
+        DurationColumn("TIME-OUT", "timeout_seconds"),
+        DurationColumn("LAST", "last_refresh_seconds"),
+        DurationColumn("LONGEST", "longest_refresh_seconds"),
         {"SIZE", SizeCell},
-        {"FILE", [](const Json::Value& object) { return Printable(object["path"].asString()); }},
+        TextColumn("FILE", "path"),
         {"UPDATER", [](const Json::Value& object) { return UpdaterLines(object["updater"]); }}};
     for (const std::string& file : files) ReportOne(file, report);
     return report;

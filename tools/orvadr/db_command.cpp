@@ -142,36 +142,32 @@ void ReportOne(const std::string& path, Report& report)
     report.objects.append(Describe(path, look));
 }
 
-std::string TableLines(const Json::Value& tables)
+std::string TableLine(const Json::Value& table)
 {
-    return LinesOf(tables, [](const Json::Value& table) {
-        const Json::Value& rows = table["rows"];
-        return Printable(table["name"].asString()) + " " + (rows.isNull() ? "?" : rows.asString());
-    });
+    const Json::Value& rows = table["rows"];
+    return Printable(table["name"].asString()) + " " + (rows.isNull() ? "?" : rows.asString());
 }
 
-std::string ProblemLines(const Json::Value& problems)
+std::string ProblemLine(const Json::Value& problem)
 {
-    return LinesOf(problems,
-                   [](const Json::Value& problem) { return Printable(problem.asString()); });
+    return Printable(problem.asString());
 }
 
 }  // namespace
 
 Report ReportDatabases(const std::vector<std::string>& files)
 {
-    const auto text = [](const char* key) {
-        return [key](const Json::Value& object) { return Printable(object[key].asString()); };
-    };
     Report report;
     report.columns = {
-        {"STATE", text("state")},
-        {"JOURNAL", text("journal_mode")},
+        TextColumn("STATE", "state"),
+        TextColumn("JOURNAL", "journal_mode"),
         {"SIZE", SizeCell},
-        {"FILE", text("path")},
-        {"TABLES", [](const Json::Value& object) { return TableLines(object["tables"]); }},
-        {"PROBLEMS", [](const Json::Value& object) { return ProblemLines(object["problems"]); }},
-        {"HOLDERS", [](const Json::Value& object) { return ProcessLines(object["holders"]); }}};
+        TextColumn("FILE", "path"),
+        {"TABLES", [](const Json::Value& object) { return LinesOf(object["tables"], TableLine); }},
+        {"PROBLEMS",
+         [](const Json::Value& object) { return LinesOf(object["problems"], ProblemLine); }},
+        {"HOLDERS",
+         [](const Json::Value& object) { return LinesOf(object["holders"], ProcessLine); }}};
     for (const std::string& file : files) ReportOne(file, report);
     return report;
 }

@@ -77,13 +77,9 @@ void ReportOne(const std::string& asked, Report& report)
 
 Report ReportErrors(const std::vector<std::string>& codesOrNames)
 {
-    const auto show = [](const char* key) {
-        return [key](const Json::Value& object) {
-            return object[key].isNull() ? "-" : Printable(object[key].asString());
-        };
-    };
     Report report;
-    report.columns = {{"CODE", show("code")}, {"NAME", show("name")}, {"MEANING", show("meaning")}};
+    report.columns = {TextColumn("CODE", "code", "-"), TextColumn("NAME", "name", "-"),
+                      TextColumn("MEANING", "meaning", "-")};
     for (const std::string& asked : codesOrNames) ReportOne(asked, report);
     if (codesOrNames.empty()) {
         for (const Meaning& meaning : Meanings) report.objects.append(Describe(meaning));

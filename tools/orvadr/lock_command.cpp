@@ -143,13 +143,11 @@ bool IsHeld(const Json::Value& object)
 Report ReportLocks(const std::vector<std::string>& namesOrNone)
 {
     Report report;
-    report.columns = {
-        {"STATE",
-         [](const Json::Value& object) {
-             return object["state"].isNull() ? "?" : object["state"].asString();
-         }},
-        {"NAME", [](const Json::Value& object) { return Printable(object["name"].asString()); }},
-        {"HOLDERS", [](const Json::Value& object) { return ProcessLines(object["holders"]); }}};
+    report.columns = {TextColumn("STATE", "state", "?"),
+                      TextColumn("NAME", "name"),
+                      {"HOLDERS", [](const Json::Value& object) {
+                           return LinesOf(object["holders"], ProcessLine);
+                       }}};
 
     std::vector<std::string> names = namesOrNone;
     if (names.empty()) {

@@ -13,7 +13,6 @@
 
 #include "base/file_io.h"
 #include "base/json_helpers.h"
-#include "table.h"
 #include "text.h"
 
 namespace Orvadr {
@@ -66,14 +65,19 @@ void NoteUses(pid_t pid, const std::set<FileId>& files, FileUses& uses)
         uses.isComplete = uses.isComplete && hasEnded;
         return;
     }
-    uses.seen.insert(pid);
+    bool isSeen = true;
     ForEachNumber(descriptors, [&](int fd) {
         struct stat status {};
         const std::string name = std::to_string(fd);
-        if (::fstatat(::dirfd(descriptors.get()), name.c_str(), &status, 0) != 0) return;
+        if (::fstatat(::dirfd(descriptors.get()), name.c_str(), &status, 0) != 0) {
+            isSeen = isSeen && errno != EACCES;  // the list can be seen, but not what is in it
+            return;
+        }
         const FileId id{status.st_dev, status.st_ino};
         if (files.count(id) > 0) NoteUse(pid, fd, uses.files[id]);
     });
+    if (isSeen) uses.seen.insert(pid);
+    uses.isComplete = uses.isComplete && isSeen;
 }
 
 }  // namespace
@@ -102,19 +106,17 @@ Json::Value DescribeProcess(pid_t pid, const std::string& command)
     return object;
 }
 
-std::string ProcessLines(const Json::Value& processes)
+std::string ProcessLine(const Json::Value& process)
 {
-    return LinesOf(processes, [](const Json::Value& process) {
-        return process["pid"].asString() + " " + Printable(process["command"].asString());
-    });
+    return process["pid"].asString() + " " + Printable(process["command"].asString());
 }
 
 FileUses FindUses(const std::set<FileId>& files)
 {
     FileUses uses;
     const Directory processes = OpenDirectory("/proc");
-    if (!processes) return uses;
-    ForEachNumber(processes, [&](pid_t pid) { NoteUses(pid, files, uses); });
+    uses.isComplete = processes != nullptr;
+    if (processes) ForEachNumber(processes, [&](pid_t pid) { NoteUses(pid, files, uses); });
     return uses;
 }
 

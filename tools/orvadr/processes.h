@@ -24,8 +24,8 @@ std::string CommandOf(pid_t pid);
 // A process in the program's output: `pid` and `command`.
 Json::Value DescribeProcess(pid_t pid, const std::string& command);
 
-// Such objects as lines for people, such as "4242 node_service --port 80".
-std::string ProcessLines(const Json::Value& processes);
+// Such an object for people: "4242 node_service --port 80".
+std::string ProcessLine(const Json::Value& process);
 
 struct FileUse {
     std::set<pid_t> openers;

@@ -127,6 +127,14 @@ std::string FormatRow(const std::vector<Lines>& cells, const std::vector<std::si
 
 }  // namespace
 
+Column TextColumn(const char* title, const char* key, const char* ifNull)
+{
+    return {title, [key, ifNull](const Json::Value& object) {
+                const Json::Value& value = object[key];
+                return value.isNull() ? ifNull : Printable(value.asString());
+            }};
+}
+
 std::string LinesOf(const Json::Value& array,
                     const std::function<std::string(const Json::Value&)>& line)
 {

@@ -17,6 +17,9 @@ struct Column {
     std::function<std::string(const Json::Value&)> cell;
 };
 
+// A column with the text or number of a key; with `ifNull` where that is null.
+Column TextColumn(const char* title, const char* key, const char* ifNull = "");
+
 // A printable text for each object of an array, one per line of a cell.
 std::string LinesOf(const Json::Value& array,
                     const std::function<std::string(const Json::Value&)>& line);

@@ -52,12 +52,17 @@ bool BecomeRoot()
            ::mount("tmpfs", LockDir, "tmpfs", 0, "mode=755") == 0;
 }
 
-bool LoseRights()
+bool LoseCapabilities()
 {
-    // Programs that root of a user namespace starts would get the capabilities again.
+    // Programs that root starts would get the others again.
     for (unsigned long capability = 0; capability <= CAP_LAST_CAP; ++capability) {
         (void)::prctl(PR_CAPBSET_DROP, capability, 0, 0, 0);
     }
+    return DropCapabilities();
+}
+
+bool LoseRights()
+{
     // A user namespace has no other user to become.
     const bool changed = ::setgroups(0, nullptr) == 0 && ::setresgid(Nobody, Nobody, Nobody) == 0 &&
                          ::setresuid(Nobody, Nobody, Nobody) == 0;

@@ -13,8 +13,11 @@ constexpr uid_t Nobody = 65534;
 // namespace with its own lock directory. False when the kernel does not allow that.
 bool BecomeRoot();
 
-// Makes this process and the programs that it starts an ordinary user's, without a way back. False when
-// that fails.
+// Takes root's capabilities from this process and the programs that it starts, without a way back: it has
+// the rights of the user that it is. False when that fails.
+bool LoseCapabilities();
+
+// Makes this process an ordinary user, without a way back. False when that fails.
 bool LoseRights();
 
 // Mounts a file system of `bytes` bytes on a directory, visible to this process and its children
