@@ -228,7 +228,7 @@ TEST_F(CacheCommandTest, TakesLittleMemoryForAHugeFile)
         ExpectUnreadable(path, NotWell, "no JSON document");
         WriteFile(path, " {");
         ASSERT_EQ(::truncate(path.c_str(), 1L << 30), 0);
-        ExpectUnreadable(path, NotSeen, "larger than 32 MiB, not read");
+        ExpectUnreadable(path, NotSeen, "larger than 16 MiB, not read");
         rusage usage{};
         ASSERT_EQ(::getrusage(RUSAGE_CHILDREN, &usage), 0);
         constexpr long MostKiB = 200'000;

@@ -25,7 +25,7 @@ using OrvaDRCore::ToJsonText;
 using OrvaDRCore::UpdaterMark;
 
 // Larger files are not parsed, because a document may take fifty times its size in memory.
-constexpr std::size_t LargestDocument = 32U << 20U;
+constexpr std::size_t LargestDocument = 16U << 20U;
 
 // A cache file and, unless that is fresh or stale, what is wrong with it.
 struct CacheLook {
@@ -73,7 +73,7 @@ CacheLook LookAt(const std::string& path)
     }
     Json::Value document;
     if (text.size() > LargestDocument && BeginsLikeAnObject(text)) {
-        return Trouble(look, "larger than 32 MiB, not read", ExitCode::NotSeen);
+        return Trouble(look, "larger than 16 MiB, not read", ExitCode::NotSeen);
     }
     if (text.size() > LargestDocument || !OrvaDRCore::fromString(document, text)) {
         return Trouble(look, "no JSON document", ExitCode::NotWell);
