@@ -4,6 +4,7 @@
 #include <charconv>
 #include <cmath>
 #include <cstdint>
+#include <cstdlib>
 #include <limits>
 #include <string_view>
 
@@ -63,8 +64,10 @@ Decimal Parse(std::string_view text)
 long double PowerOfTen(int exponent)
 {
     long double power = 1;
-    for (long double factor = 10; exponent > 0; exponent >>= 1, factor *= factor) {
+    long double factor = 10;
+    for (; exponent > 0; exponent >>= 1) {
         if ((exponent & 1) != 0) power *= factor;
+        factor *= factor;
     }
     return power;
 }
