@@ -73,10 +73,10 @@ long double PowerOfTen(int exponent)
 }
 
 // What SQLite before 3.43 reads: it computes with long doubles and then rounds a second time, and a
-// third time for the smallest and the largest numbers.
+// third time for the smallest numbers.
 double ReadRoundingTwice(Decimal decimal)
 {
-    constexpr int LargestPower = 308;
+    constexpr int LargestPower = 308;  // that is a double
     constexpr int TooSmall = 342;
     for (; decimal.exponent > 0 && decimal.digits < LargestInteger / 10; --decimal.exponent) {
         decimal.digits *= 10;
@@ -84,14 +84,12 @@ double ReadRoundingTwice(Decimal decimal)
     for (; decimal.exponent < 0 && decimal.digits % 10 == 0; ++decimal.exponent) {
         decimal.digits /= 10;
     }
-    const int size = std::abs(decimal.exponent);
-    if (size >= TooSmall) return 0;
-    const bool isFar = size >= LargestPower;
-    const long double power = PowerOfTen(isFar ? size - LargestPower : size);
-    const double rest = isFar ? 1e308 : 1;
     const auto digits = static_cast<long double>(decimal.digits);
-    return decimal.exponent < 0 ? static_cast<double>(digits / power) / rest
-                                : static_cast<double>(digits * power) * rest;
+    if (decimal.exponent >= 0) return static_cast<double>(digits * PowerOfTen(decimal.exponent));
+    const int size = -decimal.exponent;
+    if (size < LargestPower) return static_cast<double>(digits / PowerOfTen(size));
+    if (size >= TooSmall) return 0;
+    return static_cast<double>(digits / PowerOfTen(size - LargestPower)) / 1e308;
 }
 
 bool IsReadAs(std::string_view text, double number)

@@ -10,8 +10,8 @@ namespace OrvaDRCore {
 // "9e999" and "-9e999" for the infinities, "NULL" for not-a-number. The locale does not matter.
 //
 // SQLite before 3.43 misreads a few of these texts by one unit in the last place. Where it would, 17
-// to 19 digits are written instead, which it reads right. No text helps for about one in 20 of the
-// numbers between 2e-308 and 1e-290.
+// to 19 digits are written instead, which it reads right. Only of the numbers between 2e-308 and
+// 1e-290 it still misreads 9 %; for most of these there is no text that it reads right.
 void AppendReal(std::string& text, double number);
 
 }  // namespace OrvaDRCore
