@@ -114,6 +114,7 @@ class ORVADRCORE_API Request {
     std::string toStr() const;
 
   private:
+    ORVADRCORE_LOCAL void takeReservedKeys();
     ORVADRCORE_LOCAL bool takesParams() const;
 
     int version_ = -1;

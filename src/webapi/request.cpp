@@ -40,7 +40,9 @@ bool Request::FromText(const std::string& text, Request& request)
 {
     Json::Value document;
     if (!fromString(document, text) || !document.isObject()) return false;
-    Request read(document);
+    Request read;
+    read.params_.swap(document);
+    read.takeReservedKeys();
     // From here on nothing can fail.
     request.clear();
     request.encryptRequired_ = false;
@@ -54,6 +56,12 @@ bool Request::FromText(const std::string& text, Request& request)
 void Request::setRequest(const Json::Value& request)
 {
     params_ = request;
+    takeReservedKeys();
+}
+
+// Moves the three parts out of the parameters.
+void Request::takeReservedKeys()
+{
     TakeText(params_, ApiKey, api_);
     TakeText(params_, MethodKey, method_);
     const Json::Value* member = FindMember(params_, VersionKey);
