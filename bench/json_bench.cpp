@@ -1,11 +1,13 @@
-// Reading and writing JSON documents by path. The files are in memory, because a disk would hide
-// everything else.
+// Reading and writing JSON documents by path, and requests and replies as lines. The files are in
+// memory, because a disk would hide everything else.
 #include <unistd.h>
 
 #include <fstream>
 #include <sstream>
 
 #include <orvadrcore/file.h>
+#include <orvadrcore/request.h>
+#include <orvadrcore/response.h>
 
 #include "support/bench.h"
 #include "support/by_hand.h"
@@ -172,6 +174,55 @@ struct BoostWrite : WriteJson {
 };
 #endif
 
+// A handler's work from the line of a request to that of its reply: it returns the parameters.
+struct LineToLine {
+    std::string Result() const { return reply; }
+
+    std::string line =
+        R"({"api":"DR.Node","method":"get","version":1,"name":"backup-01","port":5001})";
+    std::string reply;
+};
+
+struct OurLines : LineToLine {
+    void Run()
+    {
+        OrvaDRCore::Request request;
+        const bool isRead = OrvaDRCore::Request::FromText(line, request) && request.isValid();
+        Require(isRead, "no request");
+        reply = Response(Response::Success(request.getParams())).toLine();
+    }
+
+    using Response = OrvaDRCore::Response;
+};
+
+// jsoncpp with a reader and a writer that are made once.
+struct BareLines : LineToLine {
+    BareLines()
+    {
+        Json::StreamWriterBuilder builder;
+        builder["emitUTF8"] = true;
+        builder["indentation"] = "";
+        writer.reset(builder.newStreamWriter());
+    }
+    void Run()
+    {
+        Json::Value params;
+        Require(reader->parse(line.data(), line.data() + line.size(), &params, nullptr), "no JSON");
+        Require(params["api"] == "DR.Node" && params["method"] == "get" && params["version"] == 1,
+                "no request");
+        for (const char* key : {"api", "method", "version"}) params.removeMember(key);
+        Json::Value answer;
+        answer["success"] = true;
+        answer["data"].swap(params);
+        std::ostringstream text;
+        writer->write(answer, &text);
+        reply = text.str();
+    }
+
+    std::unique_ptr<Json::CharReader> reader{Json::CharReaderBuilder().newCharReader()};
+    std::unique_ptr<Json::StreamWriter> writer;
+};
+
 void AddSize(const std::string& size, std::size_t bytes)
 {
     constexpr double OfJsoncpp = 1.05;
@@ -199,6 +250,8 @@ void AddJson()
     AddSize("1 KB", 1000);
     AddSize("100 KB", 100'000);
     AddSize("5 MB", 5'000'000);
+    Add<OurLines>("request line to reply line", Ours);
+    Add<BareLines>("request line to reply line", Bare);
 }
 
 }  // namespace Bench
