@@ -163,7 +163,7 @@ class ORVADRCORE_API SelectCommand : public SqliteCommand {
 
     void SelectAll();  ///< Selects all columns and forgets those added before.
 
-    /// Adds a column or an expression, `CAST(size AS TEXT) AS size`, and takes back SelectAll().
+    /// Adds a column or an expression, `sum(size) AS size`, and takes back SelectAll().
     /// Refuses an empty text, without a log line.
     bool AddField(const std::string& field);
 
