@@ -1,6 +1,7 @@
 #include "handler.h"
 
 #include <algorithm>
+#include <chrono>
 #include <ctime>
 #include <filesystem>
 #include <map>
@@ -37,6 +38,9 @@ constexpr const char* ImportVolume = "/volume1/replica";
 // How an export or restore takes its lock. Attempts are a second apart.
 constexpr int LockAlone = LOCK_EX | LOCK_NB;
 constexpr unsigned int LockRetries = 3;
+
+// How long a request waits for the first status.
+constexpr std::chrono::seconds StatusPatience{60};
 
 Json::Value BadRequest(const std::string& reason)
 {
@@ -263,7 +267,12 @@ Json::Value Handler::Status(const Json::Value& params)
                                  Reason("status", "has no directory or no lock that may be used"));
     }
     const StatusCache cache(statusPath_, statusTimeout_, registry_);
-    Json::Value status = cache.Read();
+    Json::Value status = cache.GetCachedData();
+    if (cache.IsValidData(status)) {
+        status = cache.Read();  // at once; a child refreshes it if it is stale
+    } else {
+        cache.ReadWithin(StatusPatience, status);  // one request takes it, the others wait
+    }
     if (cache.IsValidData(status)) {
         const Json::Int64 age = std::time(nullptr) - status["time"].asInt64();
         status["age"] = std::max(age, Json::Int64{0});

@@ -4,8 +4,9 @@
 //      "volumes":{"/volume1/replica":{"used":bytes,"free":bytes},"/volume9":null},
 //      "probes":{"backup-01":"reachable"}}
 //
-// If several handlers need it at the same time, one of them gets it. Later handlers read the stored
-// status at once; if that is stale, a child process gets a new one in the background.
+// If several handlers need the first one at the same time, one of them takes it, and the others have it
+// milliseconds later. Later handlers read the stored status at once; if that is stale, a child process
+// takes a new one in the background.
 #ifndef NODE_REGISTRY_STATUS_CACHE_H
 #define NODE_REGISTRY_STATUS_CACHE_H
 
