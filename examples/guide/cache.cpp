@@ -44,11 +44,12 @@ class NodeStatus : public Cache {
 
 // [within]
 // Asks in each thread by an object of its own, for half a minute at most. Returns how many got an answer.
-int AskInThreads(const std::string& dir, int count)
+int AskInThreads(const std::string& dir, std::size_t count)
 {
     std::atomic<int> answers{0};
     std::vector<std::thread> threads;
-    for (int i = 0; i < count; ++i) {
+    threads.reserve(count);
+    for (std::size_t i = 0; i < count; ++i) {
         threads.emplace_back([&] {
             const NodeStatus status(dir);
             Json::Value nodes;

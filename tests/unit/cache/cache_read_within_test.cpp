@@ -1,21 +1,17 @@
-// Cache::ReadWithin() in one process. What several do is in tests/process/cold_cache_test.cpp.
+// Cache::ReadWithin() in one process: fresh data, and waiting for that of others. What several processes
+// do is in tests/process/cold_cache_test.cpp.
 #include <orvadrcore/cache.h>
 
 #include <gmock/gmock.h>
-#include <orvacore/orvacore.h>
 #include <sys/file.h>
-#include <sys/stat.h>
-#include <unistd.h>
 
-#include <cerrno>
 #include <chrono>
 #include <filesystem>
 #include <limits>
-#include <stdexcept>
 #include <string>
 #include <vector>
 
-#include "support/fixtures/cache_fixture.h"
+#include "support/fixtures/read_within_fixture.h"
 #include "support/fixtures/test_files.h"
 
 namespace {
@@ -29,77 +25,7 @@ using ::testing::Ge;
 using ::testing::IsEmpty;
 using ::testing::Le;
 
-constexpr milliseconds NoTime{0};
-constexpr milliseconds ShortTime{20};
-constexpr milliseconds Long{60'000};
-
-class CacheReadWithinTest : public CacheFixture {
-  protected:
-    CacheReadWithinTest()
-    {
-        cache.defaultValue = [] { return Json::Value("default"); };
-        cache.isValid = [](const Json::Value& value) {
-            return value.isString() && value != "default" && value != "bad";
-        };
-        pauses.OnWait([this](std::size_t count) {
-            if (onWait) onWait(count);
-        });
-    }
-
-    CacheState Ask(const TestCache& which, milliseconds patience)
-    {
-        data = "untouched";
-        return which.ReadWithin(patience, data);
-    }
-    CacheState Ask(milliseconds patience) { return Ask(cache, patience); }
-
-    // Marks this process, as another thread would.
-    void Mark() const { ASSERT_EQ(CoreLibProcPidFileCreate(pidPath.c_str()), 0); }
-    bool IsMarked() const { return std::filesystem::exists(pidPath); }
-
-    std::size_t Productions() const { return cache.CountCalls("GetUpdatedData"); }
-
-    // A lock file that nobody can open.
-    void BreakLock()
-    {
-        std::filesystem::remove(lockFile);
-        std::filesystem::create_directory(lockFile);
-    }
-    std::vector<LogLine> LockIsNotOpened() const
-    {
-        return {Err("openLockedFile",
-                    "Failed to open lock file[" + lockPath + "], errno=Is a directory")
-                    .In("file_lock.cpp"),
-                Err("acquire", "Bad fd [-1] to lock [" + lockPath + "]").In("file_lock.cpp")};
-    }
-
-    LogLine StartsHere() const
-    {
-        return Debug("ReadWithin", "---> Start to update cache [" + path + "]");
-    }
-    LogLine FinishesHere() const
-    {
-        return Debug("ReadWithin", "<--- Finish to update cache [" + path + "]");
-    }
-    LogLine NotStored() const
-    {
-        return Warn("ReadWithin",
-                    "Failed to store cache [" + path + "], use fresh data all the same");
-    }
-    LogLine NotLocked() const
-    {
-        return Warn("ReadWithin", "Failed to lock cache [" + path + "], refreshed it all the same");
-    }
-    static LogLine ProducedNothing(int limit)
-    {
-        return Debug("DoUpdate", R"(Failed to get updated cache ["test cache"] and reach )"
-                                 "the retry limit[" +
-                                     std::to_string(limit) + "]");
-    }
-
-    Json::Value data;
-    std::function<void(std::size_t)> onWait;
-};
+class CacheReadWithinTest : public ReadWithinFixture {};
 
 // ------------------------------------------------------------------------------------- fresh data
 
@@ -458,212 +384,6 @@ TEST_F(CacheReadWithinTest, ALockThatIsHeldForLongGivesOldData)
     EXPECT_EQ(data, "old");
     EXPECT_EQ(Productions(), 0U);
     ExpectSleeps(0);
-}
-
-// -------------------------------------------------------------------------------- failing refreshes
-
-TEST_F(CacheReadWithinTest, AProductionIsRetriedUpToTheLimitWithShortPauses)
-{
-    for (const int limit : {-1, 0, 3}) {
-        WriteStale("old");
-        TestCache each = Another(false, limit);
-        each.produce = [](Json::Value& value) {
-            EXPECT_EQ(value, Json::Value());
-            value = "left behind";
-            return false;
-        };
-        EXPECT_EQ(Ask(each, Long), CacheState::Stale);
-        EXPECT_EQ(data, "old");
-        EXPECT_EQ(each.CountCalls("GetUpdatedData"), limit < 0 ? 1U : std::size_t(limit) + 2);
-        EXPECT_FALSE(IsMarked());
-        ExpectLines({StartsHere(), ProducedNothing(limit), FinishesHere()});
-    }
-    ASSERT_FALSE(pauses.Waits().empty());
-    EXPECT_THAT(pauses.Waits(), Each(AllOf(Ge(10'000U), Le(100'000U))));
-}
-
-TEST_F(CacheReadWithinTest, AProductionThatFailsWithoutTimeLeftIsNotRetried)
-{
-    WriteStale("old");
-    TestCache patient = Another(false, 1000);
-    patient.produce = [](Json::Value&) { return false; };
-    EXPECT_EQ(Ask(patient, NoTime), CacheState::Stale);
-    EXPECT_EQ(patient.CountCalls("GetUpdatedData"), 1U);
-    EXPECT_FALSE(IsMarked());
-    ExpectLines({StartsHere(), ProducedNothing(1000), FinishesHere()});
-}
-
-TEST_F(CacheReadWithinTest, ALaterAttemptMaySucceed)
-{
-    cache.produce = [this](Json::Value& value) {
-        value = "new";
-        return Productions() == 2;
-    };
-    EXPECT_EQ(Ask(Long), CacheState::Fresh);
-    EXPECT_EQ(data, "new");
-    TakeLines();
-}
-
-TEST_F(CacheReadWithinTest, InvalidDataIsNotHandedOut)
-{
-    WriteStale("old");
-    cache.produce = [](Json::Value& value) {
-        value = "bad";
-        return true;
-    };
-    EXPECT_EQ(Ask(Long), CacheState::Stale);
-    EXPECT_EQ(data, "old");
-    EXPECT_FALSE(IsMarked());
-    ExpectLines(
-        {StartsHere(),
-         Debug("UpdateWithData", R"(["bad"] is not valid to update for cache ["test cache"])"),
-         FinishesHere()});
-}
-
-TEST_F(CacheReadWithinTest, WhatTheSubclassThrowsPassesAndLeavesNoMark)
-{
-    WriteStale("old");
-    cache.produce = [](Json::Value&) -> bool { throw std::runtime_error("no nodes"); };
-    EXPECT_THROW(Ask(NoTime), std::runtime_error);
-    EXPECT_EQ(data, "untouched");
-    EXPECT_FALSE(IsMarked());
-    EXPECT_FALSE(IsLocked(lockFile));
-    ExpectLines({StartsHere(), FinishesHere()});
-}
-
-TEST_F(CacheReadWithinTest, WhatAnotherWritesDuringAFailedRefreshIsReturned)
-{
-    cache.produce = [this](Json::Value&) {
-        WriteCache("theirs");
-        return false;
-    };
-    EXPECT_EQ(Ask(NoTime), CacheState::Fresh);
-    EXPECT_EQ(data, "theirs");
-    TakeLines();
-}
-
-// ------------------------------------------------------------------------- what cannot be stored
-
-TEST_F(CacheReadWithinTest, DataProducedWithoutALockIsFreshAndStored)
-{
-    BreakLock();
-    EXPECT_EQ(Ask(NoTime), CacheState::Fresh);
-    EXPECT_EQ(data, "new");
-    std::vector<LogLine> lines = {NoData()};
-    for (const LogLine& line : LockIsNotOpened()) lines.push_back(line);
-    for (const LogLine& line : {NoData(), UsesDefault(), NotLocked()}) lines.push_back(line);
-    ExpectLines(lines);
-    EXPECT_FALSE(IsMarked());
-
-    EXPECT_EQ(Ask(NoTime), CacheState::Fresh);
-    EXPECT_EQ(Productions(), 1U);
-}
-
-TEST_F(CacheReadWithinTest, AnUpdaterIsRespectedWithoutALock)
-{
-    BreakLock();
-    Mark();
-    WriteStale("old");
-    EXPECT_EQ(Ask(ShortTime), CacheState::Stale);
-    EXPECT_EQ(Productions(), 0U);
-    EXPECT_TRUE(IsMarked());
-    ExpectLines({});
-}
-
-TEST_F(CacheReadWithinTest, WithoutAMarkDataIsFreshAndStored)
-{
-    WriteStale("old");
-    std::filesystem::create_directory(pidPath);
-    EXPECT_EQ(Ask(Long), CacheState::Fresh);
-    EXPECT_EQ(data, "new");
-    EXPECT_EQ(cache.GetCachedData(), "new");
-    EXPECT_FALSE(IsLocked(lockFile));
-    ExpectLines({NotLocked()});
-}
-
-TEST_F(CacheReadWithinTest, DataThatCannotBeWrittenIsFresh)
-{
-    WriteStale("old");
-    faults.rename = [this](const char* from, const char* to) {
-        if (to != path) return RealRename(from, to);
-        errno = ENOSPC;
-        return -1;
-    };
-    EXPECT_EQ(Ask(Long), CacheState::Fresh);
-    EXPECT_EQ(data, "new");
-    EXPECT_FALSE(IsMarked());
-    EXPECT_THAT(NamesIn(dir.Path()), ElementsAre("status.cached"));
-    ExpectLines({StartsHere(),
-                 Debug("UpdateWithData",
-                       "Failed to write cache to file [" + path + "] and reach retry limit[0]"),
-                 NotStored(), FinishesHere()});
-    ASSERT_EQ(pauses.Waits().size(), 1U);
-    EXPECT_LE(pauses.Waits()[0], 20'000U);
-}
-
-TEST_F(CacheReadWithinTest, DataThatCouldNotBeLoadedAgainIsFresh)
-{
-    cache.isValid = [](const Json::Value& value) { return value.isDouble(); };
-    cache.produce = [](Json::Value& value) {
-        value = std::numeric_limits<double>::infinity();
-        return true;
-    };
-    EXPECT_EQ(Ask(NoTime), CacheState::Fresh);
-    EXPECT_EQ(data.asDouble(), std::numeric_limits<double>::infinity());
-    EXPECT_FALSE(std::filesystem::exists(path));
-    TakeLines();
-}
-
-// --------------------------------------------------------------------------------- the end of a mark
-
-TEST_F(CacheReadWithinTest, TheMarkGoesEvenIfTheLockIsHeld)
-{
-    WriteStale("old");
-    std::optional<HeldLock> held;
-    cache.produce = [&](Json::Value& value) {
-        EXPECT_TRUE(IsMarked());
-        EXPECT_FALSE(IsLocked(lockFile));
-        held.emplace(lockFile, LOCK_EX);
-        value = "new";
-        return true;
-    };
-    EXPECT_EQ(Ask(NoTime), CacheState::Fresh);
-    EXPECT_FALSE(IsMarked());
-    ExpectSleeps(0);
-    TakeLines();
-}
-
-TEST_F(CacheReadWithinTest, TheMarkOfAnotherLivingProcessStays)
-{
-    WriteStale("old");
-    std::optional<ChildProcess> other;
-    cache.produce = [&](Json::Value& value) {
-        std::filesystem::remove(pidPath);  // by hand
-        other.emplace([this](ChildProcess::Link& link) {
-            if (CoreLibProcPidFileCreate(pidPath.c_str()) == 0) link.Tell();
-            link.Await();
-        });
-        value = "new";
-        return other->Await();
-    };
-    EXPECT_EQ(Ask(NoTime), CacheState::Fresh);
-    EXPECT_TRUE(IsMarked());
-    other->Tell();
-    EXPECT_EQ(other->Join(), 0);
-    TakeLines();
-}
-
-TEST_F(CacheReadWithinTest, APidFileThatCannotBeReadAnyMoreGoes)
-{
-    WriteStale("old");
-    cache.produce = [&](Json::Value& value) {
-        WriteFile(pidPath, "damaged");
-        value = "new";
-        return true;
-    };
-    EXPECT_EQ(Ask(NoTime), CacheState::Fresh);
-    EXPECT_FALSE(IsMarked());
-    TakeLines();
 }
 
 // ----------------------------------------------------------------------------------- the other reads
