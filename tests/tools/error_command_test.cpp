@@ -105,6 +105,7 @@ TEST(CommandLineTest, ShowsHelpAndVersion)
         const ProgramResult result = RunOrvadr(line);
         EXPECT_EQ(result.code, AllWell);
         EXPECT_THAT(result.out, HasSubstr("Usage: orvadr"));
+        EXPECT_THAT(result.out, HasSubstr("Exit codes:"));
         EXPECT_EQ(result.err, "");
     }
 }

@@ -78,9 +78,9 @@ struct CloseConnection {
 using RowTaker = std::function<void(sqlite3_stmt*)>;
 
 // A connection that reads, and what it has found.
-class Reader {
+class DatabaseReader {
   public:
-    Reader(const std::string& path, Way way, DatabaseLook& look, const Progress& progress);
+    DatabaseReader(const std::string& path, Way way, DatabaseLook& look, const Progress& progress);
 
     // Fills in what the look is for.
     void Read();
@@ -117,7 +117,8 @@ std::string Quote(const std::string& name)
     return quoted + '"';
 }
 
-Reader::Reader(const std::string& path, Way way, DatabaseLook& look, const Progress& progress)
+DatabaseReader::DatabaseReader(const std::string& path, Way way, DatabaseLook& look,
+                               const Progress& progress)
     : way_(way), look_(look), progress_(progress)
 {
     sqlite3* connection = nullptr;
@@ -126,7 +127,7 @@ Reader::Reader(const std::string& path, Way way, DatabaseLook& look, const Progr
     connection_.reset(connection);
 }
 
-void Reader::Read()
+void DatabaseReader::Read()
 {
     sqlite3* const connection = connection_.get();
     if (connection == nullptr) throw std::bad_alloc();
@@ -142,7 +143,7 @@ void Reader::Read()
     CountRows();
 }
 
-void Reader::Configure()
+void DatabaseReader::Configure()
 {
     sqlite3* const connection = connection_.get();
     ::sqlite3_busy_timeout(connection, BusyTimeoutMSec);
@@ -157,7 +158,7 @@ void Reader::Configure()
 }
 
 // Runs a statement. Returns SQLITE_DONE after a success.
-int Reader::Run(const std::string& sql, const RowTaker& takeRow)
+int DatabaseReader::Run(const std::string& sql, const RowTaker& takeRow)
 {
     sqlite3_stmt* prepared = nullptr;
     int result = ::sqlite3_prepare_v2(connection_.get(), sql.c_str(), -1, &prepared, nullptr);
@@ -168,14 +169,14 @@ int Reader::Run(const std::string& sql, const RowTaker& takeRow)
     return result;
 }
 
-bool Reader::RunOrNote(const std::string& sql, const RowTaker& takeRow)
+bool DatabaseReader::RunOrNote(const std::string& sql, const RowTaker& takeRow)
 {
     const bool hasSucceeded = Run(sql, takeRow) == SQLITE_DONE;
     if (!hasSucceeded) NoteFailure();
     return hasSucceeded;
 }
 
-void Reader::CheckIntegrity()
+void DatabaseReader::CheckIntegrity()
 {
     std::vector<std::string>& problems = look_.problems;
     const int result = Run("PRAGMA integrity_check", [&](sqlite3_stmt* row) {
@@ -193,7 +194,7 @@ void Reader::CheckIntegrity()
     }
 }
 
-void Reader::CountRows()
+void DatabaseReader::CountRows()
 {
     // A virtual table, which has no page of its own, would need its module.
     (void)Run(
@@ -205,13 +206,13 @@ void Reader::CountRows()
         });
 }
 
-void Reader::CountRows(TableLook& table)
+void DatabaseReader::CountRows(TableLook& table)
 {
     (void)Run("SELECT count(*) FROM " + Quote(table.name),
               [&](sqlite3_stmt* row) { table.rows = ::sqlite3_column_int64(row, 0); });
 }
 
-void Reader::NoteFailure()
+void DatabaseReader::NoteFailure()
 {
     sqlite3* const connection = connection_.get();
     const int code = ::sqlite3_extended_errcode(connection);
@@ -231,9 +232,9 @@ void Reader::NoteFailure()
     }
 }
 
-int Reader::OnProgress(void* reader)
+int DatabaseReader::OnProgress(void* reader)
 {
-    const auto& self = *static_cast<Reader*>(reader);
+    const auto& self = *static_cast<DatabaseReader*>(reader);
     int misses = 0;
     int highest = 0;
     constexpr std::int64_t Percent = 100;
@@ -266,7 +267,7 @@ std::optional<DatabaseLook> LookOnce(const std::string& path, const DatabaseLook
     const bool isWal = hasHeader && header[ReadVersionAt] == WalVersion;
     if (hasHeader || header.empty()) look.journalMode = isWal ? "wal" : "delete";
     const Way way = ChooseWay(before, isWal);
-    Reader(path, way, look, progress).Read();
+    DatabaseReader(path, way, look, progress).Read();
     const bool isSame = StampsOf(path) == before;
     if (isSame || isLastAttempt) {
         const bool isDoubtful = !isSame && IsWithoutLocks(way);

@@ -2,10 +2,10 @@
 #include <CLI/CLI.hpp>
 
 #include <algorithm>
+#include <array>
 #include <clocale>
 #include <cstdio>
 #include <exception>
-#include <functional>
 #include <iostream>
 #include <string>
 #include <string_view>
@@ -22,39 +22,38 @@ using Orvadr::Style;
 
 using Words = std::vector<std::string>;
 
-constexpr const char* ExitCodes =
-    "Exit codes:\n"
-    "  0  all is well\n"
-    "  1  something is not: see the command\n"
-    "  2  wrong usage\n"
-    "  3  something could not be looked at\n"
-    "\n"
-    "orvadr(1) and a page for each command, such as orvadr-cache(1), say more.";
+// What the help says at its end; code 1 means something else for each command.
+std::string ExitCodes(const std::string& notWell)
+{
+    return "Exit codes:\n"
+           "  0  all is well\n"
+           "  1  " +
+           notWell +
+           "\n"
+           "  2  wrong usage\n"
+           "  3  something could not be looked at\n";
+}
 
 struct Command {
     const char* name;
     const char* description;
-    const char* words;  // what its arguments are
+    const char* notWell;  // what exit code 1 means
+    const char* words;    // what its arguments are
     const char* wordsDescription;
     bool needsWords;
-    std::function<Report(const Words&)> run;
+    Report (*run)(const Words&);
 };
 
-std::vector<Command> Commands()
-{
-    return {
-        {"cache",
-         "Show whether caches are fresh, and who refreshes them. Code 1 unless all are fresh.",
-         "FILE", "cache files, such as /var/dr/nodes.cached", true, Orvadr::ReportCaches},
-        {"db", "Check SQLite databases, and show who has them open. Code 1 unless all are ok.",
-         "FILE", "databases, such as /var/dr/nodes.db", true, Orvadr::ReportDatabases},
-        {"lock", "Show who holds locks. Code 1 when one of those named is held.", "NAME",
-         "as programs name it, below /tmp/.orvadr_lock; all lock files without any", false,
-         Orvadr::ReportLocks},
-        {"error", "Show what error codes mean. Code 1 for one that there is not.", "CODE|NAME",
-         "such as 404 or ERR_NODE_EXIST; all of them without any", false, Orvadr::ReportErrors},
-    };
-}
+constexpr std::array<Command, 4> Commands{{
+    {"cache", "Show how old caches are, and who refreshes them", "a cache is not fresh", "FILE",
+     "cache files, such as /var/dr/nodes.cached", true, Orvadr::ReportCaches},
+    {"db", "Check SQLite databases, and show who has them open", "a database is not ok", "FILE",
+     "databases, such as /var/dr/nodes.db", true, Orvadr::ReportDatabases},
+    {"lock", "Show who holds locks", "a lock that was named is held", "NAME",
+     "as programs name it; all locks without any", false, Orvadr::ReportLocks},
+    {"error", "Show what error codes mean", "there is no such error", "CODE|NAME",
+     "such as 404 or ERR_NODE_EXIST; all without any", false, Orvadr::ReportErrors},
+}};
 
 // CLI11 splits a word such as "[a,b]", drops an empty one and takes "--" only in front of all names, but
 // these may be names of files. A mark in front of them keeps them whole.
@@ -89,7 +88,8 @@ ExitCode Run(int argc, const char* const* argv)
 {
     CLI::App app("Shows what the DR programs have on disk, and who uses it. Changes nothing.");
     app.name("orvadr");
-    app.footer(ExitCodes);
+    app.footer(ExitCodes("something is not: see the command") +
+               "\nMore is in orvadr(1), orvadr-cache(1), orvadr-db(1) and so on.");
     app.set_version_flag("--version", "orvadr " ORVADR_VERSION);
     app.require_subcommand(1);
 
@@ -99,11 +99,12 @@ ExitCode Run(int argc, const char* const* argv)
         to.add_flag("--json", wantsJson, "Print an array of objects, for programs");
     };
     addJson(app);
-    const std::vector<Command> commands = Commands();
-    for (const Command& command : commands) {
+    for (const Command& command : Commands) {
         CLI::App* const sub = app.add_subcommand(command.name, command.description);
+        sub->footer(ExitCodes(command.notWell));
         sub->add_option(command.words, words, command.wordsDescription)
-            ->required(command.needsWords);
+            ->required(command.needsWords)
+            ->type_name("");
         addJson(*sub);
     }
     try {
@@ -116,9 +117,9 @@ ExitCode Run(int argc, const char* const* argv)
         std::cerr << "An empty name names nothing\nRun with --help for more information.\n";
         return ExitCode::WrongUsage;
     }
-    const auto command = std::find_if(commands.begin(), commands.end(), [&](const Command& each) {
-        return app.got_subcommand(each.name);
-    });
+    const auto* const command =
+        std::find_if(Commands.begin(), Commands.end(),
+                     [&](const Command& each) { return app.got_subcommand(each.name); });
     return Orvadr::Print(command->run(words), wantsJson ? Style::Json : Style::Table);
 }
 
