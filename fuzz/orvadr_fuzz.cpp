@@ -58,7 +58,7 @@ void CheckReport(const Orvadr::Report& report)
 std::string FileWith(const std::string& content)
 {
     static const TempDir dir;
-    const std::string path = dir.File("any");
+    std::string path = dir.File("any");
     std::ofstream(path, std::ios::binary) << content;
     return path;
 }

@@ -26,35 +26,33 @@ using ::testing::ElementsAre;
 using ::testing::HasSubstr;
 using ::testing::IsEmpty;
 using ::testing::Not;
-using ::testing::UnorderedElementsAre;
 
 constexpr const char* MakeNodes =
     "CREATE TABLE nodes(name TEXT PRIMARY KEY, port INTEGER);"
     "WITH RECURSIVE c(x) AS (SELECT 1 UNION ALL SELECT x+1 FROM c WHERE x<5000)"
     "INSERT INTO nodes SELECT 'node'||x, x FROM c;";
 
-// A connection that does not close in time: a process that dies leaves its files.
 class Connection {
   public:
     explicit Connection(const std::string& path)
     {
-        EXPECT_EQ(::sqlite3_open(path.c_str(), &connection), SQLITE_OK);
+        EXPECT_EQ(::sqlite3_open(path.c_str(), &connection_), SQLITE_OK);
     }
     Connection(const Connection&) = delete;
     Connection& operator=(const Connection&) = delete;
-    ~Connection() { ::sqlite3_close(connection); }
+    ~Connection() { ::sqlite3_close(connection_); }
 
     void Run(const std::string& statements) const
     {
         char* message = nullptr;
         const int result =
-            ::sqlite3_exec(connection, statements.c_str(), nullptr, nullptr, &message);
+            ::sqlite3_exec(connection_, statements.c_str(), nullptr, nullptr, &message);
         EXPECT_EQ(result, SQLITE_OK) << message;
         ::sqlite3_free(message);
     }
 
   private:
-    sqlite3* connection = nullptr;
+    sqlite3* connection_ = nullptr;
 };
 
 class DbCommandTest : public ::testing::Test {

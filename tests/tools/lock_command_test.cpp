@@ -35,7 +35,7 @@ constexpr const char* LockDir = "/tmp/.orvadr_lock";
 
 class LockCommandTest : public ::testing::Test {
   protected:
-    ~LockCommandTest() override
+    void TearDown() override
     {
         std::error_code ignored;
         std::filesystem::remove_all(LockDir + dir.Path(), ignored);

@@ -41,7 +41,8 @@ std::string FindWrongMember(const Json::Value& value, const Json::Value& rule,
         if (!value.isMember(name.asString())) return place + ": lacks " + name.asString();
     }
     for (const std::string& name : value.getMemberNames()) {
-        const std::string memberPlace = place + "/" + name;
+        std::string memberPlace = place;
+        memberPlace.append("/").append(name);
         if (rule["properties"].isMember(name)) {
             std::string wrong =
                 FindMismatch(value[name], rule["properties"][name], schema, memberPlace);
