@@ -31,7 +31,7 @@ Number ParseNumber(const std::string& text)
     return number;
 }
 
-// The field on the next line. Its first letter tells the kind; unknown letters mean text.
+// The field on the next line. Its first letter is the kind; unknown letters mean text.
 inline Field TakeField(Pieces& pieces)
 {
     const std::string kind = pieces.Until(' ');

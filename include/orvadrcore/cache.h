@@ -108,7 +108,7 @@ class ORVADRCORE_API Cache {
     // ---------------------------------------------------------------------------------- refreshing
 
     /// Refreshes data of any age: here, in a child, or by waiting for another process that was seen
-    /// refreshing. True after starting a child or waiting, whatever comes of it. False when the refresh
+    /// refreshing. True after starting a child or waiting, whatever the result. False when the refresh
     /// here failed, another process was faster (it is not waited for), or no child could be forked (WARN).
     bool Update() const;
     /// Produces and writes data without a lock or a mark.

@@ -32,8 +32,8 @@ namespace OrvaDRCore {
 
 /// The reply to one web-API call.
 ///
-/// A null `key` counts as missing. A failed reply never gives out its data, but a successful one does
-/// give out its error.
+/// A null `key` counts as missing. A failed reply never returns its data, but a successful one does
+/// return its error.
 class ORVADRCORE_API Response {
   public:
     /// A null reply: not valid.

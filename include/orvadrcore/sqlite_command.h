@@ -35,7 +35,7 @@ class ORVADRCORE_API SqliteTableHandler {
   public:
     SqliteTableHandler() = default;
 
-    /// The schema is what stands between the parentheses of CREATE TABLE. With an empty one
+    /// The schema is the text between the parentheses of CREATE TABLE. With an empty one
     /// SqliteDB never creates the table.
     SqliteTableHandler(const std::string& name, const std::string& schema);
 

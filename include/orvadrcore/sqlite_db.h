@@ -65,7 +65,7 @@ class ORVADRCORE_API SqliteDB {
     bool InsertRecords(const SqliteTableHandler& table, const std::vector<SqliteValueList>& records,
                        bool replacable = false);
 
-    /// True also when no row meets the condition.
+    /// True also if no row matches the condition.
     bool UpdateRecord(const UpdateCommand& command);
 
     /// Appends the selected rows to `records`. See SelectByCommand() for what a row becomes.

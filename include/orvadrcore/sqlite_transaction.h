@@ -10,7 +10,7 @@
 ///
 /// While the transaction is open, each operation of the connection is a single attempt. When one
 /// fails, roll back: SQLite may have rolled back the whole transaction by itself, and the next
-/// operation would run outside of it. docs/recipes.md, "All or nothing", tells more.
+/// operation would run outside of it. See "All or nothing" in docs/recipes.md.
 ///
 /// \warning Other processes cannot write to the file meanwhile. Do not fork, and do not read a
 ///          Cache, which forks.

@@ -23,7 +23,7 @@ namespace {
 constexpr long TickUSec = 500;
 constexpr int IdleTicksWhenStuck = 2;
 
-// Sanitizers spin while they wait for a lock. Only the number of ticks tells there.
+// Sanitizers spin while they wait for a lock. There, only the number of ticks shows it.
 constexpr int TicksWhenStuck = 400;
 
 // A tick with less processor time than this is idle.

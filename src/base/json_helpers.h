@@ -23,7 +23,7 @@ bool FitsJsonName(std::size_t length);
 Json::Value ToJsonText(std::string_view text);
 
 // Parses `text`, which must be one whole JSON document of any type. False, with `value` as it was, if
-// it does not parse, goes on after the document, nests deeper than MaxLevels, or is so long that a
+// it does not parse, continues after the document, nests deeper than MaxLevels, or is so long that a
 // text in it might not fit a value.
 bool fromString(Json::Value& value, const std::string& text);
 

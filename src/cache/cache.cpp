@@ -27,7 +27,7 @@ namespace {
 
 constexpr const char* DefaultPath = "/tmp/default_dr_cache";
 constexpr int CacheDirMode = 0755;
-constexpr int DetachedFork = 0x40;
+constexpr int DetachedFork = 0x40;  // a number, because the appliance's header need not name it
 
 std::string GetCachedPath(const std::string& dir, const std::string& file)
 {

@@ -37,7 +37,7 @@ std::string EscapeWildcards(const std::string& text)
     return escaped;
 }
 
-// `before` is what stands between the quote and the text.
+// `before` is put between the quote and the text.
 bool SetPattern(std::string& condition, const std::string& lvalue, const char* before,
                 const std::string& text)
 {

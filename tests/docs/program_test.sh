@@ -1,5 +1,5 @@
 #!/usr/bin/env bash
-# An example prints what stands beside it, in an empty directory of its own. Ends with 77,
+# An example prints the output in the file beside it, in an empty directory of its own. Ends with 77,
 # for skipped, where the program needs root and the caller is somebody else.
 #
 #   program_test.sh PROGRAM EXPECTED-OUTPUT [root]

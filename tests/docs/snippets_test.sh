@@ -7,7 +7,7 @@
 set -euo pipefail
 cd "$1"
 
-# block PAGE LINE: what stands between the fences, the first of which is that line.
+# block PAGE LINE: the text between the fences, the first of which is that line.
 block() { sed -n "$(($2 + 1)),\$p" "$1" | sed '/^```$/,$d'; }
 
 # marked PROGRAM NAME: the marked lines without the indentation of the first mark.

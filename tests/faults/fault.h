@@ -11,7 +11,7 @@
 //     });
 //
 // For all operations it checks: no crash, no hang, no exception except when memory runs out, no
-// child that goes on with its parent's work, no leaked descriptor, memory or process. Pauses and
+// child that continues its parent's work, no leaked descriptor, memory or process. Pauses and
 // sleeps take no time, and a directory of the test stands in for /tmp/.orvadr_lock.
 #ifndef ORVADRCORE_TESTS_FAULT_H
 #define ORVADRCORE_TESTS_FAULT_H

@@ -187,7 +187,7 @@ class ContentionTest : public ProcessTest {
     // The same while another process locks the file now and then.
     void RunBesideHolder(int retryLimit, std::chrono::seconds time, std::chrono::seconds held);
 
-    // A process that locks the database and tells so. After Tell() it unlocks and locks it by
+    // A process that locks the database and reports it. After Tell() it unlocks and locks it by
     // turns.
     ChildProcess StartHolder(std::chrono::seconds time, std::chrono::seconds held);
 

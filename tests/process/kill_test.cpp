@@ -50,7 +50,7 @@ class KillTest : public ProcessTest {
     // with a later one without waiting, and leaves no other file behind.
     void ExpectRecovery(int old);
 
-    // A process that starts to produce data, tells so, and never finishes.
+    // A process that starts to produce data, reports it, and never finishes.
     ChildProcess StartEndlessUpdater()
     {
         return ChildProcess([this](ChildProcess::Link& link) {

@@ -56,7 +56,7 @@ int Slot(Operation operation)
     return static_cast<int>(parts.position / static_cast<std::intptr_t>(sizeof(void*)));
 }
 
-// How many slots a class has: its subclass's first new operation comes behind them. A virtual
+// How many slots a class has: its subclass's first new operation comes after them. A virtual
 // destructor takes two.
 template <class Base>
 int SlotCount()
@@ -69,7 +69,7 @@ int SlotCount()
 
 TEST(SlotTest, ACommandsOperationsKeepTheirSlots)
 {
-    EXPECT_EQ(Slot(&SqliteCommand::GetCommand), 2);  // behind the destructor
+    EXPECT_EQ(Slot(&SqliteCommand::GetCommand), 2);  // after the destructor
     EXPECT_EQ(Slot(&SqliteCommand::IsValid), 3);
     EXPECT_EQ(Slot(&SqliteCommand::DumpParam), 4);
     EXPECT_EQ(SlotCount<SqliteCommand>(), 5);
@@ -101,7 +101,7 @@ TEST(SlotTest, TablesAndListsHaveNothingButTheirDestructor)
 
 TEST(SlotTest, ACachesOperationsKeepTheirSlots)
 {
-    EXPECT_EQ(Slot(&Cache::GetInfo), 2);  // behind the destructor
+    EXPECT_EQ(Slot(&Cache::GetInfo), 2);  // after the destructor
     EXPECT_EQ(Slot(&Cache::GetDefaultValue), 3);
     EXPECT_EQ(Slot(&Cache::GetUpdatedData), 4);
     EXPECT_EQ(Slot(&Cache::IsValidData), 5);
@@ -118,7 +118,7 @@ TEST(SlotTest, RequestsAndResponsesHaveNothingButTheirDestructor)
 
 // ----------------------------------------------------------------------------------------- members
 
-// The first member's place, and each other's behind the one before it.
+// The first member's place, and each other's after the one before it.
 void ExpectInOrder(std::size_t first, std::initializer_list<std::size_t> offsets)
 {
     EXPECT_EQ(*offsets.begin(), first);
