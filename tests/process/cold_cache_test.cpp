@@ -49,19 +49,19 @@ class OwnCache : public Cache {
   public:
     OwnCache(const std::string& dir, const std::string& lockDir, Producer producer, int retries = 0)
         : Cache(dir, "x", DocumentCache::TimeoutSeconds, false, retries, lockDir),
-          produce(std::move(producer))
+          produce_(std::move(producer))
     {
     }
 
     Json::Value GetInfo() const override { return "a cache of documents"; }
-    bool GetUpdatedData(Json::Value& data) const override { return produce(data); }
+    bool GetUpdatedData(Json::Value& data) const override { return produce_(data); }
     bool IsValidData(const Json::Value& data) const override
     {
         return NumberOf(data) != NoDocument;
     }
 
   private:
-    Producer produce;
+    Producer produce_;
 };
 
 class ColdCacheTest : public ProcessTest {

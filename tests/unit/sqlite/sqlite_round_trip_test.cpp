@@ -58,7 +58,7 @@ class Generator {
     {
         switch (Below(5)) {
             case 0:
-                return static_cast<std::int64_t>(random() >> Below(64)) * (Below(2) == 0 ? 1 : -1);
+                return static_cast<std::int64_t>(random_() >> Below(64)) * (Below(2) == 0 ? 1 : -1);
             case 1: return Real();
             case 2: return Bytes();
             case 3: return BlobBytes{Bytes()};
@@ -67,13 +67,13 @@ class Generator {
     }
 
   private:
-    std::uint64_t Below(std::uint64_t limit) { return random() % limit; }
+    std::uint64_t Below(std::uint64_t limit) { return random_() % limit; }
 
     // No number between the denormals and 1e-290: SQLite before 3.43 cannot read some of them.
     double Real()
     {
         for (;;) {
-            const std::uint64_t bits = Below(4) == 0 ? random() >> 12U : random();
+            const std::uint64_t bits = Below(4) == 0 ? random_() >> 12U : random_();
             double real = 0;
             std::memcpy(&real, &bits, sizeof real);
             if (std::fpclassify(real) == FP_SUBNORMAL || std::abs(real) > 1e-290) return real;
@@ -90,7 +90,7 @@ class Generator {
         return bytes;
     }
 
-    std::mt19937_64 random{42};
+    std::mt19937_64 random_{42};
 };
 
 StoredValues Generated(int count)
