@@ -49,7 +49,8 @@ class RowReader {
         return last_ = guess;
     }
 
-    // A column's value in this row, which may be read in this thread until the next row.
+    // A column's value in this row, good until the next row. SQLite calls such a value unprotected: to
+    // read it takes no mutex. None is needed because one thread at a time uses a connection.
     sqlite3_value* GetValue(const Column& column) const
     {
         return sqlite3_column_value(statement_, column.number);
