@@ -149,6 +149,7 @@ TEST_F(DbCommandTest, ShowsWhatIsDamaged)
     EXPECT_EQ(damaged["state"], "damaged");
     EXPECT_GE(damaged["problems"].size(), 1U);
     EXPECT_THAT(StringsOf(damaged["problems"]), ::testing::Contains(HasSubstr("page")));
+    EXPECT_THAT(RunOrvadr({"db", path}).out, HasSubstr(damaged["problems"][0].asString()));
 }
 
 TEST_F(DbCommandTest, ShowsThatAFileWasCutOff)

@@ -158,16 +158,13 @@ std::string ProblemLine(const Json::Value& problem)
 Report ReportDatabases(const std::vector<std::string>& files)
 {
     Report report;
-    report.columns = {
-        TextColumn("STATE", "state"),
-        TextColumn("JOURNAL", "journal_mode"),
-        {"SIZE", SizeCell},
-        TextColumn("FILE", "path"),
-        {"TABLES", [](const Json::Value& object) { return LinesOf(object["tables"], TableLine); }},
-        {"PROBLEMS",
-         [](const Json::Value& object) { return LinesOf(object["problems"], ProblemLine); }},
-        {"HOLDERS",
-         [](const Json::Value& object) { return LinesOf(object["holders"], ProcessLine); }}};
+    report.columns = {TextColumn("STATE", "state"),
+                      TextColumn("JOURNAL", "journal_mode"),
+                      {"SIZE", SizeCell},
+                      TextColumn("FILE", "path"),
+                      LinesColumn("TABLES", "tables", TableLine),
+                      LinesColumn("PROBLEMS", "problems", ProblemLine),
+                      LinesColumn("HOLDERS", "holders", ProcessLine)};
     for (const std::string& file : files) ReportOne(file, report);
     return report;
 }

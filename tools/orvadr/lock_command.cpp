@@ -143,11 +143,8 @@ bool IsHeld(const Json::Value& object)
 Report ReportLocks(const std::vector<std::string>& namesOrNone)
 {
     Report report;
-    report.columns = {TextColumn("STATE", "state", "?"),
-                      TextColumn("NAME", "name"),
-                      {"HOLDERS", [](const Json::Value& object) {
-                           return LinesOf(object["holders"], ProcessLine);
-                       }}};
+    report.columns = {TextColumn("STATE", "state", "?"), TextColumn("NAME", "name"),
+                      LinesColumn("HOLDERS", "holders", ProcessLine)};
 
     std::vector<std::string> names = namesOrNone;
     if (names.empty()) {

@@ -135,15 +135,16 @@ Column TextColumn(const char* title, const char* key, const char* ifNull)
             }};
 }
 
-std::string LinesOf(const Json::Value& array,
-                    const std::function<std::string(const Json::Value&)>& line)
+Column LinesColumn(const char* title, const char* key, std::string (*line)(const Json::Value&))
 {
-    std::string lines;
-    for (const Json::Value& element : array) {
-        if (!lines.empty()) lines += '\n';
-        lines += line(element);
-    }
-    return lines;
+    return {title, [key, line](const Json::Value& object) {
+                std::string lines;
+                for (const Json::Value& element : object[key]) {
+                    if (!lines.empty()) lines += '\n';
+                    lines += line(element);
+                }
+                return lines;
+            }};
 }
 
 std::string FormatTable(const std::vector<Column>& columns, const Json::Value& objects,

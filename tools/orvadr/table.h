@@ -20,9 +20,8 @@ struct Column {
 // A column with the text or number of a key; with `ifNull` where that is null.
 Column TextColumn(const char* title, const char* key, const char* ifNull = "");
 
-// A printable text for each object of an array, one per line of a cell.
-std::string LinesOf(const Json::Value& array,
-                    const std::function<std::string(const Json::Value&)>& line);
+// A column with a line for each element of the array under a key.
+Column LinesColumn(const char* title, const char* key, std::string (*line)(const Json::Value&));
 
 // What the output can do.
 struct Screen {
