@@ -34,7 +34,8 @@ bool DropCapabilities()
 {
     __user_cap_header_struct header{_LINUX_CAPABILITY_VERSION_3, 0};
     std::array<__user_cap_data_struct, _LINUX_CAPABILITY_U32S_3> none{};
-    return ::syscall(SYS_capset, &header, none.data()) == 0;
+    // All six arguments, because the fake of syscall() reads as many.
+    return ::syscall(SYS_capset, &header, none.data(), 0L, 0L, 0L, 0L) == 0;
 }
 
 }  // namespace
