@@ -426,7 +426,7 @@ TEST_P(QueueTest, EveryWriterIsServedAndNoOperationFails)
     ReportCount("longest_wait_msec", longestWait);
 }
 
-const int RowsOf16 = Scaled(100, 1000);
+const int RowsOf16 = Scaled(200, 1000);
 const int RowsOf64 = Scaled(120, 400);
 
 INSTANTIATE_TEST_SUITE_P(

@@ -184,7 +184,9 @@ std::string SizeText(double bytes)
     if (bytes < Step) return Format("%.0f B", bytes);
     std::size_t unit = 0;
     for (bytes /= Step; bytes >= RoundsUp && unit + 1 < Units.size(); ++unit) bytes /= Step;
-    return Format("%.1f %s", bytes, Units[unit]);
+    // "%.1f" would have the decimal point of the locale.
+    const double tenths = std::round(bytes * 10);
+    return Format("%.0f.%.0f %s", std::floor(tenths / 10), std::fmod(tenths, 10), Units[unit]);
 }
 
 std::string SizeCell(const Json::Value& object)
