@@ -19,15 +19,18 @@ void AppendNumber(std::string& text, Json::LargestInt number)
 
 void AppendHexadecimal(std::string& text, std::string_view bytes)
 {
-    constexpr std::string_view Digits = "0123456789abcdef";
-    text.reserve(text.size() + LengthOfBlobLiteral(bytes.size()));
-    text += "X'";
+    constexpr const char* Digits = "0123456789abcdef";
+    const std::size_t begin = text.size();
+    text.resize(begin + LengthOfBlobLiteral(bytes.size()));
+    char* out = text.data() + begin;
+    *out++ = 'X';
+    *out++ = '\'';
     for (const char byte : bytes) {
         const auto number = static_cast<unsigned char>(byte);
-        text += Digits[number / 16];
-        text += Digits[number % 16];
+        *out++ = Digits[number / 16];
+        *out++ = Digits[number % 16];
     }
-    text += '\'';
+    *out = '\'';
 }
 
 // SQLite ends a statement at a zero byte, so a text that holds one is written like a blob.
