@@ -107,7 +107,7 @@ TEST_F(SqliteRowTest, IntegersThatDoNotFitAreRefusedAndNeverCut)
 TEST_F(SqliteRowTest, DoubleReadsRealsAndIntegers)
 {
     ExpectRead("0.1", 0.1);
-    ExpectRead("-1.7976931348623157e308", std::numeric_limits<double>::lowest());
+    ExpectRead("-1e22", -1e22);
     ExpectRead("9e999", std::numeric_limits<double>::infinity());
     ExpectRead("-9e999", -std::numeric_limits<double>::infinity());
     ExpectRead("3", 3.0);
