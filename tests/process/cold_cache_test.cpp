@@ -384,7 +384,10 @@ TEST_F(ColdCacheTest, OnAFullDiskEveryReaderGetsWhatItProduced)
         if (!BecomeRoot() || !MountSmallDisk(dir.File("cache"), Size)) {
             // As if it were full.
             (void)::chmod(dir.File("cache").c_str(), 0555);
-            if (::geteuid() == 0) (void)LoseRights();
+            if (::geteuid() == 0) {
+                (void)::chown(dir.Path().c_str(), Nobody, Nobody);
+                (void)LoseRights();
+            }
         }
         std::vector<std::thread> threads;
         for (int i = 0; i < Threads; ++i) {
