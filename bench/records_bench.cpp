@@ -119,7 +119,26 @@ class LoopEngine {
     NamedRows rows_;
 };
 
-// Our rows one by one, into structs. Columns are read by name.
+struct ByName {
+    static bool Read(const OrvaDRCore::SqliteRow& row, Node& node)
+    {
+        return row.GetValue("id", node.id) && row.GetValue("name", node.name) &&
+               row.GetValue("address", node.address) && row.GetValue("port", node.port) &&
+               row.GetValue("state", node.state);
+    }
+};
+
+struct ByNumber {
+    static bool Read(const OrvaDRCore::SqliteRow& row, Node& node)
+    {
+        return row.GetValue(0, node.id) && row.GetValue(1, node.name) &&
+               row.GetValue(2, node.address) && row.GetValue(3, node.port) &&
+               row.GetValue(4, node.state);
+    }
+};
+
+// Our rows one by one, into structs.
+template <class Columns>
 class EachEngine {
   public:
     explicit EachEngine(const std::string& path) : db_(path, 0)
@@ -132,10 +151,7 @@ class EachEngine {
     {
         rows_.clear();
         const auto take = [this](const OrvaDRCore::SqliteRow& row) {
-            Node& node = rows_.emplace_back();
-            return row.GetValue("id", node.id) && row.GetValue("name", node.name) &&
-                   row.GetValue("address", node.address) && row.GetValue("port", node.port) &&
-                   row.GetValue("state", node.state);
+            return Columns::Read(row, rows_.emplace_back());
         };
         Require(db_.SelectEach(select_, take), "a select failed");
     }
@@ -210,7 +226,8 @@ void AddRecords()
 #endif
     Aim({"C loop"}, OfLoop);
     Aim({"SQLiteCpp by name", "SOCI by name"}, 1);
-    Add<SelectAll<EachEngine>>("select 10,000 rows into structs", Ours);
+    Add<SelectAll<EachEngine<ByNumber>>>("select 10,000 rows into structs", Ours);
+    Add<SelectAll<EachEngine<ByName>>>("select 10,000 rows into structs", "by name");
     Add<SelectAll<BareEngine>>("select 10,000 rows into structs", Bare);
 #if BENCH_HAS_SQLITECPP
     Add<SelectAll<Peer<SqliteCpp>>>("select 10,000 rows into structs", "SQLiteCpp");
