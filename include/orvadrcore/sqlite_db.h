@@ -126,9 +126,10 @@ class ORVADRCORE_API SqliteDB {
     bool SelectByCommand(const std::string& command, std::vector<SqliteValueList>& records);
 
     /// Gives each row to `take` on the open connection, in little memory. `take` returns whether it
-    /// wants another row. Nothing is repeated after the first row, so no row comes twice. What
-    /// `take` throws passes through, with the code 404. It may use this connection for selects, but
-    /// neither destroy nor assign to this object. An empty `take` gives the code 401.
+    /// wants another row; stopping early is a success. Nothing is repeated after the first row, so
+    /// no row comes twice. What `take` throws passes through, with the code 404. It may use this
+    /// connection for selects, but neither destroy nor assign to this object. An empty `take` gives
+    /// the code 401.
     /// \warning Without the write-ahead log nobody else can commit to the file meanwhile.
     [[nodiscard]] bool SelectEachByCommand(const std::string& command,
                                            const std::function<bool(const SqliteRow&)>& take);

@@ -2,13 +2,14 @@
 /// One row of a select, read column by column without a record.
 ///
 /// \code
-///     db.SelectEach(select, [&](const SqliteRow& row) {
-///         Volume volume;
-///         if (!row.GetValue("name", volume.name) || !row.GetValue("bytes", volume.bytes)) return false;
+///     bool isReadable = true;
+///     const auto take = [&](const SqliteRow& row) {
+///         Volume& volume = volumes.emplace_back();
+///         isReadable = row.GetValue("name", volume.name) && row.GetValue("bytes", volume.bytes);
 ///         if (!row.IsNull("note")) row.GetValue("note", volume.note);
-///         volumes.push_back(volume);
-///         return true;                                  // the next row, please
-///     });
+///         return isReadable;                            // the next row, please
+///     };
+///     if (!db.SelectEach(select, take) || !isReadable) return false;
 /// \endcode
 ///
 /// SqliteDB::SelectEach() makes rows. Nothing throws unless memory runs out. Refusals are logged as
