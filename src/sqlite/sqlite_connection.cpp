@@ -90,7 +90,6 @@ void SqliteConnection::Close()
     wait_.Forget();
     watch_.Stop();
     cache_.Clear();
-    sqlite3_busy_handler(handle_, nullptr, nullptr);
     sqlite3_close(handle_);  // fails inside of a select, which closes it at its end
     handle_ = nullptr;
 }
