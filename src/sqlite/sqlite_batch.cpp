@@ -4,6 +4,7 @@
 #include <map>
 #include <string_view>
 
+#include "sqlite/sqlite_bind.h"
 #include "sqlite/sqlite_internals.h"
 #include "sqlite/sqlite_statement.h"
 
@@ -36,29 +37,6 @@ std::string InsertStatement(const std::string& table, const SqliteValueList& rec
     }
     const char* verb = replacable ? "INSERT OR REPLACE INTO " : "INSERT INTO ";
     return verb + table + " (" + fields + ") VALUES (" + places + ");";
-}
-
-// Bytes are not copied: the record outlives the run of the statement. Returns SQLite's code.
-int BindValue(sqlite3_stmt* statement, int place, const SqliteValue& value)
-{
-    using Kind = SqliteInternals::Kind;
-    const Json::Value& payload = SqliteInternals::Payload(value);
-    switch (SqliteInternals::KindOf(value)) {
-        case Kind::Boolean:
-        case Kind::Integer: return sqlite3_bind_int64(statement, place, payload.asInt64());
-        case Kind::Real: return sqlite3_bind_double(statement, place, payload.asDouble());
-        case Kind::PlainText:
-        case Kind::Text: {
-            const std::string_view text = BytesOf(payload);
-            return sqlite3_bind_text64(statement, place, text.data(), text.size(), SQLITE_STATIC,
-                                       SQLITE_UTF8);
-        }
-        case Kind::Blob: {
-            const std::string_view bytes = BytesOf(payload);
-            return sqlite3_bind_blob64(statement, place, bytes.data(), bytes.size(), SQLITE_STATIC);
-        }
-        default: return sqlite3_bind_null(statement, place);
-    }
 }
 
 // Inserts records that have the same fields.
