@@ -27,4 +27,13 @@ int EndBeforeLastRow(sqlite3_stmt* statement)
     return sqlite3_stmt_readonly(statement) != 0 ? SQLITE_OK : sqlite3_reset(statement);
 }
 
+bool HasNothingAttached([[maybe_unused]] sqlite3* handle)
+{
+#if SQLITE_VERSION_NUMBER >= 3039000
+    return handle != nullptr && sqlite3_db_name(handle, 2) == nullptr;
+#else
+    return false;
+#endif
+}
+
 }  // namespace OrvaDRCore

@@ -25,6 +25,10 @@ int PrepareStatement(sqlite3* handle, const std::string& command, Statement& sta
 // Returns SQLite's code.
 int EndBeforeLastRow(sqlite3_stmt* statement);
 
+// Whether the connection has main and temp alone. False before SQLite 3.39, where there is no way to
+// ask.
+bool HasNothingAttached(sqlite3* handle);
+
 }  // namespace OrvaDRCore
 
 #endif

@@ -13,16 +13,6 @@ constexpr std::size_t MaxCached = 8;
 // A list of thousands of values seldom comes twice, and its statement takes much memory.
 constexpr std::size_t MaxCachedLength = 1024;
 
-// Whether the connection has main and temp alone. Before SQLite 3.39 there is no way to ask.
-bool HasNothingAttached([[maybe_unused]] sqlite3* handle)
-{
-#if SQLITE_VERSION_NUMBER >= 3039000
-    return handle != nullptr && sqlite3_db_name(handle, 2) == nullptr;
-#else
-    return false;
-#endif
-}
-
 // Only selects: a PRAGMA may do its work while it is prepared.
 bool IsWorthCaching(const std::string& command, sqlite3_stmt* statement)
 {
