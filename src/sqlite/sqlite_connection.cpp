@@ -56,6 +56,7 @@ void SqliteConnection::NoteExtendedCode()
 
 void SqliteConnection::Refuse(int code)
 {
+    lookup_.GiveBack();  // a log line follows
     affectedRows_ = 0;
     error_.Set(code);
 }
@@ -90,6 +91,7 @@ void SqliteConnection::Close()
     wait_.Forget();
     watch_.Stop();
     cache_.Clear();
+    lookup_.Clear();
     sqlite3_close(handle_);  // fails inside of a select, which closes it at its end
     handle_ = nullptr;
 }
@@ -136,6 +138,7 @@ bool SqliteConnection::Select(const std::string& command, const TakeRow& takeRow
     Statement statement;
     const ScopeGuard end([&] {
         statement.reset();
+        lookup_.GiveBack();
         EndSelect(handle);
     });
     const StatementWatch::Changes before = watch_.CountChanges();
@@ -158,6 +161,8 @@ int SqliteConnection::TakeRows(sqlite3_stmt* statement, const TakeRow& takeRow,
 {
     const sqlite3* const handle = handle_;
     int code = sqlite3_step(statement);
+    // After a failure it is given back later, because that changes SQLite's message.
+    if (code == SQLITE_ROW || code == SQLITE_DONE) lookup_.GiveBack();
     RowReader row(statement);
     while (code == SQLITE_ROW) {
         const bool isMoreWanted = takeRow(row);
@@ -184,6 +189,43 @@ void SqliteConnection::EndSelect(sqlite3* handle)
     } else if (!IsInTransaction()) {
         wait_.NoteUnlocked();
     }
+}
+
+bool SqliteConnection::LookUp(const std::string& table, bool& isFound)
+{
+    const auto takeRow = [&isFound](const RowReader&) { return isFound = true; };
+    if (!lookup_.CanCheck(handle_, watch_, table)) {
+        return Select(TableLookup::Query(table), takeRow);
+    }
+    error_.Set(ERR::ERR_DATABASE_OPERATION);
+    ScopeGuard giveBack([&] {
+        lookup_.GiveBack();
+        if (!IsInTransaction()) wait_.NoteUnlocked();
+    });
+    const int code = [&] {
+        const BusyTimeoutAccess access(wait_, watch_, table);
+        return lookup_.Check(handle_);
+    }();
+    if (code != SQLITE_ROW) {
+        SetFailure(TableLookup::Query(table), code, nullptr);
+        return false;
+    }
+    if (lookup_.TakeChange()) cache_.Clear();
+    if (!lookup_.IsKnown(table)) {
+        if (!Select(TableLookup::Query(table), takeRow)) return false;
+        if (isFound) lookup_.Remember(table);
+        return true;
+    }
+    isFound = true;
+    error_.Set(0);
+    if (isLookupLockKept_ && !IsInTransaction()) giveBack.Dismiss();
+    return true;
+}
+
+void SqliteConnection::KeepLookupLock(bool isKept)
+{
+    isLookupLockKept_ = isKept;
+    if (!isKept) lookup_.GiveBack();
 }
 
 bool SqliteConnection::RunAtomically(bool isNested, const std::function<bool()>& work)

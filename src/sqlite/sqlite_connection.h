@@ -13,6 +13,7 @@
 #include "sqlite/sqlite_retry.h"
 #include "sqlite/sqlite_row_reader.h"
 #include "sqlite/sqlite_statement_cache.h"
+#include "sqlite/sqlite_table_lookup.h"
 #include "sqlite/sqlite_watch.h"
 
 namespace OrvaDRCore {
@@ -70,6 +71,14 @@ class SqliteConnection {
     using TakeRow = std::function<bool(RowReader&)>;
     bool Select(const std::string& command, const TakeRow& takeRow);
 
+    // One attempt to find out whether a table exists.
+    bool LookUp(const std::string& table, bool& isFound);
+
+    // While kept, a lookup that finds its table outside of a transaction leaves its shared lock to
+    // the first attempt of the next select, which gives it back after its first step. Nothing of the
+    // caller's code, no log line and no pause may come in between. False gives it back.
+    void KeepLookupLock(bool isKept);
+
     // One attempt to do work in a transaction of its own or, nested, in a savepoint of the open
     // transaction. When the work or the commit fails, all of it is rolled back.
     bool RunAtomically(bool isNested, const std::function<bool()>& work);
@@ -102,6 +111,8 @@ class SqliteConnection {
     StatementWatch watch_;
     BusyWait wait_;
     StatementCache cache_;
+    TableLookup lookup_;
+    bool isLookupLockKept_ = false;
     const SqliteTransaction* owner_ = nullptr;
 };
 

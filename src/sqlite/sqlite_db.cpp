@@ -117,9 +117,9 @@ bool SqliteDB::IsTableExisted(const std::string& table)
 {
     // Only the row counts: the table exists if it was read, even if the lookup failed afterwards.
     bool isFound = false;
-    SelectRows(*connection_,
-               "SELECT 1 FROM sqlite_master WHERE type='table' AND name='" + table + "';",
-               [&](const RowReader&) { return isFound = true; });
+    const Attempts attempts =
+        connection_->Retry([&] { return connection_->LookUp(table, isFound); });
+    if (attempts.failures > 0) LogAttempts("SelectByCommand", TableLookup::Query(table), attempts);
     return isFound;
 }
 

@@ -2,11 +2,13 @@
 #define DR_LOG_FILE "sqlite_db.cpp"
 
 #include <algorithm>
+#include <typeinfo>
 
 #include <orvadrcore/errors.h>
 #include <orvadrcore/sqlite_db.h>
 
 #include "base/log.h"
+#include "base/scope_guard.h"
 #include "sqlite/sqlite_batch.h"
 #include "sqlite/sqlite_connection.h"
 
@@ -69,6 +71,10 @@ template <class Select>
 bool RunSelect(const Operation& operation, SqliteDB& db, const SelectCommand& command,
                Select select)
 {
+    SqliteConnection& connection = db.Connection();
+    // Not for a class that the caller has derived: its GetCommand() may do anything.
+    connection.KeepLookupLock(typeid(command) == typeid(SelectCommand));
+    const ScopeGuard giveBack([&] { connection.KeepLookupLock(false); });
     if (!Prepare(operation, db, command)) return false;
     const std::string statement = command.GetCommand();
     if (!select(statement)) {

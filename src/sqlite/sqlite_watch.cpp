@@ -25,12 +25,21 @@ bool IsSchemaTable(const char* name)
                        [name](const char* schema) { return sqlite3_stricmp(name, schema) == 0; });
 }
 
+// The first lets a program write into the schema tables, and the second sets the number by which
+// SQLite notices a changed schema.
+bool IsSchemaPragma(const char* name)
+{
+    return sqlite3_stricmp(name, "writable_schema") == 0 ||
+           sqlite3_stricmp(name, "schema_version") == 0;
+}
+
 }  // namespace
 
 void StatementWatch::Start(sqlite3* handle)
 {
     handle_ = handle;
     isBusyTimeoutSet_ = false;
+    isSchemaUnguarded_ = false;
     allRows_ = 0;
     sqlite3_set_authorizer(handle_, Note, this);
 }
@@ -48,6 +57,7 @@ int StatementWatch::Note(void* watch, int action, const char* name, const char* 
     auto& self = *static_cast<StatementWatch*>(watch);
     const bool setsPragma = action == SQLITE_PRAGMA && value != nullptr;
     if (setsPragma && sqlite3_stricmp(name, "busy_timeout") == 0) self.isBusyTimeoutSet_ = true;
+    if (setsPragma && IsSchemaPragma(name)) self.isSchemaUnguarded_ = true;
     const bool beginsOrEnds = action == SQLITE_TRANSACTION || action == SQLITE_SAVEPOINT;
     // Outside of a transaction such a statement can only begin one.
     if (beginsOrEnds && sqlite3_get_autocommit(self.handle_) != 0) ++self.transactions_;

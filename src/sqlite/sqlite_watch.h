@@ -31,6 +31,10 @@ class StatementWatch {
     // Whether a statement has set the busy timeout of this connection.
     bool IsBusyTimeoutSet() const { return isBusyTimeoutSet_; }
 
+    // Whether a statement has set a pragma with which the schema can be changed so that SQLite does
+    // not notice.
+    bool IsSchemaUnguarded() const { return isSchemaUnguarded_; }
+
     struct Changes {
         // Statements that insert, update or delete rows. A CREATE TABLE is none.
         std::uint64_t statements;
@@ -57,6 +61,7 @@ class StatementWatch {
     sqlite3* handle_ = nullptr;
     std::uint64_t transactions_ = 0;
     bool isBusyTimeoutSet_ = false;
+    bool isSchemaUnguarded_ = false;
     bool isForbidden_ = false;
     Changes changes_{};
     std::int64_t allRows_ = 0;  // CountAllRows() when changes_ was counted
