@@ -4,6 +4,7 @@
 #include <cmath>
 
 #include "base/json_helpers.h"
+#include "support/fixtures/jsoncpp_text.h"
 #include "support/fuzz.h"
 
 namespace {
@@ -42,6 +43,8 @@ void Fuzz(const std::string& input)
     }
     const std::string text = OrvaDRCore::toString(value);
     Expect(std::none_of(text.begin(), text.end(), IsControl), "a document is one line");
+
+    Expect(text == JsoncppText(value), "a document is printed as by jsoncpp");
 
     Json::Value back;
     Expect(OrvaDRCore::fromString(back, text), "what was printed is read");

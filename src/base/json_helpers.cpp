@@ -122,6 +122,128 @@ bool Parse(Json::Value& value, const std::string& text)
     return true;
 }
 
+// What jsoncpp's own writer makes of a value.
+std::string WriteByStream(const Json::Value& value)
+{
+    const std::unique_ptr<Json::StreamWriter> writer(
+        SharedBuilder<Json::StreamWriterBuilder>().newStreamWriter());
+    std::ostringstream text;
+    text.exceptions(std::ios::badbit);  // or bad_alloc truncates the text
+    writer->write(value, &text);
+    return text.str();
+}
+
+bool NeedsEscape(char byte)
+{
+    return static_cast<unsigned char>(byte) < ' ' || byte == '"' || byte == '\\';
+}
+
+// The escape of two characters, for the bytes that have one; otherwise null.
+const char* ShortEscape(char byte)
+{
+    switch (byte) {
+        case '"': return "\\\"";
+        case '\\': return "\\\\";
+        case '\b': return "\\b";
+        case '\f': return "\\f";
+        case '\n': return "\\n";
+        case '\r': return "\\r";
+        case '\t': return "\\t";
+        default: return nullptr;
+    }
+}
+
+// Appends a text in quotes.
+void AppendText(std::string& json, const char* begin, const char* end)
+{
+    const std::size_t start = json.size();
+    json += '"';
+    for (const char* at = begin;; ++at) {
+        const char* const stop = std::find_if(at, end, NeedsEscape);
+        json.append(at, static_cast<std::size_t>(stop - at));
+        if (stop == end) break;
+        const char* const escape = ShortEscape(*stop);
+        if (escape == nullptr) {
+            // How other control characters are escaped depends on jsoncpp's version.
+            json.replace(start, std::string::npos, WriteByStream(Json::Value(begin, end)));
+            return;
+        }
+        json += escape;
+        at = stop;
+    }
+    json += '"';
+}
+
+// Appends a value that is neither an array nor an object. A function of its own, because its texts
+// would take stack on every level of a deep document.
+[[gnu::noinline]] void AppendScalar(std::string& json, const Json::Value& value)
+{
+    const char* begin = nullptr;
+    const char* end = nullptr;
+    switch (value.type()) {
+        case Json::intValue: json += Json::valueToString(value.asLargestInt()); break;
+        case Json::uintValue: json += Json::valueToString(value.asLargestUInt()); break;
+        case Json::realValue: json += Json::valueToString(value.asDouble()); break;
+        case Json::booleanValue: json += value.asBool() ? "true" : "false"; break;
+        case Json::stringValue:
+            // Without a text, which a null StaticString gives, jsoncpp writes nothing.
+            if (value.getString(&begin, &end)) AppendText(json, begin, end);
+            break;
+        default: json += "null";
+    }
+}
+
+void AppendJson(std::string& json, const Json::Value& value);
+
+// Ends an array or an object, each element of which ends with a comma.
+void Close(std::string& json, char bracket)
+{
+    if (json.back() == ',') {
+        json.back() = bracket;
+    } else {
+        json += bracket;
+    }
+}
+
+void AppendArray(std::string& json, const Json::Value& array)
+{
+    json += '[';
+    Json::ArrayIndex index = 0;
+    const auto end = array.end();
+    for (auto element = array.begin(); element != end; ++element, ++index) {
+        for (; index < element.index(); ++index) json += "null,";  // elements that were never set
+        AppendJson(json, *element);
+        json += ',';
+    }
+    Close(json, ']');
+}
+
+void AppendObject(std::string& json, const Json::Value& object)
+{
+    json += '{';
+    const auto end = object.end();
+    for (auto member = object.begin(); member != end; ++member) {
+        const char* nameEnd = nullptr;
+        const char* const name = member.memberName(&nameEnd);
+        AppendText(json, name, nameEnd);
+        json += ':';
+        AppendJson(json, *member);
+        json += ',';
+    }
+    Close(json, '}');
+}
+
+// Appends what jsoncpp's writer would write, without its streams, copies of names and copies of
+// elements.
+void AppendJson(std::string& json, const Json::Value& value)
+{
+    switch (value.type()) {
+        case Json::arrayValue: return AppendArray(json, value);
+        case Json::objectValue: return AppendObject(json, value);
+        default: return AppendScalar(json, value);
+    }
+}
+
 enum class Reals { Any, Finite };
 
 // Whether a value has this many levels at most, and only real numbers of this kind.
@@ -171,12 +293,9 @@ bool fromString(Json::Value& value, const std::string& text)
 
 std::string toString(const Json::Value& value)
 {
-    const auto& builder = SharedBuilder<Json::StreamWriterBuilder>();
-    const std::unique_ptr<Json::StreamWriter> writer(builder.newStreamWriter());
-    std::ostringstream text;
-    text.exceptions(std::ios::badbit);  // or bad_alloc truncates the text
-    writer->write(value, &text);
-    return text.str();
+    std::string json;
+    AppendJson(json, value);
+    return json;
 }
 
 bool NestsAtMost(const Json::Value& value, int levels)

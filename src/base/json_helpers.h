@@ -28,7 +28,8 @@ Json::Value ToJsonText(std::string_view text);
 bool fromString(Json::Value& value, const std::string& text);
 
 // The document on one line, without blanks or a final newline. Bytes above 0x7f are not escaped, so
-// that every byte string survives toString() and fromString().
+// that every byte string survives toString() and fromString(). To the byte what jsoncpp's
+// StreamWriter writes without indentation and comments and with "emitUTF8".
 std::string toString(const Json::Value& value);
 
 // Whether a value has this many levels or fewer. Looks no deeper than that.
