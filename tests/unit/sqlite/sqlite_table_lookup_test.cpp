@@ -3,7 +3,10 @@
 
 #include <orvadrcore/sqlite_db.h>
 
+#include <algorithm>
 #include <cstdio>
+#include <fstream>
+#include <utility>
 
 #include "sqlite/sqlite_shortcuts.h"
 #include "support/fixtures/sqlite_fixture.h"
@@ -280,6 +283,84 @@ TEST_F(SqliteTableLookupTest, ANewFileIsLookedAtAfterOpeningAgain)
     std::remove(path.c_str());
     ASSERT_TRUE(db.Open());
     ExpectExists(false);
+}
+
+TEST_F(SqliteTableLookupTest, CachedSelectsAreDroppedWhenTheSchemaHasChanged)
+{
+    // A stale one takes its lock before SQLite prepares it again, so it may fail in another way.
+    const std::string ids = "SELECT id FROM jobs";
+    const auto select = [&] {
+        SqliteValueList row;
+        prepared.clear();
+        EXPECT_TRUE(db.SelectByCommand(ids, row));
+        return std::count(prepared.begin(), prepared.end(), ids);
+    };
+    FindJobs();
+    CountFromHereOn();
+    EXPECT_EQ(select(), 1);
+    EXPECT_TRUE(db.IsTableExisted("jobs"));
+    EXPECT_EQ(select(), 0);
+    Run("CREATE TABLE others (id)");
+    EXPECT_TRUE(db.IsTableExisted("jobs"));
+    EXPECT_EQ(select(), 1);
+    EXPECT_EQ(select(), 0);
+}
+
+// ----------------------------------------------------------------------------------------- failures
+
+TEST_F(SqliteTableLookupTest, AFileThatIsOverwrittenFailsAsTheQueryFails)
+{
+    FindJobs();
+    std::ofstream(path) << std::string(8192, 'x');
+    const Failure noDatabase{LookFor("jobs"), SQLITE_NOTADB, NoDatabase};
+    for (int time = 0; time < 2; ++time) {
+        EXPECT_FALSE(db.IsTableExisted("jobs"));
+        ExpectErr(db, 404, TriesText(noDatabase));
+        ExpectLines({ManyRowsGaveUp(noDatabase)});
+    }
+}
+
+TEST_F(SqliteTableLookupTest, ADamagedSchemaFailsAsTheQueryFails)
+{
+    FindJobs();
+    // One text for all lookups, and one connection each, since an error may depend on earlier ones.
+    PlainDb other(path);
+    other.Run("PRAGMA writable_schema=ON");
+    other.Run("INSERT INTO sqlite_master VALUES ('table', 'bad', 'bad', 2, 'CREATE TABLE bad (')");
+    other.Run("PRAGMA schema_version=1000");
+    const Failure damaged{LookFor("jobs"), SQLITE_CORRUPT,
+                          "malformed database schema (bad) - incomplete input"};
+    for (const bool isShort : {true, false, true}) {
+        OrvaDRCore::ShortcutsInUse().lookups = isShort;
+        EXPECT_FALSE(db.IsTableExisted("jobs"));
+        ExpectErr(db, 404, TriesText(damaged));
+        ExpectLines({ManyRowsGaveUp(damaged)});
+    }
+}
+
+TEST_F(SqliteTableLookupTest, AFailedCheckIsAFailedAttemptOfTheQuery)
+{
+    Run("CREATE TABLE jobs (id)");
+    ASSERT_TRUE(retrying.Open());
+    // The first attempt cannot prepare the check, the second cannot run it.
+    bool isPrepared = false;
+    faults.prepare = [&](sqlite3* handle, const char* sql, sqlite3_stmt** statement) {
+        return std::exchange(isPrepared, true) ? RealPrepare(handle, sql, statement) : SQLITE_NOMEM;
+    };
+    bool isRun = false;
+    faults.step = [&](sqlite3_stmt* statement) {
+        if (!IsStatement(statement, SchemaCheck)) return RealStep(statement);
+        return std::exchange(isRun, true) ? RealStep(statement) : SQLITE_IOERR;
+    };
+    const std::string message = "not an error";  // SQLite itself has not failed
+    EXPECT_TRUE(retrying.IsTableExisted("jobs"));
+    ExpectErr(retrying, 0);
+    ExpectLines({Info("SelectByCommand",
+                      "After retry [2] times, success to select command, previous errs [" +
+                          TriesText({{LookFor("jobs"), SQLITE_NOMEM, message},
+                                     {LookFor("jobs"), SQLITE_IOERR, message}}) +
+                          "]")});
+    ExpectPauses(2);
 }
 
 // --------------------------------------------------------------------- changes that SQLite overlooks
