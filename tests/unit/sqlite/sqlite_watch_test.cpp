@@ -68,6 +68,22 @@ TEST_F(StatementWatchTest, SeesTheBusyTimeoutSetInEverySpelling)
     }
 }
 
+TEST_F(StatementWatchTest, SeesThePragmasThatHideChangesOfTheSchema)
+{
+    for (const char* text : {"PRAGMA writable_schema", "SELECT * FROM pragma_schema_version",
+                             "PRAGMA user_version=7", "CREATE TABLE jobs (id)"}) {
+        Run(text);
+        EXPECT_FALSE(watch.IsSchemaUnguarded()) << text;
+    }
+    for (const char* text : {"PRAGMA writable_schema=1", "pragma main.\"SCHEMA_version\"(5)",
+                             "SELECT 1; PRAGMA/**/[Writable_Schema] = RESET; BAD"}) {
+        db = OpenInMemory(watch);
+        EXPECT_FALSE(watch.IsSchemaUnguarded());
+        Run(text);
+        EXPECT_TRUE(watch.IsSchemaUnguarded()) << text;
+    }
+}
+
 TEST_F(StatementWatchTest, CountsStatementsThatChangeRowsAndTheirRows)
 {
     struct Row {
