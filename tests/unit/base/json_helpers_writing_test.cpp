@@ -76,7 +76,8 @@ class RandomValues {
     {
         std::string text;
         for (std::uint64_t length = Below(24); length > 0; --length) {
-            text += static_cast<char>(Below(3) > 0 ? Below(256) : "ab/\"\\\n\t\x7f"s[Below(8)]);
+            const bool isAny = Below(3) > 0;
+            text += isAny ? static_cast<char>(Below(256)) : "ab/\"\\\n\t\x7f"s[Below(8)];
         }
         return text;
     }
