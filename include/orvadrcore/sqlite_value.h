@@ -16,14 +16,14 @@
 #ifndef ORVADRCORE_SQLITE_VALUE_H
 #define ORVADRCORE_SQLITE_VALUE_H
 
+#include <atomic>
 #include <cstddef>
 #include <cstdint>
-#include <map>
 #include <string>
 #include <type_traits>
+#include <utility>
+#include <variant>
 #include <vector>
-
-#include <json/value.h>
 
 #include <orvadrcore/export.h>
 
@@ -101,7 +101,8 @@ class ORVADRCORE_API SqliteValue {
   private:
     friend struct SqliteInternals;
 
-    // What the payload is. A plain text is one that is not escaped.
+    // What the payload is: an integer (0 or 1 for a boolean), a real, or the bytes of a text or
+    // blob. A plain text is one that is not escaped.
     enum class Kind : unsigned char {
         Nothing,
         Boolean,
@@ -113,12 +114,14 @@ class ORVADRCORE_API SqliteValue {
         Null
     };
 
-    ORVADRCORE_LOCAL SqliteValue(Kind kind, Json::Value&& payload);
+    using Payload = std::variant<std::int64_t, double, std::string>;
+
+    ORVADRCORE_LOCAL SqliteValue(Kind kind, Payload&& payload) noexcept;
     ORVADRCORE_LOCAL SqliteValue(Kind kind, const char* bytes, std::size_t length);
 
     bool valid_ = false;
     Kind kind_ = Kind::Nothing;
-    Json::Value value_;
+    Payload payload_;
 };
 
 /// \cond SPECIALISATIONS
@@ -141,7 +144,7 @@ ORVADRCORE_API bool SqliteValue::GetValue<bool>(bool& out) const;
 class ORVADRCORE_API SqliteValueList {
   public:
     SqliteValueList() = default;
-    SqliteValueList(const SqliteValueList&) = default;
+    SqliteValueList(const SqliteValueList& other);
     SqliteValueList(SqliteValueList&& other) noexcept;  ///< `other` is empty then.
     virtual ~SqliteValueList();
 
@@ -166,19 +169,24 @@ class ORVADRCORE_API SqliteValueList {
     template <class T>
     bool GetValue(const std::string& field, T& out) const = delete;
 
-    /// All fields, valid as long as the record.
-    const std::map<std::string, SqliteValue>& GetValues() const { return values_; }
+    /// All fields in their order, valid until the record changes. HasField() and GetValue() find one
+    /// by its name.
+    const std::vector<std::pair<std::string, SqliteValue>>& GetValues() const;
 
     std::string ToStr() const;  ///< For people: "id:3, name:'abc'".
 
   private:
     friend struct SqliteInternals;
+    using Fields = std::vector<std::pair<std::string, SqliteValue>>;
 
     template <class T>
     ORVADRCORE_LOCAL bool ReadField(const std::string& field, T& out) const;
+    ORVADRCORE_LOCAL const SqliteValue* Find(const std::string& field) const;
+    ORVADRCORE_LOCAL void Sort() const;
 
     SqliteValue invalidValue_;  // what GetValue() refers to when a field is missing; never changes
-    std::map<std::string, SqliteValue> values_;
+    mutable Fields values_;
+    mutable std::atomic<std::size_t> unsorted_{0};  // how many fields at the end are not sorted yet
 };
 
 /// \cond SPECIALISATIONS

@@ -1,6 +1,6 @@
 #include "sqlite/sqlite_bind.h"
 
-#include <string_view>
+#include <string>
 
 #include "sqlite/sqlite_internals.h"
 
@@ -8,20 +8,21 @@ namespace OrvaDRCore {
 
 int BindValue(sqlite3_stmt* statement, int place, const SqliteValue& value)
 {
-    using Kind = SqliteInternals::Kind;
-    const Json::Value& payload = SqliteInternals::Payload(value);
-    switch (SqliteInternals::KindOf(value)) {
+    using Internals = SqliteInternals;
+    using Kind = Internals::Kind;
+    switch (Internals::KindOf(value)) {
         case Kind::Boolean:
-        case Kind::Integer: return sqlite3_bind_int64(statement, place, payload.asInt64());
-        case Kind::Real: return sqlite3_bind_double(statement, place, payload.asDouble());
+        case Kind::Integer:
+            return sqlite3_bind_int64(statement, place, Internals::IntegerOf(value));
+        case Kind::Real: return sqlite3_bind_double(statement, place, Internals::RealOf(value));
         case Kind::PlainText:
         case Kind::Text: {
-            const std::string_view text = BytesOf(payload);
+            const std::string& text = Internals::BytesOf(value);
             return sqlite3_bind_text64(statement, place, text.data(), text.size(), SQLITE_STATIC,
                                        SQLITE_UTF8);
         }
         case Kind::Blob: {
-            const std::string_view bytes = BytesOf(payload);
+            const std::string& bytes = Internals::BytesOf(value);
             return sqlite3_bind_blob64(statement, place, bytes.data(), bytes.size(), SQLITE_STATIC);
         }
         default: return sqlite3_bind_null(statement, place);

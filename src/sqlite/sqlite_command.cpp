@@ -18,13 +18,12 @@ constexpr std::size_t UsualLength = 240;
 template <class T>
 bool AddFieldValue(SqliteValueList& record, const std::string& field, const T& value)
 {
-    if (field.empty() || !MakesValue(value)) {
-        DR_LOG(Err, "Bad Field [%s] /value[%s]", field.c_str(),
-               SqliteValue(value).ToFormatedValue().c_str());
+    SqliteValue built(value);
+    if (field.empty() || !built.IsValid()) {
+        DR_LOG(Err, "Bad Field [%s] /value[%s]", field.c_str(), built.ToFormatedValue().c_str());
         return false;
     }
-    SqliteInternals::Add(record, field, value);
-    return true;
+    return record.AddValue(field, std::move(built));
 }
 
 // Writes to the stream's buffer, which throws when memory runs out. The stream's operators would

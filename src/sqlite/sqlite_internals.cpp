@@ -4,13 +4,14 @@
 #include <charconv>
 #include <cmath>
 
+#include "base/json_helpers.h"
 #include "sqlite/sqlite_real.h"
 
 namespace OrvaDRCore {
 
 namespace {
 
-void AppendNumber(std::string& text, Json::LargestInt number)
+void AppendNumber(std::string& text, std::int64_t number)
 {
     std::array<char, 24> digits{};  // 64 bits need 20 digits and a sign at most
     char* const begin = digits.data();
@@ -72,29 +73,38 @@ void AppendEscaped(std::string& text, std::string_view unescaped)
 bool IsStoredAsNull(const SqliteValue& value)
 {
     const bool isReal = SqliteInternals::KindOf(value) == SqliteInternals::Kind::Real;
-    return value.IsNull() || (isReal && std::isnan(SqliteInternals::Payload(value).asDouble()));
+    return value.IsNull() || (isReal && std::isnan(SqliteInternals::RealOf(value)));
 }
 
 void AppendLiteral(std::string& text, const SqliteValue& value)
 {
-    using Kind = SqliteInternals::Kind;
-    const Json::Value& payload = SqliteInternals::Payload(value);
-    switch (SqliteInternals::KindOf(value)) {
+    using Internals = SqliteInternals;
+    using Kind = Internals::Kind;
+    switch (Internals::KindOf(value)) {
         case Kind::Nothing: return;
-        case Kind::Boolean: text += payload.asBool() ? '1' : '0'; return;
-        case Kind::Integer: return AppendNumber(text, payload.asLargestInt());
-        case Kind::Real: return AppendReal(text, payload.asDouble());
-        case Kind::PlainText: return AppendPlain(text, BytesOf(payload));
-        case Kind::Text: return AppendText(text, BytesOf(payload));
-        case Kind::Blob: return AppendHexadecimal(text, BytesOf(payload));
+        case Kind::Boolean:
+        case Kind::Integer: return AppendNumber(text, Internals::IntegerOf(value));
+        case Kind::Real: return AppendReal(text, Internals::RealOf(value));
+        case Kind::PlainText: return AppendPlain(text, Internals::BytesOf(value));
+        case Kind::Text: return AppendText(text, Internals::BytesOf(value));
+        case Kind::Blob: return AppendHexadecimal(text, Internals::BytesOf(value));
         case Kind::Null: text += "NULL"; return;
     }
 }
 
 std::string Shown(const SqliteValue& value)
 {
-    const bool isBlob = SqliteInternals::KindOf(value) == SqliteInternals::Kind::Blob;
-    return isBlob ? value.ToFormatedValue() : toString(SqliteInternals::Payload(value));
+    using Internals = SqliteInternals;
+    using Kind = Internals::Kind;
+    switch (Internals::KindOf(value)) {
+        case Kind::Boolean: return Internals::IntegerOf(value) != 0 ? "true" : "false";
+        case Kind::Real: return toString(Internals::RealOf(value));
+        case Kind::PlainText:
+        case Kind::Text: return toString(ToJsonText(Internals::BytesOf(value)));
+        case Kind::Integer:
+        case Kind::Blob: return value.ToFormatedValue();
+        default: return "null";
+    }
 }
 
 std::string JoinPairs(const SqliteValueList& record, const char* between, const char* separator)

@@ -2,71 +2,55 @@
 #ifndef ORVADRCORE_SRC_SQLITE_SQLITE_INTERNALS_H
 #define ORVADRCORE_SRC_SQLITE_SQLITE_INTERNALS_H
 
-#include <cstring>
+#include <cstdint>
 #include <string>
 #include <string_view>
-
-#include <json/value.h>
+#include <utility>
 
 #include <orvadrcore/sqlite_value.h>
 
-#include "base/json_helpers.h"
-
 namespace OrvaDRCore {
-
-// Whether a SqliteValue built from this is valid.
-inline bool MakesValue(const std::string& text)
-{
-    return FitsJsonText(text.size());
-}
-
-inline bool MakesValue(const char* text)
-{
-    return text != nullptr && FitsJsonText(std::strlen(text));
-}
-
-inline bool MakesValue(const SqliteValue& value)
-{
-    return value.IsValid();
-}
-
-template <class Number>
-bool MakesValue(Number /*number*/)
-{
-    return true;
-}
 
 // Access for the library's own sources.
 struct SqliteInternals {
     using Kind = SqliteValue::Kind;
 
-    // Null, a number, a boolean, or a text, which holds the bytes of a blob, too.
-    static const Json::Value& Payload(const SqliteValue& value) { return value.value_; }
     static Kind KindOf(const SqliteValue& value) { return value.kind_; }
     static bool IsValid(const SqliteValue& value)  // as the public one, but inline
     {
         return value.valid_ && value.kind_ != Kind::Nothing;
     }
 
-    // Adds a field like AddValue(), but builds its value in place, which takes half the time.
-    template <class T>
-    static void Add(SqliteValueList& record, const std::string& field, const T& value)
+    // What a value of the kind holds: an integer or a boolean, a real, a text or a blob.
+    static std::int64_t IntegerOf(const SqliteValue& value)
     {
-        if (field.empty() || !MakesValue(value) ||
-            !record.values_.try_emplace(field, value).second) {
-            record.AddValue(field, SqliteValue(value));
-        }
+        return std::get<std::int64_t>(value.payload_);
+    }
+    static double RealOf(const SqliteValue& value) { return std::get<double>(value.payload_); }
+    static const std::string& BytesOf(const SqliteValue& value)
+    {
+        return std::get<std::string>(value.payload_);
+    }
+
+    // Moves what a value holds. Like an assignment, it does not take over whether it is valid.
+    static void Move(SqliteValue& to, SqliteValue& from) noexcept
+    {
+        to.payload_ = std::move(from.payload_);
+        to.kind_ = std::exchange(from.kind_, Kind::Nothing);
+    }
+
+    // Makes room for the fields of a record.
+    static void Reserve(SqliteValueList& record, std::size_t fields)
+    {
+        record.values_.reserve(fields);
+    }
+
+    // Adds a field like AddValue(), but its name must come after those that the record has.
+    static void Append(SqliteValueList& record, const std::string& field, SqliteValue&& value)
+    {
+        record.values_.emplace_back(field, std::move(value));
     }
 };
-
-// The bytes of a payload that is a text.
-inline std::string_view BytesOf(const Json::Value& payload)
-{
-    const char* begin = nullptr;
-    const char* end = nullptr;
-    payload.getString(&begin, &end);
-    return {begin, static_cast<std::size_t>(end - begin)};
-}
 
 // How many bytes the literal of a blob has.
 constexpr std::size_t LengthOfBlobLiteral(std::size_t length)

@@ -29,13 +29,14 @@ class RowReader {
     using LeftOut = void (*)(const std::string& name, int type);
 
     // The integers, as 32 bits, and the texts, up to their first zero byte. Of several columns with
-    // the same name the last one counts.
+    // the same name the last one that is not left out counts.
     SqliteValueList Read(LeftOut leftOut) const;
 
     struct Column {
         std::string name;
         int number;
         Column* follower = nullptr;  // the one that was looked up after it the last time
+        bool isRepeated = false;     // the one before it in the order of names has the same name
     };
 
     const std::vector<Column>& GetColumns() const { return columns_; }
@@ -62,12 +63,23 @@ class RowReader {
     bool IsOutOfMemory() const { return isOutOfMemory_; }
 
   private:
+    // A column of this row, as the record has it.
+    struct Field {
+        bool isThere = false;
+        int number = 0;
+        const char* text = nullptr;  // of a column that is a text
+
+        SqliteValue ToValue() const;
+    };
+
+    Field ReadField(const Column& column, LeftOut leftOut) const;
     const Column* Search(const std::string& name);
 
     sqlite3_stmt* statement_;
     std::vector<Column> columns_;
-    std::vector<Column*> sorted_;  // by name; made by the first search
-    Column* last_ = nullptr;       // that was looked up
+    std::vector<Column*> sorted_;        // by name, those with the same name by number
+    mutable std::vector<Field> fields_;  // of this row by the number of the column, for Read()
+    Column* last_ = nullptr;             // that was looked up
     bool isOutOfMemory_ = false;
 };
 

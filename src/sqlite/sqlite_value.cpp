@@ -1,19 +1,92 @@
 #include <orvadrcore/sqlite_value.h>
 
+#include <algorithm>
 #include <cstring>
-#include <utility>
+#include <limits>
+#include <thread>
 
 #include "base/json_helpers.h"
 #include "base/log.h"
+#include "base/scope_guard.h"
 #include "sqlite/sqlite_internals.h"
 
 namespace OrvaDRCore {
 
-SqliteValue::SqliteValue(int number) : SqliteValue(Kind::Integer, number) {}
+namespace {
 
-SqliteValue::SqliteValue(unsigned int number) : SqliteValue(Kind::Integer, number) {}
+// AddValue() moves at most this many fields to make room for one.
+constexpr std::size_t MostMoved = 64;
 
-SqliteValue::SqliteValue(bool truth) : SqliteValue(Kind::Boolean, truth) {}
+// While a thread sorts the fields that AddValue() has left unsorted.
+constexpr std::size_t BeingSorted = std::numeric_limits<std::size_t>::max();
+
+// Reads an integer that fits T.
+template <class T>
+bool ReadInteger(const SqliteValue& value, T& out)
+{
+    if (SqliteInternals::KindOf(value) != SqliteInternals::Kind::Integer) return false;
+    const std::int64_t number = SqliteInternals::IntegerOf(value);
+    using Limits = std::numeric_limits<T>;
+    if (number < Limits::min() || number > Limits::max()) return false;
+    out = static_cast<T>(number);
+    return true;
+}
+
+// The first field of a sorted range whose name is not less than this one.
+template <class Iterator>
+Iterator LowerBound(Iterator begin, Iterator end, const std::string& name)
+{
+    return std::lower_bound(begin, end, name, [](const auto& field, const auto& wanted) {
+        return field.first < wanted;
+    });
+}
+
+// Moves the last field before so many others.
+template <class Fields>
+void MoveLast(Fields& fields, std::size_t others)
+{
+    if (others == 0) return;
+    auto place = fields.end() - 1;
+    auto last = std::move(*place);
+    const auto move = [](auto& to, auto& from) {
+        to.first = std::move(from.first);
+        SqliteInternals::Move(to.second, from.second);
+    };
+    for (; others > 0; --others, --place) move(*place, *(place - 1));
+    move(*place, last);
+}
+
+// Sorts the last fields into the others, which are sorted. Of a field that was added twice, the
+// second value counts. Nothing has changed if memory runs out.
+template <class Fields>
+void SortInto(Fields& fields, std::size_t unsorted)
+{
+    using Field = typename Fields::value_type;
+    const auto isBefore = [](const Field* one, const Field* other) {
+        return one->first < other->first;
+    };
+    std::vector<Field*> order;
+    order.reserve(fields.size());
+    for (Field& field : fields) order.push_back(&field);
+    const auto begin = order.end() - static_cast<std::ptrdiff_t>(unsorted);
+    std::stable_sort(begin, order.end(), isBefore);
+    std::inplace_merge(order.begin(), begin, order.end(), isBefore);
+    Fields sorted;
+    sorted.reserve(fields.size());
+    for (Field* const field : order) {
+        if (!sorted.empty() && sorted.back().first == field->first) sorted.pop_back();
+        sorted.push_back(std::move(*field));
+    }
+    fields.swap(sorted);
+}
+
+}  // namespace
+
+SqliteValue::SqliteValue(int number) : SqliteValue(Integer(number)) {}
+
+SqliteValue::SqliteValue(unsigned int number) : SqliteValue(Integer(number)) {}
+
+SqliteValue::SqliteValue(bool truth) : SqliteValue(Kind::Boolean, std::int64_t{truth}) {}
 
 SqliteValue::SqliteValue(const std::string& text)
     : SqliteValue(Kind::PlainText, text.data(), text.size())
@@ -25,17 +98,17 @@ SqliteValue::SqliteValue(const char* text)
 {
 }
 
-SqliteValue::SqliteValue(Kind kind, Json::Value&& payload)
-    : valid_(true), kind_(kind), value_(std::move(payload))
+SqliteValue::SqliteValue(Kind kind, Payload&& payload) noexcept
+    : valid_(true), kind_(kind), payload_(std::move(payload))
 {
 }
 
 SqliteValue::SqliteValue(Kind kind, const char* bytes, std::size_t length)
-    : valid_(bytes != nullptr && FitsJsonText(length)),
-      kind_(valid_ ? kind : Kind::Nothing),
-      value_(valid_ ? Json::Value(bytes, bytes + length) : Json::Value())
+    : valid_(bytes != nullptr && FitsJsonText(length)), kind_(valid_ ? kind : Kind::Nothing)
 {
-    if (bytes != nullptr && !valid_) {
+    if (valid_) {
+        payload_.emplace<std::string>(bytes, length);
+    } else if (bytes != nullptr) {
         DR_LOG(Err, "text of [%zu] bytes is too long for a value", length);
     }
 }
@@ -52,12 +125,12 @@ SqliteValue SqliteValue::Text(const char* text)
 
 SqliteValue SqliteValue::Integer(std::int64_t number)
 {
-    return {Kind::Integer, Json::Value(static_cast<Json::Int64>(number))};
+    return {Kind::Integer, number};
 }
 
 SqliteValue SqliteValue::Real(double number)
 {
-    return {Kind::Real, Json::Value(number)};
+    return {Kind::Real, number};
 }
 
 // Refuses a blob whose literal could not be part of a statement, which has less than 2 GiB.
@@ -72,21 +145,21 @@ SqliteValue SqliteValue::Blob(const std::string& bytes)
 
 SqliteValue SqliteValue::Null()
 {
-    return {Kind::Null, Json::Value()};
+    return {Kind::Null, Payload()};
 }
 
 SqliteValue::SqliteValue(SqliteValue&& other) noexcept
     : valid_(other.valid_),
       kind_(std::exchange(other.kind_, Kind::Nothing)),
-      value_(std::move(other.value_))
+      payload_(std::move(other.payload_))
 {
 }
 
 // By contract `valid_` stays as it was: only construction makes a value valid.
 SqliteValue& SqliteValue::operator=(const SqliteValue& other)
 {
-    value_ = other.value_;
-    kind_ = other.kind_;
+    SqliteValue copy(other);
+    SqliteInternals::Move(*this, copy);
     return *this;
 }
 
@@ -104,46 +177,37 @@ bool SqliteValue::IsNull() const
 template <>
 bool SqliteValue::GetValue(std::string& out) const
 {
-    if (!value_.isString()) {
+    if (kind_ != Kind::PlainText && kind_ != Kind::Text && kind_ != Kind::Blob) {
         DR_LOG_AS("GetValue<std::basic_string<char> >", Warn, "[%s] is not string",
                   Shown(*this).c_str());
         return false;
     }
-    out = value_.asString();
+    out = SqliteInternals::BytesOf(*this);
     return true;
 }
 
 template <>
 bool SqliteValue::GetValue(unsigned int& out) const
 {
-    if (kind_ != Kind::Integer || !value_.isUInt()) {
-        DR_LOG_AS("GetValue<unsigned int>", Warn, "[%s] is not int", Shown(*this).c_str());
-        return false;
-    }
-    out = value_.asUInt();
-    return true;
+    if (ReadInteger(*this, out)) return true;
+    DR_LOG_AS("GetValue<unsigned int>", Warn, "[%s] is not int", Shown(*this).c_str());
+    return false;
 }
 
 template <>
 bool SqliteValue::GetValue(int& out) const
 {
-    if (kind_ != Kind::Integer || !value_.isInt()) {
-        DR_LOG_AS("GetValue<int>", Warn, "[%s] is not int", Shown(*this).c_str());
-        return false;
-    }
-    out = value_.asInt();
-    return true;
+    if (ReadInteger(*this, out)) return true;
+    DR_LOG_AS("GetValue<int>", Warn, "[%s] is not int", Shown(*this).c_str());
+    return false;
 }
 
 template <>
 bool SqliteValue::GetValue(std::int64_t& out) const
 {
-    if (kind_ != Kind::Integer) {
-        DR_LOG_AS("GetValue<long int>", Warn, "[%s] is not int", Shown(*this).c_str());
-        return false;
-    }
-    out = value_.asInt64();
-    return true;
+    if (ReadInteger(*this, out)) return true;
+    DR_LOG_AS("GetValue<long int>", Warn, "[%s] is not int", Shown(*this).c_str());
+    return false;
 }
 
 template <>
@@ -153,21 +217,21 @@ bool SqliteValue::GetValue(double& out) const
         DR_LOG_AS("GetValue<double>", Warn, "[%s] is not double", Shown(*this).c_str());
         return false;
     }
-    out = value_.asDouble();
+    out = kind_ == Kind::Real ? SqliteInternals::RealOf(*this)
+                              : static_cast<double>(SqliteInternals::IntegerOf(*this));
     return true;
 }
 
 template <>
 bool SqliteValue::GetValue(bool& out) const
 {
-    const bool isBit =
-        kind_ == Kind::Integer && value_.isInt() && (value_.asInt() == 0 || value_.asInt() == 1);
-    if (kind_ != Kind::Boolean && !isBit) {
-        DR_LOG_AS("GetValue<bool>", Warn, "[%s] is not bool", Shown(*this).c_str());
-        return false;
+    if (kind_ == Kind::Boolean) {
+        out = SqliteInternals::IntegerOf(*this) != 0;
+        return true;
     }
-    out = value_.asBool();
-    return true;
+    if (ReadInteger(*this, out)) return true;  // 0 or 1
+    DR_LOG_AS("GetValue<bool>", Warn, "[%s] is not bool", Shown(*this).c_str());
+    return false;
 }
 
 std::string SqliteValue::ToFormatedValue() const
@@ -185,8 +249,10 @@ std::string SqliteValue::EscapeText(const std::string& text)
     return escaped;
 }
 
+SqliteValueList::SqliteValueList(const SqliteValueList& other) : values_(other.GetValues()) {}
+
 SqliteValueList::SqliteValueList(SqliteValueList&& other) noexcept
-    : values_(std::move(other.values_))
+    : values_(std::move(other.values_)), unsorted_(other.unsorted_.exchange(0))
 {
 }
 
@@ -195,13 +261,14 @@ SqliteValueList::~SqliteValueList() = default;
 SqliteValueList& SqliteValueList::operator=(const SqliteValueList& other)
 {
     // Copies by construction, because assigning each value would lose `valid_`.
-    if (this != &other) values_ = std::map<std::string, SqliteValue>(other.values_);
+    if (this != &other) *this = SqliteValueList(other);
     return *this;
 }
 
 SqliteValueList& SqliteValueList::operator=(SqliteValueList&& other) noexcept
 {
     values_.swap(other.values_);
+    unsorted_ = other.unsorted_.exchange(unsorted_);
     return *this;
 }
 
@@ -210,20 +277,34 @@ bool SqliteValueList::AddValue(const std::string& field, const SqliteValue& valu
     return AddValue(field, SqliteValue(value));
 }
 
+// In a large record whose fields come in any order it would take long to make room for each one.
+// There they are appended, and sorted before the record is read or when most of it is unsorted.
 bool SqliteValueList::AddValue(const std::string& field, SqliteValue&& value)
 {
     if (field.empty() || !value.IsValid()) {
         DR_LOG(Err, "Bad Field[%s] or value [%s]", field.c_str(), value.ToFormatedValue().c_str());
         return false;
     }
-    const auto [entry, added] = values_.try_emplace(field, std::move(value));
-    if (!added) entry->second = value;  // try_emplace() has not moved from it
+    if (unsorted_ > values_.size() / 2) Sort();
+    const auto end = values_.end() - static_cast<std::ptrdiff_t>(unsorted_);
+    const auto place = LowerBound(values_.begin(), end, field);
+    if (place != end && place->first == field) {
+        SqliteInternals::Move(place->second, value);
+        return true;
+    }
+    const auto moved = static_cast<std::size_t>(end - place);
+    values_.emplace_back(field, std::move(value));
+    if (unsorted_ == 0 && moved <= MostMoved) {
+        MoveLast(values_, moved);
+    } else {
+        ++unsorted_;
+    }
     return true;
 }
 
 SqliteValueList& SqliteValueList::operator+=(const SqliteValueList& other)
 {
-    for (const auto& [field, value] : other.values_) AddValue(field, value);
+    for (const auto& [field, value] : other.GetValues()) AddValue(field, value);
     return *this;
 }
 
@@ -233,7 +314,14 @@ bool SqliteValueList::HasField(const std::string& field) const
         DR_LOG(Err, "Invalid field [%s]", field.c_str());
         return false;
     }
-    return values_.count(field) > 0;
+    return Find(field) != nullptr;
+}
+
+const SqliteValue* SqliteValueList::Find(const std::string& field) const
+{
+    const Fields& fields = GetValues();
+    const auto found = LowerBound(fields.begin(), fields.end(), field);
+    return found != fields.end() && found->first == field ? &found->second : nullptr;
 }
 
 const SqliteValue& SqliteValueList::GetValue(const std::string& field) const
@@ -242,12 +330,12 @@ const SqliteValue& SqliteValueList::GetValue(const std::string& field) const
         DR_LOG(Err, "Invalid field [%s]", field.c_str());
         return invalidValue_;
     }
-    const auto entry = values_.find(field);
-    if (entry == values_.end()) {
+    const SqliteValue* const value = Find(field);
+    if (value == nullptr) {
         DR_LOG(Warn, "Failed to find field [%s]", field.c_str());
         return invalidValue_;
     }
-    return entry->second;
+    return *value;
 }
 
 template <class T>
@@ -258,13 +346,13 @@ bool SqliteValueList::ReadField(const std::string& field, T& out) const
         DR_LOG_AS(Function, Err, "Invalid field [%s]", field.c_str());
         return false;
     }
-    const auto entry = values_.find(field);
-    if (entry == values_.end()) {
+    const SqliteValue* const value = Find(field);
+    if (value == nullptr) {
         // DEBUG, unlike the other GetValue(): callers use this one to test whether a field exists.
         DR_LOG_AS(Function, Debug, "field [%s] is not existed", field.c_str());
         return false;
     }
-    return entry->second.GetValue(out);
+    return value->GetValue(out);
 }
 
 template <>
@@ -301,6 +389,28 @@ template <>
 bool SqliteValueList::GetValue(const std::string& field, bool& out) const
 {
     return ReadField(field, out);
+}
+
+const std::vector<std::pair<std::string, SqliteValue>>& SqliteValueList::GetValues() const
+{
+    if (unsorted_.load(std::memory_order_acquire) != 0) Sort();
+    return values_;
+}
+
+// Threads may read the same record: one of them sorts it, the others wait.
+void SqliteValueList::Sort() const
+{
+    std::size_t unsorted = unsorted_.load(std::memory_order_acquire);
+    while (unsorted != 0) {
+        if (unsorted == BeingSorted) {
+            std::this_thread::yield();
+            unsorted = unsorted_.load(std::memory_order_acquire);
+        } else if (unsorted_.compare_exchange_weak(unsorted, BeingSorted)) {
+            const ScopeGuard store([&] { unsorted_.store(unsorted, std::memory_order_release); });
+            SortInto(values_, unsorted);
+            unsorted = 0;
+        }
+    }
 }
 
 std::string SqliteValueList::ToStr() const

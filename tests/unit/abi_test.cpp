@@ -132,9 +132,10 @@ constexpr std::size_t BehindCommand = sizeof(SqliteCommand);
 TEST(MemberTest, ValuesAndRecordsKeepTheirOrder)
 {
     ExpectInOrder(0, {offsetof(SqliteValue, valid_), offsetof(SqliteValue, kind_),
-                      offsetof(SqliteValue, value_)});
+                      offsetof(SqliteValue, payload_)});
     ExpectInOrder(BehindTable,
-                  {offsetof(SqliteValueList, invalidValue_), offsetof(SqliteValueList, values_)});
+                  {offsetof(SqliteValueList, invalidValue_), offsetof(SqliteValueList, values_),
+                   offsetof(SqliteValueList, unsorted_)});
     EXPECT_EQ(sizeof(SqliteRecord), BehindTable);
 }
 

@@ -21,12 +21,8 @@ constexpr const char* NullText = nullptr;
 
 const string ZeroByte("a\0'b", 4);
 
-// The kinds cost nothing: they are in the gap that alignment leaves.
-struct FlagAndPayload {
-    bool flag;
-    Json::Value payload;
-};
-static_assert(sizeof(SqliteValue) == sizeof(FlagAndPayload));
+// A value is no larger than a text, what tells a text from a number, and what tells its kind.
+static_assert(sizeof(SqliteValue) <= sizeof(string) + 2 * sizeof(std::int64_t));
 
 class SqliteValueKindsTest : public LoggedTest {
   protected:

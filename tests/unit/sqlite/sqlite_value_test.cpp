@@ -474,7 +474,7 @@ TEST_F(SqliteValueListTest, GetValueReturnsAReference)
 {
     SqliteValueList list = List({{"a", 1}});
     const SqliteValue& value = list.GetValue("a");
-    EXPECT_EQ(&value, &list.GetValues().at("a"));
+    EXPECT_EQ(&value, &list.GetValues().front().second);
     EXPECT_TRUE(list.AddValue("a", 2));
     EXPECT_EQ(value.ToFormatedValue(), "2");
 }
