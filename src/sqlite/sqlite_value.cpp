@@ -15,7 +15,10 @@ namespace OrvaDRCore {
 namespace {
 
 // AddValue() moves at most this many fields to make room for one.
-constexpr std::size_t MostMoved = 64;
+constexpr std::size_t MostMoved = 32;
+
+// Room that the first field makes, so that small records are not reallocated as they grow.
+constexpr std::size_t UsualFields = 4;
 
 // While a thread sorts the fields that AddValue() has left unsorted.
 constexpr std::size_t BeingSorted = std::numeric_limits<std::size_t>::max();
@@ -293,6 +296,7 @@ bool SqliteValueList::AddValue(const std::string& field, SqliteValue&& value)
         return true;
     }
     const auto moved = static_cast<std::size_t>(end - place);
+    if (values_.empty()) values_.reserve(UsualFields);
     values_.emplace_back(field, std::move(value));
     if (unsorted_ == 0 && moved <= MostMoved) {
         MoveLast(values_, moved);

@@ -165,6 +165,69 @@ TEST(EnvelopeFaults, Records)
     });
 }
 
+namespace {
+
+// Fields in an order in which most of them are sorted later.
+SqliteValueList MakeRecord(int fields)
+{
+    SqliteValueList record;
+    for (int number = 500; number > 500 - fields; --number) {
+        record.AddValue("a field with a number, which is " + std::to_string(number), number);
+    }
+    return record;
+}
+
+}  // namespace
+
+// With room for another field, without, and with so many unsorted fields that they are sorted first.
+TEST(EnvelopeFaults, AFieldIsAddedOrTheRecordIsTheOldOne)
+{
+    const std::string text = "a value that is long enough";
+    EveryCallFails("SqliteValueList::AddValue", [&] {
+        for (const int fields : {5, 8, 64, 67}) {
+            for (const char* field : {"a field in front of all others", "the field after them"}) {
+                SqliteValueList record = MakeRecord(fields);
+                SqliteValue value(text);
+                const Outcome outcome =
+                    WithFault([&] { return record.AddValue(field, std::move(value)); });
+                EXPECT_EQ(record.HasField(field), outcome.succeeded);
+                // NOLINTNEXTLINE(bugprone-use-after-move): a failure does not take the value
+                EXPECT_EQ(value.IsValid(), !outcome.succeeded);
+                EXPECT_TRUE(record.AddValue(field, text));
+                SqliteValueList expected = MakeRecord(fields);
+                expected.AddValue(field, text);
+                EXPECT_EQ(record.ToStr(), expected.ToStr());
+            }
+        }
+    });
+}
+
+TEST(EnvelopeFaults, ARecordIsSortedOrItsFieldsAreKept)
+{
+    const std::string sorted = MakeRecord(200).ToStr();
+    EveryCallFails("SqliteValueList::GetValues", [&] {
+        const SqliteValueList record = MakeRecord(200);
+        const Outcome outcome = WithFault([&] { return record.GetValues().size() == 200; });
+        EXPECT_TRUE(outcome.succeeded || outcome.threw);
+        EXPECT_EQ(record.ToStr(), sorted);
+    });
+}
+
+TEST(EnvelopeFaults, RecordsAreAssignedAsAWhole)
+{
+    EveryCallFails("SqliteValueList::operator=", [] {
+        const SqliteValueList other = MakeRecord(200);
+        SqliteValueList record;
+        record.AddValue("old", "a value that is long enough");
+        const Outcome outcome = WithFault([&] {
+            record = other;
+            return true;
+        });
+        EXPECT_EQ(record.HasField("old"), !outcome.succeeded);
+        EXPECT_EQ(record.GetValues().size(), outcome.succeeded ? 200U : 1U);
+    });
+}
+
 TEST(EnvelopeFaults, ValuesOfEveryKind)
 {
     EveryCallFails("SqliteValue::Text", [] {
