@@ -113,13 +113,19 @@ void Check(const std::string& path, const std::string& text)
     Expect(pairs == Model<Value>(text), "the pairs are those of the lines");
 }
 
+void CheckAllTypes(const MemoryFile& file, const std::string& text)
+{
+    file.Write(text);
+    Check<std::string>(file.Path(), text);
+    Check<int>(file.Path(), text);
+    Check<double>(file.Path(), text);
+}
+
 }  // namespace
 
 void Fuzz(const std::string& input)
 {
     static const MemoryFile file;
-    file.Write(input);
-    Check<std::string>(file.Path(), input);
-    Check<int>(file.Path(), input);
-    Check<double>(file.Path(), input);
+    CheckAllTypes(file, input);
+    CheckAllTypes(file, input + "\nlarge=" + std::string(10'000, ' '));  // its lines are sorted
 }

@@ -38,10 +38,17 @@ Extraction::Extraction()
 
 void Extraction::Read(std::string_view text, std::string& word) const
 {
+    std::string_view read;
+    Read(text, read);
+    if (!read.empty()) word = read;
+}
+
+void Extraction::Read(std::string_view text, std::string_view& word) const
+{
     text = SkipBlanks(text);
     if (text.empty()) return;
     const char* end = kinds_.scan_is(std::ctype_base::space, text.begin(), text.end());
-    word.assign(text.data(), static_cast<std::size_t>(end - text.data()));
+    word = text.substr(0, static_cast<std::size_t>(end - text.data()));
 }
 
 void Extraction::Read(std::string_view text, int& number)

@@ -18,6 +18,7 @@ class Extraction {
     Extraction();
 
     void Read(std::string_view text, std::string& word) const;
+    void Read(std::string_view text, std::string_view& word) const;  // a part of `text`
     void Read(std::string_view text, int& number);
     void Read(std::string_view text, double& number);
 

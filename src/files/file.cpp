@@ -1,16 +1,20 @@
 #include <orvadrcore/file.h>
 
+#include <endian.h>
 #include <orvacore/orvacore.h>
 #include <sys/stat.h>
 
 #include <algorithm>
 #include <array>
 #include <cerrno>
+#include <cstdint>
 #include <cstdio>
 #include <iterator>
 #include <memory>
 #include <string_view>
+#include <type_traits>
 #include <utility>
+#include <vector>
 
 #include "base/extraction.h"
 #include "base/file_io.h"
@@ -28,6 +32,8 @@ constexpr std::size_t ChunkSize = 1024;
 constexpr mode_t NewFileMode = 0666;  // less the umask
 
 constexpr char Separator = '=';
+
+constexpr std::size_t LargeFile = 8192;  // bytes; sorting the lines of a smaller one takes longer
 
 // Removes the first line from the text.
 std::string_view TakeLine(std::string_view& text)
@@ -52,10 +58,8 @@ std::string ReadLines(const FileDescriptor& file)
     return text;
 }
 
-// Reads key and value out of a line, each as File::toType does.
-template <class Value>
-bool parseLineKeyValue(std::string_view line, Extraction& extraction, std::string& key,
-                       Value& value)
+// Splits a line at the separator. Neither side is empty then.
+bool parseLineKeyValue(std::string_view line, std::string_view& key, std::string_view& value)
 {
     if (line.empty()) {
         DR_LOG(Warn, "Bad Parameter.");
@@ -67,13 +71,52 @@ bool parseLineKeyValue(std::string_view line, Extraction& extraction, std::strin
                std::string(line).c_str());
         return false;
     }
-    const std::string_view left = line.substr(0, at);
-    const std::string_view right = line.substr(at + 1);
-    if (left.empty() || right.empty()) return false;
-    extraction.Read(left, key);
-    extraction.Read(right, value);
-    return true;
+    key = line.substr(0, at);
+    value = line.substr(at + 1);
+    return !key.empty() && !value.empty();
 }
+
+// Calls `take` with both sides of each line that is a pair.
+template <class Take>
+void ForEachPair(std::string_view text, const std::string& path, Take take)
+{
+    constexpr const char* Function = "Read";
+    while (!text.empty()) {
+        const std::string_view line = TakeLine(text);
+        std::string_view key;
+        std::string_view value;
+        if (parseLineKeyValue(line, key, value)) {
+            take(key, value);
+        } else {
+            DR_LOG_AS(Function, Notice, "Failed to parse line[%s] from file [%s]",
+                      std::string(line).c_str(), path.c_str());
+        }
+    }
+}
+
+// The first eight bytes of a key as a number that is ordered as they are. Comparing it first spares
+// most comparisons of texts.
+std::uint64_t HeadOf(std::string_view key)
+{
+    std::uint64_t head = 0;
+    key.copy(reinterpret_cast<char*>(&head), sizeof head);
+    return be64toh(head);
+}
+
+// A pair before it is in the map: texts are still parts of the file's.
+template <class Value>
+struct PairOf {
+    using Read = std::conditional_t<std::is_same_v<Value, std::string>, std::string_view, Value>;
+
+    bool operator<(const PairOf& other) const
+    {
+        return head != other.head ? head < other.head : key < other.key;
+    }
+
+    std::uint64_t head = 0;
+    std::string_view key;
+    Read value{};
+};
 
 // Runs a program. If another thread has waited for all children and so got the result, `isDone()`
 // tells whether the program has done its work.
@@ -111,6 +154,43 @@ struct CloseStream {
 using Stream = std::unique_ptr<FILE, CloseStream>;
 
 template <class Value>
+void InsertPairs(std::string_view text, const std::string& path, std::map<std::string, Value>& out)
+{
+    Extraction extraction;
+    auto next = out.end();
+    ForEachPair(text, path, [&](std::string_view left, std::string_view right) {
+        std::string key;
+        Value value{};
+        extraction.Read(left, key);
+        extraction.Read(right, value);
+        // Of lines with the same key the first counts. The hint is good because most files are sorted.
+        next = std::next(out.try_emplace(next, std::move(key), std::move(value)));
+    });
+}
+
+// The same, for many lines: sorting them first takes less time than searching a large map, and the
+// map's nodes are made in the order in which they are read later.
+template <class Value>
+void AppendSortedPairs(std::string_view text, const std::string& path,
+                       std::map<std::string, Value>& out)
+{
+    Extraction extraction;
+    std::vector<PairOf<Value>> pairs;
+    ForEachPair(text, path, [&](std::string_view left, std::string_view right) {
+        PairOf<Value>& pair = pairs.emplace_back();
+        extraction.Read(left, pair.key);
+        extraction.Read(right, pair.value);
+        pair.head = HeadOf(pair.key);
+    });
+    if (!std::is_sorted(pairs.begin(), pairs.end())) std::stable_sort(pairs.begin(), pairs.end());
+    for (auto pair = pairs.begin(); pair != pairs.end(); ++pair) {
+        // Of lines with the same key the first counts, which a stable sort leaves in front.
+        if (pair != pairs.begin() && pair->key == std::prev(pair)->key) continue;
+        out.emplace_hint(out.end(), pair->key, pair->value);
+    }
+}
+
+template <class Value>
 int ReadPairs(const std::string& path, std::map<std::string, Value>& out)
 {
     constexpr const char* Function = "Read";
@@ -123,19 +203,10 @@ int ReadPairs(const std::string& path, std::map<std::string, Value>& out)
     const std::string text = ReadLines(file);
 
     out.clear();
-    Extraction extraction;
-    auto next = out.end();
-    for (std::string_view rest = text; !rest.empty();) {
-        const std::string_view line = TakeLine(rest);
-        std::string key;
-        Value value{};
-        if (!parseLineKeyValue(line, extraction, key, value)) {
-            DR_LOG_AS(Function, Notice, "Failed to parse line[%s] from file [%s]",
-                      std::string(line).c_str(), path.c_str());
-            continue;
-        }
-        // Of lines with the same key the first counts. The hint is good because most files are sorted.
-        next = std::next(out.try_emplace(next, std::move(key), std::move(value)));
+    if (text.size() < LargeFile) {
+        InsertPairs(text, path, out);
+    } else {
+        AppendSortedPairs(text, path, out);
     }
     return static_cast<int>(out.size());
 }

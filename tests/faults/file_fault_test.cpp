@@ -174,10 +174,11 @@ TEST(FileFaults, ReplaceByText)
     EveryCallFails("File::Replace(text)", [] { ExpectReplaced(New); });
 }
 
-TEST(FileFaults, ReadPairs)
+// Reads a file that holds two pairs and a bad line.
+void ReadTwoPairs(const std::string& operation, const std::string& text)
 {
-    EveryCallFails("File::Read(map)", [] {
-        const Place place("port=5001\na name that is long enough=1\nnone\n");
+    EveryCallFails(operation, [&text] {
+        const Place place(text);
         using Pairs = std::map<std::string, int>;
         const Pairs old{{"old", 1}};
         const Pairs all{{"a", 1}, {"port", 5001}};
@@ -197,6 +198,17 @@ TEST(FileFaults, ReadPairs)
         EXPECT_EQ(File::Read(place.path, pairs), 2);
         EXPECT_EQ(pairs, all);
     });
+}
+
+TEST(FileFaults, ReadPairs)
+{
+    ReadTwoPairs("File::Read(map)", "port=5001\na name that is long enough=1\nnone\n");
+}
+
+TEST(FileFaults, ReadPairsOfALargeFile)
+{
+    ReadTwoPairs("File::Read(map), a large file",
+                 "port=5001\na name=1" + std::string(10'000, ' ') + "\nnone\nport=1\n");
 }
 
 TEST(FileFaults, CreateDir)

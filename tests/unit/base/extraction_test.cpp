@@ -12,6 +12,7 @@
 #include <random>
 #include <sstream>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "support/fakes/global_locale.h"
@@ -66,6 +67,8 @@ void ExpectSame(Extraction& extraction, const std::string& text, const Value& be
 
 void ExpectSameOfAllKinds(Extraction& extraction, const std::string& text)
 {
+    EXPECT_EQ(FromExtraction(extraction, text, std::string_view("before")),
+              FromStream(text, std::string("before")));
     ExpectSame(extraction, text, std::string("before"));
     ExpectSame(extraction, text, 42);
     ExpectSame(extraction, text, 42.5);
@@ -182,6 +185,7 @@ TEST(ExtractionTest, ATextWithoutAWordLeavesTheValue)
     Extraction extraction;
     for (const std::string text : {"", " ", " \t\n\v\f\r"}) {
         EXPECT_EQ(FromExtraction(extraction, text, std::string("before")), "before");
+        EXPECT_EQ(FromExtraction(extraction, text, std::string_view("before")), "before");
         EXPECT_EQ(FromExtraction(extraction, text, 42), 42);
         EXPECT_EQ(FromExtraction(extraction, text, 42.5), 42.5);
     }
