@@ -87,7 +87,7 @@ SqliteValueList AnyRecord(Draw& draw, const Table& table)
         return record;
     }
     for (std::size_t count = 1 + draw.shape.Below(4); count > 0; --count) {
-        const bool isOdd = draw.shape.OneIn(12);
+        const bool isOdd = draw.IsOdd(12);
         const string field = isOdd ? AnyColumn(draw, table) : draw.shape.Of(table.names);
         record.AddValue(field, AnyValue(draw));
     }
@@ -123,7 +123,7 @@ SelectCommand AnySelect(Draw& draw, const Table& table)
             select.AddField(AnyColumn(draw, table));
     }
     if (!draw.shape.OneIn(6)) select.SetCondition(AnyCondition(draw, table));
-    if (draw.shape.OneIn(12)) select.GroupBy(draw.shape.Of(table.names));
+    if (draw.IsOdd(12)) select.GroupBy(draw.shape.Of(table.names));
     if (draw.shape.OneIn(6)) {
         const bool isDescending = draw.shape.OneIn(2);
         select.OrderBy(draw.shape.Of(table.names),
@@ -144,10 +144,10 @@ string AnyWrite(Draw& draw)
     const Table& table = AnyTable(draw);
     switch (draw.shape.Below(6)) {
         case 0:
-        case 1: return MaybeMutated(draw.value, AnyInsert(draw, table).GetCommand());
-        case 2: return MaybeMutated(draw.value, AnyUpdate(draw, table).GetCommand());
-        case 3: return MaybeMutated(draw.value, AnyDelete(draw, table));
-        default: return MaybeMutated(draw.value, FillIn(draw, table, draw.shape.Of(Writes)));
+        case 1: return MaybeMutated(draw, AnyInsert(draw, table).GetCommand());
+        case 2: return MaybeMutated(draw, AnyUpdate(draw, table).GetCommand());
+        case 3: return MaybeMutated(draw, AnyDelete(draw, table));
+        default: return MaybeMutated(draw, FillIn(draw, table, draw.shape.Of(Writes)));
     }
 }
 
@@ -157,7 +157,7 @@ string AnyQuery(Draw& draw)
     const bool isBuilt = draw.shape.OneIn(2);
     const string query =
         isBuilt ? AnySelect(draw, table).GetCommand() : FillIn(draw, table, draw.shape.Of(Queries));
-    return MaybeMutated(draw.value, query);
+    return MaybeMutated(draw, query);
 }
 
 }  // namespace Shapes

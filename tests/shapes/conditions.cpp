@@ -94,7 +94,7 @@ string List(Draw& draw, const string& column, bool isIn)
 {
     std::vector<SqliteValue> values;
     const std::size_t many = 60 + draw.shape.Below(80);
-    const std::size_t count = draw.shape.OneIn(12) ? many : draw.shape.Below(6);
+    const std::size_t count = draw.IsOdd(12) ? many : draw.shape.Below(6);
     for (std::size_t at = 0; at < count; ++at) values.push_back(AnyValue(draw));
     return isIn ? SqliteIn(column, values).GetCondition()
                 : SqliteNotIn(column, values).GetCondition();
@@ -106,6 +106,17 @@ string Pair(Draw& draw, const Table& table, int depth)
     const string right = AnyCondition(draw, table, depth + 1);
     return draw.shape.OneIn(2) ? SqliteAnd(left, right).GetCondition()
                                : SqliteOr(left, right).GetCondition();
+}
+
+string OddCondition(Draw& draw, const Table& table)
+{
+    const string column = AnyColumn(draw, table);
+    switch (draw.shape.Below(8)) {
+        case 0: return SqliteContains(column, AnyText(draw.value)).GetCondition();
+        case 1: return SqliteBeginsWith(column, AnyText(draw.value)).GetCondition();
+        case 2: return SqliteIn(column, FillIn(draw, table, "SELECT $c FROM $t")).GetCondition();
+        default: return FillIn(draw, table, draw.shape.Of(Written));
+    }
 }
 
 }  // namespace
@@ -125,8 +136,8 @@ string AnyColumn(Draw& draw, const Table& table)
         " a",       "a ",       "main.t.a",  "t.a",       "5",
         "'a'",      "a--",      "a+1",       "\"it's\"",  "b||a",
         "likely(a)"};
-    if (draw.shape.OneIn(10)) return draw.shape.Of(others);
-    if (draw.shape.OneIn(12)) return table.name + "." + draw.shape.Of(table.names);
+    if (draw.IsOdd(10)) return draw.shape.Of(others);
+    if (draw.IsOdd(12)) return table.name + "." + draw.shape.Of(table.names);
     return draw.shape.Of(table.names);
 }
 
@@ -150,8 +161,9 @@ string FillIn(Draw& draw, const Table& table, const string& text)
 string AnyCondition(Draw& draw, const Table& table, int depth)
 {
     constexpr int Deepest = 4;
+    if (draw.IsOdd(5)) return OddCondition(draw, table);
     const string column = AnyColumn(draw, table);
-    switch (draw.shape.Below(depth < Deepest ? 20 : 15)) {
+    switch (draw.shape.Below(depth < Deepest ? 15 : 11)) {
         case 0:
         case 1:
         case 2:
@@ -161,12 +173,8 @@ string AnyCondition(Draw& draw, const Table& table, int depth)
         case 6: return SqliteLessEqual(column, AnyValue(draw)).GetCondition();
         case 7: return SqliteGreater(column, AnyValue(draw)).GetCondition();
         case 8: return SqliteGreaterEqual(column, AnyValue(draw)).GetCondition();
-        case 9: return SqliteContains(column, AnyText(draw.value)).GetCondition();
-        case 10: return SqliteBeginsWith(column, AnyText(draw.value)).GetCondition();
-        case 11: return List(draw, column, true);
-        case 12: return List(draw, column, false);
-        case 13: return SqliteIn(column, FillIn(draw, table, "SELECT $c FROM $t")).GetCondition();
-        case 14: return FillIn(draw, table, draw.shape.Of(Written));
+        case 9: return List(draw, column, true);
+        case 10: return List(draw, column, false);
         default: return Pair(draw, table, depth);
     }
 }

@@ -20,7 +20,12 @@ struct Draw {
     Random shape;
     Random value;
     const Schema& schema;
+    std::size_t tameness = 1;
     int depth = 0;  // of operations that run inside of others
+
+    // Whether the shape has something that programs seldom write, once in so many. In tame scripts
+    // most statements are those that the library runs by their shape.
+    bool IsOdd(std::size_t often) { return shape.OneIn(often * tameness); }
 };
 
 // ------------------------------------------------------------------------------------------ values
@@ -32,7 +37,7 @@ OrvaDRCore::SqliteValue AnyValue(Draw& draw);
 std::string AnyLiteral(Draw& draw);
 
 // A statement with a few characters changed, or none.
-std::string MaybeMutated(Random& random, std::string statement);
+std::string MaybeMutated(Draw& draw, std::string statement);
 
 // -------------------------------------------------------------------------------------- conditions
 

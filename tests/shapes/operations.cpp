@@ -127,11 +127,11 @@ Operation WhilePausing(Draw& draw, const Operation& operation)
             }};
 }
 
-Operation AnyStatement(Random& random, const Pool& pool, const Schema& schema)
+Operation AnyStatement(Random& random, const Pool& pool)
 {
-    const bool isKnown = !random.OneIn(5);
-    const std::uint64_t shape = isKnown ? random.Of(pool) : random.Next();
-    Draw draw{Random(shape), Random(random.Next()), schema};
+    const bool isKnown = !random.OneIn(5 * pool.tameness);
+    const std::uint64_t shape = isKnown ? random.Of(pool.shapes) : random.Next();
+    Draw draw{Random(shape), Random(random.Next()), pool.schema, pool.tameness};
     return draw.shape.OneIn(4) ? AnyTextOperation(draw) : AnyRecordOperation(draw);
 }
 
@@ -145,13 +145,13 @@ string AnyNeighbourStatement(Draw& draw)
     return FillIn(draw, table, statement);
 }
 
-Operation AnyOperation(Random& random, const Pool& pool, const Schema& schema)
+Operation AnyOperation(Random& random, const Pool& pool)
 {
-    Draw draw{Random(random.Next()), Random(random.Next()), schema};
+    Draw draw{Random(random.Next()), Random(random.Next()), pool.schema};
     const std::size_t kind = random.Below(100);
-    if (kind < 70) return AnyStatement(random, pool, schema);
-    if (kind < 74) return WhileLocked(draw, AnyStatement(random, pool, schema));
-    if (kind < 77) return WhilePausing(draw, AnyStatement(random, pool, schema));
+    if (kind < 70) return AnyStatement(random, pool);
+    if (kind < 74) return WhileLocked(draw, AnyStatement(random, pool));
+    if (kind < 77) return WhilePausing(draw, AnyStatement(random, pool));
     if (kind < 84) return AnySessionOperation(draw);
     if (kind < 89) return RunAsNeighbour(draw.value.OneIn(4), AnyNeighbourStatement(draw));
     if (kind < 99)

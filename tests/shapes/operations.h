@@ -9,11 +9,15 @@
 
 namespace Shapes {
 
-// Shapes of statements that come again in a script, as seeds.
-using Pool = std::vector<std::uint64_t>;
+// What the statements of a script are drawn from.
+struct Pool {
+    const Schema& schema;
+    std::size_t tameness;
+    std::vector<std::uint64_t> shapes;  // those that come again, as seeds
+};
 
 // Any of those below, or the same while others are at work.
-Operation AnyOperation(Random& random, const Pool& pool, const Schema& schema);
+Operation AnyOperation(Random& random, const Pool& pool);
 
 // Of records and commands.
 Operation AnyRecordOperation(Draw& draw);

@@ -35,7 +35,7 @@ Operation Insert(Draw& draw)
 {
     const std::size_t db = AnyConnection(draw);
     const InsertCommand insert = AnyInsert(draw, AnyTable(draw));
-    if (!draw.shape.OneIn(8)) {
+    if (!draw.IsOdd(8)) {
         return {NameOf(db) + "InsertRecord: " + TextOf(insert), [db, insert](Side& side) {
                     side.Note("answer", side.Db(db).InsertRecord(insert));
                 }};
@@ -58,10 +58,10 @@ Operation Delete(Draw& draw)
     const std::size_t db = AnyConnection(draw);
     const Table& table = AnyTable(draw);
     const SqliteTableHandler handler = AnyHandler(draw, table);
-    const string condition = draw.shape.OneIn(12) ? "" : AnyCondition(draw, table);
+    const string condition = draw.IsOdd(12) ? "" : AnyCondition(draw, table);
     const string text = "DELETE FROM " + handler.GetName() + " WHERE " + condition +
                         (handler.GetSchema().empty() ? "" : " [with a schema]");
-    switch (draw.shape.Below(12)) {
+    switch (draw.IsOdd(6) ? draw.shape.Below(2) : 2) {
         case 0:
             return {NameOf(db) + "DeleteAllRecords: " + handler.GetName(),
                     [db, handler](Side& side) {

@@ -28,11 +28,14 @@ std::string Create(const Table& table, const std::string& options = "")
     return "CREATE TABLE " + table.name + "(" + table.columns + ")" + options;
 }
 
-// A few rows, so that the first conditions already match something.
+// Some rows, so that the first conditions already match something. Their order is another one in
+// each index.
 std::string Fill(const std::string& table)
 {
     return "INSERT INTO " + table +
-           "(id,a,b,c) VALUES (1,1,'a',1),(2,2,'b',2),(3,3,'A',3),(4,2,'x',NULL),(5,1,'',0)";
+           "(id,a,b,c) WITH RECURSIVE n(i) AS (VALUES(1) UNION ALL SELECT i+1 FROM n WHERE i<14) "
+           "SELECT i*5%17, CASE i%7 WHEN 4 THEN 9 ELSE i%7 END, substr('abAx1bxaB aab1x',i,1), "
+           "nullif(i*3%16,6) FROM n";
 }
 
 Schema Plain()

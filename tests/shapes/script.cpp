@@ -8,6 +8,9 @@ namespace Shapes {
 
 namespace {
 
+// How many times less often odd things come.
+constexpr std::array<std::size_t, 4> Tameness = {1, 3, 30, 30};
+
 // Mostly all of them, because that is what callers have.
 OrvaDRCore::Shortcuts AnyShortcuts(Random& random)
 {
@@ -27,11 +30,12 @@ Script MakeScript(std::uint64_t seed)
     Random random(seed);
     Script script{seed, &random.Of(Schemas()), {}, AnyShortcuts(random), {}};
     for (unsigned int& limit : script.limits) limit = static_cast<unsigned int>(random.Below(3));
-    Pool pool(2 + random.Below(14));
-    for (std::uint64_t& shape : pool) shape = random.Next();
+    Pool pool{*script.schema, random.Of(Tameness), {}};
+    pool.shapes.resize(2 + random.Below(14));
+    for (std::uint64_t& shape : pool.shapes) shape = random.Next();
     const std::size_t count = 30 + random.Below(300);
     while (script.operations.size() < count)
-        script.operations.push_back(AnyOperation(random, pool, *script.schema));
+        script.operations.push_back(AnyOperation(random, pool));
     return script;
 }
 

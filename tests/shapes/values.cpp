@@ -165,16 +165,19 @@ string AnyText(Random& random)
 
 SqliteValue AnyValue(Draw& draw)
 {
-    Random& kind = draw.value.OneIn(5) ? draw.value : draw.shape;
+    Random& kind = draw.value.OneIn(5 * draw.tameness) ? draw.value : draw.shape;
+    if (draw.IsOdd(6)) return OddValue(draw.value);
     switch (kind.Below(12)) {
         case 0:
         case 1:
         case 2:
         case 3:
         case 4: return {SmallNumber(draw.value)};
-        case 5: return SqliteValue::Integer(SmallNumber(draw.value));
+        case 5:
+            return SqliteValue::Integer(draw.value.OneIn(3) ? AnyInteger(draw.value)
+                                                            : SmallNumber(draw.value));
         case 6: return SqliteValue(AnyText(draw.value));  // quotes in it end the literal
-        case 7: return OddValue(draw.value);
+        case 7: return {-SmallNumber(draw.value)};
         case 8: return {string(1, "abAx"[draw.value.Below(4)])};
         default: return SqliteValue::Text(AnyText(draw.value));
     }
@@ -182,16 +185,18 @@ SqliteValue AnyValue(Draw& draw)
 
 string AnyLiteral(Draw& draw)
 {
-    return draw.value.OneIn(6) ? OddLiteral(draw.value) : AnyValue(draw).ToFormatedValue();
+    return draw.value.OneIn(6 * draw.tameness) ? OddLiteral(draw.value)
+                                               : AnyValue(draw).ToFormatedValue();
 }
 
-string MaybeMutated(Random& random, string statement)
+string MaybeMutated(Draw& draw, string statement)
 {
     static const std::array<const char*, 30> pieces = {
         " ",    "\t", "\n", ";",        ";;", "'",  "\"",         "--",       "/* c */", "?",
         "(",    ")",  ",",  "=",        "1",  "0x", "e5",         "AND",      " OR ",    "NOT ",
         "null", ".",  "-",  "\xc2\xa0", "`",  "[",  "; SELECT 1", " LIMIT 1", ":a",      "\f"};
-    if (!random.OneIn(4)) return statement;
+    Random& random = draw.value;
+    if (!random.OneIn(4 * draw.tameness)) return statement;
     for (std::size_t changes = 1 + random.Below(2); changes > 0; --changes) {
         const std::size_t at = random.Below(statement.size() + 1);
         switch (random.Below(5)) {
