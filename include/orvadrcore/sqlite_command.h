@@ -110,6 +110,8 @@ class ORVADRCORE_API InsertCommand : public SqliteCommand {
     void DumpParam(std::stringstream& out) const override;  ///< "values:[id=1,name='x']"
 
   private:
+    friend struct InsertInternals;
+
     bool replacable_ = false;
     SqliteValueList fieldValues_;
 };

@@ -5,6 +5,7 @@
 #include <string_view>
 
 #include "sqlite/sqlite_bind.h"
+#include "sqlite/sqlite_insert.h"
 #include "sqlite/sqlite_internals.h"
 #include "sqlite/sqlite_statement.h"
 
@@ -28,15 +29,9 @@ struct ByFields {
 std::string InsertStatement(const std::string& table, const SqliteValueList& record,
                             bool replacable)
 {
-    std::string fields;
-    std::string places;
-    for (const auto& [field, value] : record.GetValues()) {
-        const char* separator = fields.empty() ? "" : ",";
-        fields.append(separator).append(field);
-        places.append(separator).append("?");
-    }
-    const char* verb = replacable ? "INSERT OR REPLACE INTO " : "INSERT INTO ";
-    return verb + table + " (" + fields + ") VALUES (" + places + ");";
+    std::string text;
+    AppendInsertShape(text, table, record, replacable);
+    return text + ';';
 }
 
 // Inserts records that have the same fields.

@@ -5,7 +5,6 @@
 
 #include <algorithm>
 #include <string_view>
-#include <utility>
 
 namespace OrvaDRCore {
 
@@ -107,7 +106,10 @@ void BusyWait::NoteUnlocked()
 // retries unless the result is 0.
 int BusyWait::OnBusy(void* self, int count)
 {
-    return static_cast<BusyWait*>(self)->Pause(count == 0) ? 1 : 0;
+    auto& wait = *static_cast<BusyWait*>(self);
+    if (wait.refusesToWait_ && !HasChanges(wait.handle_)) return 0;
+    wait.refusesToWait_ = false;
+    return wait.Pause(count == 0) ? 1 : 0;
 }
 
 bool BusyWait::Pause(bool isFirst)

@@ -20,6 +20,7 @@
 #include <chrono>
 #include <random>
 #include <string>
+#include <utility>
 
 #include "sqlite/sqlite_watch.h"
 
@@ -56,6 +57,12 @@ class BusyWait {
     // To be called after each statement that leaves no transaction open.
     void NoteUnlocked();
 
+    // From now on a statement that meets a lock before it has changed anything fails at once.
+    void RefuseToWait() { refusesToWait_ = true; }
+
+    // Returns whether there was no wait meanwhile: a statement that met a lock has failed at once.
+    bool AcceptToWait() { return std::exchange(refusesToWait_, false); }
+
   private:
     using Clock = std::chrono::steady_clock;
     using Microseconds = std::chrono::microseconds;
@@ -67,6 +74,7 @@ class BusyWait {
     Microseconds Between(Microseconds shortest, Microseconds longest);
 
     sqlite3* handle_ = nullptr;
+    bool refusesToWait_ = false;
     std::minstd_rand random_;
 
     // All pauses of the statement that waits or has waited last: as they were asked for, as long as
@@ -93,6 +101,8 @@ class BusyTimeoutAccess {
     BusyTimeoutAccess(const BusyTimeoutAccess&) = delete;
     BusyTimeoutAccess& operator=(const BusyTimeoutAccess&) = delete;
     ~BusyTimeoutAccess();
+
+    bool IsLeftToSqlite() const { return isLeftToSqlite_; }
 
   private:
     BusyWait& wait_;

@@ -6,6 +6,8 @@
 #include <orvadrcore/errors.h>
 
 #include "base/scope_guard.h"
+#include "sqlite/sqlite_insert.h"
+#include "sqlite/sqlite_shortcuts.h"
 #include "sqlite/sqlite_statement.h"
 
 namespace OrvaDRCore {
@@ -26,6 +28,17 @@ struct Bracket {
 constexpr Bracket Transaction{"BEGIN IMMEDIATE", "COMMIT", "ROLLBACK"};
 constexpr Bracket Savepoint{"SAVEPOINT orvadr_insert", "RELEASE orvadr_insert",
                             "ROLLBACK TO orvadr_insert; RELEASE orvadr_insert"};
+
+// Inside of a transaction: whether it has the lock that a statement needs.
+bool HoldsLock([[maybe_unused]] sqlite3* handle, [[maybe_unused]] bool isSelect)
+{
+#if SQLITE_VERSION_NUMBER >= 3034000
+    const int needed = isSelect ? SQLITE_TXN_READ : SQLITE_TXN_WRITE;
+    return sqlite3_txn_state(handle, "main") >= needed;
+#else
+    return false;
+#endif
+}
 
 }  // namespace
 
@@ -98,6 +111,74 @@ void SqliteConnection::Close()
 
 bool SqliteConnection::Execute(const std::string& command)
 {
+    if (!ShortcutsInUse().shapes || !ReadShape(command, shape_) || shape_.isSelect) {
+        return ExecuteText(command);
+    }
+    StatementCache::Cached cached;
+    const std::optional<int> code = ExecuteShape(
+        [this](sqlite3_stmt* made) { return BindLiterals(made, shape_, SQLITE_STATIC); }, cached);
+    if (!code) return ExecuteText(command);
+    if (*code != SQLITE_DONE) SetFailure(command, *code, nullptr);
+    return *code == SQLITE_DONE;
+}
+
+bool SqliteConnection::Insert(const InsertCommand& command)
+{
+    shape_.isSelect = false;
+    if (!WriteInsertShape(command, shape_.text)) return ExecuteText(command.GetCommand());
+    StatementCache::Cached cached;
+    const std::optional<int> code =
+        ExecuteShape([&](sqlite3_stmt* made) { return BindInsert(made, command); }, cached);
+    if (!code) return ExecuteText(command.GetCommand());
+    if (*code != SQLITE_DONE) SetFailure(command.GetCommand(), *code, nullptr);
+    return *code == SQLITE_DONE;
+}
+
+// Whether the statement of the shape may be cached and run now. A cached statement may have become
+// wrong since it was prepared, and notices that only when it has taken its lock, while a text fails
+// before. So it must not wait for a lock, which takes our own waiting, nor take one that stays.
+bool SqliteConnection::MayRunShape()
+{
+    return wait_.IsInstalled() && cache_.IsUsable(handle_) &&
+           (!IsInTransaction() || HoldsLock(handle_, shape_.isSelect));
+}
+
+// Steps the statement of the shape once. Returns SQLite's code, or none if the text must be run
+// instead: because a lock was met, or because SQLite's message might show parameters.
+std::optional<int> SqliteConnection::BeginShape(const Bind& bind, StatementCache::Cached& cached)
+{
+    int code = cache_.Take(handle_, shape_.text, cached);
+    if (code == SQLITE_ERROR) return {};
+    if (code != SQLITE_OK) return code;
+    if (bind(cached.statement.get()) != SQLITE_OK) return {};
+    wait_.RefuseToWait();
+    code = sqlite3_step(cached.statement.get());
+    const bool metLock = wait_.AcceptToWait() && code == SQLITE_BUSY;
+    if (!metLock) return code;
+    cache_.Keep(std::move(cached));
+    return {};
+}
+
+// The same for a statement that writes, until its end. The message of a failure is there as long as
+// the statement.
+std::optional<int> SqliteConnection::ExecuteShape(const Bind& bind, StatementCache::Cached& cached)
+{
+    if (!MayRunShape()) return {};
+    if (!IsInTransaction()) wait_.Yield();
+    const StatementWatch::Changes before = watch_.BeginCached();
+    std::optional<int> code = BeginShape(bind, cached);
+    while (code == SQLITE_ROW) code = sqlite3_step(cached.statement.get());  // PRAGMA count_changes
+    sqlite3_reset(cached.statement.get());
+    if (!IsInTransaction()) wait_.NoteUnlocked();
+    if (code == SQLITE_DONE) {
+        NoteChangesSince(before);
+        cache_.Keep(std::move(cached));
+    }
+    return code;
+}
+
+bool SqliteConnection::ExecuteText(const std::string& command)
+{
     const BusyTimeoutAccess access(wait_, watch_, command);
     const StatementWatch::Changes before = watch_.CountChanges();
     if (!IsInTransaction()) wait_.Yield();
@@ -135,24 +216,50 @@ bool SqliteConnection::Select(const std::string& command, const TakeRow& takeRow
     error_.Set(ERR::ERR_DATABASE_OPERATION);
     sqlite3* const handle = handle_;
     const BusyTimeoutAccess access(wait_, watch_, command);
-    Statement statement;
+    StatementCache::Cached cached;
     const ScopeGuard end([&] {
-        statement.reset();
+        cached.statement.reset();
         lookup_.GiveBack();
         EndSelect(handle);
     });
     const StatementWatch::Changes before = watch_.CountChanges();
     const char* message = nullptr;
-    int code = cache_.Take(handle, command, statement);
-    if (code == SQLITE_OK) code = TakeRows(statement.get(), takeRow, message);
+    Keeping keeping = Keeping::No;
+    int code = BeginSelect(command, !access.IsLeftToSqlite(), cached, keeping);
+    // After a failure it is given back later, because that changes SQLite's message.
+    if (code == SQLITE_ROW || code == SQLITE_DONE) lookup_.GiveBack();
+    if (code == SQLITE_ROW) code = TakeRows(cached.statement.get(), takeRow, message);
     if (code != SQLITE_OK && code != SQLITE_DONE) {
         SetFailure(command, code, message != nullptr ? message : sqlite3_errmsg(handle));
         return false;
     }
-    if (sqlite3_stmt_readonly(statement.get()) == 0) NoteChangesSince(before);
-    if (handle_ == handle) cache_.Keep(command, std::move(statement));
+    if (sqlite3_stmt_readonly(cached.statement.get()) == 0) NoteChangesSince(before);
+    if (handle_ == handle && keeping == Keeping::ByText) cache_.KeepSelect(std::move(cached));
+    if (handle_ == handle && keeping == Keeping::ByShape) cache_.Keep(std::move(cached));
     error_.Set(0);
     return true;
+}
+
+// Prepares a select and steps it once. Returns SQLite's code. `mayRunShape` is whether this connection
+// waits for locks as ever.
+int SqliteConnection::BeginSelect(const std::string& command, bool mayRunShape,
+                                  StatementCache::Cached& cached, Keeping& keeping)
+{
+    int code = SQLITE_OK;
+    if (mayRunShape && ShortcutsInUse().shapes && ReadShape(command, shape_) && shape_.isSelect &&
+        MayRunShape()) {
+        // The caller may change the text while rows are given to it, so the literals are copied.
+        const std::optional<int> shapeCode = BeginShape(
+            [this](sqlite3_stmt* made) { return BindLiterals(made, shape_, SQLITE_TRANSIENT); },
+            cached);
+        if (shapeCode) keeping = Keeping::ByShape;
+        if (shapeCode) return *shapeCode;
+        code = PrepareStatement(handle_, command, cached.statement);
+    } else {
+        keeping = Keeping::ByText;
+        code = cache_.Take(handle_, command, cached);
+    }
+    return code == SQLITE_OK ? sqlite3_step(cached.statement.get()) : code;
 }
 
 // Returns SQLite's code, and a message for a failure that is not SQLite's.
@@ -160,9 +267,7 @@ int SqliteConnection::TakeRows(sqlite3_stmt* statement, const TakeRow& takeRow,
                                const char*& message)
 {
     const sqlite3* const handle = handle_;
-    int code = sqlite3_step(statement);
-    // After a failure it is given back later, because that changes SQLite's message.
-    if (code == SQLITE_ROW || code == SQLITE_DONE) lookup_.GiveBack();
+    int code = SQLITE_ROW;
     RowReader row(statement);
     while (code == SQLITE_ROW) {
         const bool isMoreWanted = takeRow(row);

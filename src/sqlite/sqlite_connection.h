@@ -6,18 +6,21 @@
 
 #include <cstdint>
 #include <functional>
+#include <optional>
 #include <string>
 
 #include "sqlite/sqlite_busy.h"
 #include "sqlite/sqlite_error.h"
 #include "sqlite/sqlite_retry.h"
 #include "sqlite/sqlite_row_reader.h"
+#include "sqlite/sqlite_shape.h"
 #include "sqlite/sqlite_statement_cache.h"
 #include "sqlite/sqlite_table_lookup.h"
 #include "sqlite/sqlite_watch.h"
 
 namespace OrvaDRCore {
 
+class InsertCommand;
 class SqliteTransaction;
 
 // Runs statements and logs nothing: SqliteDB and SqliteTransaction do that. It stays where it is
@@ -66,6 +69,10 @@ class SqliteConnection {
     // The same for a text that may not begin or end a transaction.
     bool ExecuteInTransaction(const std::string& command);
 
+    // One attempt to run an INSERT, whose values are bound if possible. For an InsertCommand itself,
+    // not for a derived class.
+    bool Insert(const InsertCommand& command);
+
     // One attempt to run a statement that has rows. Each row is given to `takeRow`, which returns
     // whether it wants another. It may use this connection, close it, and throw.
     using TakeRow = std::function<bool(RowReader&)>;
@@ -98,6 +105,16 @@ class SqliteConnection {
     void SetOwner(const SqliteTransaction* owner) { owner_ = owner; }
 
   private:
+    using Bind = std::function<int(sqlite3_stmt*)>;
+
+    enum class Keeping { No, ByText, ByShape };
+
+    bool MayRunShape();
+    std::optional<int> BeginShape(const Bind& bind, StatementCache::Cached& cached);
+    std::optional<int> ExecuteShape(const Bind& bind, StatementCache::Cached& cached);
+    bool ExecuteText(const std::string& command);
+    int BeginSelect(const std::string& command, bool mayRunShape, StatementCache::Cached& cached,
+                    Keeping& keeping);
     int TakeRows(sqlite3_stmt* statement, const TakeRow& takeRow, const char*& message);
     void EndSelect(sqlite3* handle);
     void NoteChangesSince(const StatementWatch::Changes& before);
@@ -113,6 +130,7 @@ class SqliteConnection {
     StatementCache cache_;
     TableLookup lookup_;
     bool isLookupLockKept_ = false;
+    Shape shape_;  // of the statement that is about to run; kept for its memory
     const SqliteTransaction* owner_ = nullptr;
 };
 

@@ -9,6 +9,7 @@
 
 #include "base/log.h"
 #include "sqlite/sqlite_connection.h"
+#include "sqlite/sqlite_exec.h"
 
 namespace OrvaDRCore {
 
@@ -157,25 +158,13 @@ std::string SqliteDB::GenerateDeleteCommand(const std::string& table,
 
 bool SqliteDB::Exec(const std::string& command)
 {
-    if (!connection_->IsOpen()) {
-        connection_->Refuse(ERR::ERR_NULL_POINTER);
-        DR_LOG(Err, "DB[%s] is not opened", connection_->GetPath().c_str());
-        return false;
-    }
-    if (command.empty()) {
+    if (connection_->IsOpen() && command.empty()) {
         connection_->Refuse(ERR::BAD_PARAMETER);
         DR_LOG(Err, "empty command to exec db[%s]", connection_->GetPath().c_str());
         return false;
     }
-    const Attempts attempts = connection_->Retry([&] { return DoExecSqliteCommand(command); });
-    if (!attempts.succeeded) {
-        DR_LOG(Warn, "Reach retry limit [%u], failed to exec command [%s] with err[%s]",
-               attempts.failures, command.c_str(), attempts.errors.c_str());
-    } else if (attempts.failures > 0) {
-        DR_LOG(Info, "After retry [%u] times, success to exec command [%s], previous errors[%s]",
-               attempts.failures, command.c_str(), attempts.errors.c_str());
-    }
-    return attempts.succeeded;
+    return ExecWithRetries(
+        *connection_, [&] { return DoExecSqliteCommand(command); }, [&] { return command; });
 }
 
 bool SqliteDB::SelectByCommand(const std::string& command, SqliteValueList& record)

@@ -11,6 +11,8 @@
 #include "base/scope_guard.h"
 #include "sqlite/sqlite_batch.h"
 #include "sqlite/sqlite_connection.h"
+#include "sqlite/sqlite_exec.h"
+#include "sqlite/sqlite_shortcuts.h"
 
 namespace OrvaDRCore {
 
@@ -55,10 +57,12 @@ bool Prepare(const Operation& operation, SqliteDB& db, const SqliteCommand& comm
     return OpenWithTable(operation.function, db, command.GetTable());
 }
 
-bool ExecCommand(const Operation& operation, SqliteDB& db, const SqliteCommand& command)
+// `exec` runs the statement.
+template <class Exec>
+bool RunExec(const Operation& operation, SqliteDB& db, const SqliteCommand& command, Exec exec)
 {
     if (!Prepare(operation, db, command)) return false;
-    if (!db.Exec(command.GetCommand())) {
+    if (!exec()) {
         DR_LOG_AS(operation.function, Err, "Failed to exec [%s] in db[%s]",
                   command.GetCommand().c_str(), db.Connection().GetPath().c_str());
         return false;
@@ -89,7 +93,14 @@ bool RunSelect(const Operation& operation, SqliteDB& db, const SelectCommand& co
 bool SqliteDB::InsertRecord(const InsertCommand& command)
 {
     // The contract gives 404 for an invalid insert, and 401 for the other invalid commands.
-    return ExecCommand({__func__, "insert", ERR::ERR_DATABASE_OPERATION}, *this, command);
+    const Operation operation{__func__, "insert", ERR::ERR_DATABASE_OPERATION};
+    const bool isDirect = ShortcutsInUse().inserts && typeid(command) == typeid(InsertCommand);
+    return RunExec(operation, *this, command, [&] {
+        if (!isDirect) return Exec(command.GetCommand());
+        return ExecWithRetries(
+            *connection_, [&] { return connection_->Insert(command); },
+            [&] { return command.GetCommand(); });
+    });
 }
 
 bool SqliteDB::InsertRecords(const SqliteTableHandler& table,
@@ -129,7 +140,8 @@ bool SqliteDB::InsertRecords(const SqliteTableHandler& table,
 
 bool SqliteDB::UpdateRecord(const UpdateCommand& command)
 {
-    return ExecCommand({__func__, "update", ERR::BAD_PARAMETER}, *this, command);
+    const auto exec = [&] { return Exec(command.GetCommand()); };
+    return RunExec({__func__, "update", ERR::BAD_PARAMETER}, *this, command, exec);
 }
 
 bool SqliteDB::SelectRecords(const SelectCommand& command, std::vector<SqliteValueList>& records)

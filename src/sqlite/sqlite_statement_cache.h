@@ -1,45 +1,57 @@
-// The selects that a connection keeps prepared.
+// The statements that a connection keeps prepared.
 #ifndef ORVADRCORE_SRC_SQLITE_SQLITE_STATEMENT_CACHE_H
 #define ORVADRCORE_SRC_SQLITE_SQLITE_STATEMENT_CACHE_H
 
 #include <sqlite3.h>
 
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "sqlite/sqlite_statement.h"
 
 namespace OrvaDRCore {
 
-// The eight selects that were used last. A statement that is taken belongs to its user. Others may be
-// taken meanwhile, even for the same text, which is then prepared once more.
+// The statements that were used last: selects by their text, and statements by their shape, which has
+// parameters in the place of literals. There are up to 24, which take up to 48 KiB.
 //
-// A cached statement is reset, so it holds no lock, and SQLite prepares it again by itself when its
-// tables have changed. SQLite closes no connection that has statements, so the cache must be cleared
-// before.
+// A statement that is taken belongs to its user. Others may be taken meanwhile, even for the same
+// text, which is then prepared once more.
+//
+// A cached statement is reset, so it holds no lock, and nothing is bound to it. SQLite prepares it
+// again by itself when its tables have changed. SQLite closes no connection that has statements, so
+// the cache must be cleared before.
 //
 // While a database is attached nothing is cached. SQLite looks for a table in one database after
 // another, and a statement that found it in a later one would not notice a new table of the same
 // name in an earlier one.
 class StatementCache {
   public:
+    struct Cached {
+        Statement statement;
+        int bytes = 0;          // of its memory; 0 until it is put back for the first time
+        std::string_view text;  // SQLite's copy of it
+    };
+
+    // Whether statements may be cached now. If not, the cache is empty afterwards.
+    bool IsUsable(sqlite3* handle);
+
     // Takes a statement out of the cache, or prepares it. Returns SQLite's code.
-    int Take(sqlite3* handle, const std::string& command, Statement& statement);
+    int Take(sqlite3* handle, const std::string& text, Cached& cached);
 
-    // Puts back a statement that was taken, unless it writes or is unusually long.
-    void Keep(const std::string& command, Statement statement);
+    // Puts back a statement that was taken for a text, unless it writes or is unusually long.
+    void KeepSelect(Cached&& cached);
 
-    void Clear() { selects_.clear(); }
+    // Puts back a statement that was taken for a shape. Needs no memory.
+    void Keep(Cached&& cached);
+
+    void Clear() { cached_.clear(); }
 
   private:
-    // Moves a select to the end. False when it is not cached.
-    bool MakeLast(const std::string& command);
+    // The index of a statement, or the number of all if it is not cached.
+    std::size_t Find(std::string_view text) const;
 
-    struct Select {
-        std::string command;
-        Statement statement;  // null while it is taken, and after it failed
-    };
-    std::vector<Select> selects_;  // the one used last comes last
+    std::vector<Cached> cached_;  // the one used last comes last
 };
 
 }  // namespace OrvaDRCore

@@ -80,6 +80,13 @@ StatementWatch::Changes StatementWatch::CountChanges()
     return changes_;
 }
 
+StatementWatch::Changes StatementWatch::BeginCached()
+{
+    const Changes before = CountChanges();
+    ++changes_.statements;
+    return before;
+}
+
 std::int64_t StatementWatch::CountAllRows() const
 {
     if (handle_ == nullptr) return 0;

@@ -46,6 +46,10 @@ class StatementWatch {
     // changes rows.
     Changes CountChanges();
 
+    // To be called before a cached statement that changes rows: SQLite does not prepare it, so it is
+    // not seen. Returns what has been changed before it.
+    Changes BeginCached();
+
     // The rows that were changed through this connection, by triggers and foreign keys, too.
     std::int64_t CountAllRows() const;
 

@@ -1,0 +1,80 @@
+#include "sqlite/sqlite_insert.h"
+
+#include <algorithm>
+
+#include "sqlite/sqlite_bind.h"
+#include "sqlite/sqlite_internals.h"
+#include "sqlite/sqlite_shape.h"
+
+namespace OrvaDRCore {
+
+namespace {
+
+// Far below the limits of SQLite, which count the literals in a text but not bound values.
+constexpr std::size_t MaxValues = 256;
+constexpr std::size_t MaxBytes = 65'536;
+
+// Whether binding a value stores what its literal stores. A quote in a plain text ends the literal,
+// and a zero byte ends the statement. SQLite reads the literal of a real in its own way.
+bool IsBoundAsWritten(const SqliteValue& value)
+{
+    using Kind = SqliteInternals::Kind;
+    switch (SqliteInternals::KindOf(value)) {
+        case Kind::Nothing:
+        case Kind::Real: return false;
+        case Kind::Boolean:
+        case Kind::Integer:
+        case Kind::Null: return true;
+        default: break;
+    }
+    const std::string& bytes = SqliteInternals::BytesOf(value);
+    if (bytes.size() > MaxBytes) return false;
+    if (SqliteInternals::KindOf(value) == Kind::Blob) return true;
+    const bool isPlain = SqliteInternals::KindOf(value) == Kind::PlainText;
+    return bytes.find('\0') == std::string::npos &&
+           (!isPlain || bytes.find('\'') == std::string::npos);
+}
+
+}  // namespace
+
+void AppendInsertShape(std::string& text, const std::string& table, const SqliteValueList& record,
+                       bool replacable)
+{
+    text += replacable ? "INSERT OR REPLACE INTO " : "INSERT INTO ";
+    text += table;
+    text += " (";
+    for (const auto& [field, value] : record.GetValues()) (text += field) += ',';
+    text.back() = ')';
+    text += " VALUES (";
+    for (std::size_t count = record.GetValues().size(); count > 0; --count) text += "?,";
+    text.back() = ')';
+}
+
+bool WriteInsertShape(const InsertCommand& command, std::string& shape)
+{
+    const SqliteValueList& record = InsertInternals::RecordOf(command);
+    const std::string& table = command.GetTable().GetName();
+    const auto& values = record.GetValues();
+    const auto isPlain = [](const auto& field) {
+        return IsPlainName(field.first) && IsBoundAsWritten(field.second);
+    };
+    if (values.empty() || values.size() > MaxValues || !IsPlainName(table) ||
+        !IsPlainTable(table) || !std::all_of(values.begin(), values.end(), isPlain)) {
+        return false;
+    }
+    shape.clear();
+    AppendInsertShape(shape, table, record, InsertInternals::IsReplacable(command));
+    return true;
+}
+
+int BindInsert(sqlite3_stmt* statement, const InsertCommand& command)
+{
+    int place = 0;
+    for (const auto& [field, value] : InsertInternals::RecordOf(command).GetValues()) {
+        const int code = BindValue(statement, ++place, value);
+        if (code != SQLITE_OK) return code;
+    }
+    return SQLITE_OK;
+}
+
+}  // namespace OrvaDRCore
