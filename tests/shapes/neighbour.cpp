@@ -57,12 +57,22 @@ void Serve(int socket)
         std::string answer;
         if (order == 'o') neighbour.Open(text);
         if (order == 'c') neighbour.Close();
-        if (order == 'r') answer = neighbour.Run(text);
+        if (order == 'r') {
+            SeedSqlite(text.size());
+            answer = neighbour.Run(text);
+        }
         if (!Send(socket, order, answer)) break;
     }
 }
 
 }  // namespace
+
+void SeedSqlite([[maybe_unused]] std::uint64_t seed)
+{
+#ifdef SQLITE_TESTCTRL_PRNG_SEED
+    sqlite3_test_control(SQLITE_TESTCTRL_PRNG_SEED, static_cast<int>(seed | 1U), nullptr);
+#endif
+}
 
 void Neighbour::Open(const std::string& path)
 {

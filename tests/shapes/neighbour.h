@@ -5,9 +5,13 @@
 #include <sqlite3.h>
 #include <sys/types.h>
 
+#include <cstdint>
 #include <string>
 
 namespace Shapes {
+
+// From now on row ids and names of temporary files that SQLite chooses depend on the seed.
+void SeedSqlite(std::uint64_t seed);
 
 // A connection to a file. It never waits for a lock.
 class Neighbour {

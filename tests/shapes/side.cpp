@@ -112,10 +112,7 @@ std::string Side::End()
 std::string Side::Run(const Operation& operation, std::uint64_t seed)
 {
     Enter();
-#ifdef SQLITE_TESTCTRL_PRNG_SEED
-    // Random row ids and names of temporary files are the same on both sides.
-    sqlite3_test_control(SQLITE_TESTCTRL_PRNG_SEED, static_cast<int>(seed | 1U), nullptr);
-#endif
+    SeedSqlite(seed);
     outcome_.clear();
     atPause_ = {};
     atWait_ = {};
