@@ -205,7 +205,7 @@ void AddEngines(const std::string& item, int number, benchmark::IterationCount i
 
 void AddCurves()
 {
-    constexpr double OfTransaction = 1.25;
+    constexpr double OfBoundInsert = 2.8;
     for (const int rows : {1000, 10'000, 100'000, 1'000'000}) {
         AddEngines<SelectRows>("select all of " + ToText(rows) + " rows", rows,
                                rows == 1'000'000 ? 1 : 0);
@@ -217,7 +217,7 @@ void AddCurves()
     }
     for (const int tables : {1, 10, 100, 1000}) {
         AddEngines<InsertBesideTables>("insert beside " + ToText(tables) + " tables", tables);
-        Aim({Contract}, OfTransaction);
+        Aim({Bare}, OfBoundInsert);
     }
     for (const int values : {1, 100, 10'000, 100'000}) {
         const std::string item = "select by an IN list of " + ToText(values);

@@ -124,6 +124,7 @@ class TempDir {
 
 // The families.
 void AddRecords();
+void AddWide();
 void AddMany();
 void AddVolumes();
 void AddTexts();

@@ -60,6 +60,7 @@ void AddItems(bool curves)
         return;
     }
     Bench::AddRecords();
+    Bench::AddWide();
     Bench::AddMany();
     Bench::AddVolumes();
     Bench::AddTexts();
