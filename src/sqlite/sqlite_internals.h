@@ -45,10 +45,12 @@ struct SqliteInternals {
         record.values_.reserve(fields);
     }
 
-    // Adds a field like AddValue(), but its name must come after those that the record has.
-    static void Append(SqliteValueList& record, const std::string& field, SqliteValue&& value)
+    // Adds a field like AddValue(), but faster. Its name must come after those that the record has,
+    // and a value made from `value` must be valid.
+    template <class T>
+    static void Append(SqliteValueList& record, const std::string& field, const T& value)
     {
-        record.values_.emplace_back(field, std::move(value));
+        record.values_.emplace_back(field, value);
     }
 };
 

@@ -55,8 +55,10 @@ SqliteValueList RowReader::Read(LeftOut leftOut) const
         if (!field.isThere) continue;
         if (column->isRepeated) {
             record.AddValue(column->name, field.ToValue());
+        } else if (field.text != nullptr) {
+            SqliteInternals::Append(record, column->name, field.text);
         } else {
-            SqliteInternals::Append(record, column->name, field.ToValue());
+            SqliteInternals::Append(record, column->name, field.number);
         }
     }
     return record;
@@ -65,9 +67,10 @@ SqliteValueList RowReader::Read(LeftOut leftOut) const
 RowReader::Field RowReader::ReadField(const Column& column, LeftOut leftOut) const
 {
     Field field;
-    const int type = sqlite3_column_type(statement_, column.number);
+    sqlite3_value* const value = GetValue(column);
+    const int type = sqlite3_value_type(value);
     if (type == SQLITE_INTEGER) {
-        field.number = sqlite3_column_int(statement_, column.number);
+        field.number = sqlite3_value_int(value);
     } else if (type == SQLITE_TEXT) {
         field.text = reinterpret_cast<const char*>(sqlite3_column_text(statement_, column.number));
     }

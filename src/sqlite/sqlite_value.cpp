@@ -85,9 +85,9 @@ void SortInto(Fields& fields, std::size_t unsorted)
 
 }  // namespace
 
-SqliteValue::SqliteValue(int number) : SqliteValue(Integer(number)) {}
+SqliteValue::SqliteValue(int number) : SqliteValue(Kind::Integer, std::int64_t{number}) {}
 
-SqliteValue::SqliteValue(unsigned int number) : SqliteValue(Integer(number)) {}
+SqliteValue::SqliteValue(unsigned int number) : SqliteValue(Kind::Integer, std::int64_t{number}) {}
 
 SqliteValue::SqliteValue(bool truth) : SqliteValue(Kind::Boolean, std::int64_t{truth}) {}
 

@@ -109,7 +109,8 @@ Expected MakeMap(const Names& names)
 
 TEST(SqliteValueOrderTest, FieldsAreSortedInWhateverOrderTheyAreAdded)
 {
-    for (const std::size_t count : {1, 2, 3, 32, 33, 34, 35, 67, 68, 200, 3000}) {
+    constexpr std::size_t Counts[] = {1, 2, 3, 32, 33, 34, 35, 67, 68, 200, 3000};
+    for (const std::size_t count : Counts) {
         for (const Order order : Orders) {
             const Names names = order(count);
             ExpectFields(MakeRecord(names), MakeMap(names));
