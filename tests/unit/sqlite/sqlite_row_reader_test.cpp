@@ -48,6 +48,34 @@ TEST_F(SqliteRowReaderTest, OtherColumnsAreLeftOutAndReportedInTheirOrder)
     EXPECT_EQ(leftOut, "a:5 c:4 d:2 ");
 }
 
+TEST_F(SqliteRowReaderTest, TheOrderOfTheNamesDoesNotChangeTheOrderOfTheReports)
+{
+    EXPECT_EQ(Read("SELECT NULL AS d, 2 AS c, x'00' AS b, 1 AS a"), "a:1, c:2");
+    EXPECT_EQ(leftOut, "d:5 b:4 ");
+}
+
+TEST_F(SqliteRowReaderTest, TheLastColumnOfANameCountsUnlessItIsLeftOut)
+{
+    EXPECT_EQ(Read("SELECT 1 AS b, 2 AS a, NULL AS b, 'x' AS b, NULL AS a, 3 AS c, 4 AS c"),
+              "a:2, b:'x', c:4");
+    EXPECT_EQ(leftOut, "b:5 a:5 ");
+}
+
+TEST_F(SqliteRowReaderTest, ManyColumnsAreReadInAnyOrder)
+{
+    std::string select = "SELECT 0 AS c0";
+    OrvaDRCore::SqliteValueList expected;
+    expected.AddValue("c0", 0);
+    for (int number = 1; number < 500; ++number) {
+        const int column = number * 181 % 500;
+        const std::string name = "c" + std::to_string(column);
+        select += "," + std::to_string(column) + " AS " + name;
+        expected.AddValue(name, column);
+    }
+    EXPECT_EQ(Read(select), expected.ToStr());
+    EXPECT_EQ(leftOut, "");
+}
+
 TEST_F(SqliteRowReaderTest, EachRowIsReadWithTheSameNames)
 {
     Statement statement;

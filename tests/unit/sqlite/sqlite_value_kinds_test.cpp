@@ -153,10 +153,20 @@ TEST_F(SqliteValueKindsTest, NothingElseIsReadAsAnInteger)
         string shown;
     };
     const std::vector<Row> rows{
-        {SqliteValue::Real(5), "5.0"},     {SqliteValue::Real(0.5), "0.5"},
-        {SqliteValue::Text("5"), "\"5\""}, {SqliteValue::Text("a\"'"), R"("a\"'")"},
-        {SqliteValue::Blob("5"), "X'35'"}, {SqliteValue::Null(), "null"},
-        {SqliteValue(), "null"},           {SqliteValue(true), "true"},
+        {SqliteValue::Real(5), "5.0"},
+        {SqliteValue::Real(0.5), "0.5"},
+        {SqliteValue::Real(0.1), "0.10000000000000001"},
+        {SqliteValue::Real(1e300), "1.0000000000000001e+300"},
+        {SqliteValue::Real(Infinity), "1e+9999"},
+        {SqliteValue::Real(-Infinity), "-1e+9999"},
+        {SqliteValue::Real(std::nan("")), "null"},
+        {SqliteValue(false), "false"},
+        {SqliteValue::Text("5"), "\"5\""},
+        {SqliteValue::Text("a\"'"), R"("a\"'")"},
+        {SqliteValue::Blob("5"), "X'35'"},
+        {SqliteValue::Null(), "null"},
+        {SqliteValue(), "null"},
+        {SqliteValue(true), "true"},
         {SqliteValue("5"), "\"5\""},
     };
     for (const Row& row : rows) {
@@ -227,6 +237,27 @@ TEST_F(SqliteValueKindsTest, AnAssignmentTakesTheKindButNotTheValidity)
     emptied = SqliteValue();
     EXPECT_FALSE(emptied.IsValid());
     EXPECT_FALSE(emptied.IsNull());
+}
+
+TEST_F(SqliteValueKindsTest, AMovedFromValueHoldsNothingUntilItIsAssigned)
+{
+    for (const SqliteValue& original :
+         {SqliteValue::Text("a text that is too long to be kept in place"), SqliteValue::Integer(5),
+          SqliteValue::Real(0.5), SqliteValue(true), SqliteValue::Null()}) {
+        SqliteValue value(original);
+        const SqliteValue taken(std::move(value));
+        // The moved-from value is what is tested. NOLINTBEGIN(bugprone-use-after-move)
+        EXPECT_EQ(value.ToFormatedValue(), "");
+        EXPECT_FALSE(value.IsNull());
+        EXPECT_EQ(ReadText(value, "[null] is not string"), std::nullopt);
+        EXPECT_EQ(ReadInteger(value, "[null] is not int"), std::nullopt);
+        EXPECT_EQ(ReadReal(value, "[null] is not double"), std::nullopt);
+        EXPECT_EQ(Read<bool>(value, true, "[null] is not bool"), std::nullopt);
+        // NOLINTEND(bugprone-use-after-move)
+        value = taken;
+        EXPECT_TRUE(value.IsValid());
+        EXPECT_EQ(value.ToFormatedValue(), original.ToFormatedValue());
+    }
 }
 
 TEST_F(SqliteValueKindsTest, CopiesAndMovesKeepTheKind)

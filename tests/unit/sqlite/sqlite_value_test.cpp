@@ -445,8 +445,10 @@ TEST_F(SqliteValueListTest, AMovedValueIsTakenUnlessItIsRefused)
     EXPECT_TRUE(text.IsValid());
     EXPECT_TRUE(record.AddValue("name", std::move(text)));
     EXPECT_FALSE(text.IsValid());
+    SqliteValue another("another");
+    EXPECT_TRUE(record.AddValue("name", std::move(another)));
+    EXPECT_FALSE(another.IsValid());
     // NOLINTEND(bugprone-use-after-move)
-    EXPECT_TRUE(record.AddValue("name", SqliteValue("another")));
     EXPECT_EQ(record.ToStr(), "name:'another'");
     ExpectLines({Err("AddValue", "Bad Field[] or value ['a text that is not short']")});
 }
