@@ -230,6 +230,7 @@ void AddWrite(const std::string& where, Place place, const std::string& size, st
 #endif
     if (place == Place::Disk) {
         Aim({Replaced}, OfReplacing);
+        Aim({Bare}, OfReplacing);
     } else {
         Aim({Contract}, OfContract);
     }
