@@ -92,9 +92,16 @@ double ReadRoundingTwice(Decimal decimal)
     return static_cast<double>(digits / PowerOfTen(size - LargestPower)) / 1e308;
 }
 
+// As in memory. Registers of 32-bit x86 processors hold more digits and smaller exponents.
+double Stored(double number)
+{
+    const volatile double stored = number;
+    return stored;
+}
+
 bool IsReadAs(std::string_view text, double number)
 {
-    return number == 0 || ReadRoundingTwice(Parse(text)) == std::abs(number);
+    return number == 0 || Stored(ReadRoundingTwice(Parse(text))) == std::abs(number);
 }
 
 }  // namespace
