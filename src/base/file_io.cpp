@@ -7,6 +7,8 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
+#include <cstdint>
+#include <limits>
 #include <utility>
 
 #include "base/errno.h"
@@ -16,6 +18,9 @@ namespace OrvaDRCore {
 namespace {
 
 constexpr std::size_t ReadSize = 16384;
+
+// No JSON document is larger, and no file in /proc.
+constexpr std::int64_t LargestFile = std::numeric_limits<std::int32_t>::max();
 
 }  // namespace
 
@@ -54,7 +59,10 @@ bool ReadRegularFile(const std::string& path, std::string& text, std::size_t mos
     struct stat status {};
     if (!file.IsOpen() || ::fstat(file.Get(), &status) < 0) return false;
     errno = EINVAL;
-    return S_ISREG(status.st_mode) && ReadAll(file.Get(), text, most);
+    if (!S_ISREG(status.st_mode)) return false;
+    errno = EFBIG;
+    if (most == std::string::npos && status.st_size > LargestFile) return false;
+    return ReadAll(file.Get(), text, most);
 }
 
 bool WriteAll(int fd, std::string_view text)

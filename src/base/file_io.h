@@ -35,7 +35,7 @@ class FileDescriptor {
 bool ReadAll(int fd, std::string& text, std::size_t most = std::string::npos);
 
 // Likewise, for a path. Fails without reading or waiting if that is no regular file, but a pipe, a
-// device or a socket.
+// device or a socket, and if 2 GiB or more are to be read as a whole (EFBIG).
 bool ReadRegularFile(const std::string& path, std::string& text,
                      std::size_t most = std::string::npos);
 

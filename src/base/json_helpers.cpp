@@ -267,7 +267,8 @@ bool StaysWithin(const Json::Value& value, int levels, Reals reals)
 // jsoncpp stores the length, the text and a zero byte in one block, whose size must fit an int.
 bool FitsJsonText(std::size_t length)
 {
-    return length <= static_cast<std::size_t>(Json::Value::maxInt) - sizeof(unsigned int) - 1;
+    constexpr auto Most = static_cast<std::size_t>(Json::Value::maxInt) - sizeof(unsigned int) - 1;
+    return length <= std::min(Most, std::string().max_size());
 }
 
 // jsoncpp stores the length of a name in 30 bits.

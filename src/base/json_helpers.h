@@ -15,7 +15,8 @@ namespace OrvaDRCore {
 constexpr int MaxLevels = 1000;
 
 // Whether a JSON value can hold a text, or an object a member's name, of this many bytes. jsoncpp
-// throws for texts of 2 GiB or more, and truncates texts of 4 GiB and names of 1 GiB.
+// throws for texts of 2 GiB or more, and truncates texts of 4 GiB and names of 1 GiB. On 32-bit
+// machines a std::string may hold less: 1 GiB with g++ 12.
 bool FitsJsonText(std::size_t length);
 bool FitsJsonName(std::size_t length);
 

@@ -3,11 +3,16 @@
 #include <orvadrcore/file.h>
 #include <unistd.h>
 
+#include <cstdint>
 #include <filesystem>
+#include <map>
+#include <new>
+#include <string>
 
 #include "base/file_io.h"
 #include "base/json_helpers.h"
 #include "fault.h"
+#include "support/fakes/allocation_faults.h"
 #include "support/fixtures/temp_dir.h"
 #include "support/fixtures/test_files.h"
 #include "support/processes/child_checks.h"
@@ -51,7 +56,42 @@ void ExpectReplacement(const Place& place)
     EXPECT_EQ(NamesIn(place.dir.Path()).size(), 1U) << "a temporary file is left";
 }
 
+// Lets the first `count` allocations succeed.
+class ShortMemory {
+  public:
+    explicit ShortMemory(int count)
+    {
+        left = count;
+        AskBeforeAllocating([] { return left-- <= 0; });
+    }
+    ShortMemory(const ShortMemory&) = delete;
+    ShortMemory& operator=(const ShortMemory&) = delete;
+    ~ShortMemory() { AskBeforeAllocating(nullptr); }
+
+  private:
+    static inline int left = 0;
+};
+
 }  // namespace
+
+// A 32-bit machine cannot hold it. The memory of a few megabytes stands in for that.
+TEST(FileFaults, AFileLargerThanTheMemoryLeavesTheResultAsItWas)
+{
+    const Place place("a=1\nb=2\n");
+    Lengthen(place.path, std::int64_t{3} << 30U);
+    std::map<std::string, int> pairs{{"old", 1}};
+    Json::Value value("old");
+    {
+        const ShortMemory memory(14);
+        EXPECT_THROW(File::Read(place.path, pairs), std::bad_alloc);
+    }
+    {
+        const ShortMemory memory(14);
+        EXPECT_THROW(File::Read(place.path, value), std::bad_alloc);
+    }
+    EXPECT_EQ(pairs, (std::map<std::string, int>{{"old", 1}}));
+    EXPECT_EQ(value, "old");
+}
 
 TEST(FileFaults, ToFile)
 {

@@ -8,6 +8,7 @@
 
 #include <algorithm>
 #include <array>
+#include <cstdint>
 #include <cstdlib>
 #include <filesystem>
 #include <string>
@@ -229,6 +230,23 @@ TEST_F(ReadRegularFileTest, FailsWithTheErrnoOfTheCallThatFails)
     EXPECT_FALSE(ReadRegularFile(path, text));
     EXPECT_EQ(errno, EISDIR);
     EXPECT_EQ(text, "");
+}
+
+TEST_F(ReadRegularFileTest, RefusesToReadTwoGigabytesAsAWhole)
+{
+    constexpr std::array<std::int64_t, 4> Sizes{0x7fff'ffffLL + 1, 3LL << 30U, 1LL << 32U,
+                                                (1LL << 32U) + 4};
+    for (const std::int64_t size : Sizes) {
+        WriteFile(path, "0123");
+        Lengthen(path, size);
+        std::string text;
+        errno = 0;
+        EXPECT_FALSE(ReadRegularFile(path, text)) << size;
+        EXPECT_EQ(errno, EFBIG);
+        EXPECT_EQ(text, "");
+        EXPECT_TRUE(ReadRegularFile(path, text, 4));
+        EXPECT_EQ(text, "0123");
+    }
 }
 
 TEST_F(ReadRegularFileTest, NeitherReadsNorWaitsForWhatIsNoRegularFile)

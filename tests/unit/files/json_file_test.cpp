@@ -173,6 +173,18 @@ TEST_F(JsonFileTest, AFileThatCannotBeReadLeavesTheValue)
     EXPECT_EQ(value, "old");
 }
 
+TEST_F(JsonFileTest, RefusesAFileOfThreeGigabytesWithoutReadingIt)
+{
+    WriteFile(path, "{}");
+    Lengthen(path, std::int64_t{3} << 30U);
+    faults.read = Failing(EIO);
+    Json::Value value("old");
+    errno = 0;
+    EXPECT_FALSE(fromFile(value, path));
+    EXPECT_EQ(errno, EFBIG);
+    EXPECT_EQ(value, "old");
+}
+
 TEST_F(JsonFileTest, RefusesWhatIsNoRegularFileWithoutWaiting)
 {
     for (const SpecialFile::Kind kind : SpecialFile::Kinds()) {
