@@ -23,6 +23,7 @@
 #define ORVADRCORE_CACHE_H
 
 #include <chrono>
+#include <cstdint>
 #include <memory>
 #include <string>
 
@@ -46,13 +47,13 @@ class ORVADRCORE_API Cache {
     /// up to `retries` + 2 attempts to produce data and to write it, or one if `retries` is negative.
     /// \warning If `dir` cannot be made (ERR), or one of the names is empty (WARN), the file is
     ///          /tmp/default_dr_cache, which all such caches share.
-    Cache(const std::string& dir, const std::string& file, long timeoutSeconds,
+    Cache(const std::string& dir, const std::string& file, std::int64_t timeoutSeconds,
           bool updatedRequired, int retries);
 
     /// For any user who may write to `dir` and `lockDir`, where lock and pid file are (0600). `lockDir` is
     /// an absolute path, made with mode 0700 if missing; empty is as without it. All processes must give
     /// a file the same one, and files of the same name in different `dir` different ones.
-    Cache(const std::string& dir, const std::string& file, long timeoutSeconds,
+    Cache(const std::string& dir, const std::string& file, std::int64_t timeoutSeconds,
           bool updatedRequired, int retries, const std::string& lockDir);
 
     Cache(const Cache& other);             ///< shares the file, and copies what is in memory
@@ -116,7 +117,7 @@ class ORVADRCORE_API Cache {
     /// Writes data that was produced from `begin` to `finish`, in seconds since the epoch (0 if not
     /// known). Refuses what IsValidData() refuses and what could not be loaded again: infinities,
     /// more than 999 levels, 2 GiB. On failure file and memory are as they were.
-    bool UpdateWithData(const Json::Value& data, long begin, long finish) const;
+    bool UpdateWithData(const Json::Value& data, std::int64_t begin, std::int64_t finish) const;
     bool UpdateWithData(const Json::Value& data) const;  ///< with times not known
 
   private:

@@ -7,6 +7,7 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
+#include <cstdint>
 #include <cstdlib>
 #include <cstring>
 #include <ctime>
@@ -45,9 +46,9 @@ std::timespec UsedProcessorTime()
     return used;
 }
 
-long NSecBetween(const std::timespec& begin, const std::timespec& end)
+std::int64_t NSecBetween(const std::timespec& begin, const std::timespec& end)
 {
-    constexpr long NSecPerSec = 1'000'000'000;
+    constexpr std::int64_t NSecPerSec = 1'000'000'000;
     return (end.tv_sec - begin.tv_sec) * NSecPerSec + end.tv_nsec - begin.tv_nsec;
 }
 

@@ -4,6 +4,7 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <cstdint>
 #include <ctime>
 #include <string>
 #include <utility>
@@ -52,7 +53,7 @@ std::string TextForLine(const Json::Value& value)
 
 // The state, and the steps that only Cache calls.
 struct Cache::Impl {
-    Impl(const std::string& path, long timeoutSeconds, bool updatedRequired, int retries,
+    Impl(const std::string& path, std::int64_t timeoutSeconds, bool updatedRequired, int retries,
          const std::string& lockDir)
         : file(path),
           mark(path, lockDir),
@@ -64,7 +65,7 @@ struct Cache::Impl {
 
     CacheFile file;
     UpdaterMark mark;
-    long timeout;
+    std::int64_t timeout;
     bool updatedDataRequired;
     int retryLimit;
 
@@ -76,19 +77,19 @@ struct Cache::Impl {
     [[noreturn]] void RefreshInChild(const Cache& cache) const;
 
     bool Produce(const Cache& cache, Json::Value& data, const Pause& pause) const;
-    bool Store(const Cache& cache, const Json::Value& data, long begin, long finish,
+    bool Store(const Cache& cache, const Json::Value& data, std::int64_t begin, std::int64_t finish,
                const Pause& pause);
     bool RefreshWithin(const Cache& cache, const Deadline& deadline, bool isMarked,
                        Json::Value& data);
 };
 
-Cache::Cache(const std::string& dir, const std::string& file, long timeoutSeconds,
+Cache::Cache(const std::string& dir, const std::string& file, std::int64_t timeoutSeconds,
              bool updatedRequired, int retries)
     : Cache(dir, file, timeoutSeconds, updatedRequired, retries, "")
 {
 }
 
-Cache::Cache(const std::string& dir, const std::string& file, long timeoutSeconds,
+Cache::Cache(const std::string& dir, const std::string& file, std::int64_t timeoutSeconds,
              bool updatedRequired, int retries, const std::string& lockDir)
     : impl_(std::make_unique<Impl>(GetCachedPath(dir, file), timeoutSeconds, updatedRequired,
                                    retries, lockDir))
@@ -216,13 +217,13 @@ bool Cache::Update() const
 
 bool Cache::DoUpdate() const
 {
-    const long begin = std::time(nullptr);
+    const std::int64_t begin = std::time(nullptr);
     Json::Value data;
     return impl_->Produce(*this, data, PauseBeforeProducing) &&
            UpdateWithData(data, begin, std::time(nullptr));
 }
 
-bool Cache::UpdateWithData(const Json::Value& data, long begin, long finish) const
+bool Cache::UpdateWithData(const Json::Value& data, std::int64_t begin, std::int64_t finish) const
 {
     return impl_->Store(*this, data, begin, finish, PauseBeforeWriting);
 }
@@ -322,8 +323,8 @@ bool Cache::Impl::Produce(const Cache& cache, Json::Value& data, const Pause& pa
     return false;
 }
 
-bool Cache::Impl::Store(const Cache& cache, const Json::Value& data, long begin, long finish,
-                        const Pause& pause)
+bool Cache::Impl::Store(const Cache& cache, const Json::Value& data, std::int64_t begin,
+                        std::int64_t finish, const Pause& pause)
 {
     constexpr const char* Function = "UpdateWithData";
     const bool isValid = cache.IsValidData(data);
@@ -356,7 +357,7 @@ bool Cache::Impl::RefreshWithin(const Cache& cache, const Deadline& deadline, bo
     });
     const Pause pause = PauseUntil(deadline);
     (void)cache.IsUpdatedDataRequired();  // where a subclass prepares a refresh
-    const long begin = std::time(nullptr);
+    const std::int64_t begin = std::time(nullptr);
     Json::Value fresh;
     if (!Produce(cache, fresh, pause)) return false;
     if (!Store(cache, fresh, begin, std::time(nullptr), pause)) {

@@ -6,17 +6,17 @@ namespace OrvaDRCore {
 
 namespace {
 
-std::optional<long> WholeNumber(const Json::Value& document, const char* key)
+std::optional<std::int64_t> WholeNumber(const Json::Value& document, const char* key)
 {
     const Json::Value* number = FindMember(document, key);
     if (number == nullptr || !number->isInt64()) return std::nullopt;
-    return static_cast<long>(number->asInt64());
+    return number->asInt64();
 }
 
 // A refresh whose times are not known has 0 for both.
-std::optional<long> Time(const Json::Value& document, const char* key)
+std::optional<std::int64_t> Time(const Json::Value& document, const char* key)
 {
-    const std::optional<long> time = WholeNumber(document, key);
+    const std::optional<std::int64_t> time = WholeNumber(document, key);
     return time.value_or(0) < 1 ? std::nullopt : time;
 }
 

@@ -2,6 +2,7 @@
 #ifndef ORVADRCORE_SRC_CACHE_CACHE_DOCUMENT_H
 #define ORVADRCORE_SRC_CACHE_CACHE_DOCUMENT_H
 
+#include <cstdint>
 #include <optional>
 
 #include <json/value.h>
@@ -22,10 +23,10 @@ inline constexpr const char* LongestRefresh = "max_updated_time";
 
 // What a document says about its data. What it does not say, or says in another type, is absent.
 struct CacheFacts {
-    std::optional<long> timeout;  // seconds
+    std::optional<std::int64_t> timeout;  // seconds
     Json::Value info;
-    std::optional<long> begin;  // of producing, in seconds since the epoch
-    std::optional<long> finish;
+    std::optional<std::int64_t> begin;  // of producing, in seconds since the epoch
+    std::optional<std::int64_t> finish;
     std::optional<double> lastRefresh;  // seconds
     int longestRefresh;                 // seconds; 0 if absent
 };

@@ -16,11 +16,11 @@ namespace OrvaDRCore {
 
 // What a refresh stores.
 struct CacheEntry {
-    long timeout;  // seconds
+    std::int64_t timeout;  // seconds
     Json::Value info;
     Json::Value data;
-    long begin;  // of producing, in seconds since the epoch; below 1 if not known
-    long finish;
+    std::int64_t begin;  // of producing, in seconds since the epoch; below 1 if not known
+    std::int64_t finish;
 };
 
 // The document to write, as JSON and as text.

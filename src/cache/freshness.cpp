@@ -4,24 +4,24 @@
 
 namespace OrvaDRCore {
 
-bool IsTooOld(std::time_t modifyTime, long timeoutSeconds)
+bool IsTooOld(std::time_t modifyTime, std::int64_t timeoutSeconds)
 {
     return IsTooOld(modifyTime, timeoutSeconds, std::time(nullptr));
 }
 
-bool IsTooOld(std::time_t modifyTime, long timeoutSeconds, std::time_t now)
+bool IsTooOld(std::time_t modifyTime, std::int64_t timeoutSeconds, std::time_t now)
 {
     return now == -1 || std::difftime(now, modifyTime) > static_cast<double>(timeoutSeconds);
 }
 
 bool IsFresh(const Cache& cache, const Json::Value& data, std::time_t modifyTime,
-             long timeoutSeconds)
+             std::int64_t timeoutSeconds)
 {
     return !IsTooOld(modifyTime, timeoutSeconds) && cache.IsValidData(data) &&
            !cache.IsNeedUpdate(data);
 }
 
-FreshnessWatch::FreshnessWatch(const Cache& cache, CacheFile& file, long timeoutSeconds)
+FreshnessWatch::FreshnessWatch(const Cache& cache, CacheFile& file, std::int64_t timeoutSeconds)
     : cache_(cache), file_(file), timeoutSeconds_(timeoutSeconds)
 {
 }

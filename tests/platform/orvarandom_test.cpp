@@ -80,7 +80,7 @@ TEST(OrvaRandomTest, NumbersAreEquallyLikely)
     for (const Row& row : rows) {
         const std::uint64_t range = std::uint64_t{row.max} - row.min + 1;
         ASSERT_EQ(range % row.bucketSize, 0U);
-        std::vector<double> buckets(range / row.bucketSize);
+        std::vector<double> buckets(static_cast<std::size_t>(range / row.bucketSize));
         ASSERT_LE(buckets.size(), 16U);
         for (int count = 0; count < Draws; ++count) {
             ++buckets.at((random.urandom(row.min, row.max) - row.min) / row.bucketSize);

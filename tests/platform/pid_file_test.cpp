@@ -93,6 +93,17 @@ TEST_F(PidFileTest, NamesADetachedChildThatCalls)
     });
 }
 
+// A machine that has been up for long counts more ticks than 32 bits hold.
+TEST_F(PidFileTest, ComparesAll64BitsOfTheStart)
+{
+    const unsigned long long start = OwnStart();
+    const std::string id = std::to_string(::getpid()) + "\n";
+    WriteFile(path, id + std::to_string(start) + "\n");
+    EXPECT_EQ(Read(), ::getpid());
+    WriteFile(path, id + std::to_string(start + (1ULL << 32U)) + "\n");
+    EXPECT_EQ(Read(), 0);
+}
+
 TEST_F(PidFileTest, IsReadableByAllWhateverTheUmask)
 {
     for (const mode_t mask : {0000U, 0022U, 0077U, 0777U}) {

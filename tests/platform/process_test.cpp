@@ -11,6 +11,7 @@
 #include <atomic>
 #include <climits>
 #include <csignal>
+#include <cstdint>
 #include <ctime>
 #include <filesystem>
 #include <thread>
@@ -79,6 +80,22 @@ extern "C" int clock_gettime(clockid_t clock, timespec* time) noexcept
     if (clock == CLOCK_MONOTONIC) time->tv_sec += clockAhead += clockStep;
     return result;
 }
+
+#if __SIZEOF_LONG__ == 4
+// The C++ library of a 32-bit machine may use the older function, which has 32-bit times.
+struct ShortTime {
+    std::int32_t seconds;
+    std::int32_t nanoseconds;
+};
+extern "C" int ShortClock(clockid_t clock, ShortTime* time) noexcept __asm__("clock_gettime");
+extern "C" int ShortClock(clockid_t clock, ShortTime* time) noexcept
+{
+    timespec now{};
+    const int result = ::clock_gettime(clock, &now);
+    *time = {static_cast<std::int32_t>(now.tv_sec), static_cast<std::int32_t>(now.tv_nsec)};
+    return result;
+}
+#endif
 
 namespace {
 

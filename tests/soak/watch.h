@@ -5,6 +5,7 @@
 #include <sys/types.h>
 
 #include <atomic>
+#include <ctime>
 #include <functional>
 #include <string>
 #include <thread>
@@ -20,7 +21,7 @@ namespace Soak {
 // Tells a file from the one that replaced it.
 struct Edition {
     ino_t inode = 0;
-    long seconds = 0;
+    std::time_t seconds = 0;
     long nanoseconds = 0;
 
     bool operator!=(const Edition& other) const

@@ -4,6 +4,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <cstdint>
 #include <ctime>
 #include <optional>
 
@@ -112,7 +113,7 @@ const char* StateOf(const CacheLook& look)
 {
     if (look.isMissing) return "missing";
     if (!look.facts) return "unreadable";
-    const std::optional<long>& timeout = look.facts->timeout;
+    const std::optional<std::int64_t>& timeout = look.facts->timeout;
     const bool isFresh = timeout && !OrvaDRCore::IsTooOld(look.status->st_mtime, *timeout);
     return isFresh ? "fresh" : "stale";
 }

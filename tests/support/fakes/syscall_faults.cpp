@@ -99,7 +99,7 @@ int RealStat(const char* path, struct stat* status)
 
 int RealStat64(const char* path, struct stat64* status)
 {
-    return RealFunction<decltype(::stat64)>("stat64")(path, status);
+    return RealFunction<int(const char*, struct stat64*)>("stat64")(path, status);
 }
 
 int RealLstat(const char* path, struct stat* status)
@@ -184,6 +184,7 @@ extern "C" int open(const char* path, int flags, ...)
     return Answer(&SyscallAnswers::open, RealOpen, path, flags, mode);
 }
 
+#ifndef __USE_FILE_OFFSET64  // with it the function above is open64
 extern "C" int open64(const char* path, int flags, ...)
 {
     va_list rest;
@@ -192,6 +193,7 @@ extern "C" int open64(const char* path, int flags, ...)
     va_end(rest);
     return Answer(&SyscallAnswers::open, RealOpen, path, flags | O_LARGEFILE, mode);
 }
+#endif
 
 extern "C" ssize_t read(int fd, void* buffer, std::size_t size)
 {
@@ -242,7 +244,10 @@ extern "C" int stat(const char* path, struct stat* status) noexcept
     return Answer(&SyscallAnswers::stat, RealStat, path, status);
 }
 
-extern "C" int stat64(const char* path, struct stat64* status) noexcept
+// SQLite's. On 32-bit machines stat64() is another function for us, and its structure is not SQLite's, but
+// nobody looks into that.
+extern "C" int StatOfSqlite(const char* path, struct stat64* status) noexcept __asm__("stat64");
+extern "C" int StatOfSqlite(const char* path, struct stat64* status) noexcept
 {
     return Answer(&SyscallAnswers::stat64, RealStat64, path, status);
 }

@@ -177,11 +177,20 @@ class Recorder {
                 NoteWrite(open.file, open.at, result);
                 open.at += static_cast<std::size_t>(result);
                 return;
-            case SYS_pwrite64: return NoteWrite(open.file, ToSize(Argument(3)), result);
+            case SYS_pwrite64: return NoteWrite(open.file, ToSize(SizeAt(3)), result);
+#ifdef SYS__llseek  // 32-bit machines have other calls for large files
+            case SYS__llseek:
+                return Seek(open, process_.Memory(Argument(3), sizeof(std::uint64_t)));
+            case SYS_ftruncate64: return NoteResize(open.file, ToSize(SizeAt(1)));
+            case SYS_fcntl64:
+            case SYS_fstat64:
+            case SYS_fstatat64: return;
+#else
+            case SYS_newfstatat: return;
+#endif
             case SYS_lseek: open.at = static_cast<std::size_t>(result); return;
-            case SYS_ftruncate:
-                record_.push_back({Kind::Resize, open.file, {}, {}, ToSize(Argument(1))});
-                return;
+            case SYS_ftruncate: return NoteResize(open.file, ToSize(Argument(1)));
+            case SYS_statx: return;
             case SYS_fchmod: {
                 const auto mode = static_cast<mode_t>(Argument(1)) & PermissionBits;
                 record_.push_back({Kind::SetMode, open.file, {}, {}, 0, {}, mode});
@@ -196,10 +205,32 @@ class Recorder {
             case SYS_read: open.at += static_cast<std::size_t>(result); return;
             case SYS_fcntl:
             case SYS_fstat:
-            case SYS_getdents64:
-            case SYS_newfstatat: return;
+            case SYS_getdents64: return;
             default: Refuse();
         }
+    }
+
+    // A size or position of 64 bits. On 32-bit machines it takes two arguments, the lower half first,
+    // which ARM aligns.
+    std::uint64_t SizeAt(int place) const
+    {
+        if (sizeof(long) == sizeof(std::uint64_t)) return Argument(place);
+#ifdef __arm__
+        place += place % 2;
+#endif
+        return Argument(place) | Argument(place + 1) << 32U;
+    }
+
+    static void Seek(Open& open, const std::string& position)
+    {
+        std::uint64_t at = 0;
+        position.copy(reinterpret_cast<char*>(&at), sizeof at);
+        open.at = ToSize(at);
+    }
+
+    void NoteResize(int file, std::size_t size)
+    {
+        record_.push_back({Kind::Resize, file, {}, {}, size});
     }
 
     void NoteWrite(int file, std::size_t at, std::int64_t size)

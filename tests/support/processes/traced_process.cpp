@@ -164,7 +164,8 @@ std::string TracedProcess::Memory(std::uint64_t address, std::size_t size) const
 {
     std::string bytes(size, '\0');
     iovec ours{bytes.data(), size};
-    void* const there = reinterpret_cast<void*>(address);  // NOLINT(performance-no-int-to-ptr)
+    // NOLINTNEXTLINE(performance-no-int-to-ptr)
+    void* const there = reinterpret_cast<void*>(static_cast<std::uintptr_t>(address));
     iovec theirs{there, size};
     const ssize_t count = ::process_vm_readv(pid_, &ours, 1, &theirs, 1, 0);
     bytes.resize(static_cast<std::size_t>(std::max<ssize_t>(count, 0)));

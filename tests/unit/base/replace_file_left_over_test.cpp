@@ -146,7 +146,7 @@ TEST_F(LeftOverTest, AFileOfADeadProcessIsRemovedAndOfALivingOneKept)
     EXPECT_TRUE(GoesOf({domain, Nobodys, 0}));
     EXPECT_TRUE(GoesOf({domain, zombie.Pid(), StartOf(zombie.Pid())}));
     EXPECT_TRUE(GoesOf({domain, living.Pid(), start + 1}));  // an earlier process had the id
-    for (const std::time_t age : {0L, 100 * Hour}) {
+    for (const std::time_t age : {std::time_t{0}, 100 * Hour}) {
         EXPECT_FALSE(GoesOf({domain, living.Pid(), start}, age));
         EXPECT_FALSE(GoesOf({domain, living.Pid(), 0}, age));
         EXPECT_FALSE(GoesOf({domain, ::getpid(), StartOf(::getpid())}, age));

@@ -4,6 +4,7 @@
 #include <gtest/gtest.h>
 
 #include <cerrno>
+#include <cstdint>
 #include <filesystem>
 #include <limits>
 
@@ -23,7 +24,8 @@ constexpr std::time_t SomeTime = 1'700'000'000;
 
 class CacheFileTest : public ::testing::Test {
   protected:
-    CacheDocument Compose(const Json::Value& data, long begin = 100, long finish = 103) const
+    CacheDocument Compose(const Json::Value& data, std::int64_t begin = 100,
+                          std::int64_t finish = 103) const
     {
         return file.Compose({60, "info", data, begin, finish});
     }
@@ -120,6 +122,32 @@ TEST_F(CacheFileTest, AWriteThatFailedCanBeRepeated)
     faults.Clear();
     EXPECT_TRUE(file.Write(document));
     EXPECT_EQ(file.GetData(), "new");
+}
+
+// As large file systems and network file systems number them.
+TEST_F(CacheFileTest, TellsInodesApartThatDifferIn32HighBits)
+{
+    WriteFile(path, "{}");
+    std::uint64_t inode = 7;
+    faults.stat = [&](const char* name, struct stat* status) {
+        const int result = RealStat(name, status);
+        status->st_ino = inode;
+        return result;
+    };
+    const auto before = file.GetVersion();
+    EXPECT_TRUE(before == file.GetVersion());
+    inode += std::uint64_t{1} << 32U;
+    EXPECT_FALSE(before == file.GetVersion());
+}
+
+TEST_F(CacheFileTest, TellsSizesApartThatDifferBy4Gigabytes)
+{
+    WriteFile(path, "{}");
+    SetModifyTime(path, SomeTime);
+    const auto before = file.GetVersion();
+    Lengthen(path, (std::int64_t{1} << 32U) + 2);
+    SetModifyTime(path, SomeTime);
+    EXPECT_FALSE(before == file.GetVersion());
 }
 
 // The document around the value is a level of its own.

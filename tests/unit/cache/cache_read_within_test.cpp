@@ -100,7 +100,8 @@ TEST_F(CacheReadWithinTest, ARefreshIsPreparedBeforeItProduces)
 
 TEST_F(CacheReadWithinTest, DataThatWasJustProducedIsFreshWhateverTheTimeoutSays)
 {
-    for (const long timeout : {0L, -1L, std::numeric_limits<long>::min()}) {
+    for (const std::int64_t timeout :
+         std::initializer_list<std::int64_t>{0, -1, std::numeric_limits<std::int64_t>::min()}) {
         TestCache always = Another(false, 0, timeout);
         always.isNeedUpdate = [](const Json::Value&) { return true; };
         EXPECT_EQ(Ask(always, NoTime), CacheState::Fresh);
@@ -167,7 +168,7 @@ TEST_F(CacheReadWithinTest, ADefaultValueIsNeverFreshOrOldData)
 {
     Mark();
     cache.isValid = [](const Json::Value&) { return true; };
-    TestCache forever = Another(false, 0, std::numeric_limits<long>::max());
+    TestCache forever = Another(false, 0, std::numeric_limits<std::int64_t>::max());
     forever.isValid = cache.isValid;
     EXPECT_EQ(Ask(NoTime), CacheState::None);
     EXPECT_EQ(Ask(forever, NoTime), CacheState::None);
@@ -275,7 +276,7 @@ TEST_F(CacheReadWithinTest, OldAndUnwantedFilesThatArriveAreNotFresh)
 TEST_F(CacheReadWithinTest, WhatALaterRefreshBringsIsFreshWhateverTheRulesSay)
 {
     const std::time_t now = std::time(nullptr);
-    for (const long timeout : {0L, -1L}) {
+    for (const int timeout : {0, -1}) {
         Mark();
         TestCache always = Another(false, 0, timeout);
         always.isNeedUpdate = [](const Json::Value&) { return true; };

@@ -1,6 +1,7 @@
 // When a cache is too old, and when its reader must have fresh data.
 #include <orvadrcore/cache.h>
 
+#include <cstdint>
 #include <filesystem>
 #include <limits>
 #include <string>
@@ -18,8 +19,8 @@ class CacheStalenessTest : public CacheFixture {};
 TEST_F(CacheStalenessTest, AFileOlderThanTheTimeoutIsStale)
 {
     struct Row {
-        long timeout;
-        long age;
+        std::int64_t timeout;
+        std::int64_t age;
         bool isTimeout;
     };
     const std::vector<Row> table = {
@@ -36,8 +37,8 @@ TEST_F(CacheStalenessTest, AFileOlderThanTheTimeoutIsStale)
         {1'000'000'000, 1'000'000'000, false},
         {1'000'000'000, 1'000'000'001, true},
         {5'000'000'000, Now, false},
-        {std::numeric_limits<long>::max(), Now, false},
-        {std::numeric_limits<long>::min(), -1'000'000, true},
+        {std::numeric_limits<std::int64_t>::max(), Now, false},
+        {std::numeric_limits<std::int64_t>::min(), -1'000'000, true},
     };
     StopClock();
     WriteCache("data");
@@ -73,7 +74,7 @@ TEST_F(CacheStalenessTest, WithoutAClockEveryFileIsStale)
     StopClock(-1);
     WriteCache("data", Now);
     EXPECT_TRUE(cache.IsTimeout());
-    EXPECT_TRUE(Another(false, 0, std::numeric_limits<long>::max()).IsTimeout());
+    EXPECT_TRUE(Another(false, 0, std::numeric_limits<std::int64_t>::max()).IsTimeout());
 }
 
 TEST_F(CacheStalenessTest, TimesInTheFileDoNotCount)

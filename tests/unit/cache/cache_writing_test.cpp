@@ -5,6 +5,7 @@
 #include <sys/stat.h>
 
 #include <cerrno>
+#include <cstdint>
 #include <filesystem>
 #include <functional>
 #include <limits>
@@ -39,8 +40,9 @@ TEST_F(CacheWritingTest, TheFileHoldsAllSevenKeys)
 
 TEST_F(CacheWritingTest, TimesAndTimeoutAreIntegersOf64Bits)
 {
-    for (const long timeout : {std::numeric_limits<long>::max(), std::numeric_limits<long>::min(),
-                               5'000'000'000L, -1L, 0L}) {
+    using Limits = std::numeric_limits<std::int64_t>;
+    const std::vector<std::int64_t> timeouts{Limits::max(), Limits::min(), 5'000'000'000, -1, 0};
+    for (const std::int64_t timeout : timeouts) {
         const TestCache each = Another(false, 0, timeout);
         EXPECT_TRUE(each.UpdateWithData("data", 4'294'967'297, 4'294'967'299));
         EXPECT_TRUE(Same(Document()["timeout"], Json::Int64{timeout}));
@@ -52,10 +54,10 @@ TEST_F(CacheWritingTest, TimesAndTimeoutAreIntegersOf64Bits)
 
 TEST_F(CacheWritingTest, OneUnknownTimeMakesBothUnknown)
 {
-    constexpr long Min = std::numeric_limits<long>::min();
+    constexpr std::int64_t Min = std::numeric_limits<std::int64_t>::min();
     struct Row {
-        long begin;
-        long finish;
+        std::int64_t begin;
+        std::int64_t finish;
         Json::Int64 beginWritten;
         Json::Int64 finishWritten;
         double took;
@@ -87,7 +89,7 @@ TEST_F(CacheWritingTest, TheLongestRefreshOnlyIncreases)
 {
     struct Row {
         const char* before;
-        long took;
+        std::int64_t took;
         int longest;
     };
     const std::vector<Row> table = {

@@ -6,6 +6,7 @@
 
 #include <cfloat>
 #include <climits>
+#include <cstdint>
 #include <map>
 #include <random>
 #include <sstream>
@@ -412,8 +413,8 @@ TEST_F(FileKeyValueTest, ATextWithoutANumberGivesZeroAndSucceeds)
 
 TEST_F(FileKeyValueTest, ConvertsEveryTypeThatStreamsWriteAndRead)
 {
-    long large = 0;
-    EXPECT_TRUE(File::toType(std::string("4294967297"), large, 0L));
+    std::int64_t large = 0;
+    EXPECT_TRUE(File::toType(std::string("4294967297"), large, std::int64_t{0}));
     EXPECT_EQ(large, 4294967297);
     std::string text;
     EXPECT_TRUE(File::toType(12, text, std::string()));

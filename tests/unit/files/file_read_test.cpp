@@ -10,6 +10,7 @@
 
 #include <array>
 #include <cerrno>
+#include <cstdint>
 #include <cstdio>
 #include <filesystem>
 #include <string>
@@ -311,7 +312,7 @@ TEST_F(FileReadDescriptorTest, ALineCutOffByAFailedReadIsIgnored)
         char* const begin = end - row.readable.size();
         row.readable.copy(begin, row.readable.size());
         const int fd = OpenFile("/proc/self/mem", O_RDONLY);
-        const auto offset = reinterpret_cast<off_t>(begin);
+        const auto offset = static_cast<off_t>(reinterpret_cast<std::uintptr_t>(begin));
         ASSERT_EQ(::lseek(fd, offset, SEEK_SET), offset);
         Json::Value value("old");
         EXPECT_EQ(File::Read(fd, value), row.document != nullptr);

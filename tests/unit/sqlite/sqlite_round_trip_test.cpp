@@ -83,7 +83,7 @@ class Generator {
     // Mostly quotes, zero bytes and letters.
     std::string Bytes()
     {
-        std::string bytes(Below(20), '\0');
+        std::string bytes(static_cast<std::size_t>(Below(20)), '\0');
         for (char& byte : bytes) {
             byte = Below(2) == 0 ? "'\0aZ"[Below(4)] : static_cast<char>(Below(256));
         }
