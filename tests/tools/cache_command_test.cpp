@@ -7,6 +7,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <cstdint>
 #include <ctime>
 #include <filesystem>
 #include <string>
@@ -32,7 +33,7 @@ constexpr long Timeout = 3600;
 class CacheCommandTest : public ::testing::Test {
   protected:
     // Writes the cache file, as a refresh does that took from `begin` to `finish`.
-    void Write(long begin = 1000, long finish = 1003) const
+    void Write(std::int64_t begin = 1000, std::int64_t finish = 1003) const
     {
         EXPECT_TRUE(cache.UpdateWithData("data", begin, finish));
     }
@@ -120,6 +121,18 @@ TEST_F(CacheCommandTest, TakesACacheFromTheFutureForFreshAsTheLibraryDoes)
     EXPECT_LE(fresh["age_seconds"].asInt(), -7000);
     EXPECT_FALSE(cache.IsTimeout());
     EXPECT_THAT(RunOrvadr({"cache", path}).out, HasSubstr("  -"));
+}
+
+TEST_F(CacheCommandTest, ShowsTimesAfterJanuary2038)
+{
+    constexpr std::int64_t In2040 = 2'208'988'800;
+    Write(In2040, In2040 + 3);
+    SetModifyTime(path, In2040 + 3);
+    const Json::Value look = Look(AllWell);
+    EXPECT_EQ(look["begin"], Json::Int64{In2040});
+    EXPECT_EQ(look["finish"], Json::Int64{In2040 + 3});
+    EXPECT_NEAR(look["age_seconds"].asDouble(),
+                static_cast<double>(std::time(nullptr) - (In2040 + 3)), 60);
 }
 
 TEST_F(CacheCommandTest, TakesACacheWithoutATimeOutForStale)

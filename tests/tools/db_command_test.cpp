@@ -134,6 +134,15 @@ TEST_F(DbCommandTest, ShowsADatabaseThatIsWhole)
     EXPECT_EQ(whole["holders"].size(), 0U);
 }
 
+TEST_F(DbCommandTest, ShowsTheSizeOfAFileOfThreeGigabytes)
+{
+    Make(MakeNodes);
+    Lengthen(path, std::int64_t{3} << 30U);
+    const Answer answer = Ask({"db", path});
+    EXPECT_EQ(answer.code, AllWell) << answer.err;
+    EXPECT_EQ(answer.Only()["size_bytes"], Json::Int64{std::int64_t{3} << 30U});
+}
+
 TEST_F(DbCommandTest, TakesAnEmptyFileForAnEmptyDatabase)
 {
     WriteFile(path, "");
