@@ -68,6 +68,15 @@ install_missing() {
         apt-get install -y --no-install-recommends "${missing[@]}"
 }
 
+# debian_mirror: where this system gets Debian from.
+debian_mirror() {
+    local mirror
+    mirror=$(sed -nE 's#^(URIs:|deb( \[[^]]*\])?) *(https?://[^ ]+).*#\3#p' \
+        /etc/apt/sources.list /etc/apt/sources.list.d/* 2>/dev/null | grep debian.org | grep -v security |
+        head -n 1 || true)
+    echo "${mirror:-http://deb.debian.org/debian}"
+}
+
 # build PRESET [CMAKE-OPTION...]: configures and builds build/PRESET.
 build() {
     local preset=$1
@@ -78,14 +87,23 @@ build() {
     quietly "$preset-build" cmake --build --preset "$preset" -j "$(nproc)"
 }
 
-# build_package: builds with the flags of Debian's own packages. CMake ignores CPPFLAGS, so they are
-# added to CXXFLAGS.
+# build_package [PRESET]: builds with the flags of Debian's own packages. CMake ignores CPPFLAGS, so they
+# are added to CXXFLAGS.
 build_package() (
     CXXFLAGS="$(dpkg-buildflags --get CXXFLAGS) $(dpkg-buildflags --get CPPFLAGS)"
     LDFLAGS="$(dpkg-buildflags --get LDFLAGS) -Wl,-z,now"
     export CXXFLAGS LDFLAGS
-    build package
+    build "${1:-package}"
 )
+
+# prepare_cross_build ARCH: installs Debian's cross compiler and fetches that machine's libraries.
+prepare_cross_build() {
+    [[ -e cmake/toolchains/$1.cmake ]] || fail "cannot build for '$1'; see cmake/toolchains"
+    install_missing dpkg-dev
+    # It warns that the compiler of this machine is another one.
+    install_missing "g++-$(dpkg-architecture -a "$1" -q DEB_HOST_GNU_TYPE 2>/dev/null)" qemu-user-static
+    [[ -e build/sysroot/$1.dpkg/status ]] || scripts/sysroot "$1"
+}
 
 # read_by_tidy GREP-OPTION...: runs clang-tidy on the sources whose paths grep selects.
 read_by_tidy() {
