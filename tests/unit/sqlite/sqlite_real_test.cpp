@@ -17,6 +17,15 @@ namespace {
 
 using Limits = std::numeric_limits<double>;
 
+// SQLite before 3.43 reads with long doubles. On x86 they have 64 binary digits, and some of the shortest
+// texts come out one unit off. With 113, as on 64-bit ARM, none does. With 53, those of a double, as on
+// 32-bit ARM, many do, whatever their number of digits.
+constexpr int SqliteDigits = std::numeric_limits<long double>::digits;
+constexpr bool SqliteIsExact = SqliteDigits > Limits::digits;
+constexpr double Misread = 0.612256287772801;
+constexpr const char* MisreadText =
+    SqliteDigits == 64 ? "0.61225628777280094" : "0.612256287772801";
+
 std::string Written(double number)
 {
     std::string text;
@@ -52,7 +61,9 @@ class SqliteRealTest : public ::testing::Test {
     {
         const std::string text = Written(number);
         EXPECT_EQ(Read(text), number) << text;
-        EXPECT_EQ(Stored(text), StoredValue(number)) << text;
+        if (SqliteIsExact) {
+            EXPECT_EQ(Stored(text), StoredValue(number)) << text;
+        }
     }
 
     PlainDb db{":memory:"};
@@ -115,15 +126,15 @@ TEST_F(SqliteRealTest, TheTextIsAppended)
     EXPECT_EQ(text, "load=0.25");
 }
 
-// SQLite 3.40 reads the shortest texts of these, 0.612256287772801 and so on, one unit off.
+// SQLite 3.40 on x86 reads the shortest texts of these, 0.612256287772801 and so on, one unit off.
 TEST_F(SqliteRealTest, MoreDigitsAreWrittenWhereSqliteWouldMisreadTheShortestText)
 {
-    for (const double number : {0.612256287772801, 0.3365092606871323, 1.681137253005582e-19,
+    for (const double number : {Misread, 0.3365092606871323, 1.681137253005582e-19,
                                 2267144481.729038, 1.344263423175451e+308}) {
         ExpectReadBack(number);
         ExpectReadBack(-number);
     }
-    EXPECT_EQ(Written(0.612256287772801), "0.61225628777280094");
+    EXPECT_EQ(Written(Misread), MisreadText);
 }
 
 // Among them are the denormals that need 18 and 19 digits.
@@ -156,6 +167,7 @@ TEST_F(SqliteRealTest, TheSmallestNumbersAreAtMostOneUnitOff)
                               OfBits((random() >> 12U) | 0x3ff0000000000000U);
         const std::string text = Written(number);
         EXPECT_EQ(Read(text), number) << text;
+        if (!SqliteIsExact) continue;
         const double stored = std::get<double>(Stored(text));
         EXPECT_LE(stored, std::nextafter(number, 1)) << text;
         EXPECT_GE(stored, std::nextafter(number, 0)) << text;
@@ -166,7 +178,7 @@ TEST_F(SqliteRealTest, TheLocaleDoesNotMatter)
 {
     const GlobalLocale locale(new CommaDecimals);
     EXPECT_EQ(Written(0.5), "0.5");
-    EXPECT_EQ(Written(0.612256287772801), "0.61225628777280094");
+    EXPECT_EQ(Written(Misread), MisreadText);
 }
 
 }  // namespace
