@@ -126,24 +126,26 @@ void ExpectInOrder(std::size_t first, std::initializer_list<std::size_t> offsets
               offsets.end());
 }
 
-constexpr std::size_t BehindTable = sizeof(void*);  // of virtual operations
+// The first place for a member of that type, after the pointer to the table of virtual operations.
+template <class Member = void*>
+constexpr std::size_t BehindTable = std::max(sizeof(void*), alignof(Member));
 constexpr std::size_t BehindCommand = sizeof(SqliteCommand);
 
 TEST(MemberTest, ValuesAndRecordsKeepTheirOrder)
 {
     ExpectInOrder(0, {offsetof(SqliteValue, valid_), offsetof(SqliteValue, kind_),
                       offsetof(SqliteValue, payload_)});
-    ExpectInOrder(BehindTable,
+    ExpectInOrder(BehindTable<SqliteValue>,
                   {offsetof(SqliteValueList, invalidValue_), offsetof(SqliteValueList, values_),
                    offsetof(SqliteValueList, unsorted_)});
-    EXPECT_EQ(sizeof(SqliteRecord), BehindTable);
+    EXPECT_EQ(sizeof(SqliteRecord), BehindTable<>);
 }
 
 TEST(MemberTest, CommandsKeepTheirOrder)
 {
-    ExpectInOrder(BehindTable,
+    ExpectInOrder(BehindTable<>,
                   {offsetof(SqliteTableHandler, name_), offsetof(SqliteTableHandler, schema_)});
-    ExpectInOrder(BehindTable, {offsetof(SqliteCommand, table_)});
+    ExpectInOrder(BehindTable<>, {offsetof(SqliteCommand, table_)});
     ExpectInOrder(BehindCommand,
                   {offsetof(InsertCommand, replacable_), offsetof(InsertCommand, fieldValues_)});
     ExpectInOrder(BehindCommand,
@@ -170,16 +172,17 @@ TEST(MemberTest, TransactionsKeepTheirOrder)
 TEST(MemberTest, LocksAndCachesKeepTheirOrder)
 {
     ExpectInOrder(0, {offsetof(FileLock, fd_), offsetof(FileLock, path_)});
-    ExpectInOrder(BehindTable, {offsetof(Cache, impl_)});
+    ExpectInOrder(BehindTable<>, {offsetof(Cache, impl_)});
 }
 
 TEST(MemberTest, RequestsAndResponsesKeepTheirOrder)
 {
-    ExpectInOrder(BehindTable,
+    ExpectInOrder(BehindTable<>,
                   {offsetof(Request, version_), offsetof(Request, timeout_),
                    offsetof(Request, api_), offsetof(Request, method_), offsetof(Request, params_),
                    offsetof(Request, encryptRequired_), offsetof(Request, uploadFile_)});
-    ExpectInOrder(BehindTable, {offsetof(Response, emptyValue_), offsetof(Response, resp_)});
+    ExpectInOrder(BehindTable<Json::Value>,
+                  {offsetof(Response, emptyValue_), offsetof(Response, resp_)});
 }
 
 }  // namespace
