@@ -25,6 +25,14 @@ const char* const FileName = "main.db";  // relative: messages show it
 
 std::string* logged = nullptr;  // lines go here during an operation
 
+// After a wait that was in vain, SQLite does not wait in the next prepare either, and the
+// shortcuts may need one prepare more. Any prepare ends that.
+void ForgetWait(sqlite3* handle)
+{
+    sqlite3_stmt* none = nullptr;
+    if (handle != nullptr) sqlite3_prepare_v2(handle, "", -1, &none, nullptr);
+}
+
 // The number of the source's line does not count: "sqlite_db.cpp:81(Exec)[ERR][4242]: ...".
 void CaptureLine(int priority, const char* format, std::va_list arguments)
 {
@@ -113,6 +121,7 @@ std::string Side::Run(const Operation& operation, std::uint64_t seed)
 {
     Enter();
     SeedSqlite(seed);
+    for (const auto& db : dbs_) ForgetWait(db->Connection().GetHandle());
     outcome_.clear();
     atPause_ = {};
     atWait_ = {};
