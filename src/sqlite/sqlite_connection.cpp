@@ -124,7 +124,6 @@ bool SqliteConnection::Execute(const std::string& command)
 
 bool SqliteConnection::Insert(const InsertCommand& command)
 {
-    shape_.isSelect = false;
     if (!WriteInsertShape(command, shape_.text)) return ExecuteText(command.GetCommand());
     StatementCache::Cached cached;
     const std::optional<int> code =
@@ -134,36 +133,43 @@ bool SqliteConnection::Insert(const InsertCommand& command)
     return *code == SQLITE_DONE;
 }
 
-// Whether the statement of the shape may be cached and run now. A cached statement may have become
-// wrong since it was prepared, and notices that only when it has taken its lock, while a text fails
-// before. So it must not wait for a lock, which takes our own waiting, nor take one that stays.
-bool SqliteConnection::MayRunShape()
+// Whether a cached statement may run now. It may have become wrong since it was prepared, and notices
+// that only when it has taken its lock, while a new one fails before. So it must not wait for a
+// lock, which takes our own waiting, nor take one that stays.
+bool SqliteConnection::MayRunCached(bool isSelect)
 {
     return wait_.IsInstalled() && cache_.IsUsable(handle_) &&
-           (!IsInTransaction() || HoldsLock(handle_, shape_.isSelect));
+           (!IsInTransaction() || HoldsLock(handle_, isSelect));
 }
 
-// Steps the statement of the shape once. Returns SQLite's code, or none if the text must be run
-// instead: because a lock was met, or because SQLite's message might show parameters.
-std::optional<int> SqliteConnection::BeginShape(const Bind& bind, StatementCache::Cached& cached)
+// Steps a statement once, without waiting for a lock if it was cached. Returns SQLite's code, or none
+// if a lock was met. Then the statement has done nothing, and must be prepared anew.
+std::optional<int> SqliteConnection::StepFirst(StatementCache::Cached& cached)
 {
-    int code = cache_.Take(handle_, shape_.text, cached);
-    if (code == SQLITE_ERROR) return {};
-    if (code != SQLITE_OK) return code;
-    if (bind(cached.statement.get()) != SQLITE_OK) return {};
+    if (!cached.WasCached()) return sqlite3_step(cached.statement.get());
     wait_.RefuseToWait();
-    code = sqlite3_step(cached.statement.get());
-    const bool metLock = wait_.AcceptToWait() && code == SQLITE_BUSY;
-    if (!metLock) return code;
+    const int code = sqlite3_step(cached.statement.get());
+    if (!wait_.AcceptToWait() || code != SQLITE_BUSY) return code;
     cache_.Keep(std::move(cached));
     return {};
 }
 
-// The same for a statement that writes, until its end. The message of a failure is there as long as
-// the statement.
+// Begins to run the statement of the shape. Returns SQLite's code, or none if the text must be run
+// instead: because a lock was met, or because SQLite's message might show parameters.
+std::optional<int> SqliteConnection::BeginShape(const Bind& bind, StatementCache::Cached& cached)
+{
+    const int code = cache_.Take(handle_, shape_.text, cached);
+    if (code == SQLITE_ERROR) return {};
+    if (code != SQLITE_OK) return code;
+    if (bind(cached.statement.get()) != SQLITE_OK) return {};
+    return StepFirst(cached);
+}
+
+// Runs the statement of the shape, which writes. The result is that of BeginShape(). SQLite's message
+// of a failure is there as long as the statement.
 std::optional<int> SqliteConnection::ExecuteShape(const Bind& bind, StatementCache::Cached& cached)
 {
-    if (!MayRunShape()) return {};
+    if (!MayRunCached(false)) return {};
     if (!IsInTransaction()) wait_.Yield();
     const StatementWatch::Changes before = watch_.BeginCached();
     std::optional<int> code = BeginShape(bind, cached);
@@ -224,8 +230,12 @@ bool SqliteConnection::Select(const std::string& command, const TakeRow& takeRow
     });
     const StatementWatch::Changes before = watch_.CountChanges();
     const char* message = nullptr;
-    Keeping keeping = Keeping::No;
-    int code = BeginSelect(command, !access.IsLeftToSqlite(), cached, keeping);
+    const bool mayRunCached = !access.IsLeftToSqlite() && MayRunCached(true);
+    const bool isShape =
+        mayRunCached && ShortcutsInUse().shapes && ReadShape(command, shape_) && shape_.isSelect;
+    std::optional<int> begun;
+    if (mayRunCached) begun = isShape ? BeginShape(cached) : BeginText(command, cached);
+    int code = begun ? *begun : BeginNew(command, cached);
     // After a failure it is given back later, because that changes SQLite's message.
     if (code == SQLITE_ROW || code == SQLITE_DONE) lookup_.GiveBack();
     if (code == SQLITE_ROW) code = TakeRows(cached.statement.get(), takeRow, message);
@@ -234,31 +244,32 @@ bool SqliteConnection::Select(const std::string& command, const TakeRow& takeRow
         return false;
     }
     if (sqlite3_stmt_readonly(cached.statement.get()) == 0) NoteChangesSince(before);
-    if (handle_ == handle && keeping == Keeping::ByText) cache_.KeepSelect(std::move(cached));
-    if (handle_ == handle && keeping == Keeping::ByShape) cache_.Keep(std::move(cached));
+    if (handle_ == handle && begun) {
+        isShape ? cache_.Keep(std::move(cached)) : cache_.KeepSelect(std::move(cached));
+    }
     error_.Set(0);
     return true;
 }
 
-// Prepares a select and steps it once. Returns SQLite's code. `mayRunShape` is whether this connection
-// waits for locks as ever.
-int SqliteConnection::BeginSelect(const std::string& command, bool mayRunShape,
-                                  StatementCache::Cached& cached, Keeping& keeping)
+// Begins to run the select of the shape. The literals are copied, because the caller may change the
+// text while rows are given to it.
+std::optional<int> SqliteConnection::BeginShape(StatementCache::Cached& cached)
 {
-    int code = SQLITE_OK;
-    if (mayRunShape && ShortcutsInUse().shapes && ReadShape(command, shape_) && shape_.isSelect &&
-        MayRunShape()) {
-        // The caller may change the text while rows are given to it, so the literals are copied.
-        const std::optional<int> shapeCode = BeginShape(
-            [this](sqlite3_stmt* made) { return BindLiterals(made, shape_, SQLITE_TRANSIENT); },
-            cached);
-        if (shapeCode) keeping = Keeping::ByShape;
-        if (shapeCode) return *shapeCode;
-        code = PrepareStatement(handle_, command, cached.statement);
-    } else {
-        keeping = Keeping::ByText;
-        code = cache_.Take(handle_, command, cached);
-    }
+    return BeginShape(
+        [this](sqlite3_stmt* made) { return BindLiterals(made, shape_, SQLITE_TRANSIENT); },
+        cached);
+}
+
+std::optional<int> SqliteConnection::BeginText(const std::string& command,
+                                               StatementCache::Cached& cached)
+{
+    const int code = cache_.Take(handle_, command, cached);
+    return code == SQLITE_OK ? StepFirst(cached) : code;
+}
+
+int SqliteConnection::BeginNew(const std::string& command, StatementCache::Cached& cached)
+{
+    const int code = PrepareStatement(handle_, command, cached.statement);
     return code == SQLITE_OK ? sqlite3_step(cached.statement.get()) : code;
 }
 

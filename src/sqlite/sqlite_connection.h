@@ -107,14 +107,14 @@ class SqliteConnection {
   private:
     using Bind = std::function<int(sqlite3_stmt*)>;
 
-    enum class Keeping { No, ByText, ByShape };
-
-    bool MayRunShape();
+    bool MayRunCached(bool isSelect);
+    std::optional<int> StepFirst(StatementCache::Cached& cached);
     std::optional<int> BeginShape(const Bind& bind, StatementCache::Cached& cached);
+    std::optional<int> BeginShape(StatementCache::Cached& cached);
+    std::optional<int> BeginText(const std::string& command, StatementCache::Cached& cached);
+    int BeginNew(const std::string& command, StatementCache::Cached& cached);
     std::optional<int> ExecuteShape(const Bind& bind, StatementCache::Cached& cached);
     bool ExecuteText(const std::string& command);
-    int BeginSelect(const std::string& command, bool mayRunShape, StatementCache::Cached& cached,
-                    Keeping& keeping);
     int TakeRows(sqlite3_stmt* statement, const TakeRow& takeRow, const char*& message);
     void EndSelect(sqlite3* handle);
     void NoteChangesSince(const StatementWatch::Changes& before);

@@ -31,6 +31,8 @@ class StatementCache {
         Statement statement;
         int bytes = 0;          // of its memory; 0 until it is put back for the first time
         std::string_view text;  // SQLite's copy of it
+
+        bool WasCached() const { return bytes != 0; }
     };
 
     // Whether statements may be cached now. If not, the cache is empty afterwards.
