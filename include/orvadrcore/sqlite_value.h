@@ -22,7 +22,6 @@
 #include <string>
 #include <type_traits>
 #include <utility>
-#include <variant>
 #include <vector>
 
 #include <orvadrcore/export.h>
@@ -101,8 +100,7 @@ class ORVADRCORE_API SqliteValue {
   private:
     friend struct SqliteInternals;
 
-    // What the payload is: an integer (0 or 1 for a boolean), a real, or the bytes of a text or
-    // blob. A plain text is one that is not escaped.
+    // What a value holds. A plain text is one that is not escaped.
     enum class Kind : unsigned char {
         Nothing,
         Boolean,
@@ -114,14 +112,19 @@ class ORVADRCORE_API SqliteValue {
         Null
     };
 
-    using Payload = std::variant<std::int64_t, double, std::string>;
+    union Number {
+        std::int64_t integer;  // also of a boolean, 1 or 0
+        double real;
+    };
 
-    ORVADRCORE_LOCAL SqliteValue(Kind kind, Payload&& payload) noexcept;
+    ORVADRCORE_LOCAL SqliteValue(Kind kind, std::int64_t number) noexcept;
+    ORVADRCORE_LOCAL SqliteValue(Kind kind, double number) noexcept;
     ORVADRCORE_LOCAL SqliteValue(Kind kind, const char* bytes, std::size_t length);
 
     bool valid_ = false;
     Kind kind_ = Kind::Nothing;
-    Payload payload_;
+    Number number_{};
+    std::string bytes_;  // of a text or a blob
 };
 
 /// \cond SPECIALISATIONS

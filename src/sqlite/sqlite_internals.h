@@ -22,20 +22,15 @@ struct SqliteInternals {
     }
 
     // What a value of the kind holds: an integer or a boolean, a real, a text or a blob.
-    static std::int64_t IntegerOf(const SqliteValue& value)
-    {
-        return std::get<std::int64_t>(value.payload_);
-    }
-    static double RealOf(const SqliteValue& value) { return std::get<double>(value.payload_); }
-    static const std::string& BytesOf(const SqliteValue& value)
-    {
-        return std::get<std::string>(value.payload_);
-    }
+    static std::int64_t IntegerOf(const SqliteValue& value) { return value.number_.integer; }
+    static double RealOf(const SqliteValue& value) { return value.number_.real; }
+    static const std::string& BytesOf(const SqliteValue& value) { return value.bytes_; }
 
     // Moves what a value holds. Like an assignment, it does not take over whether it is valid.
     static void Move(SqliteValue& to, SqliteValue& from) noexcept
     {
-        to.payload_ = std::move(from.payload_);
+        to.number_ = from.number_;
+        to.bytes_.swap(from.bytes_);
         to.kind_ = std::exchange(from.kind_, Kind::Nothing);
     }
 

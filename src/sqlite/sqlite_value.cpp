@@ -101,16 +101,21 @@ SqliteValue::SqliteValue(const char* text)
 {
 }
 
-SqliteValue::SqliteValue(Kind kind, Payload&& payload) noexcept
-    : valid_(true), kind_(kind), payload_(std::move(payload))
+SqliteValue::SqliteValue(Kind kind, std::int64_t number) noexcept : valid_(true), kind_(kind)
 {
+    number_.integer = number;
+}
+
+SqliteValue::SqliteValue(Kind kind, double number) noexcept : valid_(true), kind_(kind)
+{
+    number_.real = number;
 }
 
 SqliteValue::SqliteValue(Kind kind, const char* bytes, std::size_t length)
     : valid_(bytes != nullptr && FitsJsonText(length)), kind_(valid_ ? kind : Kind::Nothing)
 {
     if (valid_) {
-        payload_.emplace<std::string>(bytes, length);
+        bytes_.assign(bytes, length);
     } else if (bytes != nullptr) {
         DR_LOG(Err, "text of [%zu] bytes is too long for a value", length);
     }
@@ -148,13 +153,14 @@ SqliteValue SqliteValue::Blob(const std::string& bytes)
 
 SqliteValue SqliteValue::Null()
 {
-    return {Kind::Null, Payload()};
+    return {Kind::Null, std::int64_t{0}};
 }
 
 SqliteValue::SqliteValue(SqliteValue&& other) noexcept
     : valid_(other.valid_),
       kind_(std::exchange(other.kind_, Kind::Nothing)),
-      payload_(std::move(other.payload_))
+      number_(other.number_),
+      bytes_(std::move(other.bytes_))
 {
 }
 

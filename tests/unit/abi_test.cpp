@@ -134,7 +134,7 @@ constexpr std::size_t BehindCommand = sizeof(SqliteCommand);
 TEST(MemberTest, ValuesAndRecordsKeepTheirOrder)
 {
     ExpectInOrder(0, {offsetof(SqliteValue, valid_), offsetof(SqliteValue, kind_),
-                      offsetof(SqliteValue, payload_)});
+                      offsetof(SqliteValue, number_), offsetof(SqliteValue, bytes_)});
     ExpectInOrder(BehindTable<SqliteValue>,
                   {offsetof(SqliteValueList, invalidValue_), offsetof(SqliteValueList, values_),
                    offsetof(SqliteValueList, unsorted_)});

@@ -21,7 +21,7 @@ constexpr const char* NullText = nullptr;
 
 const string ZeroByte("a\0'b", 4);
 
-// A value is no larger than a text, what tells a text from a number, and what tells its kind.
+// A value is no larger than a text, a number, and what tells its kind.
 static_assert(sizeof(SqliteValue) <= sizeof(string) + 2 * sizeof(std::int64_t));
 
 class SqliteValueKindsTest : public LoggedTest {
