@@ -4,7 +4,11 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <filesystem>
+#include <regex>
+
 #include "support/fixtures/temp_dir.h"
+#include "support/fixtures/test_files.h"
 
 namespace {
 
@@ -41,6 +45,17 @@ TEST(CallersTest, EachReadsWhatTheOtherHasWritten)
     const std::vector<std::string> second = WideCaller.results(dir.Path());
     EXPECT_THAT(first, Contains("inserted 1"));
     EXPECT_THAT(second, Contains(HasSubstr("\"year\" : 2040")));
+}
+
+TEST(CallersTest, NoPublicHeaderNamesATypeWhoseSizeTheyChoose)
+{
+    const std::regex types(
+        R"(\b(time_t|off_t|ino_t|timespec|timeval|struct (stat|dirent|flock))\b)");
+    const std::filesystem::path headers = ORVADR_SOURCE_DIR "/include/orvadrcore";
+    for (const auto& header : std::filesystem::directory_iterator(headers)) {
+        const std::string path = header.path().string();
+        EXPECT_FALSE(std::regex_search(ReadFile(path), types)) << path;
+    }
 }
 
 }  // namespace

@@ -77,7 +77,8 @@ class RandomValues {
         std::string text;
         for (std::uint64_t length = Below(24); length > 0; --length) {
             const bool isAny = Below(3) > 0;
-            text += isAny ? static_cast<char>(Below(256)) : "ab/\"\\\n\t\x7f"s[Below(8)];
+            text += isAny ? static_cast<char>(Below(256))
+                          : "ab/\"\\\n\t\x7f"s[static_cast<std::size_t>(Below(8))];
         }
         return text;
     }
