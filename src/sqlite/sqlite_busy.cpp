@@ -107,9 +107,20 @@ void BusyWait::NoteUnlocked()
 int BusyWait::OnBusy(void* self, int count)
 {
     auto& wait = *static_cast<BusyWait*>(self);
-    if (wait.refusesToWait_ && !HasChanges(wait.handle_)) return 0;
+    if (wait.refusesToWait_ && !HasChanges(wait.handle_)) {
+        wait.hasRefused_ = true;
+        return 0;
+    }
     wait.refusesToWait_ = false;
     return wait.Pause(count == 0) ? 1 : 0;
+}
+
+bool BusyWait::AcceptToWait()
+{
+    // After a refusal SQLite does not ask again while it prepares the next statement, unless the
+    // handler is set anew.
+    if (std::exchange(hasRefused_, false) && IsInstalled()) TakeBack();
+    return std::exchange(refusesToWait_, false);
 }
 
 bool BusyWait::Pause(bool isFirst)

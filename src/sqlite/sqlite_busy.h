@@ -61,7 +61,7 @@ class BusyWait {
     void RefuseToWait() { refusesToWait_ = true; }
 
     // Returns whether there was no wait meanwhile: a statement that met a lock has failed at once.
-    bool AcceptToWait() { return std::exchange(refusesToWait_, false); }
+    bool AcceptToWait();
 
   private:
     using Clock = std::chrono::steady_clock;
@@ -74,6 +74,7 @@ class BusyWait {
     Microseconds Between(Microseconds shortest, Microseconds longest);
 
     sqlite3* handle_ = nullptr;
+    bool hasRefused_ = false;
     bool refusesToWait_ = false;
     std::minstd_rand random_;
 

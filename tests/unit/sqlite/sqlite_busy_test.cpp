@@ -325,4 +325,20 @@ TEST_F(SqliteBusyTest, WhenTheTimeoutCannotBeSetNothingIsWaitedFor)
     ExpectSqlitesWaiting(db, 20);
 }
 
+TEST_F(SqliteBusyTest, AStaleCachedStatementLeavesTheWaitingToItsText)
+{
+    const std::string update = "UPDATE jobs SET id=1 WHERE id=2";
+    ASSERT_TRUE(db.Open());
+    ASSERT_TRUE(db.Exec(update));
+    Run("DROP TABLE jobs");
+    SqliteValueList record;
+    ASSERT_TRUE(db.SelectByCommand("SELECT 1 FROM sqlite_master", record));
+    const LockHolder holder(path);
+    pauses.ForgetWaits();
+    // SQLite waits even for a table that it does not know, to see whether the schema has changed.
+    EXPECT_FALSE(db.DoExecSqliteCommand(update));
+    EXPECT_GE(Sum(pauses.Waits()), Second);
+    ExpectErr(db, 404, ErrorText({update, SQLITE_ERROR, "no such table: jobs"}));
+}
+
 }  // namespace
