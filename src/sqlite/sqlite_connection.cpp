@@ -326,7 +326,6 @@ bool SqliteConnection::LookUp(const std::string& table, bool& isFound)
         SetFailure(TableLookup::Query(table), code, nullptr);
         return false;
     }
-    if (lookup_.TakeChange()) cache_.Clear();
     if (!lookup_.IsKnown(table)) {
         if (!Select(TableLookup::Query(table), takeRow)) return false;
         if (isFound) lookup_.Remember(table);

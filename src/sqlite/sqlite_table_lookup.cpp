@@ -38,7 +38,6 @@ int TableLookup::Check(sqlite3* handle)
 {
     GiveBack();
     if (check_ == nullptr) {
-        hasChanged_ = true;
         const int code = PrepareStatement(handle, CheckText, check_);
         if (code != SQLITE_OK) return code;
     }
@@ -48,7 +47,6 @@ int TableLookup::Check(sqlite3* handle)
     constexpr int SetBack = 1;
     if (sqlite3_stmt_status(check_.get(), SQLITE_STMTSTATUS_REPREPARE, SetBack) != 0) {
         tables_.clear();
-        hasChanged_ = true;
     }
     return code;
 }

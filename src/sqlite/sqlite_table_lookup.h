@@ -6,7 +6,6 @@
 
 #include <string>
 #include <unordered_set>
-#include <utility>
 
 #include "sqlite/sqlite_statement.h"
 #include "sqlite/sqlite_watch.h"
@@ -34,9 +33,6 @@ class TableLookup {
     // a success. A failed check must be given back, too, after its message was read.
     int Check(sqlite3* handle);
 
-    // After a check that succeeded: whether the schema has changed since the last call.
-    bool TakeChange() { return std::exchange(hasChanged_, false); }
-
     // Ends the check, which gives back the lock outside of a transaction.
     void GiveBack();
 
@@ -51,7 +47,6 @@ class TableLookup {
   private:
     Statement check_;
     bool isChecking_ = false;  // the statement runs
-    bool hasChanged_ = false;  // and TakeChange() has not told so yet
     std::unordered_set<std::string> tables_;
 };
 

@@ -3,7 +3,6 @@
 
 #include <orvadrcore/sqlite_db.h>
 
-#include <algorithm>
 #include <cstdio>
 #include <fstream>
 #include <utility>
@@ -283,27 +282,6 @@ TEST_F(SqliteTableLookupTest, ANewFileIsLookedAtAfterOpeningAgain)
     std::remove(path.c_str());
     ASSERT_TRUE(db.Open());
     ExpectExists(false);
-}
-
-TEST_F(SqliteTableLookupTest, CachedSelectsAreDroppedWhenTheSchemaHasChanged)
-{
-    // A stale one takes its lock before SQLite prepares it again, so it may fail in another way.
-    const std::string ids = "SELECT id FROM jobs";
-    const auto select = [&] {
-        SqliteValueList row;
-        prepared.clear();
-        EXPECT_TRUE(db.SelectByCommand(ids, row));
-        return std::count(prepared.begin(), prepared.end(), ids);
-    };
-    FindJobs();
-    CountFromHereOn();
-    EXPECT_EQ(select(), 1);
-    EXPECT_TRUE(db.IsTableExisted("jobs"));
-    EXPECT_EQ(select(), 0);
-    Run("CREATE TABLE others (id)");
-    EXPECT_TRUE(db.IsTableExisted("jobs"));
-    EXPECT_EQ(select(), 1);
-    EXPECT_EQ(select(), 0);
 }
 
 // ----------------------------------------------------------------------------------------- failures
