@@ -78,6 +78,25 @@ bool CommitWork(SqliteDB& db)
            db.DeleteRecord("id=1", ExistingNodes) && transaction.Commit();
 }
 
+// Each statement runs twice: when it was just prepared, and when it was cached.
+bool CommitCachedWork(SqliteDB& db)
+{
+    SqliteTransaction transaction(db);
+    if (!transaction.Begin()) return false;
+    for (const int id : {4, 5}) {
+        InsertCommand insert = InsertOf(id, 'd');
+        insert.SetTable(ExistingNodes);
+        if (!db.InsertRecord(insert)) return false;
+    }
+    for (const std::string id : {"2", "3"}) {
+        SqliteValueList record;
+        if (!db.SelectByCommand("SELECT id FROM nodes WHERE id=" + id, record)) return false;
+        EXPECT_EQ(record.ToStr(), "id:" + id);
+        if (!db.DeleteRecord("id=" + id, ExistingNodes)) return false;
+    }
+    return transaction.Commit();
+}
+
 bool RollBackWork(SqliteDB& db)
 {
     SqliteTransaction transaction(db);
@@ -166,6 +185,7 @@ const std::vector<Operation>& Operations()
          },
          "2x,3c"},
         {"a transaction that is committed", CommitWork, "2x,3x,4x,5x"},
+        {"a transaction of cached statements", CommitCachedWork, "1a,4d,5d"},
         {"a transaction that is rolled back", RollBackWork, Before},
         {"a transaction that is abandoned", AbandonWork, Before},
     };
