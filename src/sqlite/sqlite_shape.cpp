@@ -4,7 +4,6 @@
 
 #include <algorithm>
 #include <cstring>
-#include <initializer_list>
 
 namespace OrvaDRCore {
 
@@ -225,20 +224,21 @@ class ShapeReader {
         return SkipBlanks();
     }
 
+    // One of = == != <> < <= > >=.
     bool AcceptOperator()
     {
-        for (const char* sign : {"<=", ">=", "<>", "!=", "==", "=", "<", ">"}) {
-            const std::size_t length = std::strlen(sign);
-            if (std::strncmp(at_, sign, length) != 0) continue;
-            at_ += length;
-            return SkipBlanks();
-        }
-        return false;
+        const bool isLess = *at_ == '<';
+        if (!isLess && *at_ != '=' && *at_ != '>' && *at_ != '!') return false;
+        const bool isSingle = *at_++ != '!';
+        const bool isDouble = *at_ == '=' || (isLess && *at_ == '>');
+        if (isDouble) ++at_;
+        return (isSingle || isDouble) && SkipBlanks();
     }
 
     bool AcceptWord(std::string_view word)
     {
-        if (std::strncmp(at_, word.data(), word.size()) != 0 || IsNamePart(at_[word.size()])) {
+        if (*at_ != word.front() || std::strncmp(at_, word.data(), word.size()) != 0 ||
+            IsNamePart(at_[word.size()])) {
             return false;
         }
         at_ += word.size();

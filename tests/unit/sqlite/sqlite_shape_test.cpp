@@ -227,6 +227,8 @@ TEST(SqliteShapeTest, OtherConditionsHaveNoShape)
                 {"NULL", "a=NULL"},
                 {"a name", "a=b"},
                 {"a number on the left", "5=a"},
+                {"an unknown operator", "a!5"},
+                {"another unknown operator", "a=>5"},
                 {"an expression", "a=5+6"},
                 {"a name with quotes", "\"a\"=5"},
                 {"a name with a table", "t.a=5"},
