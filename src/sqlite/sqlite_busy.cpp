@@ -102,6 +102,15 @@ void BusyWait::NoteUnlocked()
     yieldUntil_ = now + std::min<Clock::duration>(turn / 2, LongestPause);
 }
 
+bool BusyWait::AcceptToWait()
+{
+    refusesToWait_ = false;
+    if (!std::exchange(hasRefused_, false)) return false;
+    // After a refusal SQLite would not wait in the next prepare, either.
+    if (IsInstalled()) TakeBack();
+    return true;
+}
+
 // SQLite calls this when it meets a lock, with the number of earlier calls for the same lock, and
 // retries unless the result is 0.
 int BusyWait::OnBusy(void* self, int count)
@@ -113,14 +122,6 @@ int BusyWait::OnBusy(void* self, int count)
     }
     wait.refusesToWait_ = false;
     return wait.Pause(count == 0) ? 1 : 0;
-}
-
-bool BusyWait::AcceptToWait()
-{
-    // After a refusal SQLite does not ask again while it prepares the next statement, unless the
-    // handler is set anew.
-    if (std::exchange(hasRefused_, false) && IsInstalled()) TakeBack();
-    return std::exchange(refusesToWait_, false);
 }
 
 bool BusyWait::Pause(bool isFirst)

@@ -60,7 +60,7 @@ class BusyWait {
     // From now on a statement that meets a lock before it has changed anything fails at once.
     void RefuseToWait() { refusesToWait_ = true; }
 
-    // Returns whether there was no wait meanwhile: a statement that met a lock has failed at once.
+    // Ends that. Returns whether a statement met a lock meanwhile, and did not wait for it.
     bool AcceptToWait();
 
   private:
@@ -74,8 +74,8 @@ class BusyWait {
     Microseconds Between(Microseconds shortest, Microseconds longest);
 
     sqlite3* handle_ = nullptr;
-    bool hasRefused_ = false;
     bool refusesToWait_ = false;
+    bool hasRefused_ = false;  // since RefuseToWait()
     std::minstd_rand random_;
 
     // All pauses of the statement that waits or has waited last: as they were asked for, as long as

@@ -29,14 +29,17 @@ constexpr Bracket Transaction{"BEGIN IMMEDIATE", "COMMIT", "ROLLBACK"};
 constexpr Bracket Savepoint{"SAVEPOINT orvadr_insert", "RELEASE orvadr_insert",
                             "ROLLBACK TO orvadr_insert; RELEASE orvadr_insert"};
 
-// Inside of a transaction: whether it has the lock that a statement needs.
-bool HoldsLock([[maybe_unused]] sqlite3* handle, [[maybe_unused]] bool isSelect)
+// Whether a statement takes no lock that stays after its failure, and waits for each that it meets.
+// SQLite does not wait when a connection that reads begins to write.
+bool TakesPlainLock([[maybe_unused]] sqlite3* handle, bool isInTransaction,
+                    [[maybe_unused]] bool isSelect)
 {
 #if SQLITE_VERSION_NUMBER >= 3034000
-    const int needed = isSelect ? SQLITE_TXN_READ : SQLITE_TXN_WRITE;
-    return sqlite3_txn_state(handle, "main") >= needed;
+    const int state = sqlite3_txn_state(handle, "main");
+    if (!isInTransaction) return isSelect || state == SQLITE_TXN_NONE;
+    return state >= (isSelect ? SQLITE_TXN_READ : SQLITE_TXN_WRITE);
 #else
-    return false;
+    return !isInTransaction;
 #endif
 }
 
@@ -139,7 +142,7 @@ bool SqliteConnection::Insert(const InsertCommand& command)
 bool SqliteConnection::MayRunCached(bool isSelect)
 {
     return wait_.IsInstalled() && cache_.IsUsable(handle_) &&
-           (!IsInTransaction() || HoldsLock(handle_, isSelect));
+           TakesPlainLock(handle_, IsInTransaction(), isSelect);
 }
 
 // Steps a statement once, without waiting for a lock if it was cached. Returns SQLite's code, or none
@@ -149,8 +152,10 @@ std::optional<int> SqliteConnection::StepFirst(StatementCache::Cached& cached)
     if (!cached.WasCached()) return sqlite3_step(cached.statement.get());
     wait_.RefuseToWait();
     const int code = sqlite3_step(cached.statement.get());
-    if (!wait_.AcceptToWait() || code != SQLITE_BUSY) return code;
-    cache_.Keep(std::move(cached));
+    const bool metLock = wait_.AcceptToWait();
+    if (!metLock || code == SQLITE_ROW || code == SQLITE_DONE) return code;
+    if (code == SQLITE_BUSY) cache_.Keep(std::move(cached));
+    cached.statement.reset();  // prepared again in vain, without a look at the changed schema
     return {};
 }
 
