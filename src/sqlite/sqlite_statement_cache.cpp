@@ -9,8 +9,8 @@ namespace OrvaDRCore {
 namespace {
 
 // Room for the statements of a few tables in a program's loops.
-constexpr std::size_t MaxCached = 24;
-constexpr int MaxBytes = 48 * 1024;
+constexpr std::size_t MaxCached = 20;
+constexpr int MaxBytes = 36 * 1024;
 
 // A list of thousands of values seldom comes twice, and its statement takes much memory.
 constexpr std::size_t MaxSelectLength = 1024;

@@ -13,7 +13,7 @@
 namespace OrvaDRCore {
 
 // The statements that were used last: selects by their text, and statements by their shape, which has
-// parameters in the place of literals. There are up to 24, which take up to 48 KiB.
+// parameters in the place of literals. There are up to 20, which take up to 36 KiB.
 //
 // A statement that is taken belongs to its user. Others may be taken meanwhile, even for the same
 // text, which is then prepared once more.

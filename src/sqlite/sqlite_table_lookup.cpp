@@ -10,9 +10,9 @@ namespace {
 // second part makes SQLite check the schema.
 constexpr const char* CheckText = "SELECT 1 UNION ALL SELECT 1 FROM sqlite_master";
 
-// Bounds the memory of a program that invents names. When there are more, all are forgotten.
-constexpr std::size_t MaxTables = 4096;
-constexpr std::size_t MaxNameLength = 255;
+// All names together take less than 20 KB. When there are more, all are forgotten.
+constexpr std::size_t MaxTables = 128;
+constexpr std::size_t MaxNameLength = 64;
 
 // Whether the query asks for this very name: no quote ends it, and no zero byte ends the query.
 bool IsWholeName(const std::string& table)

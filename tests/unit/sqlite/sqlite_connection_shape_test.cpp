@@ -158,7 +158,7 @@ TEST_F(SqliteConnectionShapeTest, TheStatementsOfAConnectionTakeLittleMemory)
         bytes += sqlite3_stmt_status(statement, SQLITE_STMTSTATUS_MEMUSED, 0);
     }
     EXPECT_GT(count, 1);
-    EXPECT_LE(bytes, 48 * 1024);
+    EXPECT_LE(bytes, 36 * 1024);
 }
 
 // ----------------------------------------------------------------------------------------- failures

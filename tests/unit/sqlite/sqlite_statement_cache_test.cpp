@@ -137,9 +137,9 @@ TEST_F(SqliteStatementCacheTest, TheMostRecentSelectsAreCached)
 {
     ASSERT_TRUE(db.Open());
     const auto number = [](int value) { return "SELECT " + std::to_string(value) + " AS x"; };
-    for (int value = 1; value <= 24; ++value) Select(number(value));
+    for (int value = 1; value <= 20; ++value) Select(number(value));
     EXPECT_EQ(Select(number(1)), "x:1; cached");  // now that of 2 is the oldest
-    EXPECT_EQ(Select(number(25)), "x:25; prepared");
+    EXPECT_EQ(Select(number(21)), "x:21; prepared");
     EXPECT_EQ(Select(number(1)), "x:1; cached");
     EXPECT_EQ(Select(number(3)), "x:3; cached");
     EXPECT_EQ(Select(number(2)), "x:2; prepared");
