@@ -210,7 +210,8 @@ void PrintObjects()
 int main()
 {
     try {
-        Require(std::getenv("GLIBC_TUNABLES") != nullptr, "GLIBC_TUNABLES is not set");
+        const char* tunables = std::getenv("GLIBC_TUNABLES");  // NOLINT(concurrency-mt-unsafe)
+        Require(tunables != nullptr, "GLIBC_TUNABLES is not set");
         PrintConnections();
         PrintObjects();
     } catch (const std::exception& failure) {
