@@ -15,12 +15,14 @@ constexpr std::size_t MaxValues = 256;
 constexpr std::size_t MaxBytes = 65'536;
 
 // Whether binding a value stores what its literal stores. A quote in a plain text ends the literal,
-// and a zero byte ends the statement. SQLite reads the literal of a real in its own way.
+// and a zero byte ends the statement. SQLite reads the literal of a real in its own way,
+// and may index a bound blob as another text than its literal, in a database of UTF-16.
 bool IsBoundAsWritten(const SqliteValue& value)
 {
     using Kind = SqliteInternals::Kind;
     switch (SqliteInternals::KindOf(value)) {
         case Kind::Nothing:
+        case Kind::Blob:
         case Kind::Real: return false;
         case Kind::Boolean:
         case Kind::Integer:
@@ -29,7 +31,6 @@ bool IsBoundAsWritten(const SqliteValue& value)
     }
     const std::string& bytes = SqliteInternals::BytesOf(value);
     if (bytes.size() > MaxBytes) return false;
-    if (SqliteInternals::KindOf(value) == Kind::Blob) return true;
     const bool isPlain = SqliteInternals::KindOf(value) == Kind::PlainText;
     return bytes.find('\0') == std::string::npos &&
            (!isPlain || bytes.find('\'') == std::string::npos);
