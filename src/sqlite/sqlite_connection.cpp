@@ -323,6 +323,8 @@ bool SqliteConnection::LookUp(const std::string& table, bool& isFound)
         lookup_.GiveBack();
         if (!IsInTransaction()) wait_.NoteUnlocked();
     });
+    // Then the lock may end with the query, as a full-text table's does.
+    const bool wasReading = !TakesPlainLock(handle_, false, false);
     const int code = [&] {
         const BusyTimeoutAccess access(wait_, watch_, table);
         return lookup_.Check(handle_);
@@ -338,7 +340,7 @@ bool SqliteConnection::LookUp(const std::string& table, bool& isFound)
     }
     isFound = true;
     error_.Set(0);
-    if (isLookupLockKept_ && !IsInTransaction()) giveBack.Dismiss();
+    if (isLookupLockKept_ && !IsInTransaction() && !wasReading) giveBack.Dismiss();
     return true;
 }
 
