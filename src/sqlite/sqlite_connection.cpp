@@ -323,8 +323,10 @@ bool SqliteConnection::LookUp(const std::string& table, bool& isFound)
         lookup_.GiveBack();
         if (!IsInTransaction()) wait_.NoteUnlocked();
     });
-    // Then the lock may end with the query, as a full-text table's does.
-    const bool wasReading = !TakesPlainLock(handle_, false, false);
+    // If the connection reads already, the lock may end with the query, as a full-text table's does.
+    // A select from a temporary table would keep the lock to its end, but needs none.
+    const bool mayKeepLock = isLookupLockKept_ && !IsInTransaction() &&
+                             TakesPlainLock(handle_, false, false) && !watch_.HasTempTables();
     const int code = [&] {
         const BusyTimeoutAccess access(wait_, watch_, table);
         return lookup_.Check(handle_);
@@ -340,7 +342,7 @@ bool SqliteConnection::LookUp(const std::string& table, bool& isFound)
     }
     isFound = true;
     error_.Set(0);
-    if (isLookupLockKept_ && !IsInTransaction() && !wasReading) giveBack.Dismiss();
+    if (mayKeepLock) giveBack.Dismiss();
     return true;
 }
 

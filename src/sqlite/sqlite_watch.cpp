@@ -33,6 +33,15 @@ bool IsSchemaPragma(const char* name)
            sqlite3_stricmp(name, "schema_version") == 0;
 }
 
+// SQLite reports "CREATE TABLE temp.t" as it reports other tables.
+bool MakesTempTable(int action, const char* database)
+{
+    const bool makesTable = action == SQLITE_CREATE_TABLE || action == SQLITE_CREATE_TEMP_TABLE ||
+                            action == SQLITE_CREATE_VIEW || action == SQLITE_CREATE_TEMP_VIEW ||
+                            action == SQLITE_CREATE_VTABLE;
+    return makesTable && sqlite3_stricmp(database, "temp") == 0;
+}
+
 }  // namespace
 
 void StatementWatch::Start(sqlite3* handle)
@@ -40,6 +49,7 @@ void StatementWatch::Start(sqlite3* handle)
     handle_ = handle;
     isBusyTimeoutSet_ = false;
     isSchemaUnguarded_ = false;
+    hasTempTables_ = false;
     allRows_ = 0;
     sqlite3_set_authorizer(handle_, Note, this);
 }
@@ -52,12 +62,13 @@ void StatementWatch::Stop()
 
 // SQLite calls this while it prepares a statement, before the statement does anything.
 int StatementWatch::Note(void* watch, int action, const char* name, const char* value,
-                         const char* /*database*/, const char* /*trigger*/)
+                         const char* database, const char* /*trigger*/)
 {
     auto& self = *static_cast<StatementWatch*>(watch);
     const bool setsPragma = action == SQLITE_PRAGMA && value != nullptr;
     if (setsPragma && sqlite3_stricmp(name, "busy_timeout") == 0) self.isBusyTimeoutSet_ = true;
     if (setsPragma && IsSchemaPragma(name)) self.isSchemaUnguarded_ = true;
+    if (MakesTempTable(action, database)) self.hasTempTables_ = true;
     const bool beginsOrEnds = action == SQLITE_TRANSACTION || action == SQLITE_SAVEPOINT;
     // Outside of a transaction such a statement can only begin one.
     if (beginsOrEnds && sqlite3_get_autocommit(self.handle_) != 0) ++self.transactions_;

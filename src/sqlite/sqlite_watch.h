@@ -35,6 +35,9 @@ class StatementWatch {
     // not notice.
     bool IsSchemaUnguarded() const { return isSchemaUnguarded_; }
 
+    // Whether a statement has made a temporary table or view, which may hide a table of the file.
+    bool HasTempTables() const { return hasTempTables_; }
+
     struct Changes {
         // Statements that insert, update or delete rows. A CREATE TABLE is none.
         std::uint64_t statements;
@@ -66,6 +69,7 @@ class StatementWatch {
     std::uint64_t transactions_ = 0;
     bool isBusyTimeoutSet_ = false;
     bool isSchemaUnguarded_ = false;
+    bool hasTempTables_ = false;
     bool isForbidden_ = false;
     Changes changes_{};
     std::int64_t allRows_ = 0;  // CountAllRows() when changes_ was counted

@@ -188,6 +188,16 @@ TEST_F(SqliteLookupLockTest, InATransactionTheLookupEndsFirst)
     EXPECT_FALSE(IsFileLocked(path));
 }
 
+// Its callback could not write to the file with another connection.
+TEST_F(SqliteLookupLockTest, ASelectFromATemporaryTableGetsNoLock)
+{
+    ASSERT_TRUE(db.Exec("CREATE TEMP TABLE jobs (id); INSERT INTO jobs VALUES (7)"));
+    ASSERT_TRUE(db.SelectEach(command, [this](const SqliteRow&) {
+        EXPECT_FALSE(IsFileLocked(path));
+        return true;
+    }));
+}
+
 TEST_F(SqliteLookupLockTest, OnlyTheFirstAttemptGetsTheLock)
 {
     failures = 2;

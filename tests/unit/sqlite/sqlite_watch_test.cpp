@@ -84,6 +84,24 @@ TEST_F(StatementWatchTest, SeesThePragmasThatHideChangesOfTheSchema)
     }
 }
 
+TEST_F(StatementWatchTest, SeesTemporaryTablesAndViews)
+{
+    for (const char* text : {"CREATE TABLE jobs (id)", "CREATE VIEW ids AS SELECT 1",
+                             "CREATE VIRTUAL TABLE words USING fts5(word)"}) {
+        Run(text);
+        EXPECT_FALSE(watch.HasTempTables()) << text;
+    }
+    for (const char* text :
+         {"CREATE TEMP TABLE jobs (id)", "CREATE TABLE temp.jobs AS SELECT 1 AS id",
+          "CREATE TEMPORARY VIEW jobs AS SELECT 1",
+          "CREATE VIRTUAL TABLE Temp.jobs USING fts5(id)"}) {
+        db = OpenInMemory(watch);
+        EXPECT_FALSE(watch.HasTempTables());
+        Run(text);
+        EXPECT_TRUE(watch.HasTempTables()) << text;
+    }
+}
+
 TEST_F(StatementWatchTest, CountsStatementsThatChangeRowsAndTheirRows)
 {
     struct Row {
