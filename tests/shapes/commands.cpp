@@ -61,7 +61,7 @@ constexpr std::array<const char*, 24> Queries = {
     "SELECT a,sum(c) FROM $t WHERE $c=$v GROUP BY a HAVING a>$v",
     "VALUES($v)",
     "WITH x AS (SELECT * FROM $t) SELECT * FROM x WHERE $c=$v",
-    "SELECT changes(),total_changes()",
+    "SELECT total_changes()",
     "EXPLAIN QUERY PLAN SELECT * FROM $t WHERE $c=$v",
     "SELECT type,name FROM sqlite_master",
     "SELECT * FROM $t WHERE $c=$v; SELECT 2",

@@ -33,6 +33,10 @@ void ForgetWait(sqlite3* handle)
     if (handle != nullptr) sqlite3_prepare_v2(handle, "", -1, &none, nullptr);
 }
 
+// Longer than a connection that had to wait pauses before its next write. That pause is no wait for a
+// lock, and would be taken for one.
+constexpr int TurnMSec = 1000;
+
 // The number of the source's line does not count: "sqlite_db.cpp:81(Exec)[ERR][4242]: ...".
 void CaptureLine(int priority, const char* format, std::va_list arguments)
 {
@@ -121,6 +125,7 @@ std::string Side::Run(const Operation& operation, std::uint64_t seed)
 {
     Enter();
     SeedSqlite(seed);
+    AdvanceClock(TurnMSec);
     for (const auto& db : dbs_) ForgetWait(db->Connection().GetHandle());
     outcome_.clear();
     atPause_ = {};
