@@ -318,6 +318,12 @@ bool SqliteConnection::LookUp(const std::string& table, bool& isFound)
     if (!lookup_.CanCheck(handle_, watch_, table)) {
         return Select(TableLookup::Query(table), takeRow);
     }
+    const bool isInTransaction = IsInTransaction();
+    const TableLookup::Moment now{watch_.CountTransactions(), watch_.CountSchemaStatements()};
+    if (isInTransaction && lookup_.WasCheckedAt(now) && lookup_.IsKnown(table)) {
+        error_.Set(0);
+        return isFound = true;
+    }
     error_.Set(ERR::ERR_DATABASE_OPERATION);
     ScopeGuard giveBack([&] {
         lookup_.GiveBack();
@@ -325,7 +331,7 @@ bool SqliteConnection::LookUp(const std::string& table, bool& isFound)
     });
     // If the connection reads already, the lock may end with the query, as a full-text table's does.
     // A select from a temporary table would keep the lock to its end, but needs none.
-    const bool mayKeepLock = isLookupLockKept_ && !IsInTransaction() &&
+    const bool mayKeepLock = isLookupLockKept_ && !isInTransaction &&
                              TakesPlainLock(handle_, false, false) && !watch_.HasTempTables();
     const int code = [&] {
         const BusyTimeoutAccess access(wait_, watch_, table);
@@ -335,21 +341,15 @@ bool SqliteConnection::LookUp(const std::string& table, bool& isFound)
         SetFailure(TableLookup::Query(table), code, nullptr);
         return false;
     }
+    if (isInTransaction) lookup_.NoteCheckAt(now);
     if (!lookup_.IsKnown(table)) {
         if (!Select(TableLookup::Query(table), takeRow)) return false;
         if (isFound) lookup_.Remember(table);
         return true;
     }
-    isFound = true;
     error_.Set(0);
     if (mayKeepLock) giveBack.Dismiss();
-    return true;
-}
-
-void SqliteConnection::KeepLookupLock(bool isKept)
-{
-    isLookupLockKept_ = isKept;
-    if (!isKept) lookup_.GiveBack();
+    return isFound = true;
 }
 
 bool SqliteConnection::RunAtomically(bool isNested, const std::function<bool()>& work)

@@ -84,7 +84,11 @@ class SqliteConnection {
     // While kept, a lookup that finds its table outside of a transaction leaves its shared lock to
     // the first attempt of the next select, which gives it back after its first step. Nothing of the
     // caller's code, no log line and no pause may come in between. False gives it back.
-    void KeepLookupLock(bool isKept);
+    void KeepLookupLock(bool isKept)
+    {
+        isLookupLockKept_ = isKept;
+        if (!isKept) lookup_.GiveBack();
+    }
 
     // One attempt to do work in a transaction of its own or, nested, in a savepoint of the open
     // transaction. When the work or the commit fails, all of it is rolled back.

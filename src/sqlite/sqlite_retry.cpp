@@ -1,5 +1,6 @@
 #include "sqlite/sqlite_retry.h"
 
+#include <optional>
 #include <utility>
 
 #include <orvadrcore/utils.h>
@@ -21,19 +22,20 @@ Attempts RunWithRetries(SqliteError& error, unsigned int limit,
                         const std::function<bool()>& attempt,
                         const std::function<bool()>& mayRepeat)
 {
-    Json::Value entries;
+    std::optional<Json::Value> entries;  // most operations succeed, and need none
     const auto attemptAndNote = [&] {
         error.Set(0);
         if (attempt()) return true;
-        entries.append(error.AsEntry());
+        if (!entries) entries.emplace();
+        entries->append(error.AsEntry());
         return false;
     };
     const auto pause = [] { RandomSleepInMSec(MinPauseMSec, MaxPauseMSec); };
     const RetryOutcome outcome = Retry(limit, attemptAndNote, pause, mayRepeat);
 
     Attempts attempts{outcome.succeeded, static_cast<unsigned int>(outcome.failures), {}};
-    if (outcome.failures > 0) attempts.errors = toString(entries);
-    if (!outcome.succeeded) error.SetFailures(std::move(entries));
+    if (outcome.failures > 0) attempts.errors = toString(*entries);
+    if (!outcome.succeeded) error.SetFailures(std::move(*entries));
     return attempts;
 }
 

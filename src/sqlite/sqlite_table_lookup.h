@@ -4,6 +4,7 @@
 
 #include <sqlite3.h>
 
+#include <cstdint>
 #include <string>
 #include <unordered_set>
 
@@ -33,6 +34,19 @@ class TableLookup {
     // a success. A failed check must be given back, too, after its message was read.
     int Check(sqlite3* handle);
 
+    // Within a transaction a check holds until a statement may have changed the schema: the lock that
+    // it took stays.
+    struct Moment {
+        std::uint64_t transaction;
+        std::uint64_t schemaStatements;
+    };
+    void NoteCheckAt(const Moment& now) { checked_ = now; }
+    bool WasCheckedAt(const Moment& now) const
+    {
+        return checked_.transaction == now.transaction &&
+               checked_.schemaStatements == now.schemaStatements;
+    }
+
     // Ends the check, which gives back the lock outside of a transaction.
     void GiveBack();
 
@@ -47,6 +61,7 @@ class TableLookup {
   private:
     Statement check_;
     bool isChecking_ = false;  // the statement runs
+    Moment checked_{};
     std::unordered_set<std::string> tables_;
 };
 

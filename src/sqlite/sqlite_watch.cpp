@@ -33,6 +33,15 @@ bool IsSchemaPragma(const char* name)
            sqlite3_stricmp(name, "schema_version") == 0;
 }
 
+// Those of statements that only read and write rows, and of BEGIN, COMMIT and ROLLBACK.
+bool LeavesSchemaAlone(int action)
+{
+    constexpr std::array<int, 8> Actions = {SQLITE_READ,      SQLITE_SELECT,     SQLITE_FUNCTION,
+                                            SQLITE_INSERT,    SQLITE_UPDATE,     SQLITE_DELETE,
+                                            SQLITE_RECURSIVE, SQLITE_TRANSACTION};
+    return std::find(Actions.begin(), Actions.end(), action) != Actions.end();
+}
+
 // SQLite reports "CREATE TABLE temp.t" as it reports other tables.
 bool MakesTempTable(int action, const char* database)
 {
@@ -68,6 +77,7 @@ int StatementWatch::Note(void* watch, int action, const char* name, const char* 
     const bool setsPragma = action == SQLITE_PRAGMA && value != nullptr;
     if (setsPragma && sqlite3_stricmp(name, "busy_timeout") == 0) self.isBusyTimeoutSet_ = true;
     if (setsPragma && IsSchemaPragma(name)) self.isSchemaUnguarded_ = true;
+    if (!LeavesSchemaAlone(action)) ++self.schemaStatements_;
     if (MakesTempTable(action, database)) self.hasTempTables_ = true;
     const bool beginsOrEnds = action == SQLITE_TRANSACTION || action == SQLITE_SAVEPOINT;
     // Outside of a transaction such a statement can only begin one.

@@ -28,6 +28,9 @@ class StatementWatch {
     // the same and a transaction is open, it is the same transaction.
     std::uint64_t CountTransactions() const { return transactions_; }
 
+    // Grows with each statement that may change the schema or undo such a change.
+    std::uint64_t CountSchemaStatements() const { return schemaStatements_; }
+
     // Whether a statement has set the busy timeout of this connection.
     bool IsBusyTimeoutSet() const { return isBusyTimeoutSet_; }
 
@@ -67,6 +70,7 @@ class StatementWatch {
 
     sqlite3* handle_ = nullptr;
     std::uint64_t transactions_ = 0;
+    std::uint64_t schemaStatements_ = 0;
     bool isBusyTimeoutSet_ = false;
     bool isSchemaUnguarded_ = false;
     bool hasTempTables_ = false;

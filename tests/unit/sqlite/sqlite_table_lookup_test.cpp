@@ -82,6 +82,27 @@ TEST_F(SqliteTableLookupTest, ATableThatIsMissingIsQueriedForEachTime)
     ExpectExists(true);
 }
 
+TEST_F(SqliteTableLookupTest, ATransactionChecksTheSchemaOnceUntilItMayHaveChanged)
+{
+    FindJobs();
+    ASSERT_TRUE(db.Exec("BEGIN"));
+    int checks = 0;
+    faults.step = [&checks](sqlite3_stmt* statement) {
+        if (IsStatement(statement, SchemaCheck)) ++checks;
+        return RealStep(statement);
+    };
+    ExpectExists(true);
+    EXPECT_EQ(checks, 1);
+    ASSERT_TRUE(db.Exec("SAVEPOINT s; DROP TABLE jobs"));
+    ExpectExists(false);
+    ASSERT_TRUE(db.Exec("ROLLBACK TO s"));
+    ExpectExists(true);
+    ASSERT_TRUE(db.Exec("ROLLBACK"));
+    checks = 0;
+    ExpectExists(true);
+    EXPECT_EQ(checks, 3);
+}
+
 TEST_F(SqliteTableLookupTest, WithoutTheShortcutEachLookupIsTheQuery)
 {
     FindJobs();

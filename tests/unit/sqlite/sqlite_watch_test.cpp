@@ -84,6 +84,26 @@ TEST_F(StatementWatchTest, SeesThePragmasThatHideChangesOfTheSchema)
     }
 }
 
+TEST_F(StatementWatchTest, CountsStatementsThatMayChangeTheSchemaOrUndoThat)
+{
+    std::uint64_t before = watch.CountSchemaStatements();
+    for (const char* text :
+         {"CREATE TABLE jobs (id)", "CREATE TEMP TABLE others (id)", "SAVEPOINT s",
+          "ALTER TABLE jobs RENAME TO tasks", "DROP TABLE tasks", "ROLLBACK TO s; RELEASE s",
+          "ATTACH ':memory:' AS more", "PRAGMA user_version=1",
+          "CREATE VIRTUAL TABLE words USING fts5(word)"}) {
+        Run(text);
+        EXPECT_GT(watch.CountSchemaStatements(), before) << text;
+        before = watch.CountSchemaStatements();
+    }
+    for (const char* text :
+         {"BEGIN; INSERT INTO jobs VALUES (1); COMMIT", "UPDATE jobs SET id=abs(id)",
+          "DELETE FROM jobs", "SELECT * FROM jobs"}) {
+        Run(text);
+        EXPECT_EQ(watch.CountSchemaStatements(), before) << text;
+    }
+}
+
 TEST_F(StatementWatchTest, SeesTemporaryTablesAndViews)
 {
     for (const char* text : {"CREATE TABLE jobs (id)", "CREATE VIEW ids AS SELECT 1",
