@@ -154,8 +154,10 @@ std::optional<int> SqliteConnection::StepFirst(StatementCache::Cached& cached)
     const int code = sqlite3_step(cached.statement.get());
     const bool metLock = wait_.AcceptToWait();
     if (!metLock || code == SQLITE_ROW || code == SQLITE_DONE) return code;
-    if (code == SQLITE_BUSY) cache_.Keep(std::move(cached));
-    cached.statement.reset();  // prepared again in vain, without a look at the changed schema
+    // Unless it was only the lock, SQLite has prepared it again in vain, without a look at the changed
+    // schema.
+    StatementCache::Cached ended = std::exchange(cached, {});
+    if (code == SQLITE_BUSY) cache_.Keep(std::move(ended));
     return {};
 }
 
