@@ -141,6 +141,9 @@ bool SqliteConnection::Insert(const InsertCommand& command)
 // lock, which takes our own waiting, nor take one that stays.
 bool SqliteConnection::MayRunCached(bool isSelect)
 {
+    // When one of these fails, SQLite may keep a schema that only new statements see.
+    const std::uint64_t before = std::exchange(definitions_, watch_.CountDefinitions());
+    if (before != definitions_) cache_.Clear();
     return wait_.IsInstalled() && cache_.IsUsable(handle_) &&
            TakesPlainLock(handle_, IsInTransaction(), isSelect);
 }

@@ -132,6 +132,7 @@ class SqliteConnection {
     StatementWatch watch_;
     BusyWait wait_;
     StatementCache cache_;
+    std::uint64_t definitions_ = 0;  // when the cache was used last
     TableLookup lookup_;
     bool isLookupLockKept_ = false;
     Shape shape_;  // of the statement that is about to run; kept for its memory

@@ -77,7 +77,11 @@ int StatementWatch::Note(void* watch, int action, const char* name, const char* 
     const bool setsPragma = action == SQLITE_PRAGMA && value != nullptr;
     if (setsPragma && sqlite3_stricmp(name, "busy_timeout") == 0) self.isBusyTimeoutSet_ = true;
     if (setsPragma && IsSchemaPragma(name)) self.isSchemaUnguarded_ = true;
-    if (!LeavesSchemaAlone(action)) ++self.schemaStatements_;
+    if (!LeavesSchemaAlone(action)) {
+        ++self.schemaStatements_;
+        const bool defines = action != SQLITE_SAVEPOINT && action != SQLITE_PRAGMA;
+        if (defines) ++self.definitions_;
+    }
     if (MakesTempTable(action, database)) self.hasTempTables_ = true;
     const bool beginsOrEnds = action == SQLITE_TRANSACTION || action == SQLITE_SAVEPOINT;
     // Outside of a transaction such a statement can only begin one.

@@ -31,6 +31,9 @@ class StatementWatch {
     // Grows with each statement that may change the schema or undo such a change.
     std::uint64_t CountSchemaStatements() const { return schemaStatements_; }
 
+    // Grows with each statement that creates, alters, drops or analyzes something, also if it fails.
+    std::uint64_t CountDefinitions() const { return definitions_; }
+
     // Whether a statement has set the busy timeout of this connection.
     bool IsBusyTimeoutSet() const { return isBusyTimeoutSet_; }
 
@@ -71,6 +74,7 @@ class StatementWatch {
     sqlite3* handle_ = nullptr;
     std::uint64_t transactions_ = 0;
     std::uint64_t schemaStatements_ = 0;
+    std::uint64_t definitions_ = 0;
     bool isBusyTimeoutSet_ = false;
     bool isSchemaUnguarded_ = false;
     bool hasTempTables_ = false;

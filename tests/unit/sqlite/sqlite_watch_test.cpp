@@ -96,12 +96,16 @@ TEST_F(StatementWatchTest, CountsStatementsThatMayChangeTheSchemaOrUndoThat)
         EXPECT_GT(watch.CountSchemaStatements(), before) << text;
         before = watch.CountSchemaStatements();
     }
+    const std::uint64_t definitions = watch.CountDefinitions();
+    EXPECT_GE(definitions, 5U);
     for (const char* text :
          {"BEGIN; INSERT INTO jobs VALUES (1); COMMIT", "UPDATE jobs SET id=abs(id)",
           "DELETE FROM jobs", "SELECT * FROM jobs"}) {
         Run(text);
         EXPECT_EQ(watch.CountSchemaStatements(), before) << text;
     }
+    Run("PRAGMA user_version=2; SAVEPOINT s; RELEASE s");
+    EXPECT_EQ(watch.CountDefinitions(), definitions);
 }
 
 TEST_F(StatementWatchTest, SeesTemporaryTablesAndViews)
