@@ -141,15 +141,17 @@ TEST_F(SqliteConnectionShapeTest, AStatementRunsAsItStandsAfterTheProgramHasSetT
 
 TEST_F(SqliteConnectionShapeTest, TheStatementsOfAConnectionTakeLittleMemory)
 {
+    std::vector<std::string> inserts;
     std::string names = "a";
+    std::string values = "5";
     for (int column = 0; column < 100; ++column) {
         names += ",a" + std::to_string(column);
-        ASSERT_TRUE(db.Exec("CREATE TABLE t" + std::to_string(column) + " (" + names + ")"));
-        std::string values = "5";
-        for (int value = 0; value <= column; ++value) values += ",6";
-        ASSERT_TRUE(db.Exec("INSERT INTO t" + std::to_string(column) + " (" + names + ") VALUES (" +
-                            values + ")"));
+        values += ",6";
+        const std::string table = "t" + std::to_string(column) + " (" + names + ")";
+        Run("CREATE TABLE " + table);
+        inserts.push_back("INSERT INTO " + table + " VALUES (" + values + ")");
     }
+    for (const std::string& insert : inserts) ASSERT_TRUE(db.Exec(insert));
     int count = 0;
     int bytes = 0;
     sqlite3_stmt* statement = nullptr;
