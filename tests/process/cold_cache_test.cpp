@@ -14,6 +14,7 @@
 #include <set>
 #include <string>
 #include <thread>
+#include <utility>
 #include <vector>
 
 #include <orvadrcore/cache.h>
@@ -219,32 +220,42 @@ TEST_F(ColdCacheTest, ThreadsOfManyProcessesShareOneProduction)
     EXPECT_LT(slowest, 2 * BusyMachineMSec);
 }
 
-// A cache whose data is always stale, and whose time-out has passed when a reader looks.
+// A cache whose data is always stale. The production begins when all readers have looked.
 TEST_F(ColdCacheTest, ReadersShareOneProductionOfDataThatIsNeverFresh)
 {
-    constexpr int Threads = 8;
+    static constexpr int Threads = 8;
     class NeverFresh : public OwnCache {
       public:
-        using OwnCache::OwnCache;
-        bool IsNeedUpdate(const Json::Value& /*data*/) const override { return true; }
-    };
-    std::this_thread::sleep_until(std::chrono::system_clock::from_time_t(std::time(nullptr) + 1));
-    ChildProcess process([this](ChildProcess::Link& /*link*/) {
-        std::vector<std::thread> threads;
-        for (int i = 0; i < Threads; ++i) {
-            threads.emplace_back([this, i] {
-                Reader& reader = round->readers.at(static_cast<std::size_t>(i));
-                const NeverFresh cache(dir.File("cache"), locks, [this](Json::Value& data) {
-                    ++round->productions;
-                    return After(Production)(data);
-                });
-                Json::Value data;
-                reader.state = cache.ReadWithin(Long, data);
-            });
+        NeverFresh(OwnCache cache, std::atomic<int>& looks)
+            : OwnCache(std::move(cache)), looks_(looks)
+        {
         }
-        for (std::thread& thread : threads) thread.join();
-    });
-    EXPECT_EQ(process.Join(), 0);
+        bool IsNeedUpdate(const Json::Value& /*data*/) const override
+        {
+            if (!std::exchange(hasLooked_, true)) ++looks_;
+            return true;
+        }
+        bool IsUpdatedDataRequired() const override
+        {
+            return AwaitUntil([this] { return looks_ == Threads; });
+        }
+
+      private:
+        std::atomic<int>& looks_;
+        mutable bool hasLooked_ = false;
+    };
+    ASSERT_TRUE(MakeOwn(nullptr).UpdateWithData(DocumentOf(Old)));
+    std::atomic<int> looks{0};
+    std::vector<std::thread> threads;
+    for (int i = 0; i < Threads; ++i) {
+        threads.emplace_back([&, i] {
+            const NeverFresh cache(MakeOwn(After(Production)), looks);
+            Json::Value data;
+            round->readers.at(static_cast<std::size_t>(i)).state = cache.ReadWithin(Long, data);
+        });
+    }
+    for (std::thread& thread : threads) thread.join();
+    EXPECT_EQ(looks, Threads);
     EXPECT_EQ(round->productions, 1);
     EXPECT_THAT(States(Threads), Each(CacheState::Fresh));
 }
