@@ -12,9 +12,6 @@ namespace OrvaDRCore {
 
 namespace {
 
-// Reserved for a statement, so that it is rarely reallocated while it grows.
-constexpr std::size_t UsualLength = 240;
-
 template <class T>
 bool AddFieldValue(SqliteValueList& record, const std::string& field, const T& value)
 {
@@ -79,7 +76,9 @@ std::string RowCount(std::uint64_t count)
 
 std::string PairsForLog(const SqliteValueList& record)
 {
-    return "values:[" + JoinPairs(record, "=", ",") + "]";
+    std::string text = "values:[";
+    AppendPairs(text, record, "=", ",");
+    return text + "]";
 }
 
 }  // namespace
@@ -177,9 +176,7 @@ std::string InsertCommand::GetCommand() const
         DR_LOG(Err, "Bad insert parameter");
         return {};
     }
-    std::string text;
-    text.reserve(UsualLength);
-    text += replacable_ ? "INSERT OR REPLACE INTO " : "INSERT INTO ";
+    std::string text = BeginStatement(replacable_ ? "INSERT OR REPLACE INTO " : "INSERT INTO ");
     text += GetTable().GetName();
     text += ' ';
     AppendInsertValues(text, fieldValues_);
@@ -261,9 +258,11 @@ std::string UpdateCommand::GetCommand() const
         DR_LOG(Err, "Bad update command");
         return {};
     }
-    std::string text =
-        "UPDATE " + GetTable().GetName() + " SET " + JoinPairs(fieldValues_, "=", ",");
-    if (!condition_.empty()) text += " WHERE " + condition_;
+    std::string text = BeginStatement("UPDATE ");
+    text += GetTable().GetName();
+    text += " SET ";
+    AppendPairs(text, fieldValues_, "=", ",");
+    AppendClause(text, " WHERE ", condition_);
     return text;
 }
 
@@ -331,17 +330,18 @@ std::string SelectCommand::GetCommand() const
         DR_LOG(Err, "Bad select command");
         return {};
     }
-    std::string text = "SELECT ";
+    std::string text = BeginStatement("SELECT ");
     if (!fields_.empty()) {
-        text += Container::ToString(fields_, ",") + " ";
+        text += Container::ToString(fields_, ",");
+        text += ' ';
     } else if (selectAll_) {
         text += " * ";  // the contract has two blanks before the star
     }
-    text += "FROM " + GetTable().GetName();
-    if (!condition_.empty()) text += " WHERE " + condition_;
-    if (!groups_.empty()) text += " GROUP BY " + groups_;
-    if (!orders_.empty()) text += " ORDER BY " + orders_;
-    if (!limit_.empty()) text += " LIMIT " + limit_;
+    AppendClause(text, "FROM ", GetTable().GetName());
+    AppendClause(text, " WHERE ", condition_);
+    AppendClause(text, " GROUP BY ", groups_);
+    AppendClause(text, " ORDER BY ", orders_);
+    AppendClause(text, " LIMIT ", limit_);
     return text;
 }
 

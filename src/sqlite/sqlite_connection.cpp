@@ -184,7 +184,7 @@ std::optional<int> SqliteConnection::ExecuteShape(const Bind& bind, StatementCac
     const StatementWatch::Changes before = watch_.BeginCached();
     std::optional<int> code = BeginShape(bind, cached);
     while (code == SQLITE_ROW) code = sqlite3_step(cached.statement.get());  // PRAGMA count_changes
-    sqlite3_reset(cached.statement.get());
+    if (code != SQLITE_DONE) sqlite3_reset(cached.statement.get());  // gives its locks back
     if (!IsInTransaction()) wait_.NoteUnlocked();
     if (code == SQLITE_DONE) {
         NoteChangesSince(before);

@@ -2,6 +2,7 @@
 
 #include <sqlite3.h>
 
+#include <functional>
 #include <optional>
 #include <utility>
 
@@ -10,6 +11,7 @@
 #include "base/log.h"
 #include "sqlite/sqlite_connection.h"
 #include "sqlite/sqlite_exec.h"
+#include "sqlite/sqlite_internals.h"
 
 namespace OrvaDRCore {
 
@@ -118,8 +120,8 @@ bool SqliteDB::IsTableExisted(const std::string& table)
 {
     // Only the row counts: the table exists if it was read, even if the lookup failed afterwards.
     bool isFound = false;
-    const Attempts attempts =
-        connection_->Retry([&] { return connection_->LookUp(table, isFound); });
+    const auto lookUp = [&] { return connection_->LookUp(table, isFound); };
+    const Attempts attempts = connection_->Retry(std::cref(lookUp));  // without an allocation
     if (attempts.failures > 0) LogAttempts("SelectByCommand", TableLookup::Query(table), attempts);
     return isFound;
 }
@@ -151,9 +153,11 @@ std::string SqliteDB::GenerateDeleteCommand(const std::string& table,
         DR_LOG(Err, "empty table");
         return {};
     }
-    std::string text = "DELETE FROM " + table;
-    if (!condition.empty()) text += " WHERE " + condition;
-    return text + ";";
+    std::string text = BeginStatement("DELETE FROM ");
+    text += table;
+    AppendClause(text, " WHERE ", condition);
+    text += ';';
+    return text;
 }
 
 bool SqliteDB::Exec(const std::string& command)

@@ -107,16 +107,31 @@ std::string Shown(const SqliteValue& value)
     }
 }
 
-std::string JoinPairs(const SqliteValueList& record, const char* between, const char* separator)
+void AppendPairs(std::string& text, const SqliteValueList& record, const char* between,
+                 const char* separator)
 {
-    std::string text;
+    const char* before = "";
     for (const auto& [field, value] : record.GetValues()) {
-        if (!text.empty()) text += separator;
+        text += before;
         text += field;
         text += between;
         AppendLiteral(text, value);
+        before = separator;
     }
-    return text;
+}
+
+std::string BeginStatement(const char* text)
+{
+    constexpr std::size_t UsualLength = 240;
+    std::string statement;
+    statement.reserve(UsualLength);
+    statement += text;
+    return statement;
+}
+
+void AppendClause(std::string& text, const char* keyword, const std::string& clause)
+{
+    if (!clause.empty()) (text += keyword) += clause;
 }
 
 }  // namespace OrvaDRCore

@@ -67,8 +67,15 @@ void AppendLiteral(std::string& text, const SqliteValue& value);
 // How a value that is refused is shown in the log: as JSON, a blob by its literal.
 std::string Shown(const SqliteValue& value);
 
-// The fields as one text: name, `between` and literal of each, with `separator` between fields.
-std::string JoinPairs(const SqliteValueList& record, const char* between, const char* separator);
+// Appends name, `between` and literal of each field, with `separator` between fields.
+void AppendPairs(std::string& text, const SqliteValueList& record, const char* between,
+                 const char* separator);
+
+// Returns `text` with room for a usual statement, so that it is rarely reallocated while it grows.
+std::string BeginStatement(const char* text);
+
+// Appends the keyword and its clause, unless the clause is empty.
+void AppendClause(std::string& text, const char* keyword, const std::string& clause);
 
 }  // namespace OrvaDRCore
 

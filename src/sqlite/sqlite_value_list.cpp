@@ -242,7 +242,9 @@ void SqliteValueList::Sort() const
 
 std::string SqliteValueList::ToStr() const
 {
-    return JoinPairs(*this, ":", ", ");
+    std::string text;
+    AppendPairs(text, *this, ":", ", ");
+    return text;
 }
 
 }  // namespace OrvaDRCore
