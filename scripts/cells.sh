@@ -12,13 +12,15 @@ within=()
 # The tests that a cell leaves out; per line a regular expression for their names, and the reason.
 left_out=/dev/null
 
+# is_wanted NAME: whether ORVADR_CELLS, which names the cells to run, is unset or names this one.
+is_wanted() { [[ " ${ORVADR_CELLS:-$1} " == *" $1 "* ]]; }
+
 # cell NAME CMAKE-ARGUMENTS CTEST-ARGUMENTS: builds everything in build/cells/NAME and runs the tests. The
-# arguments are words in one text. After a failure the next cell runs; end_of_cells fails. ORVADR_CELLS
-# names the cells to run, if not all.
+# arguments are words in one text. After a failure the next cell runs; end_of_cells fails.
 cell() {
     local name=$1 result
     local -a cmake_arguments ctest_arguments
-    [[ " ${ORVADR_CELLS:-$name} " == *" $name "* ]] || return 0
+    is_wanted "$name" || return 0
     read -ra cmake_arguments <<<"$2"
     read -ra ctest_arguments <<<"$3"
     step "cell $name"
@@ -43,11 +45,15 @@ build_cell() {
 
 # skip_tests NAME CTEST-ARGUMENT...: says which tests are left out, and why.
 skip_tests() {
-    local name=$1 pattern reason
+    local name=$1 pattern reason names test
     shift
     sed '/^#/d' "$left_out" | while read -r pattern reason; do
-        "${within[@]}" ctest --test-dir "$cells/$name" -N "$@" -R "$pattern" </dev/null |
-            sed -n "s/^ *Test *#[0-9]*: \([^ ]*\).*/skipped: \1: $reason/p"
+        names=$("${within[@]}" ctest --test-dir "$cells/$name" -N "$@" -R "$pattern" </dev/null |
+            sed -n 's/^ *Test *#[0-9]*: \([^ ]*\).*/\1/p')
+        [[ -n $names ]] || fail "$left_out: no test is named '$pattern'"
+        while read -r test; do
+            echo "skipped: $test: $reason"
+        done <<<"$names"
     done | sort | tee "$cells/$name.skipped"
 }
 
@@ -72,6 +78,7 @@ count_tests() {
 }
 
 end_of_cells() {
+    [[ -s $cells/table ]] || fail "no cell is named '${ORVADR_CELLS:-}'"
     step "results:"
     cat "$cells/table"
     ! grep -q FAILED "$cells/table" || fail "a cell failed"

@@ -39,7 +39,7 @@ quietly() {
     local log=build/$1.log
     shift
     mkdir -p build
-    if ! "$@" >"$log" 2>&1 </dev/null; then
+    if ! ("$@") >"$log" 2>&1 </dev/null; then
         tail -n 60 "$log" >&2
         fail "'$*' failed; the whole output is in $log"
     fi
@@ -112,5 +112,5 @@ read_by_tidy() {
     sed -n 's/^  "file": "\(.*\)",\{0,1\}$/\1/p' build/tidy/compile_commands.json |
         grep "$@" | sort >build/tidy-sources
     step "checking $(wc -l <build/tidy-sources) sources"
-    xargs -P "$(nproc)" -n 1 clang-tidy -p build/tidy --quiet <build/tidy-sources 2>build/tidy.log
+    xargs -d '\n' -P "$(nproc)" -n 1 clang-tidy -p build/tidy --quiet <build/tidy-sources 2>build/tidy.log
 }

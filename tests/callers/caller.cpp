@@ -124,11 +124,12 @@ void UseCache(const std::string& dir, std::vector<std::string>& results)
 {
     const Status status(dir);
     Json::Value data;
-    const CacheState state = status.ReadWithin(std::chrono::seconds(5), data);
+    const CacheState state = status.ReadWithin(std::chrono::minutes(1), data);
     results.push_back("state " + std::to_string(static_cast<int>(state)) + Text(data));
     constexpr std::int64_t In2040 = 2'208'988'800;
     data["year"] = 2040;
-    results.push_back("stored " + std::to_string(status.UpdateWithData(data, In2040, In2040 + 3)));
+    results.push_back("stored " +
+                      std::to_string(status.UpdateWithData(data, In2040, In2040 + 3000)));
     Json::Value document;
     const bool isRead = File::Read(status.GetPath(), document);
     results.push_back("file " + std::to_string(isRead) + Text(document));

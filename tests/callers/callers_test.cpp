@@ -12,6 +12,7 @@
 
 namespace {
 
+using ::testing::AnyOf;
 using ::testing::Contains;
 using ::testing::HasSubstr;
 
@@ -19,8 +20,8 @@ TEST(CallersTest, OneHas64BitTimesAndTheOtherWhatTheMachineHas)
 {
     EXPECT_EQ(WideCaller.sizeOfTime, 8U);
     EXPECT_EQ(WideCaller.sizeOfOffset, 8U);
-    EXPECT_EQ(UsualCaller.sizeOfTime, sizeof(long));
-    EXPECT_EQ(UsualCaller.sizeOfOffset, sizeof(long));
+    EXPECT_THAT(UsualCaller.sizeOfTime, AnyOf(sizeof(long), 8U));
+    EXPECT_THAT(UsualCaller.sizeOfOffset, AnyOf(sizeof(long), 8U));
 }
 
 TEST(CallersTest, BothHaveTheSameClasses)
@@ -35,7 +36,7 @@ TEST(CallersTest, BothGetTheSameResults)
     const std::vector<std::string> results = UsualCaller.results(usual.Path());
     EXPECT_EQ(results, WideCaller.results(wide.Path()));
     EXPECT_THAT(results, Contains("id 1 4294967297"));
-    EXPECT_THAT(results, Contains(HasSubstr("\"finish_time_to_update\" : 2208988803")));
+    EXPECT_THAT(results, Contains(HasSubstr("\"finish_time_to_update\" : 2208991800")));
 }
 
 TEST(CallersTest, EachReadsWhatTheOtherHasWritten)

@@ -165,8 +165,9 @@ class ColdCacheTest : public ProcessTest {
     SharedMemory<Round> round;
 };
 
-// The bound that is wanted, on a machine with nothing else to do, is 100 ms.
-constexpr int BusyMachineMSec = 2000;
+// The bound that is wanted, on a machine with nothing else to do, is 100 ms. A reader that waits for
+// nothing takes its whole time, a minute.
+constexpr int BusyMachineMSec = 20'000;
 
 TEST_F(ColdCacheTest, ManyProcessesThatStartTogetherShareOneProduction)
 {
@@ -217,7 +218,7 @@ TEST_F(ColdCacheTest, ThreadsOfManyProcessesShareOneProduction)
     EXPECT_THAT(Numbers(Processes * Threads), Each(New));
     const int slowest = SlowestMSec(Processes * Threads);
     ReportCount("ms from the end of a production to the last of 64 x 8 threads", slowest);
-    EXPECT_LT(slowest, 2 * BusyMachineMSec);
+    EXPECT_LT(slowest, BusyMachineMSec);
 }
 
 // A cache whose data is always stale. The production begins when all readers have looked.

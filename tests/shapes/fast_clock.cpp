@@ -1,3 +1,7 @@
+// The C++ library of a 32-bit machine calls the function with 32-bit times.
+#undef _FILE_OFFSET_BITS
+#undef _TIME_BITS
+
 #include "fast_clock.h"
 
 #include <sys/syscall.h>
@@ -10,7 +14,7 @@ constexpr int NSecPerMSec = 1'000'000;
 constexpr int NSecPerSec = 1'000'000'000;
 constexpr int MSecPerSec = 1000;
 
-timespec ahead{};
+timespec now{1, 0};
 
 }  // namespace
 
@@ -18,10 +22,10 @@ namespace Shapes {
 
 void AdvanceClock(int milliseconds)
 {
-    ahead.tv_sec += milliseconds / MSecPerSec;
-    ahead.tv_nsec += static_cast<long>(milliseconds % MSecPerSec) * NSecPerMSec;
-    ahead.tv_sec += ahead.tv_nsec / NSecPerSec;
-    ahead.tv_nsec %= NSecPerSec;
+    now.tv_sec += milliseconds / MSecPerSec;
+    now.tv_nsec += static_cast<long>(milliseconds % MSecPerSec) * NSecPerMSec;
+    now.tv_sec += now.tv_nsec / NSecPerSec;
+    now.tv_nsec %= NSecPerSec;
 }
 
 }  // namespace Shapes
@@ -29,11 +33,8 @@ void AdvanceClock(int milliseconds)
 // Takes the place of the C library's. All other clocks are the real ones.
 extern "C" int clock_gettime(clockid_t clock, timespec* time) noexcept
 {
-    const auto result = static_cast<int>(::syscall(SYS_clock_gettime, clock, time));
-    if (result != 0 || clock != CLOCK_MONOTONIC) return result;
-    time->tv_sec += ahead.tv_sec;
-    time->tv_nsec += ahead.tv_nsec;
-    time->tv_sec += time->tv_nsec / NSecPerSec;
-    time->tv_nsec %= NSecPerSec;
+    if (clock != CLOCK_MONOTONIC)
+        return static_cast<int>(::syscall(SYS_clock_gettime, clock, time));
+    *time = now;
     return 0;
 }

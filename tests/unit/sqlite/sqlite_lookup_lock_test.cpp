@@ -192,10 +192,12 @@ TEST_F(SqliteLookupLockTest, InATransactionTheLookupEndsFirst)
 TEST_F(SqliteLookupLockTest, ASelectFromATemporaryTableGetsNoLock)
 {
     ASSERT_TRUE(db.Exec("CREATE TEMP TABLE jobs (id); INSERT INTO jobs VALUES (7)"));
-    ASSERT_TRUE(db.SelectEach(command, [this](const SqliteRow&) {
+    int rows = 0;
+    ASSERT_TRUE(db.SelectEach(command, [&](const SqliteRow&) {
         EXPECT_FALSE(IsFileLocked(path));
-        return true;
+        return ++rows > 0;
     }));
+    EXPECT_EQ(rows, 1);
 }
 
 TEST_F(SqliteLookupLockTest, OnlyTheFirstAttemptGetsTheLock)
