@@ -1,6 +1,6 @@
 // What random operations are made from.
 //
-// A library that keeps statements by their shape is tested only if shapes come again with other
+// A library that caches statements by their shape is tested only if shapes come again with other
 // values. So an operation is drawn from two sources of random numbers: one for its shape, which is
 // one of a few in a script, and one for the values in it.
 #ifndef ORVADRCORE_TESTS_SHAPES_DRAW_H

@@ -245,7 +245,7 @@ extern "C" int stat(const char* path, struct stat* status) noexcept
 }
 
 // SQLite's. On 32-bit machines stat64() is another function for us, and its structure is not SQLite's, but
-// nobody looks into that.
+// the fake never reads it.
 extern "C" int StatOfSqlite(const char* path, struct stat64* status) noexcept __asm__("stat64");
 extern "C" int StatOfSqlite(const char* path, struct stat64* status) noexcept
 {
