@@ -334,7 +334,9 @@ bool Cache::Impl::Store(const Cache& cache, const Json::Value& data, std::int64_
                   TextForLine(data).c_str(), TextForLine(info).c_str());
         return false;
     }
-    CacheDocument document = file.Compose({timeout, std::move(info), data, begin, finish});
+    Json::Value copy = data;  // g++ 11 would leak `info` if copying failed within the braces
+    CacheDocument document =
+        file.Compose({timeout, std::move(info), std::move(copy), begin, finish});
     const auto write = [&] { return file.Write(document); };
     // A document that is too long could not be loaded again.
     if (FitsJsonText(document.text.size()) && RetryAttempts(retryLimit, write, pause)) return true;

@@ -1,4 +1,7 @@
 // Statements that SQLite refuses while memory runs out, too: reporting a failure needs memory.
+#include <string>
+#include <vector>
+
 #include <orvadrcore/sqlite_db.h>
 #include <orvadrcore/sqlite_transaction.h>
 
@@ -114,11 +117,12 @@ TEST(SqliteFailureFaults, InsertRecords)
             another.AddValue("id", 2);
             SqliteValueList same;
             same.AddValue("id", 1);
+            const std::vector<SqliteValueList> records{another, same};
             {
                 const Refusal refusal(text, 1);
                 WithFault([&] {
                     const SqliteTableHandler nodes("nodes", "");
-                    return place.db.InsertRecords(nodes, {another, same});
+                    return place.db.InsertRecords(nodes, records);
                 });
             }
             EXPECT_EQ(place.Names(), "old");
