@@ -16,7 +16,7 @@ endif()
 
 if(CMAKE_CXX_COMPILER_ID STREQUAL GNU AND CMAKE_CXX_STANDARD GREATER 17)
     # Since C++20 strings are inlined so far that g++ 12 mistakes "a" + std::string() for an overlap.
-    target_compile_options(orvadr_compile_options INTERFACE -Wno-restrict)
+    target_compile_options(orvadr_caller_options INTERFACE -Wno-restrict)
 endif()
 
 if(ORVADR_SANITIZE)

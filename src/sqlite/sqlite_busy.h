@@ -20,7 +20,6 @@
 #include <chrono>
 #include <random>
 #include <string>
-#include <utility>
 
 #include "sqlite/sqlite_watch.h"
 

@@ -29,8 +29,16 @@ constexpr Bracket Transaction{"BEGIN IMMEDIATE", "COMMIT", "ROLLBACK"};
 constexpr Bracket Savepoint{"SAVEPOINT orvadr_insert", "RELEASE orvadr_insert",
                             "ROLLBACK TO orvadr_insert; RELEASE orvadr_insert"};
 
-// Whether a statement takes no lock that stays after its failure, and waits for each that it meets.
-// SQLite does not wait when a connection that reads begins to write.
+// Whether SQLite has prepared a select again with its values, because another connection has changed
+// the schema. Then the order of rows may be another than that of the literals: see BeginShape().
+bool IsPlannedWithValues(sqlite3_stmt* statement, int code)
+{
+    return (code == SQLITE_ROW || code == SQLITE_DONE) &&
+           sqlite3_stmt_status(statement, SQLITE_STMTSTATUS_REPREPARE, 0) != 0;
+}
+
+// Whether a statement of this kind, run now, ends all locks that it takes when it fails, and waits for
+// each lock that it meets. A write of a connection that already reads would not wait.
 bool TakesPlainLock([[maybe_unused]] sqlite3* handle, bool isInTransaction,
                     [[maybe_unused]] bool isSelect)
 {
@@ -108,6 +116,9 @@ void SqliteConnection::Close()
     watch_.Stop();
     cache_.Clear();
     lookup_.Clear();
+    // A statement that still runs may commit at its end. It must not call the handler, which has
+    // forgotten the connection.
+    sqlite3_busy_handler(handle_, nullptr, nullptr);
     sqlite3_close(handle_);  // fails inside of a select, which closes it at its end
     handle_ = nullptr;
 }
@@ -136,12 +147,14 @@ bool SqliteConnection::Insert(const InsertCommand& command)
     return *code == SQLITE_DONE;
 }
 
-// Whether a cached statement may run now. It may have become wrong since it was prepared, and notices
-// that only when it has taken its lock, while a new one fails before. So it must not wait for a
-// lock, which takes our own waiting, nor take one that stays.
+// Whether a cached statement may run now. Clears the cache if it may not be used any more.
+//
+// A cached statement may have become wrong. It notices that only when it has its lock, while a new one
+// fails before it takes any. So a cached one must not wait for a lock, for which our own busy handler is
+// needed, nor take one that would stay after its failure.
 bool SqliteConnection::MayRunCached(bool isSelect)
 {
-    // When one of these fails, SQLite may keep a schema that only new statements see.
+    // After a failed definition SQLite may keep a schema that only new statements see.
     const std::uint64_t before = std::exchange(definitions_, watch_.CountDefinitions());
     if (before != definitions_) cache_.Clear();
     return wait_.IsInstalled() && cache_.IsUsable(handle_) &&
@@ -156,7 +169,9 @@ std::optional<int> SqliteConnection::StepFirst(StatementCache::Cached& cached)
     wait_.RefuseToWait();
     const int code = sqlite3_step(cached.statement.get());
     const bool metLock = wait_.AcceptToWait();
-    if (!metLock || code == SQLITE_ROW || code == SQLITE_DONE) return code;
+    // Connections that share a cache meet locks without waiting. Their texts meet other ones.
+    const bool isLocked = metLock || code == SQLITE_LOCKED;
+    if (!isLocked || code == SQLITE_ROW || code == SQLITE_DONE) return code;
     // Unless it was only the lock, SQLite has prepared it again in vain, without a look at the changed
     // schema.
     StatementCache::Cached ended = std::exchange(cached, {});
@@ -172,6 +187,9 @@ std::optional<int> SqliteConnection::BeginShape(const Bind& bind, StatementCache
     if (code == SQLITE_ERROR) return {};
     if (code != SQLITE_OK) return code;
     if (bind(cached.statement.get()) != SQLITE_OK) return {};
+    // SQLite compares bound values with partial indexes more loosely than literals, and 5 is 5.0 there.
+    // The order of rows would be another.
+    if (MayDependOnValues(cached.statement.get())) return {};
     return StepFirst(cached);
 }
 
@@ -184,7 +202,7 @@ std::optional<int> SqliteConnection::ExecuteShape(const Bind& bind, StatementCac
     const StatementWatch::Changes before = watch_.BeginCached();
     std::optional<int> code = BeginShape(bind, cached);
     while (code == SQLITE_ROW) code = sqlite3_step(cached.statement.get());  // PRAGMA count_changes
-    if (code != SQLITE_DONE) sqlite3_reset(cached.statement.get());  // gives its locks back
+    if (code != SQLITE_DONE) sqlite3_reset(cached.statement.get());          // gives its locks back
     if (!IsInTransaction()) wait_.NoteUnlocked();
     if (code == SQLITE_DONE) {
         NoteChangesSince(before);
@@ -239,12 +257,13 @@ bool SqliteConnection::Select(const std::string& command, const TakeRow& takeRow
         EndSelect(handle);
     });
     const StatementWatch::Changes before = watch_.CountChanges();
+    const std::uint64_t definitions = watch_.CountDefinitions();
     const char* message = nullptr;
     const bool mayRunCached = !access.IsLeftToSqlite() && MayRunCached(true);
     const bool isShape =
         mayRunCached && ShortcutsInUse().shapes && ReadShape(command, shape_) && shape_.isSelect;
     std::optional<int> begun;
-    if (mayRunCached) begun = isShape ? BeginShape(cached) : BeginText(command, cached);
+    if (mayRunCached) begun = isShape ? BeginSelectShape(cached) : BeginText(command, cached);
     int code = begun ? *begun : BeginNew(command, cached);
     // After a failure it is given back later, because that changes SQLite's message.
     if (code == SQLITE_ROW || code == SQLITE_DONE) lookup_.GiveBack();
@@ -254,7 +273,8 @@ bool SqliteConnection::Select(const std::string& command, const TakeRow& takeRow
         return false;
     }
     if (sqlite3_stmt_readonly(cached.statement.get()) == 0) NoteChangesSince(before);
-    if (handle_ == handle && begun) {
+    const bool isUpToDate = handle_ == handle && watch_.CountDefinitions() == definitions;
+    if (begun && isUpToDate) {
         isShape ? cache_.Keep(std::move(cached)) : cache_.KeepSelect(std::move(cached));
     }
     error_.Set(0);
@@ -263,11 +283,14 @@ bool SqliteConnection::Select(const std::string& command, const TakeRow& takeRow
 
 // Begins to run the select of the shape. The literals are copied, because the caller may change the
 // text while rows are given to it.
-std::optional<int> SqliteConnection::BeginShape(StatementCache::Cached& cached)
+std::optional<int> SqliteConnection::BeginSelectShape(StatementCache::Cached& cached)
 {
-    return BeginShape(
+    const std::optional<int> code = BeginShape(
         [this](sqlite3_stmt* made) { return BindLiterals(made, shape_, SQLITE_TRANSIENT); },
         cached);
+    if (!code || !IsPlannedWithValues(cached.statement.get(), *code)) return code;
+    cached = {};
+    return {};
 }
 
 std::optional<int> SqliteConnection::BeginText(const std::string& command,
@@ -327,7 +350,8 @@ bool SqliteConnection::LookUp(const std::string& table, bool& isFound)
     const TableLookup::Moment now{watch_.CountTransactions(), watch_.CountSchemaStatements()};
     if (isInTransaction && lookup_.WasCheckedAt(now) && lookup_.IsKnown(table)) {
         error_.Set(0);
-        return isFound = true;
+        isFound = true;
+        return true;
     }
     error_.Set(ERR::ERR_DATABASE_OPERATION);
     ScopeGuard giveBack([&] {
@@ -335,13 +359,12 @@ bool SqliteConnection::LookUp(const std::string& table, bool& isFound)
         if (!IsInTransaction()) wait_.NoteUnlocked();
     });
     // If the connection reads already, the lock may end with the query, as a full-text table's does.
-    // A select from a temporary table would keep the lock to its end, but needs none.
-    const bool mayKeepLock = isLookupLockKept_ && !isInTransaction &&
-                             TakesPlainLock(handle_, false, false) && !watch_.HasTempTables();
-    const int code = [&] {
-        const BusyTimeoutAccess access(wait_, watch_, table);
-        return lookup_.Check(handle_);
-    }();
+    // A select from a temporary table would keep the lock to its end, but needs none. After a failed
+    // attempt a log line follows.
+    const bool reads = !TakesPlainLock(handle_, false, false);
+    const bool mayKeepLock = std::exchange(isLookupLockKept_, false) && !isInTransaction &&
+                             !reads && !watch_.HasTempTables();
+    const int code = CheckSchema(table);
     if (code != SQLITE_ROW) {
         SetFailure(TableLookup::Query(table), code, nullptr);
         return false;
@@ -354,7 +377,15 @@ bool SqliteConnection::LookUp(const std::string& table, bool& isFound)
     }
     error_.Set(0);
     if (mayKeepLock) giveBack.Dismiss();
-    return isFound = true;
+    isFound = true;
+    return true;
+}
+
+// Waits as the query would: a name with "busy_timeout" in it leaves the waiting to SQLite.
+int SqliteConnection::CheckSchema(const std::string& table)
+{
+    const BusyTimeoutAccess access(wait_, watch_, table);
+    return lookup_.Check(handle_);
 }
 
 bool SqliteConnection::RunAtomically(bool isNested, const std::function<bool()>& work)

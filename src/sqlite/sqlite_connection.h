@@ -111,10 +111,11 @@ class SqliteConnection {
   private:
     using Bind = std::function<int(sqlite3_stmt*)>;
 
+    int CheckSchema(const std::string& table);
     bool MayRunCached(bool isSelect);
     std::optional<int> StepFirst(StatementCache::Cached& cached);
     std::optional<int> BeginShape(const Bind& bind, StatementCache::Cached& cached);
-    std::optional<int> BeginShape(StatementCache::Cached& cached);
+    std::optional<int> BeginSelectShape(StatementCache::Cached& cached);
     std::optional<int> BeginText(const std::string& command, StatementCache::Cached& cached);
     int BeginNew(const std::string& command, StatementCache::Cached& cached);
     std::optional<int> ExecuteShape(const Bind& bind, StatementCache::Cached& cached);

@@ -1,4 +1,4 @@
-// The operations of SqliteDB that run a statement without rows.
+// The retries and log lines of statements without rows.
 #define DR_LOG_FILE "sqlite_db.cpp"
 
 #include "sqlite/sqlite_exec.h"

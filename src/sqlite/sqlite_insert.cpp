@@ -10,10 +10,6 @@ namespace OrvaDRCore {
 
 namespace {
 
-// Far below the limits of SQLite, which count the literals in a text but not bound values.
-constexpr std::size_t MaxValues = 256;
-constexpr std::size_t MaxBytes = 65'536;
-
 // Whether binding a value stores what its literal stores. A quote in a plain text ends the literal,
 // and a zero byte ends the statement. SQLite reads the literal of a real in its own way,
 // and may index a bound blob as another text than its literal, in a database of UTF-16.
@@ -30,7 +26,7 @@ bool IsBoundAsWritten(const SqliteValue& value)
         default: break;
     }
     const std::string& bytes = SqliteInternals::BytesOf(value);
-    if (bytes.size() > MaxBytes) return false;
+    if (bytes.size() > MaxTextBytes) return false;
     const bool isPlain = SqliteInternals::KindOf(value) == Kind::PlainText;
     return bytes.find('\0') == std::string::npos &&
            (!isPlain || bytes.find('\'') == std::string::npos);
@@ -59,7 +55,7 @@ bool WriteInsertShape(const InsertCommand& command, std::string& shape)
     const auto isPlain = [](const auto& field) {
         return IsPlainName(field.first) && IsBoundAsWritten(field.second);
     };
-    if (values.empty() || values.size() > MaxValues || !IsPlainName(table) ||
+    if (values.empty() || values.size() > MaxParameters || !IsPlainName(table) ||
         !IsPlainTable(table) || !std::all_of(values.begin(), values.end(), isPlain)) {
         return false;
     }

@@ -3,18 +3,17 @@
 #include <strings.h>
 
 #include <algorithm>
+#include <array>
 #include <cstring>
 
 namespace OrvaDRCore {
 
 namespace {
 
-// Far below all limits of SQLite, which count the literals in a text but not bound values.
-constexpr std::size_t MaxLength = 65'536;
-constexpr std::size_t MaxLiterals = 256;
-
-// Each length of a list has a shape of its own. Longer ones would drive others out of the cache.
-constexpr std::size_t MaxLiteralsInCondition = 16;
+// Longer conditions seldom come again, and would drive others out of the cache. SQLite's limits, where
+// `-5` counts for more than a parameter, are far above.
+constexpr std::size_t MaxTerms = 16;
+constexpr std::size_t MaxDepth = 40;
 
 constexpr std::size_t MaxDigits = 18;
 
@@ -91,36 +90,58 @@ class ShapeReader {
     bool ReadCondition()
     {
         conditionBegin_ = shape_.literals.size();
-        int depth = 0;
+        std::array<std::string_view, MaxTerms> equal;
+        std::size_t terms = 0;
+        std::size_t depth = 0;
+        bool hasOr = false;
         do {
             while (Accept('(')) ++depth;
-            if (!ReadTerm()) return false;
-            while (Accept(')')) --depth;
-            if (depth < 0) return false;
-        } while (AcceptWord("AND") || AcceptWord("OR"));
-        return depth == 0;
+            if (depth > MaxDepth || terms == MaxTerms || !ReadTerm(equal.at(terms++))) return false;
+            for (; Accept(')'); --depth) {
+                if (depth == 0) return false;
+            }
+        } while (AcceptWord("AND") || (AcceptWord("OR") && (hasOr = true)));
+        return depth == 0 && !(hasOr && HasSameTwice(equal.begin(), equal.begin() + terms));
     }
 
-    bool ReadTerm()
+    // Sets `equal` to the name in `name=literal` and `name IN (literal)`.
+    bool ReadTerm(std::string_view& equal)
     {
+        const char* const begin = at_;
         if (!ReadName()) return false;
+        const std::string_view name(begin, static_cast<std::size_t>(nameEnd_ - begin));
         if (AcceptWord("IS")) {
             AcceptWord("NOT");
             return AcceptWord("NULL");
         }
-        if (AcceptWord("IN")) return ReadList();
+        const bool isList = AcceptWord("IN");
+        if (isList || *at_ == '=') equal = name;
+        if (isList) return ReadList();
         if (AcceptWord("NOT")) return AcceptWord("IN") && ReadList();
         return AcceptOperator() && ReadCompared();
     }
 
+    // Only a list of one, of which SQLite makes `name=literal`. It uses a partial index for
+    // `name IN (5,7)` only if these are literals, and then gives the rows in another order. It also
+    // makes such a list of `name=5 OR name=7`.
     bool ReadList()
     {
-        const std::size_t before = shape_.literals.size();
-        const auto readItem = [this] { return ReadLiteral() && IsNewInCondition() && Replace(); };
-        if (!Accept('(') || !ReadCommaList(readItem) || !Accept(')')) return false;
-        // SQLite makes `name=literal` of a list of one.
-        const bool isOne = shape_.literals.size() == before + 1;
-        return !isOne || !IsPlannedApart(shape_.literals.back());
+        return Accept('(') && ReadLiteral() && !IsPlannedApart(literal_) && IsNewInCondition() &&
+               Replace() && Accept(')');
+    }
+
+    // Whether a name is among these twice, in upper or lower case.
+    template <class Iterator>
+    static bool HasSameTwice(Iterator name, Iterator end)
+    {
+        for (; name != end; ++name) {
+            const auto isSame = [name](std::string_view other) {
+                return !other.empty() && other.size() == name->size() &&
+                       ::strncasecmp(other.data(), name->data(), name->size()) == 0;
+            };
+            if (std::any_of(name + 1, end, isSame)) return true;
+        }
+        return false;
     }
 
     bool ReadCompared()
@@ -186,14 +207,13 @@ class ShapeReader {
         const std::int64_t* const number = std::get_if<std::int64_t>(&literal_);
         if (number != nullptr && (*number > MaxCompared || *number < -MaxCompared)) return false;
         const auto begin = shape_.literals.begin() + static_cast<std::ptrdiff_t>(conditionBegin_);
-        return shape_.literals.size() - conditionBegin_ < MaxLiteralsInCondition &&
-               std::find(begin, shape_.literals.end(), literal_) == shape_.literals.end();
+        return std::find(begin, shape_.literals.end(), literal_) == shape_.literals.end();
     }
 
     // Puts a parameter in the place of the literal that was read last.
     bool Replace()
     {
-        if (shape_.literals.size() == MaxLiterals) return false;
+        if (shape_.literals.size() == MaxParameters) return false;
         shape_.text.append(copied_, literalBegin_);
         shape_.text += '?';
         copied_ = at_;
@@ -221,6 +241,7 @@ class ShapeReader {
     {
         if (!IsLetter(*at_)) return false;
         while (IsNamePart(*at_)) ++at_;
+        nameEnd_ = at_;
         return SkipBlanks();
     }
 
@@ -265,6 +286,7 @@ class ShapeReader {
     Shape& shape_;
     Shape::Literal literal_;
     const char* literalBegin_ = nullptr;
+    const char* nameEnd_ = nullptr;
     std::size_t conditionBegin_ = 0;  // the number of literals before the condition
 };
 
@@ -272,7 +294,7 @@ class ShapeReader {
 
 bool ReadShape(const std::string& statement, Shape& shape)
 {
-    return statement.size() <= MaxLength && ShapeReader(statement, shape).Read();
+    return statement.size() <= MaxTextBytes && ShapeReader(statement, shape).Read();
 }
 
 bool IsPlainName(std::string_view name)

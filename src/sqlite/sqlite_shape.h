@@ -4,6 +4,7 @@
 
 #include <sqlite3.h>
 
+#include <cstddef>
 #include <cstdint>
 #include <string>
 #include <string_view>
@@ -22,6 +23,11 @@ struct Shape {
     bool isSelect = false;
 };
 
+// The largest statement that is run by its shape. Far below all limits of SQLite, which count the
+// literals in a text but not bound values.
+inline constexpr std::size_t MaxParameters = 256;
+inline constexpr std::size_t MaxTextBytes = 65'536;  // of a statement, and of each bound text
+
 // Reads a statement as the builders and conditions of this library write it:
 //
 //     INSERT [OR REPLACE] INTO name (names) VALUES (literals)[;]
@@ -30,8 +36,8 @@ struct Shape {
 //     SELECT names|* FROM name [WHERE condition][;]
 //
 // Literals are integers of up to 18 digits and texts without quotes; NULL stays in the text. A
-// condition is made of terms `name op literal`, `name [NOT] IN (literals)` and `name IS [NOT] NULL`
-// with AND, OR and parentheses.
+// condition is made of up to 16 terms `name op literal`, `name [NOT] IN (literal)` and
+// `name IS [NOT] NULL` with AND, OR and parentheses.
 //
 // Returns false for every other statement, for one without a literal to replace, and where SQLite
 // might run the shape in another way than the statement; the comments in the source say when. Such

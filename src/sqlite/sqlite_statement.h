@@ -1,4 +1,4 @@
-// A prepared statement and its owner.
+// A prepared statement and its owner, and what to ask SQLite about both.
 #ifndef ORVADRCORE_SRC_SQLITE_SQLITE_STATEMENT_H
 #define ORVADRCORE_SRC_SQLITE_SQLITE_STATEMENT_H
 
@@ -24,6 +24,10 @@ int PrepareStatement(sqlite3* handle, const std::string& command, Statement& sta
 // Ends a statement before its last row. A statement that writes commits only now, which may fail.
 // Returns SQLite's code.
 int EndBeforeLastRow(sqlite3_stmt* statement);
+
+// Whether the values that were just bound may change how the statement is run: SQLite would prepare it
+// again for them. True if SQLite was built without the function that says so.
+bool MayDependOnValues(sqlite3_stmt* statement);
 
 // Whether the connection has main and temp alone. False before SQLite 3.39, where there is no way to
 // ask.

@@ -41,11 +41,13 @@ class StatementCache {
     // Takes a statement out of the cache, or prepares it. Returns SQLite's code.
     int Take(sqlite3* handle, const std::string& text, Cached& cached);
 
-    // Puts back a statement that was taken for a text, unless it writes or is unusually long.
-    void KeepSelect(Cached&& cached);
-
-    // Puts back a statement that was taken for a shape. Needs no memory.
+    // Resets a statement that was taken for a shape and puts it back. One that may not be cached, or
+    // is too large, is left to the caller. Needs no memory.
     void Keep(Cached&& cached);
+
+    // The same for a statement that was taken for a text. Leaves also one that writes or is unusually
+    // long.
+    void KeepSelect(Cached&& cached);
 
     void Clear() { cached_.clear(); }
 

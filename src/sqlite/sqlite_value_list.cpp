@@ -22,7 +22,7 @@ constexpr std::size_t MostMoved = 32;
 // Room that the first field makes, so that small records are not reallocated as they grow.
 constexpr std::size_t UsualFields = 4;
 
-// While a thread sorts the fields that AddValue() has left unsorted.
+// What unsorted_ is while one thread sorts the fields and the others wait.
 constexpr std::size_t BeingSorted = std::numeric_limits<std::size_t>::max();
 
 // The first field of a sorted range whose name is not less than this one.
@@ -54,6 +54,11 @@ void MoveLast(Fields& fields, std::size_t others)
 template <class Fields>
 void SortInto(Fields& fields, std::size_t unsorted)
 {
+    if (unsorted == 1) {  // the usual case if the record is read after each field
+        const auto last = fields.end() - 1;
+        const auto place = LowerBound(fields.begin(), last, last->first);
+        return MoveLast(fields, static_cast<std::size_t>(last - place));
+    }
     using Field = typename Fields::value_type;
     const auto isBefore = [](const Field* one, const Field* other) {
         return one->first < other->first;

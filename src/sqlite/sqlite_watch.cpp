@@ -79,7 +79,9 @@ int StatementWatch::Note(void* watch, int action, const char* name, const char* 
     if (setsPragma && IsSchemaPragma(name)) self.isSchemaUnguarded_ = true;
     if (!LeavesSchemaAlone(action)) {
         ++self.schemaStatements_;
-        const bool defines = action != SQLITE_SAVEPOINT && action != SQLITE_PRAGMA;
+        // A PRAGMA that sets something may change how statements are prepared. It does so even in an
+        // EXPLAIN, which does not make SQLite prepare the others again.
+        const bool defines = action != SQLITE_SAVEPOINT && (action != SQLITE_PRAGMA || setsPragma);
         if (defines) ++self.definitions_;
     }
     if (MakesTempTable(action, database)) self.hasTempTables_ = true;

@@ -6,27 +6,17 @@
 #include <stdexcept>
 
 #include "sqlite/sqlite_connection.h"
-#include "sqlite/sqlite_shortcuts.h"
+#include "support/fixtures/as_texts.h"
 #include "support/fixtures/sqlite_fixture.h"
 
 namespace {
 
 using OrvaDRCore::InsertCommand;
-using OrvaDRCore::ShortcutsInUse;
 using OrvaDRCore::SqliteDB;
 using OrvaDRCore::SqliteRow;
 using OrvaDRCore::SqliteTableHandler;
 using OrvaDRCore::SqliteValue;
 using OrvaDRCore::SqliteValueList;
-
-// While it lives, statements run as the texts that they are.
-class AsTexts {
-  public:
-    AsTexts() { ShortcutsInUse() = {false, false, false}; }
-    AsTexts(const AsTexts&) = delete;
-    AsTexts& operator=(const AsTexts&) = delete;
-    ~AsTexts() { ShortcutsInUse() = {}; }
-};
 
 class SqliteConnectionShapeTest : public SqliteFixture {
   protected:

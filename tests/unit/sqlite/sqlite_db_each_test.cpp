@@ -325,6 +325,23 @@ TEST_F(SqliteDbEachTest, AConnectionThatTheCallbackClosesGivesNoMoreRows)
     ExpectLines({Err("Exec", "DB[" + path + "] is not opened")});
 }
 
+// Its commit, at its end, meets the reader.
+TEST_F(SqliteDbEachTest, ADeleteWhoseConnectionTheCallbackClosesMayFail)
+{
+    MakeJobs();
+    ASSERT_TRUE(db.Open());
+    PlainDb reader(path);
+    reader.Run("BEGIN; SELECT id FROM jobs");
+    EXPECT_FALSE(db.SelectEachByCommand("DELETE FROM jobs RETURNING id", [this](const SqliteRow&) {
+        db.Close();
+        return false;
+    }));
+    EXPECT_EQ(db.GetSqliteCode(), SQLITE_BUSY);
+    reader.Run("COMMIT");
+    EXPECT_EQ(Run("SELECT count(*) FROM jobs"), "3");
+    TakeLines();
+}
+
 TEST_F(SqliteDbEachTest, AConnectionIsClosedByTheLastOfNestedSelects)
 {
     MakeJobs();

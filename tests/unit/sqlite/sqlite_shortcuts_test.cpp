@@ -1,8 +1,9 @@
-// What cached statements once did otherwise than their texts. tests/shapes found these.
+// What shortcuts once did otherwise than statements that run as their texts.
 #include <orvadrcore/sqlite_condition.h>
 #include <orvadrcore/sqlite_db.h>
 
 #include "sqlite/sqlite_connection.h"
+#include "support/fixtures/as_texts.h"
 #include "support/fixtures/sqlite_fixture.h"
 
 namespace OrvaDRCore {
@@ -90,6 +91,126 @@ TEST_F(SqliteShortcutsTest, AColumnThatIsMissingIsAwaitedFromTheHolderOfTheLock)
         if (number == 2) other.Run("COMMIT");
     });
     EXPECT_TRUE(db.Exec("DELETE FROM t WHERE c=8"));
+}
+
+// ------------------------------------------------------------------------------- the order of rows
+
+struct PartialIndex {
+    const char* index;  // its condition
+    const char* query;  // that of the statement
+};
+
+std::ostream& operator<<(std::ostream& out, const PartialIndex& partial)
+{
+    return out << partial.index << " and " << partial.query;
+}
+
+// Whether SQLite uses a partial index, and so the order of rows, depends on the literals.
+class SqliteOrderTest : public SqliteShortcutsTest,
+                        public ::testing::WithParamInterface<PartialIndex> {
+  protected:
+    SqliteOrderTest()
+    {
+        Run("CREATE TABLE r(a REAL, b); INSERT INTO r VALUES(5,30),(7,20),(5,10),(8,15)");
+        Run("CREATE TABLE log(b); CREATE VIEW v AS SELECT * FROM r");
+        Run("CREATE TRIGGER d INSTEAD OF DELETE ON v BEGIN INSERT INTO log VALUES(old.b); END");
+    }
+
+    std::string Selected()
+    {
+        std::string selected;
+        std::vector<SqliteValueList> rows;
+        EXPECT_TRUE(db.SelectByCommand("SELECT b FROM r WHERE " + query, rows));
+        for (const SqliteValueList& row : rows) selected += row.ToStr() + " ";
+        return selected;
+    }
+
+    std::string Deleted()
+    {
+        EXPECT_TRUE(db.Exec("DELETE FROM log") && db.Exec("DELETE FROM v WHERE " + query));
+        return Run("SELECT b FROM log ORDER BY rowid");
+    }
+
+    const std::string makeIndex = "CREATE INDEX i ON r(b) WHERE " + std::string(GetParam().index);
+    const std::string query = GetParam().query;
+};
+
+TEST_P(SqliteOrderTest, IsThatOfTheTexts)
+{
+    ASSERT_TRUE(db.Exec(makeIndex));
+    for (int run = 0; run < 2; ++run) {
+        const std::string selected = Selected();
+        const std::string deleted = Deleted();
+        const AsTexts asTexts;
+        EXPECT_EQ(selected, Selected());
+        EXPECT_EQ(deleted, Deleted());
+    }
+}
+
+TEST_P(SqliteOrderTest, IsThatOfTheTextsAfterAnotherConnectionHasMadeTheIndex)
+{
+    Selected();
+    Run(makeIndex);
+    const std::string selected = Selected();
+    const AsTexts asTexts;
+    EXPECT_EQ(selected, Selected());
+}
+
+INSTANTIATE_TEST_SUITE_P(Conditions, SqliteOrderTest,
+                         ::testing::Values(PartialIndex{"a=5", "a=5"}, PartialIndex{"a=5.0", "a=5"},
+                                           PartialIndex{"a=+5", "a=5"},
+                                           PartialIndex{"a IN (5,7)", "a IN (5,7)"},
+                                           PartialIndex{"a IN (5,7)", "a=5 OR a=7"},
+                                           PartialIndex{"a IN (1,7)", "a=1 OR a=7"},
+                                           PartialIndex{"a NOT IN (7,9)", "a NOT IN (7,9)"},
+                                           PartialIndex{"a IN (5)", "a=5"},
+                                           PartialIndex{"a>5", "a>6"}));
+
+// ---------------------------------------------------------------------------- failures of the text
+
+TEST_F(SqliteShortcutsTest, AConditionThatSqliteCannotParseFails)
+{
+    const auto fails = [this](const std::string& condition) {
+        const bool failed = !db.Exec("DELETE FROM t WHERE " + condition);
+        TakeLines();
+        return failed;
+    };
+    std::string chain = "a=-5";
+    for (int terms = 1; terms < 999; ++terms) chain += " AND c=1";
+    std::string nested = "a=-5";
+    for (int depth = 0; depth < 87; ++depth) nested = "(" + nested + ")";
+    for (const std::string& condition : {chain, nested}) {
+        const bool failed = fails(condition);
+        const AsTexts asTexts;
+        EXPECT_EQ(failed, fails(condition)) << condition;
+    }
+}
+
+TEST_F(SqliteShortcutsTest, ForeignKeysThatAnExplainSwitchesOnAreEnforced)
+{
+    ASSERT_TRUE(db.Exec("CREATE TABLE p(id INTEGER PRIMARY KEY); CREATE TABLE k(a REFERENCES p)"));
+    EXPECT_TRUE(db.Exec("INSERT INTO k (a) VALUES (7)"));
+    EXPECT_TRUE(db.Exec("EXPLAIN PRAGMA foreign_keys=ON"));
+    EXPECT_FALSE(db.Exec("INSERT INTO k (a) VALUES (8)"));
+    EXPECT_EQ(db.GetSqliteCode(), SQLITE_CONSTRAINT_FOREIGNKEY);
+    TakeLines();
+}
+
+TEST_F(SqliteShortcutsTest, ALockOfASharedCacheIsReportedAsForTheText)
+{
+    if (sqlite3_compileoption_used("USE_URI") == 0) return;
+    SqliteDB one("file:" + path + "?cache=shared", 0);
+    SqliteDB other("file:" + path + "?cache=shared", 0);
+    ASSERT_TRUE(one.Open() && other.Open());
+    const std::string update = "UPDATE t SET c=5 WHERE a=7";
+    ASSERT_TRUE(other.Exec(update));
+    ASSERT_TRUE(one.Exec("BEGIN; CREATE TABLE u(a)"));
+    EXPECT_FALSE(other.Exec(update));
+    const std::string record = toString(other.GetErr());
+    const AsTexts asTexts;
+    EXPECT_FALSE(other.Exec(update));
+    EXPECT_EQ(record, toString(other.GetErr()));
+    TakeLines();
 }
 
 }  // namespace

@@ -104,8 +104,10 @@ TEST_F(StatementWatchTest, CountsStatementsThatMayChangeTheSchemaOrUndoThat)
         Run(text);
         EXPECT_EQ(watch.CountSchemaStatements(), before) << text;
     }
-    Run("PRAGMA user_version=2; SAVEPOINT s; RELEASE s");
+    Run("PRAGMA user_version; SAVEPOINT s; RELEASE s");
     EXPECT_EQ(watch.CountDefinitions(), definitions);
+    Run("EXPLAIN PRAGMA foreign_keys=ON");  // takes effect all the same
+    EXPECT_EQ(watch.CountDefinitions(), definitions + 1);
 }
 
 TEST_F(StatementWatchTest, SeesTemporaryTablesAndViews)
