@@ -43,10 +43,7 @@ const std::string* TextOf(const SqliteCondition& condition)
 // Appends "(id,name) VALUES (1,'x')".
 void AppendInsertValues(std::string& text, const SqliteValueList& record)
 {
-    text += '(';
-    for (const auto& [field, value] : record.GetValues()) (text += field) += ',';
-    if (text.back() == ',') text.pop_back();
-    text += ") VALUES (";
+    AppendColumns(text, record);
     for (const auto& [field, value] : record.GetValues()) {
         AppendLiteral(text, value);
         text += ',';
@@ -176,9 +173,8 @@ std::string InsertCommand::GetCommand() const
         DR_LOG(Err, "Bad insert parameter");
         return {};
     }
-    std::string text = BeginStatement(replacable_ ? "INSERT OR REPLACE INTO " : "INSERT INTO ");
-    text += GetTable().GetName();
-    text += ' ';
+    std::string text = BeginStatement("");
+    AppendInsertInto(text, GetTable().GetName(), replacable_);
     AppendInsertValues(text, fieldValues_);
     text += ';';
     return text;

@@ -37,12 +37,8 @@ bool IsBoundAsWritten(const SqliteValue& value)
 void AppendInsertShape(std::string& text, const std::string& table, const SqliteValueList& record,
                        bool replacable)
 {
-    text += replacable ? "INSERT OR REPLACE INTO " : "INSERT INTO ";
-    text += table;
-    text += " (";
-    for (const auto& [field, value] : record.GetValues()) (text += field) += ',';
-    text.back() = ')';
-    text += " VALUES (";
+    AppendInsertInto(text, table, replacable);
+    AppendColumns(text, record);
     for (std::size_t count = record.GetValues().size(); count > 0; --count) text += "?,";
     text.back() = ')';
 }

@@ -129,6 +129,21 @@ std::string BeginStatement(const char* text)
     return statement;
 }
 
+void AppendInsertInto(std::string& text, const std::string& table, bool replacable)
+{
+    text += replacable ? "INSERT OR REPLACE INTO " : "INSERT INTO ";
+    text += table;
+    text += ' ';
+}
+
+void AppendColumns(std::string& text, const SqliteValueList& record)
+{
+    text += '(';
+    for (const auto& [field, value] : record.GetValues()) (text += field) += ',';
+    if (text.back() == ',') text.pop_back();
+    text += ") VALUES (";
+}
+
 void AppendClause(std::string& text, const char* keyword, const std::string& clause)
 {
     if (!clause.empty()) (text += keyword) += clause;

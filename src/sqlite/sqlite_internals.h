@@ -74,6 +74,12 @@ void AppendPairs(std::string& text, const SqliteValueList& record, const char* b
 // Returns `text` with room for a usual statement, so that it is rarely reallocated while it grows.
 std::string BeginStatement(const char* text);
 
+// Appends "INSERT INTO table " or "INSERT OR REPLACE INTO table ".
+void AppendInsertInto(std::string& text, const std::string& table, bool replacable);
+
+// Appends "(a,b) VALUES (", which follows that.
+void AppendColumns(std::string& text, const SqliteValueList& record);
+
 // Appends the keyword and its clause, unless the clause is empty.
 void AppendClause(std::string& text, const char* keyword, const std::string& clause);
 
