@@ -4,7 +4,7 @@
 #include <limits>
 
 // Missing in an SQLite without its deprecated functions.
-extern "C" __attribute__((weak)) int sqlite3_expired(sqlite3_stmt* statement);
+#pragma weak sqlite3_expired
 
 namespace OrvaDRCore {
 
