@@ -46,7 +46,8 @@ class Recorder {
     void Begin(const SystemCall& begun)
     {
         call_ = begun;
-        first_ = second_ = {};
+        first_.reset();
+        second_.reset();
         const auto [one, other] = PathsOf(call_);
         if (one >= 0) first_ = NameIn(Argument(one));
         if (other >= 0) second_ = NameIn(Argument(other));
