@@ -226,7 +226,7 @@ class System {
         for (const Kind& kind : Kinds()) {
             for (const int error : kind.errors) {
                 std::array<char, 128> text{};
-                static_cast<void>(::strerror_r(error, text.data(), text.size()));
+                EXPECT_NE(::strerror_r(error, text.data(), text.size()), nullptr);
             }
         }
         // So does our library for JSON.

@@ -12,6 +12,7 @@
 #include <filesystem>
 #include <fstream>
 #include <set>
+#include <stdexcept>
 #include <string>
 #include <thread>
 #include <utility>
@@ -396,9 +397,9 @@ TEST_F(ColdCacheTest, OnAFullDiskEveryReaderGetsWhatItProduced)
         if (!BecomeRoot() || !MountSmallDisk(dir.File("cache"), Size)) {
             // As if it were full.
             (void)::chmod(dir.File("cache").c_str(), 0555);
-            if (::geteuid() == 0) {
-                (void)::chown(dir.Path().c_str(), Nobody, Nobody);
-                (void)LoseRights();
+            if (::geteuid() == 0 &&
+                (::chown(dir.Path().c_str(), Nobody, Nobody) != 0 || !LoseRights())) {
+                throw std::runtime_error("cannot become an ordinary user");
             }
         }
         std::vector<std::thread> threads;
