@@ -121,8 +121,7 @@ TEST(CommandLineTest, TakesTheFlagForJsonBeforeAndAfterTheCommand)
 
 TEST(CommandLineTest, TellsThatItsOutputCannotBeWritten)
 {
-    const ProgramResult result =
-        RunProgram({"/bin/sh", "-c", std::string(ORVADR_PROGRAM) + " error >/dev/full"});
+    const ProgramResult result = RunProgram({"/bin/sh", "-c", ORVADR_PROGRAM " error >/dev/full"});
     EXPECT_EQ(result.code, NotSeen);
     EXPECT_THAT(result.err, StartsWith("orvadr: cannot write to standard output: "));
 }
