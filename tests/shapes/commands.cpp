@@ -15,7 +15,7 @@ using OrvaDRCore::SqliteValueList;
 using OrvaDRCore::UpdateCommand;
 using std::string;
 
-constexpr std::array<const char*, 27> Writes = {
+constexpr std::array<const char*, 29> Writes = {
     "INSERT INTO $t DEFAULT VALUES",
     "INSERT INTO $t(a,b) VALUES($v,$v)",
     "INSERT INTO $t (a,b) VALUES ($v,$v),($v,$v);",
@@ -36,6 +36,8 @@ constexpr std::array<const char*, 27> Writes = {
     "UPDATE $t SET (a,b)=($v,$v) WHERE $c=$v",
     "UPDATE $t SET a=$v WHERE $c=$v RETURNING a",
     "DELETE FROM $t WHERE $c=$v LIMIT 1",
+    "DELETE FROM $t WHERE $c=$v RETURNING *",
+    "DELETE FROM $t RETURNING $c",
     "DELETE FROM $t AS x WHERE x.a=$v",
     "DELETE FROM $t;",
     "WITH x AS (SELECT 1) DELETE FROM $t WHERE $c=$v",

@@ -79,8 +79,8 @@ Comparison::Comparison(const string& directory, Fault fault)
 
 std::optional<Difference> Comparison::Run(const Script& script, std::size_t count)
 {
-    plain_.Begin(*script.schema, script.limits, {false, false, false});
-    tested_.Begin(*script.schema, script.limits, script.shortcuts);
+    plain_.Begin(script.schema, script.limits, {false, false, false});
+    tested_.Begin(script.schema, script.limits, script.shortcuts);
     const std::size_t end = std::min(count, script.operations.size());
     for (std::size_t at = 0; at < end; ++at) {
         ++operations_;

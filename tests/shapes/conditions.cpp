@@ -108,6 +108,26 @@ string Pair(Draw& draw, const Table& table, int depth)
                                : SqliteOr(left, right).GetCondition();
 }
 
+string Chain(Draw& draw, const string& column, std::size_t terms)
+{
+    static const std::array<const char*, 5> others = {" AND c=1", " AND a<>0", " OR c=-1",
+                                                      " OR a IS NULL", " AND b IS NOT NULL"};
+    const string other = draw.shape.Of(others);
+    string chain = column + "=" + AnyLiteral(draw);
+    for (std::size_t count = 1 + draw.value.Below(3); count < terms; ++count) chain += other;
+    return chain;
+}
+
+// Near SQLite's limits for the depth of expressions and parentheses, and those of the library.
+string AtLimit(Draw& draw, const string& column)
+{
+    constexpr std::size_t Terms = 1002;
+    constexpr std::array<std::size_t, 3> Depths = {41, 89, 100};
+    if (draw.shape.OneIn(2)) return Chain(draw, column, Terms);
+    const std::size_t depth = draw.shape.Of(Depths) - draw.value.Below(4);
+    return string(depth, '(') + column + "=" + AnyLiteral(draw) + string(depth, ')');
+}
+
 string OddCondition(Draw& draw, const Table& table)
 {
     const string column = AnyColumn(draw, table);
@@ -115,6 +135,7 @@ string OddCondition(Draw& draw, const Table& table)
         case 0: return SqliteContains(column, AnyText(draw.value)).GetCondition();
         case 1: return SqliteBeginsWith(column, AnyText(draw.value)).GetCondition();
         case 2: return SqliteIn(column, FillIn(draw, table, "SELECT $c FROM $t")).GetCondition();
+        case 3: return draw.shape.OneIn(3) ? AtLimit(draw, column) : Chain(draw, column, 17);
         default: return FillIn(draw, table, draw.shape.Of(Written));
     }
 }
@@ -163,6 +184,9 @@ string AnyCondition(Draw& draw, const Table& table, int depth)
     constexpr int Deepest = 4;
     if (draw.IsOdd(5)) return OddCondition(draw, table);
     const string column = AnyColumn(draw, table);
+    const bool isCommon =
+        draw.schema.hasCommonConditions ? !draw.shape.OneIn(3) : draw.shape.OneIn(8);
+    if (isCommon) return CommonCondition(draw, column);
     switch (draw.shape.Below(depth < Deepest ? 15 : 11)) {
         case 0:
         case 1:

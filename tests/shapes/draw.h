@@ -49,6 +49,9 @@ std::string AnyColumn(Draw& draw, const Table& table);
 // A text after WHERE.
 std::string AnyCondition(Draw& draw, const Table& table, int depth = 0);
 
+// A condition with few numbers, like those of the partial indexes in partial_indexes.cpp.
+std::string CommonCondition(Draw& draw, const std::string& column);
+
 // The text with every "$c", "$v" and "$t" replaced by a column, a literal and the table.
 std::string FillIn(Draw& draw, const Table& table, const std::string& text);
 

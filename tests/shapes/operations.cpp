@@ -139,6 +139,8 @@ Operation AnyStatement(Random& random, const Pool& pool)
 
 string AnyNeighbourStatement(Draw& draw)
 {
+    if (!draw.schema.neighbour.empty() && !draw.value.OneIn(3))
+        return draw.value.Of(draw.schema.neighbour);
     const Table& table = draw.value.OneIn(2) ? draw.schema.tables.front() : AnyTable(draw);
     const char* const statement =
         draw.value.OneIn(3) ? draw.value.Of(Changes) : draw.value.Of(SchemaChanges);

@@ -184,7 +184,9 @@ Schema ForeignKeys()
                 "SET NULL, b TEXT, c INTEGER REFERENCES t(id) DEFERRABLE INITIALLY DEFERRED");
     return {"foreign keys",
             {Create(t), Create(u), Fill("t"), "INSERT INTO u VALUES(1,1,'a',1),(2,2,'b',3)"},
-            {u, t}};
+            {u, t},
+            {"PRAGMA foreign_keys=1", "PRAGMA foreign_keys=0", "EXPLAIN PRAGMA foreign_keys=1",
+             "EXPLAIN PRAGMA foreign_keys=0"}};
 }
 
 Schema Collations()
@@ -231,8 +233,6 @@ Schema SmallPages()
             {t}};
 }
 
-}  // namespace
-
 const std::vector<Schema>& Schemas()
 {
     static const std::vector<Schema> schemas = {
@@ -242,6 +242,13 @@ const std::vector<Schema>& Schemas()
         Generated(),  ForeignKeys(),  Collations(),     OddNames(),
         WideTables(), SmallPages()};
     return schemas;
+}
+
+}  // namespace
+
+Schema AnySchema(Random& random)
+{
+    return random.OneIn(4) ? AnyPartialIndexes(random) : random.Of(Schemas());
 }
 
 }  // namespace Shapes

@@ -5,6 +5,8 @@
 #include <string>
 #include <vector>
 
+#include "random.h"
+
 namespace Shapes {
 
 struct Table {
@@ -14,12 +16,18 @@ struct Table {
 };
 
 struct Schema {
-    const char* name;
-    std::vector<std::string> setup;  // run on an empty file
-    std::vector<Table> tables;       // what operations use; the first one most
+    std::string name;
+    std::vector<std::string> setup;        // run on an empty file
+    std::vector<Table> tables;             // what operations use; the first one most
+    std::vector<std::string> session{};    // what its connections often run
+    std::vector<std::string> neighbour{};  // what others often run
+    bool hasCommonConditions = false;      // statements mostly use CommonCondition()
+    const char* file = "main.db";          // as its connections write it
 };
 
-const std::vector<Schema>& Schemas();
+// One of the databases in schemas.cpp, or one with random partial indexes.
+Schema AnySchema(Random& random);
+Schema AnyPartialIndexes(Random& random);
 
 }  // namespace Shapes
 

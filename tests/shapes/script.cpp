@@ -28,9 +28,9 @@ OrvaDRCore::Shortcuts AnyShortcuts(Random& random)
 Script MakeScript(std::uint64_t seed)
 {
     Random random(seed);
-    Script script{seed, &random.Of(Schemas()), {}, AnyShortcuts(random), {}};
+    Script script{seed, AnySchema(random), {}, AnyShortcuts(random), {}};
     for (unsigned int& limit : script.limits) limit = static_cast<unsigned int>(random.Below(3));
-    Pool pool{*script.schema, random.Of(Tameness), {}};
+    Pool pool{script.schema, random.Of(Tameness), {}};
     pool.shapes.resize(2 + random.Below(14));
     for (std::uint64_t& shape : pool.shapes) shape = random.Next();
     const std::size_t count = 30 + random.Below(300);
@@ -41,7 +41,7 @@ Script MakeScript(std::uint64_t seed)
 
 std::string Describe(const Script& script)
 {
-    std::string text = std::string("schema: ") + script.schema->name + ", retry limits:";
+    std::string text = "schema: " + script.schema.name + ", retry limits:";
     for (const unsigned int limit : script.limits) text += " " + std::to_string(limit);
     text += ", shortcuts:";
     if (script.shortcuts.shapes) text += " shapes";

@@ -14,7 +14,7 @@ namespace Shapes {
 
 struct Script {
     std::uint64_t seed;
-    const Schema* schema;
+    Schema schema;
     RetryLimits limits;
     OrvaDRCore::Shortcuts shortcuts;  // of the side that is tested
     std::vector<Operation> operations;

@@ -108,10 +108,17 @@ Operation ExecOf(Draw& draw, const string& statement)
             [=](Side& side) { side.Note("answer", side.Db(db).Exec(statement)); }};
 }
 
+// Some take effect even in an EXPLAIN.
+string AnyPragma(Draw& draw)
+{
+    const char* const begin = draw.value.OneIn(5) ? "EXPLAIN PRAGMA " : "PRAGMA ";
+    return begin + string(draw.value.Of(Pragmas));
+}
+
 Operation QueryPragma(Draw& draw)
 {
     const std::size_t db = AnyConnection(draw);
-    const string statement = string("PRAGMA ") + draw.value.Of(Pragmas);
+    const string statement = AnyPragma(draw);
     return {NameOf(db) + "SelectByCommand: " + statement, [=](Side& side) {
                 std::vector<OrvaDRCore::SqliteValueList> rows;
                 side.Note("answer", side.Db(db).SelectByCommand(statement, rows));
@@ -140,10 +147,30 @@ Operation TransactionOperation(Draw& draw)
     }
 }
 
+// Closes the connection while it deletes. The deletion is committed later, while another reads.
+Operation CloseInDelete(Draw& draw)
+{
+    const std::size_t db = AnyConnection(draw);
+    const string text = "DELETE FROM " + draw.value.Of(draw.schema.tables).name + " RETURNING a";
+    const bool wantsMore = draw.value.OneIn(2);
+    return {NameOf(db) + "SelectEachByCommand: " + text + " { closes, while another reads }",
+            [=](Side& side) {
+                const char* const read = "BEGIN; SELECT count(*) FROM sqlite_master";
+                side.Note("reader", side.RunAsNeighbour(false, read));
+                const auto close = [&](const OrvaDRCore::SqliteRow&) {
+                    side.DropTransaction(db);
+                    side.Db(db).Close();
+                    return wantsMore;
+                };
+                side.Note("answer", side.Db(db).SelectEachByCommand(text, close));
+                side.Note("reader", side.RunAsNeighbour(false, "COMMIT"));
+            }};
+}
+
 Operation ConnectionOperation(Draw& draw)
 {
     const std::size_t db = AnyConnection(draw);
-    switch (draw.value.Below(4)) {
+    switch (draw.value.Below(5)) {
         case 0:
             return {NameOf(db) + "Close", [db](Side& side) {
                         side.DropTransaction(db);
@@ -155,6 +182,7 @@ Operation ConnectionOperation(Draw& draw)
                         SqliteDB moved(std::move(side.Db(db)));
                         side.Db(db) = std::move(moved);
                     }};
+        case 2: return CloseInDelete(draw);
         default:
             return {NameOf(db) + "Open",
                     [db](Side& side) { side.Note("answer", side.Db(db).Open()); }};
@@ -188,6 +216,8 @@ Operation TableOperation(Draw& draw)
 
 Operation AnySessionOperation(Draw& draw)
 {
+    if (!draw.schema.session.empty() && draw.value.OneIn(2))
+        return ExecOf(draw, draw.value.Of(draw.schema.session));
     switch (draw.value.Below(16)) {
         case 0:
         case 1:
@@ -197,7 +227,7 @@ Operation AnySessionOperation(Draw& draw)
         case 5:
         case 6: return TransactionOperation(draw);
         case 7:
-        case 8: return ExecOf(draw, string("PRAGMA ") + draw.value.Of(Pragmas));
+        case 8: return ExecOf(draw, AnyPragma(draw));
         case 9: return QueryPragma(draw);
         case 10: return ConnectionOperation(draw);
         case 11: return TableOperation(draw);

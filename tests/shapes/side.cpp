@@ -23,7 +23,9 @@ constexpr int WaitMSec = 100;
 
 const char* const FileName = "main.db";  // relative: messages show it
 
-std::string* logged = nullptr;  // lines go here during an operation
+// During an operation: where its lines go, and who could do something while they are logged.
+std::string* logged = nullptr;
+Neighbour* witness = nullptr;
 
 // After a wait that was in vain, SQLite does not wait in the next prepare either, and the
 // shortcuts may need one prepare more. Any prepare ends that.
@@ -48,7 +50,8 @@ void CaptureLine(int priority, const char* format, std::va_list arguments)
     (void)std::vsnprintf(line.data(), line.size() + 1, format, arguments);
     const std::size_t colon = line.find(':');
     line.erase(colon, line.find('(') - colon);
-    *logged += "log " + std::to_string(priority) + ": " + line + "\n";
+    *logged += "log " + std::to_string(priority) + ": " + line +
+               "\npossible while it is logged: " + witness->TryLocks() + "\n";
 }
 
 int StateOfTransaction([[maybe_unused]] sqlite3* handle)
@@ -92,11 +95,12 @@ void Side::Begin(const Schema& schema, const RetryLimits& limits,
     for (const std::string& statement : schema.setup) {
         const std::string result = second_.Run(statement);
         if (result.find("code ") == std::string::npos) continue;
-        (void)std::fprintf(stderr, "%s: %s: %s\n", schema.name, statement.c_str(), result.c_str());
+        (void)std::fprintf(stderr, "%s: %s: %s\n", schema.name.c_str(), statement.c_str(),
+                           result.c_str());
         std::abort();
     }
     for (std::size_t which = 0; which < ConnectionCount; ++which)
-        dbs_[which].emplace(FileName, limits[which]);
+        dbs_[which].emplace(schema.file, limits[which]);
 }
 
 void Side::Close()
@@ -137,6 +141,7 @@ std::string Side::Run(const Operation& operation, std::uint64_t seed)
         Do(atWait_, number);
     });
     logged = &outcome_;
+    witness = &second_;
     operation.run(*this);
     logged = nullptr;
     Note("pauses", static_cast<std::int64_t>(pauses.Taken().size()));
