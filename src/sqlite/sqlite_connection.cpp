@@ -29,25 +29,25 @@ constexpr Bracket Transaction{"BEGIN IMMEDIATE", "COMMIT", "ROLLBACK"};
 constexpr Bracket Savepoint{"SAVEPOINT orvadr_insert", "RELEASE orvadr_insert",
                             "ROLLBACK TO orvadr_insert; RELEASE orvadr_insert"};
 
-// Whether SQLite has prepared a select again with its values, because another connection has changed
-// the schema. Then the order of rows may be another than that of the literals: see BeginShape().
-bool IsPlannedWithValues(sqlite3_stmt* statement, int code)
-{
-    return (code == SQLITE_ROW || code == SQLITE_DONE) &&
-           sqlite3_stmt_status(statement, SQLITE_STMTSTATUS_REPREPARE, 0) != 0;
-}
-
-// Whether a statement of this kind, run now, ends all locks that it takes when it fails, and waits for
-// each lock that it meets. A write of a connection that already reads would not wait.
-bool TakesPlainLock([[maybe_unused]] sqlite3* handle, bool isInTransaction,
-                    [[maybe_unused]] bool isSelect)
+// Whether a connection outside of a transaction has a lock: a select of it runs, or a virtual table has
+// kept the lock.
+bool IsReading([[maybe_unused]] sqlite3* handle)
 {
 #if SQLITE_VERSION_NUMBER >= 3034000
-    const int state = sqlite3_txn_state(handle, "main");
-    if (!isInTransaction) return isSelect || state == SQLITE_TXN_NONE;
-    return state >= (isSelect ? SQLITE_TXN_READ : SQLITE_TXN_WRITE);
+    return sqlite3_txn_state(handle, "main") != SQLITE_TXN_NONE;
 #else
-    return !isInTransaction;
+    return false;
+#endif
+}
+
+// Whether a statement of this kind, run now in a transaction, takes no lock that stays after its
+// failure.
+bool HasLock([[maybe_unused]] sqlite3* handle, [[maybe_unused]] bool isSelect)
+{
+#if SQLITE_VERSION_NUMBER >= 3034000
+    return sqlite3_txn_state(handle, "main") >= (isSelect ? SQLITE_TXN_READ : SQLITE_TXN_WRITE);
+#else
+    return false;
 #endif
 }
 
@@ -151,14 +151,16 @@ bool SqliteConnection::Insert(const InsertCommand& command)
 //
 // A cached statement may have become wrong. It notices that only when it has its lock, while a new one
 // fails before it takes any. So a cached one must not wait for a lock, for which our own busy handler is
-// needed, nor take one that would stay after its failure.
+// needed, nor take one that would stay after its failure. Nor may it end one that a virtual table has
+// kept, as it does when SQLite prepares it again.
 bool SqliteConnection::MayRunCached(bool isSelect)
 {
     // After a failed definition SQLite may keep a schema that only new statements see.
     const std::uint64_t before = std::exchange(definitions_, watch_.CountDefinitions());
     if (before != definitions_) cache_.Clear();
-    return wait_.IsInstalled() && cache_.IsUsable(handle_) &&
-           TakesPlainLock(handle_, IsInTransaction(), isSelect);
+    if (!wait_.IsInstalled() || !cache_.IsUsable(handle_)) return false;
+    if (IsInTransaction()) return HasLock(handle_, isSelect);
+    return !IsReading(handle_) || (isSelect && HoldsLock());
 }
 
 // Steps a statement once, without waiting for a lock if it was cached. Returns SQLite's code, or none
@@ -180,17 +182,23 @@ std::optional<int> SqliteConnection::StepFirst(StatementCache::Cached& cached)
 }
 
 // Begins to run the statement of the shape. Returns SQLite's code, or none if the text must be run
-// instead: because a lock was met, or because SQLite's message might show parameters.
+// instead: because of a lock or a changed schema, or because SQLite's message might show parameters.
 std::optional<int> SqliteConnection::BeginShape(const Bind& bind, StatementCache::Cached& cached)
 {
-    const int code = cache_.Take(handle_, shape_.text, cached);
-    if (code == SQLITE_ERROR) return {};
-    if (code != SQLITE_OK) return code;
+    const int taken = cache_.Take(handle_, shape_.text, cached);
+    if (taken == SQLITE_ERROR) return {};
+    if (taken != SQLITE_OK) return taken;
     if (bind(cached.statement.get()) != SQLITE_OK) return {};
     // SQLite compares bound values with partial indexes more loosely than literals, and 5 is 5.0 there.
     // The order of rows would be another.
     if (MayDependOnValues(cached.statement.get())) return {};
-    return StepFirst(cached);
+    // Nor may SQLite prepare it again with the values, because another connection has changed the schema.
+    // It would also forget which values the new plan depends on.
+    watch_.RefuseToPrepareAgain(cached.statement.get());
+    const std::optional<int> code = StepFirst(cached);
+    if (!watch_.AcceptToPrepareAgain()) return code;
+    cached = {};
+    return {};
 }
 
 // Runs the statement of the shape, which writes. The result is that of BeginShape(). SQLite's message
@@ -285,12 +293,9 @@ bool SqliteConnection::Select(const std::string& command, const TakeRow& takeRow
 // text while rows are given to it.
 std::optional<int> SqliteConnection::BeginSelectShape(StatementCache::Cached& cached)
 {
-    const std::optional<int> code = BeginShape(
+    return BeginShape(
         [this](sqlite3_stmt* made) { return BindLiterals(made, shape_, SQLITE_TRANSIENT); },
         cached);
-    if (!code || !IsPlannedWithValues(cached.statement.get(), *code)) return code;
-    cached = {};
-    return {};
 }
 
 std::optional<int> SqliteConnection::BeginText(const std::string& command,
@@ -313,6 +318,8 @@ int SqliteConnection::TakeRows(sqlite3_stmt* statement, const TakeRow& takeRow,
     const sqlite3* const handle = handle_;
     int code = SQLITE_ROW;
     RowReader row(statement);
+    ++selects_;
+    const ScopeGuard ended([this] { --selects_; });
     while (code == SQLITE_ROW) {
         const bool isMoreWanted = takeRow(row);
         if (row.IsOutOfMemory()) {
@@ -343,10 +350,12 @@ void SqliteConnection::EndSelect(sqlite3* handle)
 bool SqliteConnection::LookUp(const std::string& table, bool& isFound)
 {
     const auto takeRow = [&isFound](const RowReader&) { return isFound = true; };
-    if (!lookup_.CanCheck(handle_, watch_, table)) {
+    const bool isInTransaction = IsInTransaction();
+    const bool canCheck = lookup_.CanCheck(handle_, watch_, table);
+    const bool reads = canCheck && !isInTransaction && IsReading(handle_);
+    if (!canCheck || (reads && !HoldsLock())) {  // see MayRunCached()
         return Select(TableLookup::Query(table), takeRow);
     }
-    const bool isInTransaction = IsInTransaction();
     const TableLookup::Moment now{watch_.CountTransactions(), watch_.CountSchemaStatements()};
     if (isInTransaction && lookup_.WasCheckedAt(now) && lookup_.IsKnown(table)) {
         error_.Set(0);
@@ -361,10 +370,13 @@ bool SqliteConnection::LookUp(const std::string& table, bool& isFound)
     // If the connection reads already, the lock may end with the query, as a full-text table's does.
     // A select from a temporary table would keep the lock to its end, but needs none. After a failed
     // attempt a log line follows.
-    const bool reads = !TakesPlainLock(handle_, false, false);
     const bool mayKeepLock = std::exchange(isLookupLockKept_, false) && !isInTransaction &&
                              !reads && !watch_.HasTempTables();
     const int code = CheckSchema(table);
+    if (code == SQLITE_LOCKED) {  // see StepFirst()
+        lookup_.GiveBack();
+        return Select(TableLookup::Query(table), takeRow);
+    }
     if (code != SQLITE_ROW) {
         SetFailure(TableLookup::Query(table), code, nullptr);
         return false;

@@ -124,6 +124,7 @@ class SqliteConnection {
     void EndSelect(sqlite3* handle);
     void NoteChangesSince(const StatementWatch::Changes& before);
     void NoteExtendedCode();
+    bool HoldsLock() const { return selects_ > 0 || lookup_.IsChecking(); }
 
     const std::string path_;
     const unsigned int retryLimit_;
@@ -136,7 +137,8 @@ class SqliteConnection {
     std::uint64_t definitions_ = 0;  // when the cache was used last
     TableLookup lookup_;
     bool isLookupLockKept_ = false;
-    Shape shape_;  // of the statement that is about to run; kept for its memory
+    Shape shape_;               // of the statement that is about to run; kept for its memory
+    unsigned int selects_ = 0;  // that give their rows to callers
     const SqliteTransaction* owner_ = nullptr;
 };
 

@@ -62,11 +62,6 @@ void StatementCache::Keep(Cached&& cached)
 {
     sqlite3_stmt* const statement = cached.statement.get();
     if (!IsUsable(sqlite3_db_handle(statement))) return;
-    // When SQLite prepares a statement again, it forgets which parameters the new plan depends on. With
-    // other values the plan could miss rows, those outside of a new partial index for example.
-    const bool hasParameters = sqlite3_bind_parameter_count(statement) > 0;
-    if (hasParameters && sqlite3_stmt_status(statement, SQLITE_STMTSTATUS_REPREPARE, 0) != 0)
-        return;
     sqlite3_reset(statement);
     sqlite3_clear_bindings(statement);
     cached.text = TextOf(statement);

@@ -47,6 +47,9 @@ class TableLookup {
                checked_.schemaStatements == now.schemaStatements;
     }
 
+    // Whether a check holds the lock.
+    bool IsChecking() const { return isChecking_; }
+
     // Ends the check, which gives back the lock outside of a transaction.
     void GiveBack();
 

@@ -74,6 +74,10 @@ int StatementWatch::Note(void* watch, int action, const char* name, const char* 
                          const char* database, const char* /*trigger*/)
 {
     auto& self = *static_cast<StatementWatch*>(watch);
+    if (self.refused_ != nullptr && sqlite3_stmt_busy(self.refused_) == 0) {
+        self.wasRefused_ = true;
+        return SQLITE_DENY;
+    }
     const bool setsPragma = action == SQLITE_PRAGMA && value != nullptr;
     if (setsPragma && sqlite3_stricmp(name, "busy_timeout") == 0) self.isBusyTimeoutSet_ = true;
     if (setsPragma && IsSchemaPragma(name)) self.isSchemaUnguarded_ = true;

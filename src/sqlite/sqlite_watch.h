@@ -65,6 +65,22 @@ class StatementWatch {
     // From now on statements that begin or end a transaction are refused, or not any more.
     void ForbidTransactions(bool isForbidden) { isForbidden_ = isForbidden; }
 
+    // From now on SQLite may not prepare this statement again, as its first step does when the schema
+    // has changed. The step fails before it has done anything. What the running statement prepares
+    // for its own use is not refused.
+    void RefuseToPrepareAgain(sqlite3_stmt* statement)
+    {
+        refused_ = statement;
+        wasRefused_ = false;
+    }
+
+    // Ends that. Returns whether SQLite has tried.
+    bool AcceptToPrepareAgain()
+    {
+        refused_ = nullptr;
+        return wasRefused_;
+    }
+
   private:
     static int Note(void* watch, int action, const char* first, const char* second,
                     const char* database, const char* trigger);
@@ -79,6 +95,8 @@ class StatementWatch {
     bool isSchemaUnguarded_ = false;
     bool hasTempTables_ = false;
     bool isForbidden_ = false;
+    sqlite3_stmt* refused_ = nullptr;
+    bool wasRefused_ = false;
     Changes changes_{};
     std::int64_t allRows_ = 0;  // CountAllRows() when changes_ was counted
 };

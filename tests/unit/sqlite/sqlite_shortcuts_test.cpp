@@ -156,6 +156,16 @@ TEST_P(SqliteOrderTest, IsThatOfTheTextsAfterAnotherConnectionHasMadeTheIndex)
     EXPECT_EQ(selected, Selected());
 }
 
+TEST_P(SqliteOrderTest, IsThatOfTheTextsForATriggerAfterAnotherConnectionHasMadeTheIndex)
+{
+    Deleted();
+    Run(makeIndex + "; DELETE FROM log");
+    EXPECT_TRUE(db.Exec("DELETE FROM v WHERE " + query));
+    const std::string deleted = Run("SELECT b FROM log ORDER BY rowid");
+    const AsTexts asTexts;
+    EXPECT_EQ(deleted, Deleted());
+}
+
 INSTANTIATE_TEST_SUITE_P(Conditions, SqliteOrderTest,
                          ::testing::Values(PartialIndex{"a=5", "a=5"}, PartialIndex{"a=5.0", "a=5"},
                                            PartialIndex{"a=+5", "a=5"},
@@ -196,20 +206,48 @@ TEST_F(SqliteShortcutsTest, ForeignKeysThatAnExplainSwitchesOnAreEnforced)
     TakeLines();
 }
 
-TEST_F(SqliteShortcutsTest, ALockOfASharedCacheIsReportedAsForTheText)
+// A failed command to a full-text table keeps its lock, until the next statement of the connection ends
+// or is prepared again.
+TEST_F(SqliteShortcutsTest, ALookupUsesTheLockThatAFullTextTableHasKept)
+{
+    if (sqlite3_compileoption_used("ENABLE_FTS5") == 0) return;
+    Run("CREATE VIRTUAL TABLE words USING fts5(a)");
+    EXPECT_TRUE(db.IsTableExisted("t"));
+    EXPECT_FALSE(db.Upgrade({"CREATE TABLE u(a)", "ALTER TABLE words ADD COLUMN b"}));
+    EXPECT_FALSE(db.Exec("INSERT INTO words(a,words) VALUES(3,6)"));
+    PlainDb writer(path);
+    writer.Run("BEGIN IMMEDIATE");
+    EXPECT_EQ(sqlite3_exec(writer.Handle(), "COMMIT", nullptr, nullptr, nullptr), SQLITE_BUSY);
+    EXPECT_TRUE(db.IsTableExisted("t"));
+    TakeLines();
+}
+
+// What fails while another connection to a shared cache changes the schema.
+void ExpectSameLockAsForText(const std::string& path, const std::function<bool(SqliteDB&)>& run)
 {
     if (sqlite3_compileoption_used("USE_URI") == 0) return;
     SqliteDB one("file:" + path + "?cache=shared", 0);
     SqliteDB other("file:" + path + "?cache=shared", 0);
     ASSERT_TRUE(one.Open() && other.Open());
-    const std::string update = "UPDATE t SET c=5 WHERE a=7";
-    ASSERT_TRUE(other.Exec(update));
+    ASSERT_TRUE(run(other));
     ASSERT_TRUE(one.Exec("BEGIN; CREATE TABLE u(a)"));
-    EXPECT_FALSE(other.Exec(update));
+    EXPECT_FALSE(run(other));
     const std::string record = toString(other.GetErr());
     const AsTexts asTexts;
-    EXPECT_FALSE(other.Exec(update));
+    EXPECT_FALSE(run(other));
     EXPECT_EQ(record, toString(other.GetErr()));
+}
+
+TEST_F(SqliteShortcutsTest, ALockOfASharedCacheIsReportedAsForTheText)
+{
+    ExpectSameLockAsForText(
+        path, [](SqliteDB& other) { return other.Exec("UPDATE t SET c=5 WHERE a=7"); });
+    TakeLines();
+}
+
+TEST_F(SqliteShortcutsTest, ALookupReportsALockOfASharedCacheAsTheQueryDoes)
+{
+    ExpectSameLockAsForText(path, [](SqliteDB& other) { return other.IsTableExisted("t"); });
     TakeLines();
 }
 

@@ -162,6 +162,24 @@ TEST_F(StatementWatchTest, RefusesTransactionsWhileItIsAskedTo)
     EXPECT_EQ(sqlite3_exec(db.get(), "BEGIN; COMMIT", nullptr, nullptr, nullptr), SQLITE_OK);
 }
 
+TEST_F(StatementWatchTest, RefusesToPrepareAStatementAgainWhileItIsAskedTo)
+{
+    Run("CREATE TABLE jobs (id)");
+    sqlite3_stmt* select = nullptr;
+    ASSERT_EQ(sqlite3_prepare_v2(db.get(), "SELECT id FROM jobs", -1, &select, nullptr), SQLITE_OK);
+    watch.RefuseToPrepareAgain(select);
+    EXPECT_EQ(sqlite3_step(select), SQLITE_DONE);
+    EXPECT_FALSE(watch.AcceptToPrepareAgain());
+    sqlite3_reset(select);
+    Run("CREATE INDEX jobs_id ON jobs(id)");
+    watch.RefuseToPrepareAgain(select);
+    EXPECT_EQ(sqlite3_step(select), SQLITE_AUTH);
+    EXPECT_TRUE(watch.AcceptToPrepareAgain());
+    sqlite3_reset(select);
+    EXPECT_EQ(sqlite3_step(select), SQLITE_DONE);
+    sqlite3_finalize(select);
+}
+
 TEST_F(StatementWatchTest, KeepsCountingOnTheNextConnection)
 {
     Run("CREATE TABLE jobs (id); INSERT INTO jobs VALUES (1)");
