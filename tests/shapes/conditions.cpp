@@ -108,24 +108,22 @@ string Pair(Draw& draw, const Table& table, int depth)
                                : SqliteOr(left, right).GetCondition();
 }
 
-string Chain(Draw& draw, const string& column, std::size_t terms)
-{
-    static const std::array<const char*, 5> others = {" AND c=1", " AND a<>0", " OR c=-1",
-                                                      " OR a IS NULL", " AND b IS NOT NULL"};
-    const string other = draw.shape.Of(others);
-    string chain = column + "=" + AnyLiteral(draw);
-    for (std::size_t count = 1 + draw.value.Below(3); count < terms; ++count) chain += other;
-    return chain;
-}
-
-// Near SQLite's limits for the depth of expressions and parentheses, and those of the library.
+// A condition near SQLite's limits for the depth of expressions and of parentheses, or near those of
+// the library. For SQLite -5 is deeper than a parameter.
 string AtLimit(Draw& draw, const string& column)
 {
-    constexpr std::size_t Terms = 1002;
-    constexpr std::array<std::size_t, 3> Depths = {41, 89, 100};
-    if (draw.shape.OneIn(2)) return Chain(draw, column, Terms);
-    const std::size_t depth = draw.shape.Of(Depths) - draw.value.Below(4);
-    return string(depth, '(') + column + "=" + AnyLiteral(draw) + string(depth, ')');
+    static const std::array<const char*, 5> others = {" AND c=1", " AND a<>0", " OR c>-1",
+                                                      " OR a IS NULL", " AND b IS NOT NULL"};
+    const string first = column + "=-" + std::to_string(2 + draw.value.Below(6));
+    if (draw.shape.OneIn(2)) {
+        const std::size_t depth = (draw.shape.OneIn(3) ? 38 : 84) + draw.value.Below(8);
+        return string(depth, '(') + first + string(depth, ')');
+    }
+    const std::size_t terms = (draw.shape.OneIn(3) ? 14 : 997) + draw.value.Below(4);
+    const string other = draw.shape.Of(others);
+    string chain = first;
+    for (std::size_t count = 1; count < terms; ++count) chain += other;
+    return chain;
 }
 
 string OddCondition(Draw& draw, const Table& table)
@@ -135,7 +133,6 @@ string OddCondition(Draw& draw, const Table& table)
         case 0: return SqliteContains(column, AnyText(draw.value)).GetCondition();
         case 1: return SqliteBeginsWith(column, AnyText(draw.value)).GetCondition();
         case 2: return SqliteIn(column, FillIn(draw, table, "SELECT $c FROM $t")).GetCondition();
-        case 3: return draw.shape.OneIn(3) ? AtLimit(draw, column) : Chain(draw, column, 17);
         default: return FillIn(draw, table, draw.shape.Of(Written));
     }
 }
@@ -185,8 +182,10 @@ string AnyCondition(Draw& draw, const Table& table, int depth)
     if (draw.IsOdd(5)) return OddCondition(draw, table);
     const string column = AnyColumn(draw, table);
     const bool isCommon =
-        draw.schema.hasCommonConditions ? !draw.shape.OneIn(3) : draw.shape.OneIn(8);
+        draw.schema.conditions.empty() ? draw.shape.OneIn(8) : !draw.shape.OneIn(3);
     if (isCommon) return CommonCondition(draw, column);
+    constexpr std::size_t UntilLimit = 100;
+    if (draw.shape.OneIn(UntilLimit)) return AtLimit(draw, column);
     switch (draw.shape.Below(depth < Deepest ? 15 : 11)) {
         case 0:
         case 1:

@@ -42,8 +42,9 @@ bool Compare(Comparison& comparison, std::uint64_t seed, std::size_t operations,
         const Script script = MakeScript(seed);
         std::optional<Difference> difference = comparison.Run(script, left);
         if (difference) {
-            std::printf("DIFFERENCE. Again: --seed %llu --operations %zu\n%s",
-                        static_cast<unsigned long long>(seed), difference->operation,
+            std::printf("DIFFERENCE after %zu operations. Again: --seed %llu --operations %zu\n%s",
+                        comparison.CountOperations(), static_cast<unsigned long long>(seed),
+                        difference->operation,
                         Report({script.seed, script.schema, script.limits, script.shortcuts, {}},
                                *difference)
                             .c_str());

@@ -127,6 +127,20 @@ Operation WhilePausing(Draw& draw, const Operation& operation)
             }};
 }
 
+// The second time a statement is cached, and may have become wrong.
+Operation TwiceAroundChange(Draw& draw, const Operation& operation)
+{
+    const bool isOwn = draw.value.OneIn(draw.schema.neighbour.empty() ? 2 : 8);
+    const Operation change = isOwn
+                                 ? AnySessionOperation(draw)
+                                 : RunAsNeighbour(draw.value.OneIn(4), AnyNeighbourStatement(draw));
+    return {operation.text + " { and again after " + change.text + " }", [=](Side& side) {
+                operation.run(side);
+                change.run(side);
+                operation.run(side);
+            }};
+}
+
 Operation AnyStatement(Random& random, const Pool& pool)
 {
     const bool isKnown = !random.OneIn(5 * pool.tameness);
@@ -150,8 +164,11 @@ string AnyNeighbourStatement(Draw& draw)
 Operation AnyOperation(Random& random, const Pool& pool)
 {
     Draw draw{Random(random.Next()), Random(random.Next()), pool.schema};
+    const bool hasChanges = !pool.schema.neighbour.empty() || !pool.schema.session.empty();
+    if (hasChanges && random.OneIn(6)) return TwiceAroundChange(draw, AnyStatement(random, pool));
     const std::size_t kind = random.Below(100);
-    if (kind < 70) return AnyStatement(random, pool);
+    if (kind < 67) return AnyStatement(random, pool);
+    if (kind < 70) return TwiceAroundChange(draw, AnyStatement(random, pool));
     if (kind < 74) return WhileLocked(draw, AnyStatement(random, pool));
     if (kind < 77) return WhilePausing(draw, AnyStatement(random, pool));
     if (kind < 84) return AnySessionOperation(draw);

@@ -12,85 +12,67 @@ namespace {
 
 using std::string;
 
-// "$c" is one column, and each "$n" a number.
-constexpr std::array<const char*, 24> Conditions = {"$c=$n",
-                                                    "$c=$n",
-                                                    "$c=$n",
-                                                    "$c==$n",
-                                                    "($c=$n)",
-                                                    "$c IN ($n)",
-                                                    "$c IN ($n,$n)",
-                                                    "$c IN ($n,$n)",
-                                                    "$c IN ( $n,$n,$n )",
-                                                    "$c NOT IN ($n)",
-                                                    "$c NOT IN ($n,$n)",
-                                                    "$c NOT IN ($n,$n)",
-                                                    "$c=$n OR $c=$n",
-                                                    "($c=$n) OR ($c=$n)",
-                                                    "$c=$n OR $c IN ($n)",
-                                                    "$c=1 OR $c=$n",
-                                                    "$c>$n",
-                                                    "$c>=$n",
-                                                    "$c<$n",
-                                                    "$c<=$n",
-                                                    "$c<>$n",
-                                                    "$c>$n AND $c<$n",
-                                                    "$c IS NOT NULL",
-                                                    "$c=$n AND $c>$n"};
+// Conditions of which SQLite may make each other. "$c" is one column, and each "$n" a number.
+using Family = std::vector<const char*>;
+const std::array<Family, 7> Families = {
+    {{"$c=$n"},
+     {"$c=$n", "$c==$n", "($c=$n)", "$c IN ($n)"},
+     {"$c IN ($n,$n)", "$c=$n OR $c=$n"},
+     {"$c IN ($n,$n)", "($c=$n) OR ($c IN ($n))", "$c IN ( $n,$n,$n )"},
+     {"$c=1 OR $c=$n", "$c IN (1,$n)"},
+     {"$c NOT IN ($n,$n)", "$c NOT IN ($n)", "$c<>$n"},
+     {"$c>$n", "$c>=$n", "$c<$n", "$c>$n AND $c<$n", "$c=$n", "$c IS NOT NULL"}}};
 
 // So few that those of a statement are often those of an index.
-constexpr std::array<const char*, 10> Numbers = {"5", "5", "5",  "7",   "7",
-                                                 "9", "6", "-5", "'5'", "'x'"};
+constexpr std::array<const char*, 10> Numbers = {"5", "5", "5", "5", "7",
+                                                 "7", "7", "7", "9", "'5'"};
 
 // In an index they are also written in other ways.
-constexpr std::array<const char*, 16> IndexNumbers = {"5",   "5",   "5",   "5.0",  "5.0", "+5",
-                                                      "7",   "7",   "7.0", "9",    "'5'", "'x'",
-                                                      "5e0", "0x5", "-5",  "'5.0'"};
+constexpr std::array<const char*, 14> IndexNumbers = {"5", "5",   "5",   "5",  "7",   "7",   "7",
+                                                      "7", "5.0", "5.0", "+5", "7.0", "0x5", "'5'"};
 
-template <class Choices>
-string Fill(Random& shape, Random& value, const string& column, const Choices& numbers)
+// Puts a column, or numbers, in the place of each "$c" or "$n".
+template <class Next>
+string Replace(const string& text, char kind, const Next& next)
 {
-    string filled;
-    for (const char* at = shape.Of(Conditions); *at != '\0'; ++at) {
-        if (*at != '$') {
-            filled += *at;
-        } else {
-            filled += *++at == 'c' ? column : value.Of(numbers);
-        }
+    string replaced;
+    for (std::size_t at = 0; at < text.size(); ++at) {
+        const bool isPlace = text[at] == '$' && text[at + 1] == kind;
+        replaced += isPlace ? next() : string(1, text[at]);
+        if (isPlace) ++at;
     }
-    return filled;
+    return replaced;
 }
 
-string AnyIndex(Random& random, std::size_t number)
+string AnyIndex(Random& random, const string& condition)
 {
-    static const std::array<const char*, 8> keys = {"b", "b",   "c",   "c DESC",
-                                                    "a", "b,a", "c,b", "a DESC"};
-    static const std::array<const char*, 4> columns = {"a", "a", "a", "c"};
+    static const std::array<const char*, 7> keys = {"b",   "b",   "c",     "c DESC",
+                                                    "b,a", "c,b", "a DESC"};
+    static const std::array<const char*, 3> plain = {"5", "7", "9"};
     const string key = random.Of(keys);
-    const string column = random.Of(columns);
-    return "CREATE INDEX p" + std::to_string(number) + " ON t(" + key + ") WHERE " +
-           Fill(random, random, column, IndexNumbers);
+    const bool isPlain = random.OneIn(2);
+    std::size_t count = 0;
+    const auto next = [&] {
+        return string(isPlain ? plain[count++ % plain.size()] : random.Of(IndexNumbers));
+    };
+    return " ON t(" + key + ") WHERE " + Replace(condition, 'n', next);
 }
 
 // Rows with the numbers of the conditions as integers, reals and texts. Each column has another order.
 const char* const Rows =
-    "INSERT OR REPLACE INTO t(id,a,b,c) WITH RECURSIVE n(i) AS (VALUES(1) UNION ALL SELECT i+1 "
-    "FROM n "
-    "WHERE i<15) SELECT i*7%17, CASE i%8 WHEN 0 THEN 7 WHEN 1 THEN '5' WHEN 2 THEN 5.0 WHEN 3 THEN "
-    "9 "
-    "WHEN 4 THEN NULL ELSE 5 END, char(120-i*5%13), CASE i%4 WHEN 0 THEN 5 WHEN 1 THEN 7 ELSE i "
-    "END "
-    "FROM n";
+    "INSERT OR REPLACE INTO t(id,a,b,c) "
+    "WITH RECURSIVE n(i) AS (VALUES(1) UNION ALL SELECT i+1 FROM n WHERE i<15) "
+    "SELECT i*7%17, CASE i%8 WHEN 0 THEN 7 WHEN 1 THEN '5' WHEN 2 THEN 5.0 WHEN 3 THEN 9 "
+    "WHEN 4 THEN NULL ELSE 5 END, char(120-i*5%13), "
+    "CASE i%4 WHEN 0 THEN 5 WHEN 1 THEN 7 ELSE i END FROM n";
 
 std::vector<string> Triggers(Random& random)
 {
-    const string end = random.OneIn(3) ? "; DELETE FROM t WHERE id=old.id; END" : "; END";
-    return {"CREATE TABLE log(op,id,a)", "CREATE VIEW v AS SELECT id,a,b,c FROM t",
-            "CREATE TRIGGER v1 INSTEAD OF DELETE ON v BEGIN "
-            "INSERT INTO log VALUES('d',old.id,old.a)" +
-                end,
-            "CREATE TRIGGER v2 INSTEAD OF UPDATE ON v BEGIN "
-            "INSERT INTO log VALUES('u',old.id,new.a); END",
+    const string log = "BEGIN INSERT INTO log VALUES(old.id,old.a); ";
+    const string del = random.OneIn(3) ? "DELETE FROM t WHERE id=old.id; " : "";
+    return {"CREATE TABLE log(id,a)", "CREATE VIEW v AS SELECT id,a,b,c FROM t",
+            "CREATE TRIGGER v1 INSTEAD OF DELETE ON v " + log + del + "END",
+            "CREATE TRIGGER v2 INSTEAD OF UPDATE ON v " + log + "END",
             "CREATE TRIGGER v3 INSTEAD OF INSERT ON v BEGIN "
             "INSERT INTO t(id,a,b,c) VALUES(new.id,new.a,new.b,new.c); END"};
 }
@@ -99,7 +81,11 @@ std::vector<string> Triggers(Random& random)
 
 string CommonCondition(Draw& draw, const string& column)
 {
-    return Fill(draw.shape, draw.value, column, Numbers);
+    const std::vector<string>& own = draw.schema.conditions;
+    const bool isOwn = !own.empty() && !draw.shape.OneIn(8);
+    const string condition = isOwn ? draw.shape.Of(own) : draw.shape.Of(draw.shape.Of(Families));
+    const string ofColumn = Replace(condition, 'c', [&] { return column; });
+    return Replace(ofColumn, 'n', [&] { return string(draw.value.Of(Numbers)); });
 }
 
 Schema AnyPartialIndexes(Random& random)
@@ -111,16 +97,19 @@ Schema AnyPartialIndexes(Random& random)
     Schema schema{"random partial indexes of t(" + t.columns + ")", {}, {t, v, v}};
     schema.setup = {"CREATE TABLE t(" + t.columns + ")", Rows};
     for (const string& statement : Triggers(random)) schema.setup.push_back(statement);
-    schema.hasCommonConditions = true;
+    const string column = random.OneIn(4) ? "c" : "a";
+    for (const char* const condition : random.Of(Families))
+        schema.conditions.push_back(Replace(condition, 'c', [&] { return column; }));
     constexpr std::size_t Indexes = 6;
     const std::size_t present = random.Below(3);
     for (std::size_t number = 0; number < Indexes; ++number) {
-        const string create = AnyIndex(random, number);
+        const string name = "p" + std::to_string(number);
+        const string create =
+            "CREATE INDEX " + name + AnyIndex(random, random.Of(schema.conditions));
         schema.name += (number < present ? "; " : "; later ") + create;
         if (number < present) schema.setup.push_back(create);
-        schema.neighbour.push_back(create);
-        schema.neighbour.push_back("DROP INDEX p" + std::to_string(number));
-        schema.neighbour.emplace_back(Rows);
+        for (const string& change : {create, "DROP INDEX " + name, string(Rows)})
+            schema.neighbour.push_back(change);
     }
     if (random.OneIn(3)) schema.setup.emplace_back("ANALYZE");
     return schema;

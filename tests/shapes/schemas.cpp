@@ -1,5 +1,7 @@
 #include "schemas.h"
 
+#include <sqlite3.h>
+
 namespace Shapes {
 
 namespace {
@@ -221,6 +223,16 @@ Schema WideTables()
             {wide, t}};
 }
 
+// Both connections of a side use one cache, and meet each other's locks there.
+Schema SharedCache()
+{
+    const Table t = Usually("t");
+    const Table u = Usually("u");
+    Schema schema{"shared cache", {Create(t), Create(u), Fill("t")}, {t, u}};
+    if (sqlite3_compileoption_used("USE_URI") != 0) schema.file = "file:main.db?cache=shared";
+    return schema;
+}
+
 Schema SmallPages()
 {
     const Table t = Usually("t", "a, b BLOB, c FLOAT, id INTEGER PRIMARY KEY");
@@ -240,7 +252,7 @@ const std::vector<Schema>& Schemas()
         Strict(),     WithoutRowid(), Triggers(),       Checks(),
         Views(),      FullText(),     Utf16(),          WriteAheadLog(),
         Generated(),  ForeignKeys(),  Collations(),     OddNames(),
-        WideTables(), SmallPages()};
+        WideTables(), SmallPages(),   SharedCache()};
     return schemas;
 }
 

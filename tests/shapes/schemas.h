@@ -17,12 +17,12 @@ struct Table {
 
 struct Schema {
     std::string name;
-    std::vector<std::string> setup;        // run on an empty file
-    std::vector<Table> tables;             // what operations use; the first one most
-    std::vector<std::string> session{};    // what its connections often run
-    std::vector<std::string> neighbour{};  // what others often run
-    bool hasCommonConditions = false;      // statements mostly use CommonCondition()
-    const char* file = "main.db";          // as its connections write it
+    std::vector<std::string> setup;         // run on an empty file
+    std::vector<Table> tables;              // what operations use; the first one most
+    std::vector<std::string> session{};     // what its connections often run
+    std::vector<std::string> neighbour{};   // what others often run
+    std::vector<std::string> conditions{};  // what its statements often use: see CommonCondition()
+    const char* file = "main.db";           // as its connections write it
 };
 
 // One of the databases in schemas.cpp, or one with random partial indexes.
