@@ -130,7 +130,7 @@ Operation WhilePausing(Draw& draw, const Operation& operation)
 // The second time a statement is cached, and may have become wrong.
 Operation TwiceAroundChange(Draw& draw, const Operation& operation)
 {
-    const bool isOwn = draw.value.OneIn(draw.schema.neighbour.empty() ? 2 : 8);
+    const bool isOwn = draw.schema.neighbour.empty() && draw.value.Below(4) != 0;
     const Operation change = isOwn
                                  ? AnySessionOperation(draw)
                                  : RunAsNeighbour(draw.value.OneIn(4), AnyNeighbourStatement(draw));
@@ -165,7 +165,11 @@ Operation AnyOperation(Random& random, const Pool& pool)
 {
     Draw draw{Random(random.Next()), Random(random.Next()), pool.schema};
     const bool hasChanges = !pool.schema.neighbour.empty() || !pool.schema.session.empty();
-    if (hasChanges && random.OneIn(6)) return TwiceAroundChange(draw, AnyStatement(random, pool));
+    if (hasChanges && random.OneIn(6)) {
+        const bool isOrdered = !pool.schema.conditions.empty() && !random.OneIn(4);
+        return TwiceAroundChange(
+            draw, isOrdered ? AnyOrderedOperation(draw) : AnyStatement(random, pool));
+    }
     const std::size_t kind = random.Below(100);
     if (kind < 67) return AnyStatement(random, pool);
     if (kind < 70) return TwiceAroundChange(draw, AnyStatement(random, pool));

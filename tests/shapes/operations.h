@@ -25,6 +25,10 @@ Operation AnyRecordOperation(Draw& draw);
 // Of statements as texts.
 Operation AnyTextOperation(Draw& draw);
 
+// A statement with one of the conditions in partial_indexes.cpp, on its tables. The order of the rows can
+// be noticed.
+Operation AnyOrderedOperation(Draw& draw);
+
 // Opening, closing, transactions, PRAGMAs, other databases, tables.
 Operation AnySessionOperation(Draw& draw);
 

@@ -60,6 +60,23 @@ Operation SelectRowByRow(Draw& draw)
 
 }  // namespace
 
+Operation AnyOrderedOperation(Draw& draw)
+{
+    const std::size_t db = AnyConnection(draw);
+    const string condition = CommonCondition(draw, "a");
+    if (draw.shape.OneIn(2)) {
+        const string text = "DELETE FROM v WHERE " + condition;
+        return {NameOf(db) + "Exec: " + text,
+                [=](Side& side) { side.Note("answer", side.Db(db).Exec(text)); }};
+    }
+    const string text = "SELECT b,id FROM t WHERE " + condition;
+    return {NameOf(db) + "SelectByCommand: " + text, [=](Side& side) {
+                std::vector<SqliteValueList> records;
+                side.Note("answer", side.Db(db).SelectByCommand(text, records));
+                for (const SqliteValueList& record : records) side.Note("record", record.ToStr());
+            }};
+}
+
 Operation AnyTextOperation(Draw& draw)
 {
     switch (draw.shape.Below(5)) {
