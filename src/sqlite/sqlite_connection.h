@@ -124,6 +124,10 @@ class SqliteConnection {
     void EndSelect(sqlite3* handle);
     void NoteChangesSince(const StatementWatch::Changes& before);
     void NoteExtendedCode();
+
+    // Whether a connection outside of a transaction has a lock, and whether by itself: a select of it
+    // runs, or its lookup. Otherwise a virtual table has kept the lock.
+    bool IsReading() const;
     bool HoldsLock() const { return selects_ > 0 || lookup_.IsChecking(); }
 
     const std::string path_;
