@@ -178,11 +178,9 @@ std::optional<int> SqliteConnection::BeginShape(const Bind& bind, StatementCache
     if (taken == SQLITE_ERROR) return {};
     if (taken != SQLITE_OK) return taken;
     if (bind(cached.statement.get()) != SQLITE_OK) return {};
-    // SQLite compares bound values with partial indexes more loosely than literals, and 5 is 5.0 there.
-    // The order of rows would be another.
-    if (MayDependOnValues(cached.statement.get())) return {};
-    // Nor may SQLite prepare it again with the values, because another connection has changed the schema.
-    // It would also forget which values the new plan depends on.
+    // SQLite prepares a statement again if its plan depends on the values, and if another connection has
+    // changed the schema. Then it compares the values with partial indexes more loosely than literals,
+    // 5 is 5.0 there, and the order of rows would be another.
     watch_.RefuseToPrepareAgain(cached.statement.get());
     const std::optional<int> code = StepFirst(cached);
     if (!watch_.AcceptToPrepareAgain()) return code;

@@ -3,9 +3,6 @@
 #include <cstring>
 #include <limits>
 
-// Missing in an SQLite without its deprecated functions.
-#pragma weak sqlite3_expired
-
 namespace OrvaDRCore {
 
 // SQLite counts the bytes of a literal in an int and crashes when that overflows.
@@ -28,11 +25,6 @@ int PrepareStatement(sqlite3* handle, const std::string& command, Statement& sta
 int EndBeforeLastRow(sqlite3_stmt* statement)
 {
     return sqlite3_stmt_readonly(statement) != 0 ? SQLITE_OK : sqlite3_reset(statement);
-}
-
-bool MayDependOnValues(sqlite3_stmt* statement)
-{
-    return sqlite3_expired == nullptr || sqlite3_expired(statement) != 0;
 }
 
 bool HasNothingAttached([[maybe_unused]] sqlite3* handle)

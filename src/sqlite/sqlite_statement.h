@@ -25,10 +25,6 @@ int PrepareStatement(sqlite3* handle, const std::string& command, Statement& sta
 // Returns SQLite's code.
 int EndBeforeLastRow(sqlite3_stmt* statement);
 
-// Whether the values that were just bound may change how the statement is run: SQLite would prepare it
-// again for them. True if SQLite was built without the function that says so.
-bool MayDependOnValues(sqlite3_stmt* statement);
-
 // Whether the connection has main and temp alone. False before SQLite 3.39, where there is no way to
 // ask.
 bool HasNothingAttached(sqlite3* handle);
