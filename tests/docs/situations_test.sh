@@ -94,12 +94,13 @@ make_database() {
 
 # start_sqlite STATEMENTS: a process that has run them and keeps the database open.
 start_sqlite() {
+    rm -f "$work/out" # that of an earlier situation is ready, too
     mkfifo "$work/in"
     sqlite3 nodes.db <"$work/in" >"$work/out" 2>&1 &
     note_started $!
     exec 8>"$work/in"
     printf '%s\n.print ready\n' "$1" >&8
-    until grep -q ready "$work/out"; do sleep 0.01; done
+    until grep -qs ready "$work/out"; do sleep 0.01; done
     rm "$work/in"
 }
 
